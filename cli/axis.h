@@ -1,0 +1,30 @@
+#pragma once
+
+#include <string>
+#include <vector>
+
+// A range of numbers with round ticks on it: steps of 1, 2 or 5 times a power of ten.
+class Axis {
+public:
+    // `low` <= `high`, finite. About `ticks` ticks; a step is never below `leastStep`.
+    Axis(double low, double high, int ticks, double leastStep = 0.0);
+
+    double Low() const { return low_; }
+    double High() const { return high_; }
+    // The ticks inside the range.
+    std::vector<double> Ticks() const;
+    // As many places as the step needs, and no "-0".
+    std::string Label(double tick) const;
+
+private:
+    double low_;
+    double high_;
+    double step_;
+};
+
+// A range with some air around it; an empty one gets some extent.
+struct Range {
+    double low;
+    double high;
+};
+Range WithAir(Range range, double share);

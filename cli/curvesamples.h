@@ -1,0 +1,28 @@
+#pragma once
+
+#include "cli/svg.h"
+#include "host/scene.h"
+
+#include <vector>
+
+// The curve of one component as points: x in seconds, y in value units, or value units a second for the speed.
+struct ComponentCurve {
+    std::vector<Point> value;
+    std::vector<Point> speed;  // a jump is two points at one time
+    std::vector<Point> keys;
+};
+
+// A handle of a key on a curved side.
+struct Handle {
+    std::size_t component;
+    Point key;
+    Point end;
+};
+
+struct StreamCurves {
+    std::vector<ComponentCurve> components;
+    std::vector<Handle> handles;
+};
+
+// Samples a stream with some `pointsPerSecond` points. Throws StoreError.
+StreamCurves SampleCurves(kfshost::StreamItem const& item, double pointsPerSecond);

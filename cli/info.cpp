@@ -1,0 +1,66 @@
+#include "cli/commands.h"
+#include "cli/output.h"
+#include "cli/table.h"
+
+#include <fmt/format.h>
+
+#include <iterator>
+
+using kfshost::StreamItem;
+
+namespace {
+
+std::string Plural(std::size_t count, std::string_view one, std::string_view many)
+{
+    return fmt::format("{} {}", count, count == 1 ? one : many);
+}
+
+std::string Summary(kfshost::Scene const& scene, std::vector<StreamItem const*> const& items)
+{
+    std::size_t keys = 0;
+    for (StreamItem const* item : items) {
+        keys += static_cast<std::size_t>(kfshost::KeyCount(*item->stream));
+    }
+    std::string text = fmt::format("{}: {}, {}", scene.name, Plural(items.size(), "stream", "streams"), Plural(keys, "key", "keys"));
+    if (auto const span = SpanOf(items)) {
+        text += fmt::format(", {} s to {} s", TimeText(span->first), TimeText(span->last));
+    }
+    text += fmt::format("\ntimes in 1/{} s: ", scene.timeScale);
+    return text + (scene.exactTimes ? "every key time is exactly what the file says\n"
+                                    : fmt::format("key times are rounded by up to {:.2g} s\n", scene.worstTimeError));
+}
+
+std::string Joined(std::vector<std::string> const& names)
+{
+    constexpr std::size_t mostNames = 6;
+    std::string text;
+    for (std::size_t i = 0; i < names.size() && i < mostNames; ++i) {
+        text += (i == 0 ? "" : " ") + names[i];
+    }
+    return names.size() > mostNames ? text + " ..." : text;
+}
+
+}  // namespace
+
+void RunInfo(InfoOptions const& options)
+{
+    kfshost::Scene const scene = LoadScene(options.selection);
+    auto const items = SelectStreams(scene, options.selection);
+    Table table({{"stream", Align::Left},
+                 {"kind", Align::Left},
+                 {"dimension", Align::Right},
+                 {"components", Align::Left},
+                 {"keys", Align::Right},
+                 {"first", Align::Right},
+                 {"last", Align::Right},
+                 {"interpolation", Align::Left}});
+    for (StreamItem const* item : items) {
+        int const keys = kfshost::KeyCount(*item->stream);
+        table.AddRow({item->path, std::string(NameOf(item->kind)), std::to_string(item->stream->GetDimension()),
+                      Joined(item->components), std::to_string(keys),
+                      keys == 0 ? "-" : TimeText(kfshost::KeyTime(*item->stream, 0)),
+                      keys == 0 ? "-" : TimeText(kfshost::KeyTime(*item->stream, keys - 1)),
+                      std::string(NameOf(item->interpolation))});
+    }
+    WriteToStandardOutput(Summary(scene, items) + '\n' + table.ToText());
+}

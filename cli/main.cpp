@@ -1,0 +1,123 @@
+#include "cli/commands.h"
+#include "cli/usererror.h"
+
+#include "frame/services/reports.h"
+#include "host/import.h"
+#include "host/import_error.h"
+#include "host/session.h"
+#include "host/storeerror.h"
+
+#include <CLI/CLI.hpp>
+
+#include <cstdio>
+#include <map>
+#include <new>
+#include <string>
+
+namespace {
+
+constexpr int FailureCode = 2;
+
+// What the library reported first: it explains an error code.
+std::string firstReport;
+
+void RememberFirstReport(Q_Report const& report)
+{
+    if (firstReport.empty() && report.text) {
+        firstReport = report.text;
+    }
+}
+
+void AddSelection(CLI::App& command, Selection& selection)
+{
+    command.add_option("FILE", selection.file, "a .gltf, .glb or .bvh file")->required();
+    command
+        .add_option("--stream", selection.glob, "only streams whose path matches this pattern, with * and ? (quote it)")
+        ->type_name("GLOB")
+        ->capture_default_str();
+    command
+        .add_option("--time-scale", selection.timeScale,
+                    "hold times in this many units a second (default: chosen so that key times are exact)")
+        ->check(CLI::PositiveNumber)
+        ->type_name("N");
+}
+
+void AddInfo(CLI::App& app, InfoOptions& options)
+{
+    CLI::App* const command = app.add_subcommand("info", "List what is animated: streams, keys, span, interpolation");
+    AddSelection(*command, options.selection);
+    command->callback([&options] { RunInfo(options); });
+}
+
+void AddEval(CLI::App& app, EvalOptions& options)
+{
+    CLI::App* const command = app.add_subcommand("eval", "Print values at regular times");
+    AddSelection(*command, options.selection);
+    command->add_option("--from", options.from, "first time: seconds like 0.5 or 1/24, or frames like 12f (default: first key)")
+        ->type_name("TIME");
+    command->add_option("--to", options.to, "last time (default: last key)")->type_name("TIME");
+    command->add_option("--fps", options.fps, "samples a second, like 24 or 30000/1001")->type_name("RATE")->capture_default_str();
+    static std::map<std::string, Format> const formats{{"table", Format::Table}, {"csv", Format::Csv}, {"json", Format::Json}};
+    command->add_option("--format", options.format, "table, csv or json (default: table)")
+        ->transform(CLI::CheckedTransformer(formats))
+        ->type_name("FORMAT");
+    command->footer("Numbers are printed with as many digits as it takes to read the same number back. In tables times are exact\n"
+                    "fractions; JSON gives them as [numerator, denominator] in seconds.");
+    command->callback([&options] { RunEval(options); });
+}
+
+void AddPlot(CLI::App& app, PlotOptions& options)
+{
+    CLI::App* const command = app.add_subcommand("plot", "Draw value and speed graphs into an SVG file");
+    AddSelection(*command, options.selection);
+    command->add_option("-o,--output", options.output, "the drawing; - for the standard output")->required()->type_name("SVG");
+    command->add_flag("--frames", options.inFrames, "label the time axis in frames");
+    command->add_option("--fps", options.fps, "frames a second for --frames")->type_name("RATE")->capture_default_str();
+    command->callback([&options] { RunPlot(options); });
+}
+
+int Fail(std::string const& message)
+{
+    std::fprintf(stderr, "kfs: %s\n", message.c_str());
+    return FailureCode;
+}
+
+}  // namespace
+
+kfshost::Scene LoadScene(Selection const& selection)
+{
+    try {
+        return kfshost::ImportFile(selection.file, {selection.timeScale});
+    } catch (kfshost::ImportError const& error) {
+        throw UserError(selection.file, error.what());
+    }
+}
+
+int main(int argc, char** argv)
+try {
+    kfshost::Session const session;
+    Q_SetReportSink(RememberFirstReport);
+
+    CLI::App app{"Takes the animation out of a file, holds it in streams of keys, and answers with values and drawings.", "kfs"};
+    app.require_subcommand(1);
+    app.footer("Examples:\n"
+               "  kfs info walk.glb\n"
+               "  kfs eval walk.glb --stream '*/Hips/*' --fps 30 --format csv\n"
+               "  kfs plot walk.glb --stream '*/Hips/translation' -o hips.svg\n"
+               "\n"
+               "Errors are one line on the standard error and exit code 2; nothing is written then.");
+    InfoOptions info;
+    EvalOptions eval;
+    PlotOptions plot;
+    AddInfo(app, info);
+    AddEval(app, eval);
+    AddPlot(app, plot);
+    CLI11_PARSE(app, argc, argv);
+    return 0;
+} catch (kfshost::StoreError const& error) {
+    return Fail(firstReport.empty() ? error.what() : error.what() + (": " + firstReport));
+} catch (std::bad_alloc const&) {
+    return Fail("out of memory");
+} catch (std::exception const& error) {
+    return Fail(error.what());
+}

@@ -1,0 +1,298 @@
+#include "cli/axis.h"
+#include "cli/commands.h"
+#include "cli/curvesamples.h"
+#include "cli/output.h"
+#include "cli/usererror.h"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+#include <array>
+#include <cmath>
+
+using kfshost::StreamItem;
+
+namespace {
+
+constexpr std::size_t MostStreams = 6;
+constexpr std::size_t MostLegendLines = 14;
+
+constexpr double Width = 1600.0;
+constexpr double Left = 110.0;
+constexpr double Right = 1390.0;
+constexpr double HeaderHeight = 76.0;
+constexpr double TitleHeight = 40.0;
+constexpr double ValueHeight = 300.0;
+constexpr double PanelGap = 30.0;
+constexpr double SpeedHeight = 150.0;
+constexpr double AxisHeight = 62.0;
+constexpr double StreamHeight = TitleHeight + ValueHeight + PanelGap + SpeedHeight + AxisHeight;
+
+// Told apart in print and by eyes that don't tell red from green; x, y and z come near their usual red, green and blue.
+constexpr std::array<std::string_view, 8> Colors{"#d1432b", "#17915f", "#1f6fb5", "#c07a00",
+                                                 "#8a4fa8", "#3a3a3a", "#2aa7c9", "#b0397e"};
+constexpr std::array<std::string_view, 3> Dashes{"", "9 4", "2 4"};
+// For a curve on top of one, two or more others: their colours show in the gaps.
+constexpr std::array<std::string_view, 3> OverlapDashes{"14 14", "14 28", "14 42"};
+
+using CurvePoints = std::vector<Point> ComponentCurve::*;
+
+bool Coincide(std::vector<Point> const& a, std::vector<Point> const& b)
+{
+    return std::ranges::equal(a, b, [](Point const& p, Point const& q) { return p.x == q.x && p.y == q.y; });
+}
+
+// The pen of a component, which tells it from those before it also where their curves are one.
+Pen CurvePen(StreamCurves const& curves, std::size_t component, CurvePoints points)
+{
+    std::size_t covered = 0;
+    for (std::size_t d = 0; d < component; ++d) {
+        covered += Coincide(curves.components[d].*points, curves.components[component].*points) ? 1 : 0;
+    }
+    std::string_view const dashes = covered == 0 ? Dashes[component / Colors.size() % Dashes.size()]
+                                                 : OverlapDashes[std::min(covered, OverlapDashes.size()) - 1];
+    return {Colors[component % Colors.size()], 2.0, dashes};
+}
+
+// The time axis of all panels: seconds, or frames.
+struct TimeUnit {
+    std::string name;
+    double perSecond;
+    double leastStep;
+};
+
+TimeUnit UnitOf(PlotOptions const& options)
+{
+    if (!options.inFrames) {
+        return {"seconds", 1.0, 0.0};
+    }
+    auto const fps = ParseFps(options.fps);
+    return {"frames at " + fps.ToString() + " a second", fps.ToDouble(), 1.0};
+}
+
+// One graph: maps what it shows to the drawing.
+class Panel {
+public:
+    Panel(double top, double height, Axis const& time, Axis const& values) : top_(top), height_(height), time_(time), values_(values) {}
+
+    double Bottom() const { return top_ + height_; }
+    double X(double time) const { return Left + (time - time_.Low()) / (time_.High() - time_.Low()) * (Right - Left); }
+    double Y(double value) const { return Bottom() - (value - values_.Low()) / (values_.High() - values_.Low()) * height_; }
+
+    void DrawFrame(Svg& svg, std::string const& caption) const
+    {
+        Pen const grid{"#e4e4e4"};
+        svg.Rectangle({Left, top_}, Right - Left, height_, "#fcfcfc", {"none"});
+        for (double const tick : time_.Ticks()) {
+            svg.Line({X(tick), top_}, {X(tick), Bottom()}, grid);
+        }
+        for (double const tick : values_.Ticks()) {
+            bool const isZero = values_.Label(tick) == values_.Label(0.0);
+            svg.Line({Left, Y(tick)}, {Right, Y(tick)}, isZero ? Pen{"#b4b4b4"} : grid);
+            svg.Text({Left - 10, Y(tick) + 4.5}, values_.Label(tick), {13.0, "#444444", Anchor::End});
+        }
+        svg.Rectangle({Left, top_}, Right - Left, height_, "none", {"#8c8c8c"});
+        svg.Text({Left, top_ - 8}, caption, {13.0, "#666666"});
+    }
+
+    void DrawTimeLabels(Svg& svg, std::string const& unit) const
+    {
+        for (double const tick : time_.Ticks()) {
+            svg.Line({X(tick), Bottom()}, {X(tick), Bottom() + 5}, {"#8c8c8c"});
+            svg.Text({X(tick), Bottom() + 20}, time_.Label(tick), {13.0, "#444444", Anchor::Middle});
+        }
+        svg.Text({(Left + Right) / 2, Bottom() + 40}, unit, {13.0, "#666666", Anchor::Middle});
+    }
+
+private:
+    double top_;
+    double height_;
+    Axis const& time_;
+    Axis const& values_;
+};
+
+class Plot {
+public:
+    Plot(PlotOptions const& options, kfshost::Scene const& scene, std::vector<StreamItem const*> const& all)
+        : unit_(UnitOf(options)), shown_(all.begin(), all.begin() + static_cast<std::ptrdiff_t>(std::min(all.size(), MostStreams))),
+          svg_(Width, HeaderHeight + StreamHeight * static_cast<double>(shown_.size())), time_(TimeAxis())
+    {
+        DrawHeader(scene.name, all.size());
+    }
+
+    std::string Draw()
+    {
+        double top = HeaderHeight;
+        for (StreamItem const* item : shown_) {
+            DrawStream(*item, top);
+            top += StreamHeight;
+        }
+        return svg_.Finish();
+    }
+
+private:
+    Axis TimeAxis() const
+    {
+        auto const span = SpanOf(shown_).value_or(TimeSpan{});
+        Range const range = WithAir({span.first.ToDouble() * unit_.perSecond, span.last.ToDouble() * unit_.perSecond}, 0.02);
+        return {range.low, range.high, 12, unit_.leastStep};
+    }
+
+    void DrawHeader(std::string const& name, std::size_t selected)
+    {
+        svg_.Text({Left, 38}, name, {22.0, "#111111", Anchor::Start, true});
+        if (selected > shown_.size()) {
+            svg_.Text({Left, 60}, fmt::format("the first {} of {} streams with keys; --stream chooses others", shown_.size(), selected),
+                      {13.0, "#666666"});
+        }
+        double const y = 33;
+        svg_.Diamond({Right - 170, y}, 5.5, "#555555", {"#ffffff", 1.2});
+        svg_.Text({Right - 158, y + 4.5}, "key", {13.0, "#444444"});
+        svg_.Line({Right - 100, y}, {Right - 66, y}, {"#555555", 1.2});
+        svg_.Circle({Right - 66, y}, 3.5, "#ffffff", {"#555555", 1.4});
+        svg_.Text({Right - 54, y + 4.5}, "handle", {13.0, "#444444"});
+    }
+
+    void DrawStream(StreamItem const& item, double top)
+    {
+        svg_.Text({Left, top + 14}, Shortened(item.path, 110), {15.0, "#111111", Anchor::Start, true});
+        double const valueTop = top + TitleHeight;
+        double const pointsPerUnit = (Right - Left) / (time_.High() - time_.Low());
+        StreamCurves const curves = SampleCurves(item, pointsPerUnit * unit_.perSecond);
+        bool const showHandles = PixelsPerKey(curves) >= 14.0;
+
+        Axis const values = ValueAxis(curves, showHandles);
+        Panel const valuePanel(valueTop, ValueHeight, time_, values);
+        valuePanel.DrawFrame(svg_, std::string(NameOf(item.kind)) + ", " + std::string(NameOf(item.interpolation)));
+        DrawCurves(valuePanel, curves, &ComponentCurve::value);
+        DrawKeys(valuePanel, curves, showHandles);
+        DrawLegend(item, curves, valueTop);
+
+        Axis const speeds = SpeedAxis(curves);
+        Panel const speedPanel(valuePanel.Bottom() + PanelGap, SpeedHeight, time_, speeds);
+        speedPanel.DrawFrame(svg_, "speed, a second");
+        DrawCurves(speedPanel, curves, &ComponentCurve::speed);
+        speedPanel.DrawTimeLabels(svg_, unit_.name);
+    }
+
+    static std::string Shortened(std::string const& text, std::size_t most)
+    {
+        if (text.size() <= most) {
+            return text;
+        }
+        std::size_t start = text.size() - most;
+        while ((static_cast<unsigned char>(text[start]) & 0xC0) == 0x80) {
+            ++start;
+        }
+        return "..." + text.substr(start);
+    }
+
+    // How far apart keys are on average.
+    double PixelsPerKey(StreamCurves const& curves) const
+    {
+        auto const& keys = curves.components.front().keys;
+        double const extent = (keys.back().x - keys.front().x) * unit_.perSecond / (time_.High() - time_.Low()) * (Right - Left);
+        return keys.size() < 2 ? Right - Left : extent / static_cast<double>(keys.size() - 1);
+    }
+
+    static Range Extent(StreamCurves const& curves, CurvePoints points)
+    {
+        Range range{HUGE_VAL, -HUGE_VAL};
+        for (ComponentCurve const& curve : curves.components) {
+            for (Point const& point : curve.*points) {
+                range = {std::min(range.low, point.y), std::max(range.high, point.y)};
+            }
+        }
+        return range.low <= range.high ? range : Range{0.0, 0.0};
+    }
+
+    // Room for the curves, and for the ends of the handles where they are drawn.
+    static Axis ValueAxis(StreamCurves const& curves, bool withHandles)
+    {
+        Range range = Extent(curves, &ComponentCurve::value);
+        for (Handle const& handle : curves.handles) {
+            if (withHandles) {
+                range = {std::min(range.low, handle.end.y), std::max(range.high, handle.end.y)};
+            }
+        }
+        range = WithAir(range, 0.07);
+        return {range.low, range.high, 9};
+    }
+
+    // Speed 0 is always in sight: it is where things rest.
+    static Axis SpeedAxis(StreamCurves const& curves)
+    {
+        Range range = Extent(curves, &ComponentCurve::speed);
+        range = WithAir({std::min(range.low, 0.0), std::max(range.high, 0.0)}, 0.07);
+        return {range.low, range.high, 6};
+    }
+
+    Point Place(Panel const& panel, Point const& point) const { return {panel.X(point.x * unit_.perSecond), panel.Y(point.y)}; }
+
+    void DrawCurves(Panel const& panel, StreamCurves const& curves, CurvePoints points)
+    {
+        std::vector<Point> placed;
+        for (std::size_t d = 0; d < curves.components.size(); ++d) {
+            placed.clear();
+            for (Point const& point : curves.components[d].*points) {
+                placed.push_back(Place(panel, point));
+            }
+            svg_.Polyline(placed, CurvePen(curves, d, points));
+        }
+    }
+
+    // Fewer marks the closer the keys are, so that the curve stays in sight.
+    void DrawKeys(Panel const& panel, StreamCurves const& curves, bool showHandles)
+    {
+        for (Handle const& handle : curves.handles) {
+            if (showHandles) {
+                std::string_view const color = Colors[handle.component % Colors.size()];
+                svg_.Line(Place(panel, handle.key), Place(panel, handle.end), {color, 1.2, "", 0.75});
+                svg_.Circle(Place(panel, handle.end), 3.5, "#ffffff", {color, 1.4});
+            }
+        }
+        double const spacing = PixelsPerKey(curves);
+        if (spacing < 4.0) {
+            return;
+        }
+        for (std::size_t d = 0; d < curves.components.size(); ++d) {
+            for (Point const& key : curves.components[d].keys) {
+                svg_.Diamond(Place(panel, key), spacing < 14.0 ? 3.0 : 5.5, Colors[d % Colors.size()], {"#ffffff", 1.2});
+            }
+        }
+    }
+
+    void DrawLegend(StreamItem const& item, StreamCurves const& curves, double top)
+    {
+        double y = top + 12;
+        for (std::size_t d = 0; d < item.components.size(); ++d) {
+            if (d == MostLegendLines) {
+                svg_.Text({Right + 22, y + 4.5}, fmt::format("and {} more", item.components.size() - d), {13.0, "#666666"});
+                return;
+            }
+            Pen pen = CurvePen(curves, d, &ComponentCurve::value);
+            pen.width = 3.0;
+            svg_.Line({Right + 22, y}, {Right + 54, y}, pen);
+            svg_.Text({Right + 64, y + 4.5}, item.components[d], {14.0, "#222222"});
+            y += 22;
+        }
+    }
+
+    TimeUnit unit_;
+    std::vector<StreamItem const*> shown_;
+    Svg svg_;
+    Axis time_;
+};
+
+}  // namespace
+
+void RunPlot(PlotOptions const& options)
+{
+    kfshost::Scene const scene = LoadScene(options.selection);
+    auto items = SelectStreams(scene, options.selection);
+    std::erase_if(items, [](StreamItem const* item) { return kfshost::KeyCount(*item->stream) == 0; });
+    if (items.empty()) {
+        throw UserError(options.selection.file, "the chosen streams have no keys to draw");
+    }
+    WriteWholeFile(options.output, Plot(options, scene, items).Draw());
+}

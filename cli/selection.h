@@ -1,0 +1,28 @@
+#pragma once
+
+#include "host/scene.h"
+
+#include <optional>
+#include <string>
+#include <vector>
+
+// What a command is asked to look at.
+struct Selection {
+    std::string file;
+    std::string glob = "*";
+    unsigned int timeScale = 0;
+};
+
+// The streams whose paths the pattern matches, in the scene's order. Throws UserError when there are none.
+std::vector<kfshost::StreamItem const*> SelectStreams(kfshost::Scene const& scene, Selection const& selection);
+
+struct TimeSpan {
+    kfshost::Rational first;
+    kfshost::Rational last;
+};
+
+// From the first to the last key of all these streams; nothing if no stream has a key.
+std::optional<TimeSpan> SpanOf(std::vector<kfshost::StreamItem const*> const& items);
+
+// A time as "5/24"; as a decimal where the fraction would say nothing to anybody.
+std::string TimeText(kfshost::Rational const& time);

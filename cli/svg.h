@@ -1,0 +1,48 @@
+#pragma once
+
+#include <span>
+#include <string>
+#include <string_view>
+
+struct Point {
+    double x;
+    double y;
+};
+
+// How a line is drawn.
+struct Pen {
+    std::string_view color;
+    double width = 1.0;
+    std::string_view dashes = "";
+    double opacity = 1.0;
+};
+
+enum class Anchor { Start, Middle, End };
+
+struct Font {
+    double size = 13.0;
+    std::string_view color = "#333333";
+    Anchor anchor = Anchor::Start;
+    bool bold = false;
+};
+
+// An SVG drawing as it grows.
+class Svg {
+public:
+    Svg(double width, double height);
+
+    void Rectangle(Point corner, double width, double height, std::string_view fill, Pen const& border);
+    void Line(Point from, Point to, Pen const& pen);
+    // Nothing for fewer than two points.
+    void Polyline(std::span<Point const> points, Pen const& pen);
+    void Circle(Point center, double radius, std::string_view fill, Pen const& border);
+    // A square on its corner.
+    void Diamond(Point center, double radius, std::string_view fill, Pen const& border);
+    // The text stands on the line through `at`.
+    void Text(Point at, std::string_view text, Font const& font);
+
+    std::string Finish() const { return text_ + "</svg>\n"; }
+
+private:
+    std::string text_;
+};

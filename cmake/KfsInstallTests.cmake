@@ -1,0 +1,40 @@
+# The user's side: an installed tree, each of its headers alone, the exported symbols, and a host outside the tree.
+
+if(NOT PROJECT_IS_TOP_LEVEL)
+    return()
+endif()
+
+set(installTests "${PROJECT_SOURCE_DIR}/tests/install")
+set(installPrefix "${CMAKE_BINARY_DIR}/installed")
+set(sanitizerFlags)
+if(KFS_SANITIZE)
+    set(sanitizerFlags "-fsanitize=${kfsLinkSanitizers}")
+endif()
+
+add_test(NAME install.tree
+    COMMAND "${CMAKE_COMMAND}" -DBUILD=${CMAKE_BINARY_DIR} -DPREFIX=${installPrefix} -P "${installTests}/install.cmake")
+set_tests_properties(install.tree PROPERTIES FIXTURES_SETUP installed_tree)
+
+add_test(NAME install.headers
+    COMMAND bash "${installTests}/headers.sh" "${CMAKE_CXX_COMPILER}" "${installPrefix}/${CMAKE_INSTALL_INCLUDEDIR}/kfs")
+
+add_test(NAME install.exports
+    COMMAND bash "${installTests}/exports.sh" "${installPrefix}/${CMAKE_INSTALL_LIBDIR}/libkfs.so")
+add_custom_target(update-exports
+    COMMAND bash "${installTests}/exports.sh" "$<TARGET_FILE:kfs>" --update
+    DEPENDS kfs
+    COMMENT "Writing tests/install/exports.txt")
+
+add_test(NAME install.consumer
+    COMMAND "${CMAKE_CTEST_COMMAND}"
+        --build-and-test "${PROJECT_SOURCE_DIR}/tests/consumer" "${CMAKE_BINARY_DIR}/consumer"
+        --build-generator "${CMAKE_GENERATOR}"
+        --build-options
+            "-DCMAKE_PREFIX_PATH=${installPrefix}"
+            "-DCMAKE_CXX_COMPILER=${CMAKE_CXX_COMPILER}"
+            "-DCMAKE_CXX_FLAGS=${sanitizerFlags}"
+            "-DCMAKE_BUILD_TYPE=${CMAKE_BUILD_TYPE}"
+            "-DCMAKE_FIND_USE_PACKAGE_REGISTRY=OFF"
+        --test-command consumer)
+set_tests_properties(install.headers install.exports install.consumer PROPERTIES FIXTURES_REQUIRED installed_tree)
+set_tests_properties(install.tree install.headers install.exports install.consumer PROPERTIES LABELS install TIMEOUT 600)

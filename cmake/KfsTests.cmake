@@ -1,0 +1,61 @@
+# tests/<folder>/*.cpp make test_<folder>, whose tests carry the folder's name as their ctest label. They link the
+# library's objects, so hidden functions can be tested. Two don't: test_services links the services alone, since they
+# know nothing of the library, and test_shared links libkfs itself and sees what a host sees.
+
+find_package(GTest REQUIRED)
+include(GoogleTest)
+
+set(testDefinitions
+    "KFS_TEST_DATA=\"${KFS_TEST_DATA}\""
+    "KFS_TEST_SAMPLES=\"${PROJECT_SOURCE_DIR}/examples/samples\"")
+
+add_library(kfs_test_base INTERFACE)
+target_compile_definitions(kfs_test_base INTERFACE ${testDefinitions})
+target_link_libraries(kfs_test_base INTERFACE GTest::gtest_main GTest::gtest)
+
+kfs_sources(supportSources tests/support)
+if(supportSources)
+    add_library(kfs_test_support OBJECT ${supportSources})
+    target_link_libraries(kfs_test_support PUBLIC kfs_test_base kfs_services)
+endif()
+
+# The targets with label `threads`, for builds that need nothing else.
+add_custom_target(thread_tests)
+
+function(kfs_add_test_folder name)
+    kfs_sources(sources "tests/${name}")
+    set(target "test_${name}")
+    add_executable(${target} ${sources})
+    target_link_libraries(${target} PRIVATE kfs_test_base)
+    if(NOT name STREQUAL "services" AND TARGET kfs_host)
+        target_link_libraries(${target} PRIVATE kfs_host)
+    endif()
+    if(name STREQUAL "services")
+        target_link_libraries(${target} PRIVATE kfs_services)
+    elseif(name STREQUAL "shared")
+        target_link_libraries(${target} PRIVATE kfs)
+    else()
+        target_link_libraries(${target} PRIVATE kfs_objects kfs_services Boost::thread Threads::Threads)
+        if(TARGET kfs_test_support)
+            target_link_libraries(${target} PRIVATE kfs_test_support)
+        endif()
+    endif()
+    if(name STREQUAL "cli" AND TARGET kfs_cli)
+        target_compile_definitions(${target} PRIVATE "KFS_TEST_COMMAND=\"$<TARGET_FILE:kfs_cli>\"")
+        add_dependencies(${target} kfs_cli)
+    endif()
+    if(name STREQUAL "threads")
+        add_dependencies(thread_tests ${target})
+    endif()
+    # Discovered when ctest runs, not when it links: a test that dies on start then fails alone, as a test.
+    gtest_discover_tests(${target} DISCOVERY_MODE PRE_TEST DISCOVERY_TIMEOUT 120 TEST_PREFIX "${name}."
+        PROPERTIES LABELS "${name}" TIMEOUT 600)
+endfunction()
+
+kfs_subfolders(testFolders tests)
+list(REMOVE_ITEM testFolders support install consumer)
+foreach(name IN LISTS testFolders)
+    kfs_add_test_folder(${name})
+endforeach()
+
+include(KfsInstallTests)

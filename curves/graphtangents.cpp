@@ -1,0 +1,159 @@
+#include "curves/keyhandles_private.h"
+#include "curves/neighbours_private.h"
+#include "curves/tangents.h"
+#include "keystore/pins_private.h"
+
+#include <algorithm>
+#include <cmath>
+
+namespace {
+
+constexpr double MinInfluence = 0.0001;  // of a handle that is set as a graph tangent on a plain stream
+constexpr double MaxInfluence = 1.0;
+constexpr double NoDuration = 1e-12;
+
+// The seconds to a key's neighbours, 0 where there is none.
+struct Durations {
+    bool hasPrev = false;
+    bool hasNext = false;
+    double prev = 0.0;
+    double next = 0.0;
+
+    double operator[](KFSp_Side side) const { return side == KFSp_Side::In ? prev : next; }
+};
+
+int GetDurations(KFS_Stream const* stream, int index, KFS_KeyScalar const* key, Durations* durations)
+{
+    if (stream->HasNoKeys()) return 0;
+    KFS_KeyScalar* prev = nullptr;
+    KFS_KeyScalar* next = nullptr;
+    if (int const code = KFSp_GetNeighborsFromIndex(stream, index, 0, &prev, &next, nullptr, nullptr)) return code;
+    durations->hasPrev = prev != nullptr;
+    durations->hasNext = next != nullptr;
+    if (prev) durations->prev = KFSp_Seconds(key->time, prev->time, stream->GetTimeScale());
+    if (next) durations->next = KFSp_Seconds(next->time, key->time, stream->GetTimeScale());
+    return 0;
+}
+
+// A side's graph tangent as a caller gives it.
+struct Given {
+    double const* x;
+    double const* y;
+    bool Whole() const { return x && y; }
+};
+
+void StoreTangent(KFSp_Handles<double> const& handles, KFSp_Side side, Given const& given, double duration,
+                  bool limited)
+{
+    for (int i = 0; i < handles.count; ++i) {
+        double const x = side == KFSp_Side::In ? std::min(given.x[i], 0.0) : std::max(given.x[i], 0.0);
+        double const influence = std::fabs(x / duration);
+        handles.speed[i] = x != 0.0 ? given.y[i] / x : 0.0;
+        handles.influence[i] = limited ? std::clamp(influence, MinInfluence, MaxInfluence) : influence;
+    }
+}
+
+void ForbidFalling(KFSp_Handles<double> const& handles)
+{
+    for (int i = 0; i < handles.count; ++i) {
+        if (handles.speed[i] < 0.0) handles.speed[i] = 0.0;
+    }
+}
+
+// The influence that keeps a handle's length in the graph when its speed changes.
+double KeepLength(double influence, double speed, double newSpeed, double duration, double yScale)
+{
+    double const x = influence * duration;
+    double const y = speed * yScale;
+    double const newY = newSpeed * yScale;
+    if (std::fabs(duration) < NoDuration) return x;
+    return std::clamp(std::sqrt((y * y + 1.0) * (x * x) / (newY * newY + 1.0)) / duration, MinInfluence, MaxInfluence);
+}
+
+// Turns a continuous key's other side along.
+void TurnAlong(KFSp_Handles<double> const& turned, KFSp_Handles<double> const& other, double duration, double yScale,
+               bool keepLength)
+{
+    for (int i = 0; i < turned.count; ++i) {
+        double const speed = turned.speed[i];
+        if (keepLength) other.influence[i] = KeepLength(other.influence[i], other.speed[i], speed, duration, yScale);
+        other.speed[i] = speed;
+    }
+}
+
+int SetTangents(KFS_Stream* stream, int index, Given const& in, Given const& out, double yScale)
+{
+    KFSp_FirstError error;
+    {
+        KFSp_ScKey const key(stream->GetKeys(), index, error);
+        Durations durations;
+        if (error.None()) error.Keep(GetDurations(stream, index, key.get(), &durations));
+        if (error.None()) {
+            bool const spatial = stream->IsSpatial();
+            bool const nonDecreasing = spatial && (stream->GetKFSFlags() & KFS_StreamFlag_NonDecreasing) != 0;
+            bool const continuous = (key->flags & KFS_KeyFlag_Continuous) != 0;
+            auto const set = [&](KFSp_Side side, Given const& given, bool both) {
+                KFSp_Side const otherSide = side == KFSp_Side::In ? KFSp_Side::Out : KFSp_Side::In;
+                KFSp_Handles<double> const handles = KFSp_GetHandles(stream, key.get(), side);
+                StoreTangent(handles, side, given, durations[side], !spatial);
+                if (nonDecreasing) ForbidFalling(handles);
+                if (continuous && !both) {
+                    TurnAlong(handles, KFSp_GetHandles(stream, key.get(), otherSide), durations[otherSide], yScale,
+                              !spatial);
+                    error.Keep(stream->SetInvalid(index + 1, 2));
+                } else {
+                    error.Keep(stream->SetInvalid(side == KFSp_Side::In ? index : index + 1, 1));
+                }
+            };
+            if (in.Whole() && durations.hasPrev) set(KFSp_Side::In, in, out.Whole());
+            if (out.Whole() && durations.hasNext) set(KFSp_Side::Out, out, in.Whole());
+        }
+    }
+    return error.Code();
+}
+
+void ReadTangent(KFS_Stream const* stream, KFS_KeyScalar const* key, KFSp_Side side, double duration, double* x,
+                 double* y)
+{
+    KFSp_Handles<double const> const handles = KFSp_GetHandles(stream, key, side);
+    double const direction = side == KFSp_Side::In ? -1.0 : 1.0;
+    int const count = KFSp_HandleArraySize(stream);
+    for (int i = 0; i < count; ++i) {
+        bool const stored = i < handles.count;
+        double const dx = stored ? direction * handles.influence[i] * duration : 0.0;
+        if (x) x[i] = dx;
+        if (y) y[i] = stored ? handles.speed[i] * dx : 0.0;
+    }
+}
+
+}  // namespace
+
+int KFS_SetKeyTangentsF(KFS_Stream* stream, int index, double const* inX, double const* inY, double const* outX,
+                        double const* outY, double yScale)
+{
+    if (int const code = KFSp_CheckHandleAccess(stream, {KFSp_Op_SetKeyTangents, KFSp_Row_GetValue},
+                                                {KFSp_Op_GetKeyTangents, KFSp_Row_GetValue})) {
+        return code;
+    }
+    KFSp_FirstError error;
+    if (stream->HasKeys()) {
+        // Durations and the other side's handle may be derived.
+        error.Keep(stream->UpdateStreamIfStaleTangents(index));
+        if (error.None()) error.Keep(SetTangents(stream, index, {inX, inY}, {outX, outY}, yScale));
+    }
+    return KFSp_FinishHandleEdit(stream, error);
+}
+
+int KFS_GetKeyTangentsF(KFS_Stream const* stream, int index, double* inX, double* inY, double* outX, double* outY)
+{
+    KFSp_Refusal const refusal{KFSp_Op_GetKeyTangents, KFSp_Row_GetValue};
+    if (int const code = KFSp_CheckHandleAccess(stream, refusal, refusal)) return code;
+    if (int const code = stream->UpdateStreamIfStaleTangents(index)) return code;
+    KFS_KeyScalar* key = nullptr;
+    if (int const code = KFSp_GetHandleKey(stream, stream->GetKeyData(), index, &key)) return code;
+    Durations durations;
+    if (int const code = GetDurations(stream, index, key, &durations)) return code;
+    ReadTangent(stream, key, KFSp_Side::In, durations.prev, inX, inY);
+    ReadTangent(stream, key, KFSp_Side::Out, durations.next, outX, outY);
+    return 0;
+}

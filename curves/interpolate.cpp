@@ -1,0 +1,98 @@
+#include "curves/interpolate_private.h"
+
+#include "curves/neighbours_private.h"
+#include "keystore/keylist_private.h"
+
+namespace {
+
+// The two keys between which a read happens.
+struct Segment {
+    KFS_KeyScalar const* a = nullptr;
+    KFS_KeyScalar const* b = nullptr;
+};
+
+// Whether the hint names the key right before the time; `segment` is the answer then.
+bool TakeHint(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int keyIndex, Segment* segment)
+{
+    if (keyIndex < 0 || keyIndex >= KFSp_ItemCount(data) - 1 || stream->HasNoKeys()) return false;
+    if (stream->IsSpatial() && stream->IsSParametrized()) return false;  // a neighbour may be a float key
+    return KFSp_GetConstKey(data, keyIndex, &segment->a) == 0 &&
+           KFSp_GetConstKey(data, keyIndex + 1, &segment->b) == 0 && segment->a->time < time && time < segment->b->time;
+}
+
+int FindSegment(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int keyIndex, Segment* segment)
+{
+    if (TakeHint(stream, data, time, keyIndex, segment)) [[likely]]
+        return 0;
+    KFS_KeyScalar* at = nullptr;
+    KFS_KeyScalar* prev = nullptr;
+    KFS_KeyScalar* next = nullptr;
+    int const code = KFSp_GetNeighborsFromTime(stream, time, 0, &at, &prev, &next, nullptr, nullptr, nullptr);
+    *segment = {prev, next};
+    return code;
+}
+
+void InterpolateLinear(int dimension, Segment const& segment, int time, double* result)
+{
+    double const* const from = KFSp_Numbers(segment.a);
+    double const* const to = KFSp_Numbers(segment.b);
+    double const fraction = static_cast<double>(KFSp_TimeDifference(time, segment.a->time)) /
+                            static_cast<double>(KFSp_TimeDifference(segment.b->time, segment.a->time));
+    for (int i = 0; i < dimension; ++i) result[i] = from[i] + (to[i] - from[i]) * fraction;
+}
+
+// Builds each component's cubic and hands it to `kernel`, which evaluates it at an x.
+template <class Kernel>
+inline int EvaluateCurved(KFS_Stream const* stream, Segment const& segment, int time, double* result, Kernel kernel)
+{
+    int const dimension = stream->GetDimension();
+    KFSp_TemporalRuns<double const> const from = KFSp_GetTemporalRuns(segment.a, dimension);
+    KFSp_TemporalRuns<double const> const to = KFSp_GetTemporalRuns(segment.b, dimension);
+    bool const fromSpline = segment.a->outInterp == KFS_Interp_Spline;
+    bool const toSpline = segment.b->inInterp == KFS_Interp_Spline;
+    bool const nonDecreasing = (stream->GetKFSFlags() & KFS_StreamFlag_NonDecreasing) != 0;
+    double const dt = KFSp_Seconds(segment.b->time, segment.a->time, stream->GetTimeScale());
+    double const x = KFSp_Seconds(time, segment.a->time, stream->GetTimeScale());
+
+    KFSp_SegmentCurve cubic(2);
+    for (int i = 0; i < dimension; ++i) {
+        KFSp_FillTemporalSegment({from.value[i], from.outSpeed[i], from.outInfluence[i], fromSpline},
+                                 {to.value[i], to.inSpeed[i], to.inInfluence[i], toSpline}, dt, cubic.curve);
+        if (nonDecreasing) [[unlikely]] {
+            if (int const code = CRV_CurveSetNonDecreasing(&cubic.curve, nullptr)) return code;
+        }
+        if (int const code = kernel(&cubic.curve, &result[i], x)) return code;
+    }
+    return 0;
+}
+
+}  // namespace
+
+int KFSp_Interpolate(KFS_Stream const* stream, long, int time, int keyIndex)
+{
+    KFS_StreamKeyData const* const data = stream->GetKeyData();
+    Segment segment;
+    if (int const code = FindSegment(stream, data, time, keyIndex, &segment)) return code;
+    double* const result = KFSp_Numbers(data->cache);
+    switch (KFSp_GetSegmentKind(segment.a->outInterp, segment.b->inInterp)) {
+    case KFSp_SegmentKind::Linear: InterpolateLinear(stream->GetDimension(), segment, time, result); return 0;
+    case KFSp_SegmentKind::Curved:
+        return EvaluateCurved(stream, segment, time, result, [](CRV_Curve const* curve, double* y, double x) {
+            return CRV_EvaluateYFromX(curve, y, x);
+        });
+    case KFSp_SegmentKind::Hold:
+    case KFSp_SegmentKind::Other: break;
+    }
+    return 0;
+}
+
+int KFSp_InterpDeriv(KFS_Stream const* stream, long, int time, int keyIndex)
+{
+    KFS_StreamKeyData const* const data = stream->GetKeyData();
+    Segment segment;
+    if (int const code = FindSegment(stream, data, time, keyIndex, &segment)) return code;
+    if (KFSp_GetSegmentKind(segment.a->outInterp, segment.b->inInterp) != KFSp_SegmentKind::Curved) return 0;
+    return EvaluateCurved(
+        stream, segment, time, KFSp_Numbers(data->cache),
+        [](CRV_Curve const* curve, double* dydx, double x) { return CRV_Evaluate1dDerivFromX(curve, dydx, x); });
+}

@@ -1,0 +1,91 @@
+#pragma once
+
+#include "frame/boundary_private.h"
+#include "frame/report_private.h"
+#include "keystore/cache_private.h"
+#include "keystore/keylist_private.h"
+#include "keystore/valuedata_private.h"
+
+// What the doors to a key's temporal handles share.
+
+enum class KFSp_Side { In, Out };
+
+// The handles of one side: `count` speeds and influences. A spatial key has one of each, a custom value has none.
+template <class Number>
+struct KFSp_Handles {
+    Number* speed = nullptr;
+    Number* influence = nullptr;
+    int count = 0;
+};
+
+// Whether the keys' value data are runs of numbers with handles. While a custom stream carries a plain description its records still hold
+// the client's bytes.
+inline bool KFSp_HasHandleRuns(KFS_Stream const* stream)
+{
+    return !stream->IsSpatial() && !stream->IsCustom() && !stream->IsTemporarilyNonCustom();
+}
+
+template <class Key>
+auto KFSp_GetHandles(KFS_Stream const* stream, Key* key, KFSp_Side side)
+{
+    using Number = std::conditional_t<std::is_const_v<Key>, double const, double>;
+    bool const in = side == KFSp_Side::In;
+    if (stream->IsSpatial()) {
+        return in ? KFSp_Handles<Number>{&key->inSpeed, &key->inInfluence, 1}
+                  : KFSp_Handles<Number>{&key->outSpeed, &key->outInfluence, 1};
+    }
+    if (!KFSp_HasHandleRuns(stream)) return KFSp_Handles<Number>{};
+    KFSp_TemporalRuns<Number> const runs = KFSp_GetTemporalRuns(key, stream->GetDimension());
+    return in ? KFSp_Handles<Number>{runs.inSpeed, runs.inInfluence, stream->GetDimension()}
+              : KFSp_Handles<Number>{runs.outSpeed, runs.outInfluence, stream->GetDimension()};
+}
+
+// The elements that callers' arrays have.
+inline int KFSp_HandleArraySize(KFS_Stream const* stream)
+{
+    return stream->IsSpatial() ? 1 : stream->GetDimension();
+}
+
+// One of a refusal's two sentences: the operation that failed and what it was about to do.
+struct KFSp_Refusal {
+    KFSp_Op operation;
+    KFSp_Row action;
+};
+
+// Refuses a damaged stream, then one without a value or a key.
+inline int KFSp_CheckHandleAccess(KFS_Stream const* stream, KFSp_Refusal const& damaged, KFSp_Refusal const& noKeys)
+{
+    if (int const code = KFSp_CheckStream(damaged.operation, stream, damaged.action)) return code;
+    return KFSp_HasNoValue(stream, stream->GetKeyData())
+               ? KFSp_ReportErr(noKeys.operation, KFS_Err_NoKeys, noKeys.action)
+               : 0;
+}
+
+// The key at an index, or a constant's record whatever the index. -1 isn't the last key here: its neighbours would not be.
+inline int KFSp_GetHandleKey(KFS_Stream const* stream, KFS_StreamKeyData const* data, int index, KFS_KeyScalar** key)
+{
+    if (stream->HasNoKeys()) {
+        *key = data->cache;
+        return 0;
+    }
+    if (index < 0) return SEQ_Err_BadIndex;
+    KFS_KeyScalar const* item = nullptr;
+    int const code = KFSp_GetConstKey(data, index, &item);
+    *key = const_cast<KFS_KeyScalar*>(item);
+    return code;
+}
+
+// The cache record as room for numbers of the key's own layout. What it held is gone, unless it is the key itself.
+inline KFS_KeyScalar* KFSp_BorrowCache(KFS_StreamKeyData const* data, KFS_KeyScalar const* key)
+{
+    if (data->cache != key) data->cache->time = KFS_INVALID_INDEX;
+    return data->cache;
+}
+
+// The end of every setter: the cached value may be of the curve as it was, and whoever listens is told once nothing failed.
+inline int KFSp_FinishHandleEdit(KFS_Stream* stream, KFSp_FirstError& error)
+{
+    if (stream->HasKeys()) error.Keep(KFSp_ClearCache(stream));
+    if (error.None()) error.Keep(KFSp_Boundary([stream] { stream->NotifyValueChanged(); }));
+    return error.Code();
+}

@@ -1,0 +1,158 @@
+#include "curves/neighbours_private.h"
+#include "curves/update.h"
+#include "frame/report_private.h"
+#include "keystore/keylist_private.h"
+#include "keystore/pins_private.h"
+
+#include <iterator>
+
+namespace {
+
+// The actions by what they touch: a side's spatial form reaches as far as its temporal one.
+enum class Reach { Nowhere, Key, InSide, OutSide };
+
+Reach GetReach(unsigned short action)
+{
+    constexpr Reach reaches[] = {Reach::Nowhere, Reach::Key,    Reach::Key,    Reach::InSide,
+                                 Reach::OutSide, Reach::InSide, Reach::OutSide};
+    return action < std::size(reaches) ? reaches[action] : Reach::Nowhere;
+}
+
+bool IsSpatialAction(unsigned short action)
+{
+    return action == 5 || action == 6;
+}
+
+// Where an edit happens: the keys around it, null where there is none.
+struct Place {
+    KFS_Stream const* stream;
+    KFS_KeyScalar* at = nullptr;
+    KFS_KeyScalar* prev = nullptr;
+    KFS_KeyScalar* next = nullptr;
+    int prevIndex = 0;
+    int nextIndex = 0;
+};
+
+struct Span {
+    int from;
+    int to;
+};
+
+// Whether a neighbour derives its handles on the far side from its own neighbours, so that an edit next to it reaches beyond it.
+bool IsAutomatic(KFS_Stream const* stream, KFS_KeyScalar const* key, signed char farInterp)
+{
+    if (farInterp == KFS_Interp_Spline && (key->flags & KFS_KeyFlag_Modifiable) != 0) return true;
+    return stream->IsSpatial() && KFSp_HasSpatialBlock(key) && (key->spFlags & KFS_KeySpFlag_Modifiable) != 0;
+}
+
+bool IsContinuous(KFS_Stream const* stream, KFS_KeyScalar const* key)
+{
+    if (!stream->IsSpatial()) return (key->flags & KFS_KeyFlag_Continuous) != 0;
+    return KFSp_HasSpatialBlock(key) && (key->spFlags & KFS_KeySpFlag_Continuous) != 0;
+}
+
+// The path runs through float keys, so on a spatial stream they count as neighbours of an automatic key.
+int NeighboursOf(KFS_Stream const* stream, int index, KFS_KeyScalar** prev, KFS_KeyScalar** next)
+{
+    return KFSp_GetNeighborsFromIndex(stream, index, stream->IsSpatial() ? 1 : 0, prev, next, nullptr, nullptr);
+}
+
+int ReachOfKey(Place const& place, Span* span)
+{
+    KFSp_FirstError error;
+    KFS_KeyScalar* before = nullptr;
+    KFS_KeyScalar* behind = nullptr;
+    if (place.prev) {
+        span->from = place.prev->time;
+        if (IsAutomatic(place.stream, place.prev, place.prev->inInterp)) {
+            error.Keep(NeighboursOf(place.stream, place.prevIndex, &before, &behind));
+            if (before) {
+                span->from = before->time;
+            }
+        }
+    }
+    if (place.next) {
+        span->to = place.next->time;
+        if (IsAutomatic(place.stream, place.next, place.next->outInterp)) {
+            error.Keep(NeighboursOf(place.stream, place.nextIndex, &before, &behind));
+            if (behind) {
+                span->to = behind->time;
+            }
+        }
+    }
+    return error.Code();
+}
+
+int ReachOfSide(Place const& place, Reach reach, Span* span)
+{
+    if (!place.at) {
+        return KFSp_ReportRow(KFSp_Op_PredictInvalid, KFS_Err_NoControlPoint, KFSp_Row_NoControlPoint);
+    }
+    bool const bothSides = IsContinuous(place.stream, place.at);
+    if (place.prev && (reach == Reach::InSide || bothSides)) {
+        span->from = place.prev->time;
+    }
+    if (place.next && (reach == Reach::OutSide || bothSides)) {
+        span->to = place.next->time;
+    }
+    return 0;
+}
+
+int FindReach(KFS_Stream const* stream, Reach reach, int time, Span* span)
+{
+    Place place{stream};
+    if (int const code = KFSp_GetNeighborsFromTime(stream, time, 0, &place.at, &place.prev, &place.next, &place.prevIndex,
+                                                   &place.nextIndex, nullptr);
+        code != 0) {
+        return code;
+    }
+    switch (reach) {
+    case Reach::Key: return ReachOfKey(place, span);
+    case Reach::InSide:
+    case Reach::OutSide: return ReachOfSide(place, reach, span);
+    case Reach::Nowhere: break;
+    }
+    return 0;
+}
+
+int Predict(KFS_Stream const* stream, unsigned short action, T_Time const* time, T_Time* from, T_Time* to)
+{
+    if (int const code = KFSp_CheckStream(KFSp_Op_PredictInvalid, stream, KFSp_Row_PredictInvalid); code != 0) return code;
+
+    unsigned int const timeScale = stream->GetTimeScale();
+    T_Time converted{time ? time->value : 0, timeScale};
+    int const conversion = time ? T_ConvTime(time, timeScale, &converted, 0) : 0;
+    if (IsSpatialAction(action) && !stream->IsSpatial()) {
+        return KFSp_ReportErr(KFSp_Op_PredictInvalid, KFS_Err_NotSpatial, KFSp_Row_PredictInvalid);
+    }
+    KFS_StreamKeyData const* const data = stream->GetKeyData();
+    if (stream->HasNoKeys() || KFSp_ItemCount(data) == 0) {
+        *from = *to = T_Time{converted.value, timeScale};
+        return conversion;
+    }
+    // Times of float keys are derived.
+    if (stream->IsSpatial()) {
+        if (int const code = stream->UpdateStream(); code != 0) return code;
+    }
+
+    KFSp_FirstError error;
+    Span span{converted.value, converted.value};
+    {
+        KFSp_ScConstPin const pin(data->keys, error);
+        if (error.None()) {
+            error.Keep(FindReach(stream, GetReach(action), converted.value, &span));
+        }
+    }
+    if (error.None()) {
+        *from = T_Time{span.from, timeScale};
+        *to = T_Time{span.to, timeScale};
+    }
+    return error.Code();
+}
+
+} // namespace
+
+int KFS_PredictInvalid(KFS_Stream const* stream, unsigned short action, T_Time const* time, T_Time* from, T_Time* to)
+{
+    return KFSp_Boundary([&] { return Predict(stream, action, time, from, to); });
+}

@@ -1,0 +1,133 @@
+#include "frame/project.h"
+
+#include "keystore/expstate.h"
+#include "overrides/parambag.h"
+#include "tree/streambase.h"
+
+#include <boost/make_shared.hpp>
+
+KFS_Project::~KFS_Project() = default;
+
+void KFS_Project::InitializeContexts()
+{
+    context_.reset();
+    renderContext_.reset();
+    context_ = KFS_Context::MakeNewContext(this);
+    renderContext_ = Q_RenderContext::MakeNewContext(false);
+}
+
+Q_RenderContext* KFS_Project::GetRenderContext(bool useCurrent) const
+{
+    if (useCurrent) {
+        if (Q_RenderContext* const current = Q_RenderContext::PeekCurrent()) {
+            return current;
+        }
+    }
+    return renderContext_.get();
+}
+
+KFS_Context::~KFS_Context() = default;
+
+boost::shared_ptr<KFS_Context> KFS_Context::MakeNewContext(KFS_Project* project)
+{
+    return boost::make_shared<KFS_Context>(project);
+}
+
+KFS_Project* KFS_Context::GetCurrentProject()
+{
+    return KFS_GetCurrentProject();
+}
+
+KFS_Project* KFS_GetCurrentProject()
+{
+    auto const* const context = dynamic_cast<KFS_Context*>(Q_Context::PeekCurrent());
+    return context ? context->GetProject() : nullptr;
+}
+
+KFS_Project const* KFS_GetCurrentConstProject()
+{
+    return KFS_GetCurrentProject();
+}
+
+KFS_Project const* KFS_GetConstProject(KFS_StreamBase const* stream, bool)
+{
+    if (stream && !stream->IsCanonical()) {
+        if (KFS_Project const* const project = stream->GetProject()) {
+            return project;
+        }
+    }
+    return KFS_GetCurrentConstProject();
+}
+
+KFS_Project* KFS_GetProject(KFS_StreamBase* stream, bool)
+{
+    if (stream && !stream->IsCanonical()) {
+        if (KFS_Project* const project = stream->GetProject()) {
+            return project;
+        }
+    }
+    return KFS_GetCurrentProject();
+}
+
+KFS_Project const* KFS_GetConstProject(KFS_Project const* project, bool)
+{
+    return project ? project : KFS_GetCurrentConstProject();
+}
+
+KFS_Project* KFS_GetProject(KFS_Project* project, bool)
+{
+    return project ? project : KFS_GetCurrentProject();
+}
+
+hearth::utility::ImmutableString const& KFS_RenderState::GetStateName() const
+{
+    return S_StateName;
+}
+
+KFS_RenderState::~KFS_RenderState() = default;
+
+KFS_RenderState::Suspension KFS_RenderState::SuspendAutoDecanonicalize()
+{
+    return boost::make_shared<hearth::utility::ScSetReset<bool>>(&autoDecanonicalizeSuspended_, true);
+}
+
+KFS_CapsuleOverrides::KFS_CapsuleOverrides(Q_RenderContext*) : bag_(new KFS_ParamBag) {}
+
+hearth::utility::ImmutableString const& KFS_CapsuleOverrides::GetStateName() const
+{
+    return S_StateName;
+}
+
+KFS_CapsuleOverrides::~KFS_CapsuleOverrides() = default;
+
+void KFS_CapsuleOverrides::SetScopedCapsuleParamBag(Q_ScSetReset<KFS_ParamBag>& scope, KFS_ParamBag const& bag)
+{
+    scope.Arm(bag_.get());
+    *bag_ = bag;
+}
+
+void KFS_CapsuleOverrides::MergeInScopedCapsuleParamBag(Q_ScSetReset<KFS_ParamBag>& scope, KFS_ParamBag const& bag)
+{
+    KFS_ParamBag const merged(*bag_, bag);
+    scope.Arm(bag_.get());
+    *bag_ = merged;
+}
+
+KFS_DetectExpressionErrors::KFS_DetectExpressionErrors(KFS_ExpState const* state)
+    : state_(state), saved_(state->detectingErrors)
+{
+    state_->detectingErrors = true;
+}
+
+KFS_DetectExpressionErrors::KFS_DetectExpressionErrors(boost::shared_ptr<KFS_ExpState> const& state)
+    : KFS_DetectExpressionErrors(state.get())
+{
+}
+
+KFS_DetectExpressionErrors::~KFS_DetectExpressionErrors()
+{
+    state_->detectingErrors = saved_;
+    if (!saved_) {
+        state_->errorCount = 0;
+    }
+}

@@ -1,0 +1,16 @@
+#pragma once
+
+#include "frame/services/threads.h"
+
+#include <boost/thread/tss.hpp>
+
+// Objects that are made when the library loads and outlive KFS_Birth .. KFS_Death. They stand in one file because their order counts.
+
+// Non-zero while a look-up on this thread is inside an update pass; null until first used.
+boost::thread_specific_ptr<int>& KFSp_GetTimeToIndexCheck();
+// True while this thread tells ancestors of a stored stream; null until first used.
+boost::thread_specific_ptr<bool>& KFSp_GetNotifyParentsCheck();
+// This thread's pause flag of the main listener manager; null until first used.
+boost::thread_specific_ptr<bool>& KFSp_GetMainListenerPauseState();
+// Guards the lazy fill of canonical groups.
+hearth::threads::RecursiveMutex& KFSp_GetCanonicalLock();

@@ -1,0 +1,157 @@
+#include "host/bvh_parse_private.h"
+#include "host/filebytes_private.h"
+#include "host/import.h"
+#include "host/import_error.h"
+#include "host/names.h"
+#include "host/storeerror.h"
+#include "host/streambuilder.h"
+#include "host/timescale.h"
+
+#include <algorithm>
+#include <cmath>
+#include <limits>
+
+namespace kfshost {
+
+namespace {
+
+// The scale that most of our files have, in which all common frame rates are whole numbers.
+constexpr unsigned int UsualScale = 120000;
+
+bool Fits(Rational const& last, unsigned int scale)
+{
+    return std::abs(last.ToUnits(scale)) <= MaxKeyUnits;
+}
+
+// A scale in which each multiple of the frame time is a whole number, fine enough to read between frames; without one that
+// fits, the finest power of two.
+unsigned int ChooseScale(Rational const& frameTime, Rational const& last)
+{
+    auto const isWhole = [&](unsigned int scale) { return scale % frameTime.Denominator() == 0; };
+    if (isWhole(UsualScale) && Fits(last, UsualScale)) {
+        return UsualScale;
+    }
+    if (frameTime.Denominator() <= MaxKeyUnits && Fits(last, static_cast<unsigned int>(frameTime.Denominator()))) {
+        auto scale = static_cast<unsigned int>(frameTime.Denominator());
+        while (scale < UsualScale && Fits(last, scale * 2)) {
+            scale *= 2;
+        }
+        return scale;
+    }
+    for (int power = 30; power >= 0; --power) {
+        if (Fits(last, 1U << power)) {
+            return 1U << power;
+        }
+    }
+    return 0;
+}
+
+// The channels of one kind that a joint has, by their columns in the frames.
+struct ChannelSet {
+    StreamKind kind;
+    std::vector<std::string> names;
+    std::vector<std::size_t> columns;
+};
+
+class BvhImport {
+public:
+    explicit BvhImport(std::string const& fileName)
+        : motion_(ParseBvh(ReadFileBytes(fileName, "", std::numeric_limits<std::size_t>::max())))
+    {
+        scene_.name = StemOf(fileName);
+    }
+
+    Scene Run(ImportOptions const& options)
+    {
+        PlaceFrames(options);
+        std::size_t column = 0;
+        for (std::size_t i = 0; i < motion_.joints.size(); ++i) {
+            BvhJoint const& joint = motion_.joints[i];
+            std::string const place = "joints[" + std::to_string(i) + ']';
+            AddStream(joint, place, Take(joint, StreamKind::Translation, "position", column));
+            AddStream(joint, place, Take(joint, StreamKind::Angles, "rotation", column));
+            column += joint.channels.size();
+        }
+        return std::move(scene_);
+    }
+
+private:
+    void PlaceFrames(ImportOptions const& options)
+    try {
+        auto const lastFrame = static_cast<std::int64_t>(motion_.frames == 0 ? 0 : motion_.frames - 1);
+        Rational const last = motion_.frameTime * Rational(lastFrame, 1);
+        scene_.timeScale = options.timeScale == 0 ? ChooseScale(motion_.frameTime, last) : options.timeScale;
+        if (scene_.timeScale == 0 || !Fits(last, scene_.timeScale)) {
+            throw ImportError("Frame Time", "the frames don't fit a 32-bit time line of that scale");
+        }
+        for (std::int64_t frame = 0; frame <= lastFrame; ++frame) {
+            Rational const time = motion_.frameTime * Rational(frame, 1);
+            int const units = time.ToUnits(scene_.timeScale);
+            if (frame > 0 && units <= times_.back()) {
+                throw ImportError("Frame Time", "frames are closer than 1/" + std::to_string(scene_.timeScale) + " s");
+            }
+            Rational const error = Rational(units, scene_.timeScale) - time;
+            scene_.exactTimes = scene_.exactTimes && error == Rational();
+            scene_.worstTimeError = std::max(scene_.worstTimeError, std::abs(error.ToDouble()));
+            times_.push_back(units);
+        }
+    } catch (std::overflow_error const&) {
+        throw ImportError("Frame Time", "has too many digits for this number of frames");
+    }
+
+    static ChannelSet Take(BvhJoint const& joint, StreamKind kind, std::string_view ending, std::size_t column)
+    {
+        ChannelSet set{kind, {}, {}};
+        for (std::size_t i = 0; i < joint.channels.size(); ++i) {
+            if (joint.channels[i].ends_with(ending)) {
+                set.names.push_back(joint.channels[i]);
+                set.columns.push_back(column + i);
+            }
+        }
+        return set;
+    }
+
+    void AddStream(BvhJoint const& joint, std::string const& place, ChannelSet const& channels)
+    {
+        if (channels.names.empty()) {
+            return;
+        }
+        StreamItem item;
+        item.path = paths_.Make("motion/" + joint.name + '/' + std::string(NameOf(channels.kind)));
+        item.place = place;
+        item.kind = channels.kind;
+        item.components = channels.names;
+        try {
+            item.stream = BuildStream(item.path, channels);
+        } catch (StoreError const& error) {
+            throw ImportError(place, error.what());
+        }
+        scene_.streams.push_back(std::move(item));
+    }
+
+    std::unique_ptr<KFS_Stream> BuildStream(std::string const& path, ChannelSet const& channels) const
+    {
+        StreamBuilder builder(static_cast<int>(channels.columns.size()), scene_.timeScale, path);
+        std::vector<double> value(channels.columns.size());
+        for (std::size_t frame = 0; frame < motion_.frames; ++frame) {
+            double const* const row = motion_.numbers.data() + frame * motion_.channelCount;
+            std::ranges::transform(channels.columns, value.begin(), [&](std::size_t column) { return row[column]; });
+            builder.Append(times_[frame], value.data(), KFS_Interp_Linear, KFS_Interp_Linear);
+        }
+        return builder.Take();
+    }
+
+    BvhMotion motion_;
+    Scene scene_;
+    UniqueNames paths_;
+    std::vector<int> times_;
+};
+
+}  // namespace
+
+Scene ImportBvh(std::string const& fileName, ImportOptions const& options)
+{
+    return BvhImport(fileName).Run(options);
+}
+
+}  // namespace kfshost

@@ -1,0 +1,274 @@
+#include "host/gltf_accessor_private.h"
+#include "host/import.h"
+#include "host/import_error.h"
+#include "host/names.h"
+#include "host/storeerror.h"
+#include "host/streambuilder.h"
+#include "host/timescale.h"
+
+#include <algorithm>
+#include <map>
+#include <stdexcept>
+#include <utility>
+
+namespace kfshost {
+
+namespace {
+
+// Channels may share accessors, so a small file can ask for any number of keys. This many doubles in all key records, 0.8 GB,
+// are more than files of this kind come with.
+constexpr std::size_t MaxNumbers = 100'000'000;
+constexpr std::size_t NumbersPerComponent = 5;
+
+struct PathKind {
+    std::string_view path;
+    StreamKind kind;
+    int type;
+    char const* typeName;
+};
+
+constexpr PathKind PathKinds[] = {
+    {"translation", StreamKind::Translation, TINYGLTF_TYPE_VEC3, "VEC3"},
+    {"rotation", StreamKind::Rotation, TINYGLTF_TYPE_VEC4, "VEC4"},
+    {"scale", StreamKind::Scale, TINYGLTF_TYPE_VEC3, "VEC3"},
+    {"weights", StreamKind::Weights, TINYGLTF_TYPE_SCALAR, "SCALAR"},
+};
+
+std::string At(std::string const& list, std::size_t index)
+{
+    return list + '[' + std::to_string(index) + ']';
+}
+
+SourceInterpolation InterpolationOf(tinygltf::AnimationSampler const& sampler, std::string const& place)
+{
+    if (sampler.interpolation == "STEP") {
+        return SourceInterpolation::Step;
+    }
+    if (sampler.interpolation.empty() || sampler.interpolation == "LINEAR") {
+        return SourceInterpolation::Linear;
+    }
+    if (sampler.interpolation == "CUBICSPLINE") {
+        return SourceInterpolation::CubicSpline;
+    }
+    throw ImportError(place, "has the interpolation \"" + CleanName(sampler.interpolation) + '"');
+}
+
+KFS_Interp CodeOf(SourceInterpolation interpolation)
+{
+    switch (interpolation) {
+    case SourceInterpolation::Step: return KFS_Interp_Hold;
+    case SourceInterpolation::Linear: return KFS_Interp_Linear;
+    case SourceInterpolation::CubicSpline: return KFS_Interp_Spline;
+    }
+    return KFS_Interp_None;
+}
+
+// One channel on its way from the file to a stream.
+struct Channel {
+    StreamItem item;
+    PathKind const* path;
+    int input;
+    int output;
+    std::string samplerPlace;
+};
+
+// A channel's values, dimension by dimension within a key.
+struct Values {
+    std::vector<double> numbers;
+    std::size_t dimension;
+};
+
+class GltfImport {
+public:
+    explicit GltfImport(std::string const& fileName) : model_(LoadGltfDocument(fileName)) { scene_.name = StemOf(fileName); }
+
+    Scene Run(ImportOptions const& options)
+    {
+        CollectChannels();
+        ReadTimes();
+        ChooseScale(options);
+        for (Channel& channel : channels_) {
+            MakeStream(channel);
+            scene_.streams.push_back(std::move(channel.item));
+        }
+        return std::move(scene_);
+    }
+
+private:
+    void CollectChannels()
+    {
+        for (std::size_t i = 0; i < model_.animations.size(); ++i) {
+            tinygltf::Animation const& animation = model_.animations[i];
+            std::string const name = animation.name.empty() ? "animation" + std::to_string(i) : CleanName(animation.name);
+            for (std::size_t j = 0; j < animation.channels.size(); ++j) {
+                CollectChannel(animation, name, At("animations", i), j);
+            }
+        }
+    }
+
+    // A channel without a node, or with a path of some extension, moves nothing that is known here.
+    void CollectChannel(tinygltf::Animation const& animation, std::string const& animationName, std::string const& place,
+                        std::size_t index)
+    {
+        tinygltf::AnimationChannel const& source = animation.channels[index];
+        auto const path = std::ranges::find(PathKinds, source.target_path, &PathKind::path);
+        if (source.target_node < 0 || path == std::end(PathKinds)) {
+            return;
+        }
+        Channel channel{};
+        channel.item.place = place + '.' + At("channels", index);
+        if (static_cast<std::size_t>(source.target_node) >= model_.nodes.size()) {
+            throw ImportError(channel.item.place, "asks for node " + std::to_string(source.target_node) + " of " +
+                                                      std::to_string(model_.nodes.size()));
+        }
+        if (source.sampler < 0 || static_cast<std::size_t>(source.sampler) >= animation.samplers.size()) {
+            throw ImportError(channel.item.place, "asks for sampler " + std::to_string(source.sampler) + " of " +
+                                                      std::to_string(animation.samplers.size()));
+        }
+        auto const& sampler = animation.samplers[static_cast<std::size_t>(source.sampler)];
+        channel.samplerPlace = place + '.' + At("samplers", static_cast<std::size_t>(source.sampler));
+        channel.input = sampler.input;
+        channel.output = sampler.output;
+        channel.path = &*path;
+        channel.item.kind = path->kind;
+        channel.item.interpolation = InterpolationOf(sampler, channel.samplerPlace);
+        channel.item.path = paths_.Make(animationName + '/' + NodeName(source.target_node) + '/' + source.target_path);
+        channels_.push_back(std::move(channel));
+    }
+
+    std::string NodeName(int index) const
+    {
+        std::string const& name = model_.nodes[static_cast<std::size_t>(index)].name;
+        return name.empty() ? "node" + std::to_string(index) : CleanName(name);
+    }
+
+    // Many channels share one list of times.
+    void ReadTimes()
+    {
+        for (Channel const& channel : channels_) {
+            if (times_.contains(channel.input)) {
+                continue;
+            }
+            AccessorReader const accessor(model_, channel.input, channel.samplerPlace);
+            accessor.RequireType(TINYGLTF_TYPE_SCALAR, "SCALAR");
+            accessor.RequireFloats();
+            std::vector<double> const numbers = accessor.ReadNumbers();
+            std::vector<float> times(numbers.size());
+            std::ranges::transform(numbers, times.begin(), [](double time) { return static_cast<float>(time); });
+            for (std::size_t i = 1; i < times.size(); ++i) {
+                if (!(times[i - 1] < times[i])) {
+                    throw ImportError(accessor.Place(), "time " + std::to_string(i) + " isn't later than the one before it");
+                }
+            }
+            times_.emplace(channel.input, std::move(times));
+        }
+    }
+
+    void ChooseScale(ImportOptions const& options)
+    {
+        std::vector<float> all;
+        for (auto const& [index, times] : times_) {
+            all.insert(all.end(), times.begin(), times.end());
+        }
+        try {
+            TimeScale const scale = options.timeScale == 0 ? ChooseTimeScale(all) : JudgeTimeScale(all, options.timeScale);
+            scene_.timeScale = scale.scale;
+            scene_.exactTimes = scale.exact;
+            scene_.worstTimeError = scale.worstError;
+        } catch (std::range_error const& error) {
+            throw ImportError("key times", error.what());
+        }
+    }
+
+    Values ReadValues(Channel const& channel, std::size_t keys)
+    {
+        AccessorReader const accessor(model_, channel.output, channel.samplerPlace);
+        accessor.RequireType(channel.path->type, channel.path->typeName);
+        bool const isSpline = channel.item.interpolation == SourceInterpolation::CubicSpline;
+        std::size_t const elementsPerKey = isSpline ? 3 : 1;
+        bool const isWeights = channel.path->kind == StreamKind::Weights;
+        std::size_t const targets = isWeights && keys > 0 ? accessor.Count() / keys / elementsPerKey : 1;
+        if (targets == 0 || accessor.Count() != keys * elementsPerKey * targets) {
+            throw ImportError(channel.samplerPlace, "has " + std::to_string(accessor.Count()) + " values for " +
+                                                        std::to_string(keys) + " times");
+        }
+        std::size_t const dimension = isWeights ? targets : channel.path->kind == StreamKind::Rotation ? 4 : 3;
+        if (dimension > static_cast<std::size_t>(StreamBuilder::MaxDimension)) {
+            throw ImportError(channel.samplerPlace, "has " + std::to_string(dimension) + " weights a key, more than " +
+                                                        std::to_string(StreamBuilder::MaxDimension));
+        }
+        numbersUsed_ += keys * dimension * NumbersPerComponent;
+        if (numbersUsed_ > MaxNumbers) {
+            throw ImportError(channel.item.place, "the file's channels ask for more keys than are accepted");
+        }
+        return {accessor.ReadNumbers(), dimension};
+    }
+
+    void MakeStream(Channel& channel)
+    {
+        std::vector<float> const& times = times_.at(channel.input);
+        Values const values = ReadValues(channel, times.size());
+        NameComponents(channel.item, values.dimension);
+        try {
+            StreamBuilder builder(static_cast<int>(values.dimension), scene_.timeScale, channel.item.path);
+            AppendKeys(builder, channel, times, values);
+            if (channel.item.interpolation == SourceInterpolation::CubicSpline) {
+                SetTangents(builder, times.size(), values);
+            }
+            channel.item.stream = builder.Take();
+        } catch (StoreError const& error) {
+            throw ImportError(channel.item.place, error.what());
+        }
+    }
+
+    static void NameComponents(StreamItem& item, std::size_t dimension)
+    {
+        constexpr char const* axes[] = {"x", "y", "z", "w"};
+        for (std::size_t i = 0; i < dimension; ++i) {
+            item.components.push_back(item.kind == StreamKind::Weights ? std::to_string(i).insert(0, 1, 'w') : axes[i]);
+        }
+    }
+
+    void AppendKeys(StreamBuilder& builder, Channel const& channel, std::vector<float> const& times, Values const& values) const
+    {
+        bool const isSpline = channel.item.interpolation == SourceInterpolation::CubicSpline;
+        std::size_t const stride = values.dimension * (isSpline ? 3 : 1);
+        std::size_t const offset = isSpline ? values.dimension : 0;
+        KFS_Interp const code = CodeOf(channel.item.interpolation);
+        for (std::size_t i = 0; i < times.size(); ++i) {
+            int const time = ToUnits(times[i], scene_.timeScale);
+            if (i > 0 && time <= ToUnits(times[i - 1], scene_.timeScale)) {
+                throw ImportError(channel.item.place, "keys " + std::to_string(i - 1) + " and " + std::to_string(i) +
+                                                          " are closer than 1/" + std::to_string(scene_.timeScale) + " s");
+            }
+            builder.Append(time, values.numbers.data() + i * stride + offset, code, code);
+        }
+    }
+
+    // A Hermite segment is the Bezier segment with handles at its thirds, whose slopes are the tangents.
+    static void SetTangents(StreamBuilder& builder, std::size_t keys, Values const& values)
+    {
+        std::vector<double> const thirds(values.dimension, 1.0 / 3.0);
+        for (std::size_t i = 0; i < keys; ++i) {
+            double const* const in = values.numbers.data() + i * values.dimension * 3;
+            double const* const out = in + values.dimension * 2;
+            builder.SetHandles(static_cast<int>(i), {in, thirds.data(), out, thirds.data()});
+        }
+    }
+
+    tinygltf::Model model_;
+    Scene scene_;
+    UniqueNames paths_;
+    std::vector<Channel> channels_;
+    std::map<int, std::vector<float>> times_;
+    std::size_t numbersUsed_ = 0;
+};
+
+}  // namespace
+
+Scene ImportGltf(std::string const& fileName, ImportOptions const& options)
+{
+    return GltfImport(fileName).Run(options);
+}
+
+}  // namespace kfshost

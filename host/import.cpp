@@ -1,0 +1,24 @@
+#include "host/import.h"
+
+#include "host/import_error.h"
+
+#include <algorithm>
+#include <cctype>
+#include <filesystem>
+
+namespace kfshost {
+
+Scene ImportFile(std::string const& fileName, ImportOptions const& options)
+{
+    std::string ending = std::filesystem::path(fileName).extension().string();
+    std::ranges::transform(ending, ending.begin(), [](unsigned char c) { return static_cast<char>(std::tolower(c)); });
+    if (ending == ".gltf" || ending == ".glb") {
+        return ImportGltf(fileName, options);
+    }
+    if (ending == ".bvh") {
+        return ImportBvh(fileName, options);
+    }
+    throw ImportError("", "the name doesn't end in .gltf, .glb or .bvh");
+}
+
+}  // namespace kfshost

@@ -1,0 +1,54 @@
+#include "host/scene.h"
+
+
+#include "frame/errors.h"
+#include "host/storeerror.h"
+#include "keystore/evaluate.h"
+#include "keystore/lookup.h"
+
+namespace kfshost {
+
+std::string_view NameOf(StreamKind kind)
+{
+    switch (kind) {
+    case StreamKind::Translation: return "translation";
+    case StreamKind::Rotation: return "rotation";
+    case StreamKind::Scale: return "scale";
+    case StreamKind::Weights: return "weights";
+    case StreamKind::Angles: return "angles";
+    }
+    return "";
+}
+
+std::string_view NameOf(SourceInterpolation interpolation)
+{
+    switch (interpolation) {
+    case SourceInterpolation::Step: return "step";
+    case SourceInterpolation::Linear: return "linear";
+    case SourceInterpolation::CubicSpline: return "spline";
+    }
+    return "";
+}
+
+int KeyCount(KFS_Stream const& stream)
+{
+    return stream.GetKeyCount();
+}
+
+Rational KeyTime(KFS_Stream const& stream, int index)
+{
+    T_Time time{};
+    ThrowIfFailed(KFS_IndexToTime(&stream, index, &time));
+    if (time.scale == 0) {
+        throw StoreError(KFS_Err_NoKeys);
+    }
+    return {time.value, time.scale};
+}
+
+void ReadAt(KFS_Stream const& stream, Rational const& seconds, double* values)
+{
+    T_Time const time{seconds.ToUnits(stream.GetTimeScale()), stream.GetTimeScale()};
+    ThrowIfFailed(KFS_GetValueFPlus(&stream, &time, 0, values, nullptr, nullptr));
+}
+
+}  // namespace kfshost

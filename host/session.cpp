@@ -1,0 +1,116 @@
+#include "host/session.h"
+
+#include "frame/frame.h"
+#include "keystore/cachestate.h"
+#include "keystore/evaluate.h"
+
+#include <boost/make_shared.hpp>
+
+#include <stdexcept>
+#include <string>
+
+namespace kfshost {
+
+namespace {
+
+// What a host without an expression engine answers.
+class NoExprContext final : public KFS_ExprContext {
+public:
+    bool CanEvaluate() const override { return false; }
+};
+
+// Layers and paths have no meaning here: nothing to fix up, nothing that depends on a place, and no identity of their own.
+KFS_AppCallbacks HarmlessCallbacks()
+{
+    KFS_AppCallbacks callbacks;
+    callbacks.oldPathFixupFunc = [](int, KFS_StreamIDPath*) {};
+    callbacks.layerDefaultValueFunc = [](KFS_ParamLayerStream const*) { return 0; };
+    callbacks.layerIndependentFunc = [](KFS_ParamLayerStream const*, bool) { return 0L; };
+    callbacks.layerRenderGuidFunc = [](KFS_ParamLayerStream const*, KFS_RenderOptionsBase const&,
+                                       GetRenderGuidFilter*) { return hearth::utility::Guid(); };
+    callbacks.pathIndependentFunc = [](KFS_ParamPathStream const*, bool) { return 0; };
+    callbacks.pathRenderGuidFunc = [](KFS_ParamPathStream const*, KFS_RenderOptionsBase const&, GetRenderGuidFilter*) {
+        return hearth::utility::Guid();
+    };
+    return callbacks;
+}
+
+void AddStates(Q_RenderContext& context)
+{
+    context.SetState(boost::make_shared<ExpState>());
+    context.SetState(boost::make_shared<KFS_RenderState>());
+    context.SetState(boost::make_shared<KFS_CapsuleOverrides>(&context));
+    context.SetState(boost::make_shared<KFS_StreamCacheState>());
+}
+
+}  // namespace
+
+void ExpState::EvalExprValue(KFS_Stream const*, int, int, void*, KFS_ParamBag const*)
+{
+    throw static_cast<int>(KFS_Err_ExprNoValue);
+}
+
+void ExpState::EvalExprValueF(KFS_Stream const*, int, int, double*, KFS_ParamBag const*)
+{
+    throw static_cast<int>(KFS_Err_ExprNoValue);
+}
+
+void ExpState::EvalNoExprValue(KFS_Stream const* stream, int time, int, void* value, unsigned char* atKey,
+                               KFS_ParamBag const*, KFS_InterpFunc* interpFunc, long refcon)
+{
+    KFS_GetValueNoExpr(stream, time, false, value, atKey, nullptr, interpFunc, refcon);
+}
+
+void ExpState::EvalNoExprValueF(KFS_Stream const* stream, int time, int, double* value, unsigned char* atKey,
+                                KFS_ParamBag const*)
+{
+    KFS_GetValueFNoExpr(stream, time, false, value, atKey, nullptr);
+}
+
+void ExpState::ResolveExprTarget(KFS_Stream const**, int*, KFS_ParamBag const*, KFS_ParamBag*) {}
+
+boost::shared_ptr<KFS_ExprContext> ExpState::GetExprContext(KFS_Stream const*)
+{
+    static boost::shared_ptr<KFS_ExprContext> const context = boost::make_shared<NoExprContext>();
+    return context;
+}
+
+Project::Project()
+{
+    InitializeContexts();
+    AddStates(*GetRenderContext(false));
+}
+
+boost::shared_ptr<Q_RenderContext> MakeRenderContext(bool tempClone)
+{
+    auto context = Q_RenderContext::MakeNewContext(tempClone);
+    AddStates(*context);
+    return context;
+}
+
+Session::Library::Library()
+{
+    if (int const code = KFS_Birth()) {
+        KFS_Death();
+        throw std::runtime_error("the library didn't start: error " + std::to_string(code));
+    }
+    KFS_AppCallbacks callbacks = HarmlessCallbacks();
+    KFS_SetCallbacks(callbacks);
+}
+
+Session::Library::~Library()
+{
+    KFS_ClearCallbacks();
+    KFS_Death();
+}
+
+// The project owns its render context, so that reference shares the project's.
+Session::Session()
+    : project_(boost::make_shared<Project>()), currentContext_(project_->GetContext()),
+      currentRenderContext_(boost::shared_ptr<Q_RenderContext>(project_, project_->GetRenderContext(false)))
+{
+}
+
+Session::~Session() = default;
+
+}  // namespace kfshost

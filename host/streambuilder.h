@@ -1,0 +1,41 @@
+#pragma once
+
+#include "keystore/stream.h"
+
+#include <memory>
+#include <span>
+#include <string>
+
+namespace kfshost {
+
+// The four numbers of a key's handles, for each component: speeds in value units a second, influences as fractions of the
+// segment on that side.
+struct KeyHandles {
+    double const* inSpeed;
+    double const* inInfluence;
+    double const* outSpeed;
+    double const* outInfluence;
+};
+
+// Makes one stream of doubles, key after key. All of it throws StoreError.
+class StreamBuilder {
+public:
+    // `dimension` is 1 to MaxDimension.
+    StreamBuilder(int dimension, unsigned int timeScale, std::string const& name);
+
+    // A key's record, five doubles a component behind a head, has to fit the 15 bits of a list item's size.
+    static constexpr int MaxDimension = 818;
+
+    // Keys come in the order of their times, `value` with `dimension` doubles. The codes are those of KFS_Interp for the
+    // segments on both sides.
+    void Append(int time, double const* value, KFS_Interp inInterp, KFS_Interp outInterp);
+    // The handles of a key that stands already; they matter on sides that are KFS_Interp_Spline.
+    void SetHandles(int index, KeyHandles const& handles);
+
+    std::unique_ptr<KFS_Stream> Take() { return std::move(stream_); }
+
+private:
+    std::unique_ptr<KFS_Stream> stream_;
+};
+
+}  // namespace kfshost

@@ -1,0 +1,215 @@
+#include "keystore/cache_private.h"
+
+#include "frame/boundary_private.h"
+#include "frame/report_private.h"
+#include "frame/services/memory.h"
+#include "keystore/items.h"
+#include "keystore/items_private.h"
+#include "keystore/keylist_private.h"
+#include "keystore/pins_private.h"
+#include "keystore/valuedata_private.h"
+
+#include <cstring>
+
+namespace {
+
+constexpr int CacheMemoryId = 0x1D0003;
+
+bool NothingIsStale(KFS_StreamKeyData const* data)
+{
+    return data->invalidKeyIndex[0] == KFS_INVALID_INDEX && data->invalidKeyIndex[1] == KFS_INVALID_INDEX &&
+           data->arcInvalidKeyIndex[0] == KFS_INVALID_INDEX && data->arcInvalidKeyIndex[1] == KFS_INVALID_INDEX;
+}
+
+// The whole key into the cache record, which never takes a share in its arc table.
+int CopyKeyToCache(KFS_StreamKeyData const* data, int index)
+{
+    int const code = SEQ_GetItemCopy(data->keys, 0, index, data->cache);
+    if (code == 0 && KFSp_HasSpatialBlock(data->cache)) {
+        data->cache->remapTable = nullptr;
+    }
+    return code;
+}
+
+int InterpolateToCache(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int keyIndex, KFS_InterpFunc* interpFunc,
+                       long refcon)
+{
+    KFS_InterpFunc const func = interpFunc ? *interpFunc : stream->GetInterpFunc();
+    if (!func) {
+        KFSp_ReportRow(KFSp_Op_UpdateCache, 0, KFSp_Row_NoInterpFunc);
+    }
+    int const code = func(stream, interpFunc ? refcon : stream->GetItemRefcon(), time, keyIndex);
+    data->cache->time = code == 0 ? time : KFS_INVALID_INDEX;
+    return code;
+}
+
+// The value between, before or after keys. `next` is the index of the first key after the time.
+int FillBetweenKeys(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int next, KFS_InterpFunc* interpFunc,
+                    long refcon)
+{
+    if (next == 0) {
+        return CopyKeyToCache(data, 0);
+    }
+    if (next >= KFSp_ItemCount(data)) {
+        return CopyKeyToCache(data, next - 1);
+    }
+    if (!stream->IsSpatial()) {
+        KFS_KeyScalar const* a = nullptr;
+        KFS_KeyScalar const* b = nullptr;
+        KFSp_FirstError error;
+        error.Keep(KFSp_GetConstKey(data, next - 1, &a));
+        error.Keep(KFSp_GetConstKey(data, next, &b));
+        if (!error.None()) {
+            return error.Code();
+        }
+        if (a->outInterp == KFS_Interp_Hold) {
+            return CopyKeyToCache(data, next - 1);
+        }
+        // A hold on the far side takes the later key's value, and is meant to.
+        if (b->inInterp == KFS_Interp_Hold) {
+            return CopyKeyToCache(data, next);
+        }
+    }
+    return InterpolateToCache(stream, data, time, next - 1, interpFunc, refcon);
+}
+
+} // namespace
+
+int KFS_Stream::GetCacheSize() const
+{
+    int const itemSize = KFSp_KeyItemSize(this);
+    return IsCustom() && valueDesc_.itemSize < 8 ? itemSize + 4 : itemSize;
+}
+
+KFS_KeyScalar* KFS_Stream::AllocateCacheImpl() const
+{
+    auto* const cache = static_cast<KFS_KeyScalar*>(Q_AllocatePtrClear(
+        CacheMemoryId, KFSp_MessageText(KFSp_Row_StreamValueCache), static_cast<std::size_t>(GetCacheSize())));
+    if (!cache) {
+        throw int{KFS_Err_OutOfMemory};
+    }
+    cache->time = KFS_INVALID_INDEX;
+    return cache;
+}
+
+void KFS_Stream::AllocateCache()
+{
+    KFS_KeyScalar* const cache = AllocateCacheImpl();
+    keyData_.cache = cache;
+}
+
+void KFS_Stream::FreeCache()
+{
+    Q_FreePtr(keyData_.cache);
+    keyData_.cache = nullptr;
+}
+
+KFS_KeyScalar* KFS_Stream::CloneCache(KFS_KeyScalar const* source) const
+{
+    KFS_KeyScalar* const clone = AllocateCacheImpl();
+    std::memcpy(static_cast<void*>(clone), source, static_cast<std::size_t>(GetCacheSize()));
+    if (KFSp_HasSpatialBlock(clone)) {
+        clone->remapTable = nullptr;
+    }
+    if (!KFSp_CacheIsEmpty(source) && copyItemFunc_) {
+        int const code = KFSp_Boundary([&] {
+            return copyItemFunc_(this, GetItemRefcon(), KFS_Item_CacheWhole, KFSp_ValueData(source), KFSp_ValueData(clone));
+        });
+        if (code != 0) {
+            Q_FreePtr(clone);
+            throw int{code};
+        }
+    }
+    return clone;
+}
+
+int KFSp_ClearCacheRecord(KFS_Stream const* stream, KFS_KeyScalar* cache)
+{
+    if (KFSp_CacheIsEmpty(cache)) {
+        return 0;
+    }
+    int code = 0;
+    if (KFS_DisposeItemFunc const dispose = stream->GetDisposeItemFunc()) {
+        code = dispose(stream, stream->GetItemRefcon(), KFS_Item_CacheWhole, KFSp_ValueData(cache));
+    }
+    cache->time = KFS_INVALID_INDEX;
+    return code;
+}
+
+int KFSp_ClearCache(KFS_Stream const* stream)
+{
+    return KFSp_ClearCacheRecord(stream, stream->GetCache());
+}
+
+int KFSp_SetupCache(KFS_Stream const* stream, int time, void const* value, char inInterp, char outInterp, short kind,
+                    unsigned char convert)
+{
+    KFS_KeyScalar* const cache = stream->GetCache();
+    cache->time = time;
+    cache->inInterp = inInterp;
+    cache->outInterp = outInterp;
+    cache->flags = kind == KFS_Item_KeyValue ? 0 : KFS_KeyFlag_TangentsSet;
+    if (stream->IsSpatial()) {
+        cache->flags |= KFS_KeyFlag_SpatialBlock;
+        cache->spFlags = 0;
+        cache->remapTable = nullptr;
+    }
+    if (!value) {
+        return 0;
+    }
+    KFS_CopyItemFunc const copy = !convert || stream->IsCustom() ? KFSp_FakeCopyItemFunc : KFSp_ConvertItemToFloat;
+    return copy(stream, 0, kind, value, KFSp_ValueData(cache));
+}
+
+void KFSp_UpdateStreamCacheToTime(KFS_Stream const* stream, int time, unsigned char keyOnly, void* value, unsigned char* atKey,
+                                  KFS_InterpFunc* interpFunc, long refcon)
+{
+    KFSp_UpdateCacheToTime(stream, stream->GetKeyData(), time, keyOnly, value, atKey, interpFunc, refcon);
+}
+
+void KFSp_UpdateCacheToTime(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, unsigned char keyOnly,
+                            void const* value, unsigned char* atKey, KFS_InterpFunc* interpFunc, long refcon)
+{
+    KFS_KeyScalar* const cache = data->cache;
+    if (stream->HasNoKeys()) {
+        if (time != KFS_INVALID_INDEX) {    // which would say that the constant has no value
+            cache->time = time;
+        }
+        if (atKey) {
+            *atKey = 1;
+        }
+        return;
+    }
+    bool found = false;
+    int index = 0;
+    KFSp_ThrowIf(KFSp_SearchKeys(data, time, &found, &index));
+    bool const stands = !value || (cache->time == time && !KFSp_CacheIsEmpty(cache));
+    if (!stands) {
+        KFSp_ThrowIf(KFSp_ClearCacheRecord(stream, cache));
+        bool mayBeStale = !NothingIsStale(data);
+        if (mayBeStale && found) {
+            KFS_KeyScalar const* key = nullptr;
+            KFSp_ThrowIf(KFSp_GetConstKey(data, index, &key));
+            mayBeStale = stream->IsSpatial() && (key->flags & KFS_KeyFlag_Float) != 0;
+        }
+        if (mayBeStale) {
+            KFSp_ThrowIf(stream->UpdateStream());
+            KFSp_ThrowIf(KFSp_SearchKeys(data, time, &found, &index));      // float keys may have moved
+        }
+        if (found) {
+            KFSp_ThrowIf(CopyKeyToCache(data, index));
+        } else if (!keyOnly && KFSp_ItemCount(data) > 0) {
+            KFSp_FirstError error;
+            {
+                KFSp_ScConstPin const pin(data->keys, error);
+                if (error.None()) {
+                    error.Keep(FillBetweenKeys(stream, data, time, index, interpFunc, refcon));
+                }
+            }
+            KFSp_ThrowIf(error.Code());
+        }
+    }
+    if (atKey) {
+        *atKey = found ? 1 : 0;
+    }
+}

@@ -1,0 +1,34 @@
+#pragma once
+
+#include "frame/export.h"
+#include "frame/services/context.h"
+#include "keystore/stream.h"
+
+#include <boost/shared_ptr.hpp>
+
+#include <map>
+
+// The private copies of a render on a temporary clone context: for each stream that it reads, the key data as it stood at the first
+// read. The host puts one into each such context, and makes the first reads (or all of them) while nobody edits the streams.
+// Threads: reached by the thread of one context at a time.
+class KFS_API KFS_StreamCacheState : public Q_RenderState {
+public:
+    static hearth::utility::ImmutableString const S_StateName;
+
+    KFS_StreamCacheState() = default;
+    hearth::utility::ImmutableString const& GetStateName() const override;
+    ~KFS_StreamCacheState() override;
+    virtual void Activate();
+    virtual void Deactivate();
+
+    // The copy for `stream`, made from `source` at the first call. Throws an int; nothing is kept then.
+    KFS_StreamKeyData* GetOverrideKeyData(KFS_Stream const* stream, KFS_StreamKeyData const& source);
+    // Frees all copies.
+    void FreeCacheData();
+
+private:
+    std::map<KFS_Stream const*, boost::shared_ptr<KFS_StreamKeyData>> keyData_;
+    // The last answer: one read asks several times.
+    KFS_Stream const* lastStream_ = nullptr;
+    KFS_StreamKeyData* lastKeyData_ = nullptr;
+};

@@ -1,0 +1,100 @@
+#include "keystore/copyundo_private.h"
+
+#include "keystore/items_private.h"
+#include "keystore/keylist_private.h"
+#include "keystore/valuedata_private.h"
+
+#include <climits>
+
+KFSp_CopyUndo::KFSp_CopyUndo(KFS_Stream* stream, KFS_StreamKeyData* data, int count) noexcept
+    : stream_(stream),
+      data_(data),
+      steps_(static_cast<std::size_t>(count) * sizeof(Step))
+{}
+
+KFSp_CopyUndo::~KFSp_CopyUndo()
+{
+    if (kept_) {
+        SEQ_Dispose(kept_, 0);
+    }
+}
+
+int KFSp_CopyUndo::Code() const noexcept
+{
+    return steps_.get() ? 0 : KFS_Err_OutOfMemory;
+}
+
+int KFSp_CopyUndo::Note(int time)
+{
+    bool found = false;
+    int index = 0;
+    if (int const code = KFSp_SearchKeys(data_, time, &found, &index)) {
+        return code;
+    }
+    if (found) {
+        if (int const code = Keep(index)) {
+            return code;
+        }
+    }
+    static_cast<Step*>(steps_.get())[stepCount_++] = {time, found};
+    return 0;
+}
+
+int KFSp_CopyUndo::Keep(int index)
+{
+    if (!kept_) {
+        if (int const code = KFSp_NewKeyList(stream_, &kept_)) {
+            return code;
+        }
+    }
+    KFS_KeyScalar const* key = nullptr;
+    if (int const code = KFSp_GetConstKey(data_, index, &key)) {
+        return code;
+    }
+    return SEQ_InsertCopy(key, -1, kept_, 0);
+}
+
+void KFSp_CopyUndo::Undo()
+{
+    while (stepCount_ > 0) {
+        Step const step = static_cast<Step const*>(steps_.get())[--stepCount_];
+        bool found = false;
+        int index = 0;
+        if (KFSp_SearchKeys(data_, step.time, &found, &index) != 0 || !found) {
+            continue;  // the copy never got in
+        }
+        if (step.overwrites) {
+            PutBack(index);
+        } else {
+            static_cast<void>(KFSp_RemoveKeyItem(data_, index, nullptr));
+        }
+    }
+    MarkAllStale();
+}
+
+// The kept key moves into the place of the one that stands there now, whose arc table it takes over. Needs no memory.
+void KFSp_CopyUndo::PutBack(int index)
+{
+    void* item = nullptr;
+    if (SEQ_GetAddress(data_->keys, index, 0, &item) != 0) {
+        return;
+    }
+    auto* const key = static_cast<KFS_KeyScalar*>(item);
+    bool const hasTable = KFSp_HasSpatialBlock(key);
+    SEQ_Head** const table = hasTable ? key->remapTable : nullptr;
+    static_cast<void>(KFSp_DisposeKeyItemFunc(stream_, data_->keys, item));
+    static_cast<void>(SEQ_Remove((*kept_)->count - 1, kept_, 0, item));
+    if (hasTable) {
+        key->remapTable = table;
+    }
+}
+
+void KFSp_CopyUndo::MarkAllStale() const
+{
+    int last = KFSp_ItemCount(data_) - 1;
+    do {
+        static_cast<void>(stream_->SetInvalid(last, SHRT_MAX));
+        static_cast<void>(stream_->SetArcInvalid(last, SHRT_MAX));
+        last -= SHRT_MAX;
+    } while (last >= 0);
+}

@@ -1,0 +1,373 @@
+#include "keystore/evaluate.h"
+
+#include "frame/boundary_private.h"
+#include "frame/project.h"
+#include "frame/report_private.h"
+#include "frame/services/memory.h"
+#include "frame/timehelpers.h"
+#include "keystore/cache_private.h"
+#include "keystore/expstate.h"
+#include "keystore/items_private.h"
+#include "keystore/keylist_private.h"
+#include "keystore/renderstates_private.h"
+#include "keystore/valuedata_private.h"
+#include "overrides/parambag.h"
+
+#include <cstring>
+
+namespace {
+
+// What the two forms of a read do differently.
+struct ExternalForm {
+    using Value = void;
+    static void EvalExpr(KFS_ExpState* state, KFS_Stream const* stream, int time, int flags, void* value, KFS_ParamBag const* bag)
+    {
+        state->EvalExprValue(stream, time, flags, value, bag);
+    }
+    // Where the expression read another stream of another data type, its value becomes this stream's by way of doubles.
+    static int Adapt(KFS_Stream const* stream, KFS_Stream const* target, void* value);
+};
+
+struct DoubleForm {
+    using Value = double;
+    static void EvalExpr(KFS_ExpState* state, KFS_Stream const* stream, int time, int flags, double* value,
+                         KFS_ParamBag const* bag)
+    {
+        state->EvalExprValueF(stream, time, flags, value, bag);
+    }
+    static int Adapt(KFS_Stream const*, KFS_Stream const*, double*) { return 0; }
+};
+
+constexpr int MaxAdaptedDimension = 4;
+
+short ValueItemKind(KFS_Stream const* stream)
+{
+    return stream->HasNoKeys() ? KFS_Item_CacheValue : KFS_Item_KeyValue;
+}
+
+int ExternalForm::Adapt(KFS_Stream const* stream, KFS_Stream const* target, void* value)
+{
+    if (target == stream || target->GetValueDesc()->dataType == stream->GetValueDesc()->dataType ||
+        target->GetDimension() != stream->GetDimension() || stream->GetDimension() > MaxAdaptedDimension) {
+        return 0;
+    }
+    double numbers[MaxAdaptedDimension] = {};
+    if (int const code = KFSp_ConvertItemToFloat(target, 0, ValueItemKind(target), value, numbers)) {
+        return code;
+    }
+    return KFSp_ConvertItemFromFloat(stream, 0, ValueItemKind(stream), numbers, value);
+}
+
+bool AnswersFromFollowers(KFS_Stream const* stream, void const* value)
+{
+    return value && stream->GetParent() && !stream->IsCanonical() && stream->AreDimensionsSeparated();
+}
+
+// The buffer is taken as doubles, whatever the data type. A dimension without a follower keeps what is there.
+int ReadFollowers(KFS_Stream const* stream, int time, int flags, double* value, KFS_ParamBag const* bag)
+{
+    T_Time const at{time, stream->GetTimeScale()};
+    for (int d = 0; d < stream->GetDimension(); ++d) {
+        if (KFS_Stream const* const follower = stream->GetSeparationFollower(d)) {
+            if (int const code = KFS_GetValueFPlus(follower, &at, flags, value + d, nullptr, bag)) {
+                return code;
+            }
+        }
+    }
+    return 0;
+}
+
+bool WantsExpression(KFS_Stream const* stream, int flags, void const* value)
+{
+    return (flags & KFS_EvalFlag_NoExpression) == 0 && value && stream->HasExpression() &&
+           !stream->GetExprInfo().GetFlag(KFS_ExprFlag_Disabled);
+}
+
+// Whether the expression answered; `code` is the read's result then.
+template <class Form>
+bool ReadExpression(KFS_ExpState* state, KFS_Stream const* stream, int time, int flags, typename Form::Value* value,
+                    unsigned char* atKey, KFS_ParamBag const* bag, int* code)
+{
+    KFS_Stream const* target = stream;
+    int targetTime = time;
+    KFS_ParamBag resolved;
+    state->ResolveExprTarget(&target, &targetTime, bag, &resolved);
+    KFS_ParamBag const* const inForce = resolved.GetOverrideCount() == 0 ? bag : &resolved;
+    if (!state->GetExprContext(target)->CanEvaluate()) {
+        return false;
+    }
+    *code = KFSp_Boundary([&] { Form::EvalExpr(state, target, targetTime, flags, value, inForce); });
+    if (*code != 0 && *code != KFS_Err_ExprNoValue) {
+        return true;
+    }
+    if (atKey) {
+        *atKey = 0;
+    }
+    if (*code == KFS_Err_ExprNoValue) {
+        return false;
+    }
+    *code = Form::Adapt(stream, target, value);
+    return true;
+}
+
+// A render context that holds no KFS_ExpState can't say how to read.
+int ReportMissingState()
+{
+    return Qp_ReportLegacyErrString(KFSp_ReportId(KFSp_Op_GetValue), KFSp_Severity, KFS_Err_LegacyMismatch, nullptr);
+}
+
+// The current render context goes before the stream's project, which is asked only without one.
+Q_RenderContext const* FindRenderContext(KFS_Stream const* stream)
+{
+    if (Q_RenderContext const* const current = Q_RenderContext::PeekCurrent()) [[likely]] {
+        return current;
+    }
+    KFS_Project const* const project = KFS_GetConstProject(stream, true);
+    return project ? project->GetRenderContext(true) : nullptr;
+}
+
+// The stages that both forms share, up to the keys; `readKeys` takes the state that says how to read them.
+template <class Form, class ReadKeys>
+int ReadStaged(KFS_Stream const* stream, Q_RenderContext const* context, int time, int flags, typename Form::Value* value,
+               unsigned char* atKey, KFS_ParamBag const* bag, ReadKeys&& readKeys)
+{
+    if (AnswersFromFollowers(stream, value)) [[unlikely]] {
+        return ReadFollowers(stream, time, flags, static_cast<double*>(value), bag);
+    }
+    KFS_ExpState* const state = context ? KFSp_GetRenderStates(context).expState : nullptr;
+    if (!state) [[unlikely]] {
+        return ReportMissingState();
+    }
+    if (WantsExpression(stream, flags, value)) [[unlikely]] {
+        int code = 0;
+        if (ReadExpression<Form>(state, stream, time, flags, value, atKey, bag, &code)) {
+            return code;
+        }
+    }
+    readKeys(state);
+    return 0;
+}
+
+// What both ends of a read do before the value is copied out: refuse, and bring the cache to the time. Whether there is a value to copy.
+bool BringCache(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, unsigned char keyOnly, void const* value,
+                unsigned char* atKey, KFS_InterpFunc* interpFunc, long refcon)
+{
+    if (KFSp_HasNoValue(stream, data)) [[unlikely]] {
+        throw KFSp_ReportErr(KFSp_Op_GetValueNoExpr, KFS_Err_NoKeys, KFSp_Row_GetValue);
+    }
+    unsigned char found = 0;
+    KFSp_UpdateCacheToTime(stream, data, time, keyOnly, value, &found, interpFunc, refcon);
+    if (atKey) {
+        *atKey = found;
+    }
+    return value && stream->GetDimension() >= 1 && (!keyOnly || found);
+}
+
+int ReadSamples(KFS_Stream const* stream, T_Time time, T_Time const* step, int count, int flags, double* values)
+{
+    bool const separated = stream->GetParent() && stream->AreDimensionsSeparated();
+    std::vector<KFS_Stream const*> followers;
+    if (separated) {
+        stream->GetSeparationFollowers(followers);
+    }
+    int const dimension = stream->GetDimension();
+    for (int sample = 0; sample < count; ++sample, values += dimension) {
+        KFSp_FirstError error;
+        if (!separated) {
+            error.Keep(KFS_GetValueFPlus(stream, &time, flags, values, nullptr, nullptr));
+        }
+        for (int d = 0; separated && d < dimension && error.None(); ++d) {
+            values[d] = 0.0;
+            if (static_cast<std::size_t>(d) < followers.size()) {
+                error.Keep(KFS_GetValueFPlus(followers[static_cast<std::size_t>(d)], &time, flags, values + d, nullptr, nullptr));
+            }
+        }
+        if (error.None() && sample + 1 < count) {
+            error.Keep(KFS_AddTime(step, &time, 0, &time));
+        }
+        if (!error.None()) {
+            return error.Code();
+        }
+    }
+    return 0;
+}
+
+} // namespace
+
+int KFS_GetValue(KFS_Stream const* stream, T_Time const* time, unsigned char, void* value, unsigned char* atKey,
+                 KFS_ParamBag const* bag)
+{
+    return KFS_GetValuePlus(stream, time, 0, value, atKey, bag, nullptr, 0);
+}
+
+int KFS_GetValuePlus(KFS_Stream const* stream, T_Time const* time, int flags, void* value, unsigned char* atKey,
+                     KFS_ParamBag const* bag, KFS_InterpFunc* interpFunc, long refcon)
+{
+    if (int const code = KFSp_CheckStream(KFSp_Op_GetValue, stream, KFSp_Row_GetValue)) {
+        return code;
+    }
+    int at = 0;
+    if (int const code = KFSp_TimeInStream(stream, time, &at)) {
+        return code;
+    }
+    return KFSp_Boundary([&] {
+        return ReadStaged<ExternalForm>(stream, FindRenderContext(stream), at, flags, value, atKey, bag, [&](KFS_ExpState* state) {
+            state->EvalNoExprValue(stream, at, flags, value, atKey, bag, interpFunc, refcon);
+        });
+    });
+}
+
+int KFS_GetValueF(KFS_Stream const* stream, T_Time const* time, unsigned char, double* value, unsigned char* atKey,
+                  KFS_ParamBag const* bag)
+{
+    return KFS_GetValueFPlus(stream, time, 0, value, atKey, bag);
+}
+
+int KFS_GetValueFPlus(KFS_Stream const* stream, T_Time const* time, int flags, double* value, unsigned char* atKey,
+                      KFS_ParamBag const* bag)
+{
+    if (int const code = KFSp_CheckStream(KFSp_Op_GetValue, stream, KFSp_Row_GetValue)) {
+        return code;
+    }
+    int at = 0;
+    if (int const code = KFSp_TimeInStream(stream, time, &at)) {
+        return code;
+    }
+    if (stream->IsCustom()) [[unlikely]] {
+        return KFSp_RefuseCustomValue(KFSp_Op_GetFloat, KFSp_Row_ComputeFloatValues);
+    }
+    return KFSp_Boundary([&] {
+        return ReadStaged<DoubleForm>(stream, Q_RenderContext::PeekCurrent(), at, flags, value, atKey, bag,
+                                      [&](KFS_ExpState* state) {
+                                          state->EvalNoExprValueF(stream, at, flags, value, atKey, bag);
+                                      });
+    });
+}
+
+void KFS_GetValueNoExpr(KFS_Stream const* stream, int time, unsigned char keyOnly, void* value, unsigned char* atKey,
+                        void const* source, KFS_InterpFunc* interpFunc, long refcon)
+{
+    KFSp_ThrowIf(KFSp_CheckStream(KFSp_Op_GetValueNoExpr, stream, KFSp_Row_GetValue));
+    KFS_StreamKeyData const* const data = stream->GetKeyData();
+    if (!BringCache(stream, data, time, keyOnly, value, atKey, interpFunc, refcon)) {
+        return;
+    }
+    KFS_CopyItemFunc copy = stream->GetCopyItemFunc();
+    if (!copy) {
+        copy = stream->IsCustom() ? KFSp_FakeCopyItemFunc : KFSp_ConvertItemFromFloat;
+    }
+    void const* const from = source ? source : KFSp_ValueData(data->cache);
+    KFSp_ThrowIf(copy(stream, stream->GetItemRefcon(), KFS_Item_CacheValue, from, value));
+}
+
+void KFS_GetValueFNoExpr(KFS_Stream const* stream, int time, unsigned char keyOnly, double* value, unsigned char* atKey,
+                         void const* source)
+{
+    KFSp_ThrowIf(KFSp_CheckStream(KFSp_Op_GetValueNoExpr, stream, KFSp_Row_GetValue));
+    if (stream->IsCustom()) {
+        throw KFSp_RefuseCustomValue(KFSp_Op_GetValuesFRefusal, KFSp_Row_ComputeFloatValues);
+    }
+    KFS_StreamKeyData const* const data = stream->GetKeyData();
+    if (!BringCache(stream, data, time, keyOnly, value, atKey, nullptr, 0)) {
+        return;
+    }
+    void const* const from = source ? source : KFSp_ValueData(data->cache);
+    KFSp_ThrowIf(KFSp_FakeCopyItemFunc(stream, 0, KFS_Item_CacheValue, from, value));
+}
+
+int KFS_GetValuesFPlus(KFS_Stream const* stream, T_Time const* start, T_Time const* step, int count, int flags,
+                       char*** values)
+{
+    if (int const code = KFSp_CheckStream(KFSp_Op_GetFloat, stream, KFSp_Row_GetValue)) {
+        return code;
+    }
+    if (stream->IsCustom()) {
+        return KFSp_RefuseCustomValue(KFSp_Op_GetValuesFRefusal, KFSp_Row_ComputeFloatValues);
+    }
+    if (!values) {
+        return Qp_ReportLegacyErrString(KFSp_ReportId(KFSp_Op_GetValuesFHandle), KFSp_Severity, KFS_Err_LegacyMismatch, nullptr);
+    }
+    std::size_t const number = count > 0 ? static_cast<std::size_t>(count) * static_cast<std::size_t>(stream->GetDimension()) : 0;
+    char** const handle = Q_AllocateHandleClear(KFSp_ReportId(KFSp_Op_GetValuesFHandle),
+                                                KFSp_MessageText(KFSp_Row_InterpolationArray), number * sizeof(double));
+    if (!handle) {
+        return KFS_Err_OutOfMemory;
+    }
+    T_Time const first = start ? *start : T_Time{0, stream->GetTimeScale()};
+    int const code = KFSp_Boundary(
+        [&] { return ReadSamples(stream, first, step, count, flags, reinterpret_cast<double*>(*handle)); });
+    if (code != 0) {
+        Q_FreeHandle(handle);
+        return code;
+    }
+    *values = handle;
+    return 0;
+}
+
+int KFS_DisposeValue(KFS_Stream const* stream, void* value)
+{
+    if (int const code = KFSp_CheckStream(KFSp_Op_DisposeValue, stream, KFSp_Row_Dispose)) {
+        return code;
+    }
+    KFS_DisposeItemFunc const dispose = stream->GetDisposeItemFunc();
+    return dispose ? KFSp_Boundary([&] { return dispose(stream, stream->GetItemRefcon(), KFS_Item_KeyValue, value); }) : 0;
+}
+
+void KFS_PostCacheVector4Value(KFS_Stream const* stream, int, M_Vector4T<double> const& vector, void* pointerValue, void* value)
+{
+    if (pointerValue) {
+        std::memcpy(value, &pointerValue, sizeof pointerValue);
+        return;
+    }
+    KFS_CopyItemFunc const copy = stream->IsCustom() ? KFSp_FakeCopyItemFunc : KFSp_ConvertItemFromFloat;
+    KFSp_ThrowIf(copy(stream, 0, KFS_Item_CacheValue, vector.v, value));
+}
+
+namespace {
+
+// A buffer for one external value, aligned to 16, that shows in the memory count.
+class ScratchValue {
+public:
+    explicit ScratchValue(KFS_Stream const* stream)
+        : size_(static_cast<std::size_t>(stream->GetDimension()) * stream->GetValueDesc()->itemSize),
+          buffer_(::operator new(size_, Alignment))
+    {
+        Q_AccountAllocationEx(size_, 1);
+    }
+    ~ScratchValue()
+    {
+        ::operator delete(buffer_, Alignment);
+        Q_AccountAllocationEx(size_, 0);
+    }
+    ScratchValue(ScratchValue const&) = delete;
+    ScratchValue& operator=(ScratchValue const&) = delete;
+    void* get() const { return buffer_; }
+
+private:
+    static constexpr std::align_val_t Alignment{16};
+    std::size_t size_;
+    void* buffer_;
+};
+
+void ReadForSideEffect(KFS_Stream const* stream, T_Time const& time)
+{
+    ScratchValue const scratch(stream);
+    KFSp_ThrowIf(KFS_GetValuePlus(stream, &time, KFS_EvalFlag_NoExpression, scratch.get(), nullptr, nullptr, nullptr, 0));
+    KFSp_ThrowIf(KFS_DisposeValue(stream, scratch.get()));
+}
+
+} // namespace
+
+void KFS_Stream::ValidateCacheAtTime(T_Time const& time)
+{
+    if (HasKeys()) {
+        ReadForSideEffect(this, time);
+    } else {
+        KFSp_ThrowIf(T_ShortConvTime(time.value, time.scale, timeScale_, &GetCache()->time));
+    }
+}
+
+void KFS_Stream::ForceInterpolateAtTime(T_Time const& time)
+{
+    ReadForSideEffect(this, time);
+}

@@ -1,0 +1,76 @@
+#include "keystore/keylist_private.h"
+
+namespace {
+
+// Only `time` of a probe is ever compared.
+KFS_KeyScalar MakeProbe(int time)
+{
+    KFS_KeyScalar probe{};
+    probe.time = time;
+    return probe;
+}
+
+int SearchList(KFS_StreamKeyData const* data, int time, bool* found, int* index)
+{
+    KFS_KeyScalar const probe = MakeProbe(time);
+    unsigned char foundByte = 0;
+    int const code = SEQ_GetSortedConstItem(data->keys, 0, &probe, &foundByte, 0, index);
+    *found = foundByte != 0;
+    return code;
+}
+
+} // namespace
+
+int KFSp_SearchKeys(KFS_StreamKeyData const* data, int time, bool* found, int* index)
+{
+    *found = false;
+    *index = 0;
+    if (!data->keys) {
+        return 0;
+    }
+    int const count = (*data->keys)->count;
+    if (!data->times.Mirrors(count) && !data->times.Build(data->keys)) {
+        return SearchList(data, time, found, index);
+    }
+    int const position = data->times.LowerBound(time);
+    *index = position;
+    *found = position < count && data->times[position] == time;
+    return 0;
+}
+
+int KFSp_InsertKeyItem(KFS_StreamKeyData* data, KFS_KeyScalar const* record, int index)
+{
+    bool const mirrors = data->times.Mirrors((*data->keys)->count);
+    int const code = SEQ_InsertCopy(record, index, data->keys, 0);
+    if (code == 0 && mirrors) {
+        data->times.Inserted(index, record->time);
+    }
+    return code;
+}
+
+int KFSp_RemoveKeyItem(KFS_StreamKeyData* data, int index, KFS_KeyScalar* record)
+{
+    bool const mirrors = data->times.Mirrors((*data->keys)->count);
+    int const code = SEQ_Remove(index, data->keys, 0, record);
+    if (code == 0 && mirrors) {
+        data->times.Removed(index);
+    }
+    return code;
+}
+
+int KFSp_ReplaceKeyItem(KFS_StreamKeyData* data, KFS_KeyScalar const* record, int index)
+{
+    int const code = SEQ_SetItemCopy(record, index, data->keys, 0, 0);
+    if (code == 0 && data->times.Mirrors((*data->keys)->count)) {
+        data->times.Retimed(index, record->time);
+    }
+    return code;
+}
+
+void KFSp_RetimeKey(KFS_StreamKeyData* data, int index, KFS_KeyScalar* key, int time)
+{
+    key->time = time;
+    if (data->times.Mirrors((*data->keys)->count)) {
+        data->times.Retimed(index, time);
+    }
+}

@@ -1,0 +1,79 @@
+#pragma once
+
+#include "keystore/items.h"
+#include "keystore/stream.h"
+
+#include <climits>
+
+// Everything that searches, inserts, removes or retimes keys goes through here, which keeps the packed times of the key data in step
+// with the list.
+
+// Bytes of one record of the key list, head and value data.
+inline int KFSp_KeyItemSize(KFS_ValueDesc const& desc, bool spatial, short dimension)
+{
+    return KFS_GetKeyScalarDataSize(&desc, spatial, dimension) + (spatial ? KFS_KeySpatialHeadSize + 4 : KFS_KeyHeadSize);
+}
+
+inline int KFSp_KeyItemSize(KFS_Stream const* stream)
+{
+    return KFSp_KeyItemSize(*stream->GetValueDesc(), stream->IsSpatial(), stream->GetDimension());
+}
+
+// Whether a record has a size that the list service can hold: its item sizes are shorts.
+inline bool KFSp_KeyItemFits(KFS_ValueDesc const& desc, bool spatial, short dimension)
+{
+    return dimension >= 0 && KFSp_KeyItemSize(desc, spatial, dimension) <= SHRT_MAX;
+}
+
+// A caller's time as a value in the stream's scale; a null `time` is value 0.
+inline int KFSp_TimeInStream(KFS_Stream const* stream, T_Time const* time, int* value)
+{
+    if (!time) {
+        *value = 0;
+        return 0;
+    }
+    return T_ShortConvTime(time->value, time->scale, stream->GetTimeScale(), value);
+}
+
+// The number of items of the data's list; 0 without a list.
+inline int KFSp_ItemCount(KFS_StreamKeyData const* data)
+{
+    return data->keys ? (*data->keys)->count : 0;
+}
+
+// What GetKeyCount answers, on key data that the caller has at hand.
+inline int KFSp_KeyCount(KFS_Stream const* stream, KFS_StreamKeyData const* data)
+{
+    if (stream->HasNoKeys()) {
+        return data->cache->time == KFS_INVALID_INDEX ? 0 : -1;
+    }
+    return KFSp_ItemCount(data);
+}
+
+// Whether there is nothing to answer: no key, or a constant without a value.
+inline bool KFSp_HasNoValue(KFS_Stream const* stream, KFS_StreamKeyData const* data)
+{
+    return KFSp_KeyCount(stream, data) == 0;
+}
+
+// The key at exactly `time`: `found` and its index; or not found, and the index of the first key after it (the count past the end).
+// A missing list is an empty one. Answers the list service's code.
+int KFSp_SearchKeys(KFS_StreamKeyData const* data, int time, bool* found, int* index);
+
+// A key of the list, read-only; -1 names the last one.
+inline int KFSp_GetConstKey(KFS_StreamKeyData const* data, int index, KFS_KeyScalar const** key)
+{
+    void const* item = nullptr;
+    int const code = SEQ_GetConstAddress(data->keys, index, &item);
+    *key = static_cast<KFS_KeyScalar const*>(item);
+    return code;
+}
+
+// Inserts a copy of `record` so that it stands at `index`; the list exists.
+int KFSp_InsertKeyItem(KFS_StreamKeyData* data, KFS_KeyScalar const* record, int index);
+// Removes a key; `record`, if not null, takes it over without disposal.
+int KFSp_RemoveKeyItem(KFS_StreamKeyData* data, int index, KFS_KeyScalar* record);
+// Replaces the key by a copy of `record`, disposing the old one.
+int KFSp_ReplaceKeyItem(KFS_StreamKeyData* data, KFS_KeyScalar const* record, int index);
+// Writes the time of the key at `index`, which `key` points to. The caller keeps the list sorted.
+void KFSp_RetimeKey(KFS_StreamKeyData* data, int index, KFS_KeyScalar* key, int time);

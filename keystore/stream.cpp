@@ -1,0 +1,300 @@
+#include "keystore/stream.h"
+
+#include "curves/interpolate_private.h"
+#include "curves/spatial_private.h"
+#include "frame/boundary_private.h"
+#include "frame/report_private.h"
+#include "frame/services/context.h"
+#include "keystore/attributes.h"
+#include "keystore/attributes_private.h"
+#include "keystore/cache_private.h"
+#include "keystore/cachestate.h"
+#include "keystore/edit_private.h"
+#include "keystore/items_private.h"
+#include "keystore/keylist_private.h"
+#include "keystore/renderstates_private.h"
+#include "keystore/valuedata_private.h"
+#include "tree/listener_private.h"
+
+#include <array>
+#include <utility>
+
+namespace {
+
+// Gives the duplicate of a list arc tables of its own. A key whose table can't be had stays without one.
+int DuplicateRemapTable(SEQ_Head**, long, int, void* item)
+{
+    auto* const key = static_cast<KFS_KeyScalar*>(item);
+    if (!KFSp_HasSpatialBlock(key) || !key->remapTable) {
+        return 0;
+    }
+    SEQ_Head** const shared = std::exchange(key->remapTable, nullptr);
+    return SEQ_Duplicate(shared, 0, &key->remapTable);
+}
+
+int DisposeRemapTable(SEQ_Head**, long, int, void* item)
+{
+    auto* const key = static_cast<KFS_KeyScalar*>(item);
+    if (!KFSp_HasSpatialBlock(key) || !key->remapTable) {
+        return 0;
+    }
+    return SEQ_Dispose(std::exchange(key->remapTable, nullptr), 0);
+}
+
+// The list with the arc tables that its keys own; null is fine. There is nobody to tell of a failure.
+void DisposeKeys(SEQ_Head** keys)
+{
+    if (keys) {
+        static_cast<void>(SEQ_ForEach(keys, 0, DisposeRemapTable, 0));
+        static_cast<void>(SEQ_Dispose(keys, 0));
+    }
+}
+
+// By KFS_Type.
+constexpr std::array<unsigned short, 10> ElementSizes{1, 1, 2, 2, 4, 4, 4, 4, 4, 8};
+
+int SetCustomDescription(KFS_Stream* stream, KFS_ValueDesc const& desc)
+{
+    if (!KFSp_KeyItemFits(desc, stream->IsSpatial(), stream->GetDimension())) {
+        return KFS_Err_BadValueDesc;
+    }
+    *stream->GetValueDescForModify() = desc;
+    stream->SetInterpFunc(desc.interpFunc);
+    if (stream->GetCopyItemFunc()) {
+        return 0;
+    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_SetCustomFuncs, stream, KFSp_Row_SetCustomFuncs)) {
+        return code;
+    }
+    stream->SetCopyItemFunc(KFSp_FakeCopyItemFunc);
+    stream->SetDisposeItemFunc(nullptr);
+    return KFSp_SetKeyFuncs(stream);
+}
+
+int SetPlainDescription(KFS_Stream* stream, KFS_ValueDesc const& newDesc)
+{
+    auto const type = static_cast<signed char>(newDesc.dataType & 0xFF);
+    if (type > KFS_Type_Double || !KFSp_KeyItemFits(*stream->GetValueDesc(), stream->IsSpatial(), stream->GetDimension())) {
+        return KFS_Err_BadValueDesc;
+    }
+    KFS_ValueDesc* const desc = stream->GetValueDescForModify();
+    desc->dataType = (desc->dataType & ~0xFFL) | (newDesc.dataType & 0xFF);
+    int code = 0;
+    if (type >= 0) {
+        desc->itemSize = ElementSizes[static_cast<std::size_t>(type)];
+    } else {
+        code = KFSp_CheckStream(KFSp_Op_SetCustomFuncs, stream, KFSp_Row_SetCustomFuncs);
+        if (code == 0) {
+            stream->SetCopyItemFunc(nullptr);
+            stream->SetDisposeItemFunc(nullptr);
+            code = KFSp_SetKeyFuncs(stream);
+        }
+    }
+    stream->SetInterpFunc(stream->IsSpatial() ? KFSp_InterpolateSpatial : KFSp_Interpolate);
+    return code;
+}
+
+} // namespace
+
+KFS_StreamKeyData::KFS_StreamKeyData(KFS_StreamKeyData const& source, KFS_Stream const* stream)
+    : invalidKeyIndex{source.invalidKeyIndex[0], source.invalidKeyIndex[1]},
+      arcInvalidKeyIndex{source.arcInvalidKeyIndex[0], source.arcInvalidKeyIndex[1]}
+{
+    if (source.keys) {
+        KFSp_ThrowIf(SEQ_Duplicate(source.keys, 0, &keys));
+    }
+    KFSp_FirstError error;
+    if (keys) {
+        error.Keep(SEQ_SetRefcon((*source.keys)->refcon, keys));
+        if (stream->IsSpatial()) {
+            // All of them, also after a failure: until a key has been visited, its table is the source's.
+            for (int i = 0; i < (*keys)->count; ++i) {
+                error.Keep(SEQ_ForRange(keys, i, i, 0, DuplicateRemapTable, nullptr));
+            }
+        }
+    }
+    try {
+        KFSp_ThrowIf(error.Code());
+        cache = stream->CloneCache(source.cache);
+    } catch (...) {
+        DisposeKeys(keys);
+        throw;
+    }
+}
+
+KFS_StreamKeyData::~KFS_StreamKeyData()
+{
+    DisposeKeys(keys);
+    Q_FreePtr(cache);
+}
+
+KFS_Stream::KFS_Stream(short dimension, unsigned int timeScale, unsigned char noKeys, unsigned char spatial,
+                       unsigned short interpMask, unsigned short spInterpMask, KFS_ValueDesc const& valueDesc,
+                       KFS_MatchName const* matchName, KFS_StreamFactory* factory, bool canonical)
+    : KFS_StreamBase(matchName, factory, canonical), stamp_(KFS_StreamValidStamp), dimension_(dimension),
+      spInterpMask_(spInterpMask), interpMask_(interpMask), timeScale_(timeScale), multiplier_{1.0, 1.0, 1.0, 1.0},
+      interpFunc_(KFSp_Interpolate)
+{
+    if (noKeys) {
+        kfsFlags_ |= KFS_StreamFlag_NoKeys;
+    }
+    if (spatial) {
+        kfsFlags_ |= KFS_StreamFlag_Spatial | KFS_StreamFlag_NonDecreasing;
+        interpFunc_ = KFSp_InterpolateSpatial;
+    }
+    if (valueDesc.isCustom) {
+        interpFunc_ = valueDesc.interpFunc;
+    }
+    KFSp_ThrowIf(KFS_SetValueDescription(this, &valueDesc, nullptr));
+    AllocateCache();
+    if (spatial && !IsCustom() && dimension <= 3) {
+        KFSp_ThrowIf(KFS_SetStreamSParametrize(this, 1));
+        if (spInterpMask & KFS_InterpMask_Negative) {
+            KFSp_ThrowIf(KFSp_CheckStream(KFSp_Op_SetSpInterp, this, KFSp_Row_SetSpInterp));
+            KFSp_ThrowIf(KFSp_CanDoSpInterp(this, KFS_SpInterp_Auto));
+            spInterp_ = KFS_SpInterp_Auto;
+        }
+    }
+}
+
+KFS_Stream::KFS_Stream(KFS_Stream const& source, KFS_CloneStreamParams const& params)
+    : KFS_StreamBase(source), stamp_(KFS_StreamDeadStamp), dimension_(source.dimension_), kfsFlags_(source.kfsFlags_),
+      spInterp_(source.spInterp_), spInterpMask_(source.spInterpMask_), interpMask_(source.interpMask_),
+      timeScale_(source.timeScale_), accuracy_(source.accuracy_), multiplier_(source.multiplier_), valueDesc_(source.valueDesc_),
+      interpFunc_(source.interpFunc_), copyItemFunc_(source.copyItemFunc_), disposeItemFunc_(source.disposeItemFunc_),
+      temporarilyNonCustom_(source.temporarilyNonCustom_)
+{
+    KFSp_ThrowIf(KFSp_CheckStream(KFSp_Op_StreamCopy, &source, KFSp_Row_Duplicate));
+    stamp_ = KFS_StreamValidStamp;
+    KFSp_ThrowIf(KFSp_Boundary([&] {
+        keyData_.cache = source.CloneCache(source.GetCache());
+        if (params.cloneKeys && source.keyData_.keys) {
+            CopyKeysFrom(source);
+        }
+        if (params.cloneExpression && source.HasExpression()) {
+            CopyExpressionFrom(source);
+        }
+    }));
+}
+
+void KFS_Stream::CopyKeysFrom(KFS_Stream const& source)
+{
+    KFSp_ThrowIf(SEQ_Duplicate(source.GetKeys(), 0, &keyData_.keys));
+    if (source.IsSpatial()) {
+        KFSp_ThrowIf(SEQ_ForEach(keyData_.keys, 0, KFSp_KeyClearRemap, 0));
+    }
+    KFSp_ThrowIf(SEQ_SetRefcon(this, keyData_.keys));
+    auto const count = static_cast<short>(GetKeyCount());
+    KFSp_ThrowIf(SetInvalid(-1, count));
+    KFSp_ThrowIf(SetArcInvalid(-1, count));
+}
+
+void KFS_Stream::CopyExpressionFrom(KFS_Stream const& source)
+{
+    exprInfo_.SetExpression(source.exprInfo_.GetExpression());
+    exprInfo_.SetFlags(source.exprInfo_.GetFlags());
+    if (source.exprInfo_.HasExpressionError()) {
+        exprInfo_.SetExpressionError(source.exprInfo_.GetExpressionError(), -1, u16str());
+    }
+}
+
+// The stream's own key data throughout, whatever context the thread is in.
+KFS_Stream::~KFS_Stream()
+{
+    if (KFSp_CheckStream(KFSp_Op_StreamDestroy, this, KFSp_Row_Dispose) == 0 && keyData_.cache) {
+        KFSp_ClearCacheRecord(this, keyData_.cache);
+    }
+    exprInfo_.clear();
+    // Volatile, because what is written to a dying object counts as never read, and checks of the stamp are to read it.
+    *const_cast<unsigned short volatile*>(&stamp_) = KFS_StreamDeadStamp;
+}
+
+KFS_StreamBase* KFS_Stream::CloneStream(KFS_CloneStreamParams const& params) const
+{
+    return new KFS_Stream(*this, params);
+}
+
+bool KFS_Stream::IsLeaf() const
+{
+    return true;
+}
+
+KFS_Stream* KFS_Stream::GetAsLeaf()
+{
+    return this;
+}
+
+KFS_Stream const* KFS_Stream::GetAsLeaf() const
+{
+    return this;
+}
+
+KFS_StreamKeyData const* KFS_Stream::GetKeyData() const
+{
+    Q_RenderContext const* const context = Q_RenderContext::PeekCurrent();
+    if (!context || !context->GetIsTempCloneContext()) [[likely]] {
+        return &keyData_;
+    }
+    return KFSp_GetRenderStates(context).cacheState->GetOverrideKeyData(this, keyData_);
+}
+
+void KFS_Stream::SetKeys(SEQ_Head** keys)
+{
+    KFS_StreamKeyData* const data = GetKeyDataForModify();
+    data->keys = keys;
+    data->times.Drop();
+}
+
+bool KFS_Stream::HasActiveExpression() const
+{
+    return exprInfo_.HasExpression() && !exprInfo_.GetFlag(KFS_ExprFlag_Disabled) && !exprInfo_.HasExpressionError();
+}
+
+int KFS_Stream::GetKeyCount() const
+{
+    return KFSp_KeyCount(this, GetKeyData());
+}
+
+bool KFS_Stream::HasNoValue() const
+{
+    return KFSp_HasNoValue(this, GetKeyData());
+}
+
+void KFS_Stream::NotifyValueChanged()
+{
+    if (KFSp_IsHeard(this)) {
+        KFS_NotifyListeners(this, [this](KFS_StreamListener* listener) { listener->StreamValueChanged(this); });
+    }
+}
+
+KFS_Stream::QuietExpressionErrorToken::QuietExpressionErrorToken(KFS_Stream* stream)
+    : stream_(stream), saved_(stream->ExpressionErrorsAreQuiet())
+{
+    stream_->SetExpressionErrorsAreQuiet(true);
+}
+
+KFS_Stream::QuietExpressionErrorToken::~QuietExpressionErrorToken()
+{
+    stream_->SetExpressionErrorsAreQuiet(saved_);
+}
+
+int KFS_SetValueDescription(KFS_Stream* stream, KFS_ValueDesc const* newDesc, KFS_ValueDesc* oldDesc)
+{
+    if (int const code = KFSp_CheckStream(KFSp_Op_SetValueDesc, stream, KFSp_Row_SetValueDesc)) {
+        return code;
+    }
+    if (oldDesc) {
+        *oldDesc = *stream->GetValueDesc();
+    }
+    if (!newDesc) {
+        return 0;
+    }
+    if (stream->IsCustom() && !newDesc->isCustom) {
+        stream->MarkTemporarilyNonCustom(true);
+    } else if (newDesc->isCustom) {
+        stream->MarkTemporarilyNonCustom(false);
+        return SetCustomDescription(stream, *newDesc);
+    }
+    stream->GetValueDescForModify()->isCustom = 0;
+    return SetPlainDescription(stream, *newDesc);
+}

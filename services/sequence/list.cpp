@@ -1,0 +1,194 @@
+#include "services/sequence/list_private.h"
+
+#include "frame/services/memory.h"
+
+#include <algorithm>
+#include <climits>
+#include <cstring>
+#include <memory>
+
+namespace {
+
+constexpr char const* ListLabel = "sorted item list";
+constexpr char const* ItemsLabel = "sorted item list items";
+constexpr int FirstCapacity = 4;
+
+struct DisposeList {
+    void operator()(SEQ_Head** list) const { SEQ_Dispose(list, 0); }
+};
+using ListOwner = std::unique_ptr<SEQ_Head*, DisposeList>;
+
+template <class Func>
+void Replace(Func& present, Func wanted) noexcept
+{
+    if (wanted == static_cast<Func>(SEQ_RemoveFunc))
+        present = nullptr;
+    else if (wanted)
+        present = wanted;
+}
+
+int CopyAllItems(SEQ_Head const* const* source, SEQ_Head& copy)
+{
+    SEQ_Head const& from = **source;
+    if (from.count == 0) return 0;
+    if (const int code = SEQp_SetCapacity(copy, from.count)) return code;
+    if (!from.copy) {
+        std::memcpy(copy.items, from.items, SEQp_Bytes(from, from.count));
+        copy.count = from.count;
+        return 0;
+    }
+    std::memset(copy.items, 0, SEQp_Bytes(from, from.count));
+    for (int i = 0; i < from.count; ++i) {
+        if (const int code = from.copy(from.refcon, source, SEQp_Item(from, i), SEQp_Item(copy, i))) return code;
+        copy.count = i + 1;  // what is made so far is what a failure has to dispose
+    }
+    return 0;
+}
+
+}  // namespace
+
+int SEQp_SetCapacity(SEQ_Head& head, int capacity) noexcept
+{
+    unsigned char* items = nullptr;
+    if (capacity > 0) {
+        const std::size_t bytes = SEQp_Bytes(head, capacity);
+        items = static_cast<unsigned char*>(Q_AllocatePtr(SEQp_AllocationId, ItemsLabel, bytes));
+        if (!items) return Q_Err_OutOfMemory;
+        if (head.count > 0) std::memcpy(items, head.items, SEQp_Bytes(head, head.count));
+    }
+    Q_FreePtr(head.items);
+    head.items = items;
+    head.capacity = capacity;
+    return 0;
+}
+
+int SEQp_Grow(SEQ_Head& head, int count) noexcept
+{
+    if (count <= head.capacity) return 0;
+    const long long roomy = static_cast<long long>(head.capacity) + head.capacity / 2;
+    const long long capacity = std::max({static_cast<long long>(count), roomy, static_cast<long long>(FirstCapacity)});
+    return SEQp_SetCapacity(head, static_cast<int>(std::min<long long>(capacity, INT_MAX)));
+}
+
+int SEQ_New(int, short itemSize, int, int, SEQ_Head*** list)
+{
+    if (itemSize <= 0 || !list) return SEQ_Err_BadArgument;
+    void* const block = Q_AllocatePtrClear(SEQp_AllocationId, ListLabel, sizeof(SEQp_List));
+    if (!block) return Q_Err_OutOfMemory;
+    SEQp_List* const made = new (block) SEQp_List{};
+    made->head = &made->body;
+    made->body.itemSize = itemSize;
+    made->body.stride = (itemSize + 7) & ~7;
+    *list = &made->head;
+    return 0;
+}
+
+int SEQ_Dispose(SEQ_Head** list, long)
+{
+    if (!SEQp_IsList(list)) return SEQ_Err_BadList;
+    SEQ_Head& head = **list;
+    int first = 0;
+    if (head.dispose)
+        for (int i = 0; i < head.count; ++i)
+            if (const int code = SEQp_DisposeItem(list, SEQp_Item(head, i)); first == 0) first = code;
+    Q_FreePtr(head.items);
+    Q_FreePtr(list);  // the handle is the address of the block's first word
+    return first;
+}
+
+int SEQ_Duplicate(SEQ_Head const* const* list, long, SEQ_Head*** out)
+{
+    if (!SEQp_IsList(list)) return SEQ_Err_BadList;
+    if (!out) return SEQ_Err_BadArgument;
+    SEQ_Head const& source = **list;
+    SEQ_Head** made = nullptr;
+    if (const int code = SEQ_New(0, static_cast<short>(source.itemSize), 4, 1, &made)) return code;
+    ListOwner owner(made);
+    SEQ_Head& copy = **made;
+    copy.refcon = source.refcon;
+    copy.copy = source.copy;
+    copy.dispose = source.dispose;
+    copy.sort = source.sort;
+    if (const int code = CopyAllItems(list, copy)) return code;
+    *out = owner.release();
+    return 0;
+}
+
+int SEQ_SetFuncs(SEQ_Head** list, int count, SEQ_Funcs const* funcs)
+{
+    if (!SEQp_IsList(list)) return SEQ_Err_BadList;
+    if (count != 3 || !funcs) return SEQ_Err_BadArgument;
+    Replace((*list)->copy, funcs->copy);
+    Replace((*list)->dispose, funcs->dispose);
+    Replace((*list)->sort, funcs->sort);
+    return 0;
+}
+
+int SEQ_SetRefcon(void* refcon, SEQ_Head** list)
+{
+    if (!SEQp_IsList(list)) return SEQ_Err_BadList;
+    (*list)->refcon = refcon;
+    return 0;
+}
+
+int SEQ_LockConst(int, SEQ_Head const* const* list)
+{
+    if (!SEQp_IsList(list)) return SEQ_Err_BadList;
+    ++(*list)->pins;
+    return 0;
+}
+
+int SEQ_UnlockConst(SEQ_Head const* const* list)
+{
+    if (!SEQp_IsList(list)) return SEQ_Err_BadList;
+    if ((*list)->pins == 0) return SEQ_Err_NotPinned;
+    --(*list)->pins;
+    return 0;
+}
+
+int SEQ_Lock(int reserved, SEQ_Head** list)
+{
+    return SEQ_LockConst(reserved, list);
+}
+
+int SEQ_Unlock(SEQ_Head** list)
+{
+    return SEQ_UnlockConst(list);
+}
+
+int SEQ_GetPinCount(SEQ_Head const* const* list)
+{
+    return SEQp_IsList(list) ? (*list)->pins : 0;
+}
+
+int SEQ_ReserveSpace(int count, SEQ_Head** list)
+{
+    if (!SEQp_IsList(list)) return SEQ_Err_BadList;
+    if (count < 0) return SEQ_Err_BadArgument;
+    // Exactly: who reserves knows the final count.
+    return count > (*list)->capacity ? SEQp_SetCapacity(**list, count) : 0;
+}
+
+int SEQ_Compact(SEQ_Head** list)
+{
+    if (!SEQp_IsList(list)) return SEQ_Err_BadList;
+    SEQ_Head& head = **list;
+    if (head.pins > 0 || head.capacity == head.count) return 0;
+    return SEQp_SetCapacity(head, head.count);
+}
+
+int SEQ_SetNumItems(int count, SEQ_Head** list, long)
+{
+    if (!SEQp_IsList(list)) return SEQ_Err_BadList;
+    if (count < 0) return SEQ_Err_BadArgument;
+    SEQ_Head& head = **list;
+    while (head.count > count) {
+        if (const int code = SEQp_DisposeItem(list, SEQp_Item(head, head.count - 1))) return code;
+        --head.count;
+    }
+    if (head.count == count) return 0;
+    if (const int code = SEQp_Grow(head, count)) return code;
+    std::memset(SEQp_Item(head, head.count), 0, SEQp_Bytes(head, count - head.count));
+    head.count = count;
+    return 0;
+}

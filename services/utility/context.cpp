@@ -1,0 +1,161 @@
+#include "frame/services/context.h"
+
+#include "frame/services/reports.h"
+
+#include <boost/make_shared.hpp>
+
+#include <algorithm>
+#include <atomic>
+#include <mutex>
+#include <string>
+#include <unordered_set>
+#include <utility>
+
+namespace {
+
+// One thread's current object: the owner, and beside it the bare pointer, which can be read without the check whether
+// the thread has constructed its owner yet.
+template <class T>
+struct Current {
+    static inline thread_local T* bare = nullptr;
+    static inline thread_local boost::shared_ptr<T> owner;
+
+    static boost::shared_ptr<T> Set(boost::shared_ptr<T> next) noexcept
+    {
+        bare = next.get();
+        owner.swap(next);
+        return next;
+    }
+
+    static boost::shared_ptr<T> Get(bool tolerateNone, char const* complaint)
+    {
+        if (bare) return owner;
+        if (!tolerateNone) Q_ReportFailedVerification(0, 0, 0, complaint);
+        return {};
+    }
+};
+
+constexpr char const* NoContext = "there is no current context";
+constexpr char const* NoRenderContext = "there is no current render context";
+
+std::uint64_t NextStamp() noexcept
+{
+    static std::atomic<std::uint64_t> last{0};
+    return last.fetch_add(1, std::memory_order_relaxed) + 1;
+}
+
+}  // namespace
+
+namespace hearth::utility {
+
+char const* const ImmutableString::Empty = "";
+
+ImmutableString ImmutableString::Create(char const* text)
+{
+    if (!text || *text == 0) return {};
+    // Never destroyed: names made at load are used until the very end.
+    static std::mutex* const mutex = new std::mutex;
+    static std::unordered_set<std::string>* const pool = new std::unordered_set<std::string>;
+    const std::lock_guard<std::mutex> lock(*mutex);
+    return ImmutableString(pool->emplace(text).first->c_str());
+}
+
+}  // namespace hearth::utility
+
+Q_Context::~Q_Context() = default;
+
+bool Q_Context::HasCurrent() noexcept
+{
+    return Current<Q_Context>::bare != nullptr;
+}
+
+boost::shared_ptr<Q_Context> Q_Context::GetCurrent(bool tolerateNone)
+{
+    return Current<Q_Context>::Get(tolerateNone, NoContext);
+}
+
+boost::shared_ptr<Q_Context const> Q_Context::GetCurrentConst(bool tolerateNone)
+{
+    return GetCurrent(tolerateNone);
+}
+
+Q_Context* Q_Context::PeekCurrent() noexcept
+{
+    return Current<Q_Context>::bare;
+}
+
+Q_RenderState::~Q_RenderState() = default;
+
+boost::shared_ptr<Q_RenderContext> Q_RenderContext::MakeNewContext(bool tempClone)
+{
+    return boost::make_shared<Q_RenderContext>(tempClone);
+}
+
+Q_RenderContext::Q_RenderContext(bool tempClone) : statesStamp_(NextStamp()), tempClone_(tempClone) {}
+
+Q_RenderContext::~Q_RenderContext() = default;
+
+boost::shared_ptr<Q_RenderContext> Q_RenderContext::GetCurrent(bool tolerateNone)
+{
+    return Current<Q_RenderContext>::Get(tolerateNone, NoRenderContext);
+}
+
+Q_RenderContext* Q_RenderContext::PeekCurrent() noexcept
+{
+    return Current<Q_RenderContext>::bare;
+}
+
+boost::shared_ptr<Q_RenderState> Q_RenderContext::GetState(hearth::utility::ImmutableString const& name) const
+{
+    for (NamedState const& named : states_)
+        if (named.name == name) return named.state;
+    return {};
+}
+
+Q_RenderState* Q_RenderContext::PeekState(hearth::utility::ImmutableString const& name) const noexcept
+{
+    for (NamedState const& named : states_)
+        if (named.name == name) return named.state.get();
+    return nullptr;
+}
+
+void Q_RenderContext::SetState(boost::shared_ptr<Q_RenderState> const& state)
+{
+    if (!state) return;
+    NamedState next{state->GetStateName(), state};
+    const auto place =
+        std::find_if(states_.begin(), states_.end(), [&](NamedState const& named) { return named.name == next.name; });
+    if (place == states_.end())
+        states_.push_back(std::move(next));
+    else
+        place->state.swap(next.state);  // the earlier state goes at the end of this scope, when all is in order
+    statesStamp_ = NextStamp();
+}
+
+void Q_RenderContext::RemoveState(hearth::utility::ImmutableString const& name)
+{
+    const auto place =
+        std::find_if(states_.begin(), states_.end(), [&](NamedState const& named) { return named.name == name; });
+    if (place == states_.end()) return;
+    const NamedState removed = std::move(*place);
+    states_.erase(place);
+    statesStamp_ = NextStamp();
+}
+
+Q_ScSetCurrentContext::Q_ScSetCurrentContext(boost::shared_ptr<Q_Context> context) noexcept
+    : previous_(Current<Q_Context>::Set(std::move(context)))
+{}
+
+Q_ScSetCurrentContext::~Q_ScSetCurrentContext()
+{
+    Current<Q_Context>::Set(std::move(previous_));
+}
+
+Q_ScSetCurrentRenderContext::Q_ScSetCurrentRenderContext(boost::shared_ptr<Q_RenderContext> context) noexcept
+    : previous_(Current<Q_RenderContext>::Set(std::move(context)))
+{}
+
+Q_ScSetCurrentRenderContext::~Q_ScSetCurrentRenderContext()
+{
+    Current<Q_RenderContext>::Set(std::move(previous_));
+}

@@ -1,0 +1,50 @@
+#include "frame/services/context.h"
+#include "frame/services/strings.h"
+
+namespace {
+
+std::atomic<Q_TranslateFunc> translateFunc{nullptr};
+
+// A translation as a text that is valid for ever, or null.
+char const* Translation(std::string_view key)
+{
+    const Q_TranslateFunc translate = translateFunc.load(std::memory_order_acquire);
+    char const* const text = translate ? translate(key) : nullptr;
+    return text ? hearth::utility::ImmutableString::Create(text).c_str() : nullptr;
+}
+
+// What "key=text" says: the translation for the key, else the text. Without a "=" all of it is text.
+char const* TextOfEntry(char const* entry)
+{
+    const std::string_view whole(entry);
+    const std::size_t equals = whole.find('=');
+    if (equals == std::string_view::npos) return entry;
+    char const* const translation = Translation(whole.substr(0, equals));
+    return translation ? translation : entry + equals + 1;
+}
+
+}  // namespace
+
+void Q_SetTranslateFunc(Q_TranslateFunc translate) noexcept
+{
+    translateFunc.store(translate, std::memory_order_release);
+}
+
+char const* Q_ZLookupLStrCache(Q_ZTable const* const* table, int row, int, int)
+{
+    Q_ZTable const& messages = **table;
+    if (row < 0 || row >= messages.rowCount || !messages.rows[row].entry) return "";
+    Q_ZRow const& message = messages.rows[row];
+    char const* text = message.cache.load(std::memory_order_acquire);
+    if (!text) {
+        text = TextOfEntry(message.entry);
+        message.cache.store(text, std::memory_order_release);
+    }
+    return text;
+}
+
+u16str Q_ZStringToUTF16String(char const* text)
+{
+    const bool hasKey = text && std::string_view(text).starts_with("$$$");
+    return Q_MBToUTF16String(hasKey ? TextOfEntry(text) : text);
+}

@@ -1,0 +1,270 @@
+#include "curves/interpolate_private.h"
+
+#include "tests/curves/keyedstream.h"
+
+#include <array>
+#include <cmath>
+#include <cstring>
+#include <limits>
+
+namespace {
+
+using InterpolateTest = StreamTest;
+
+constexpr double Untouched = -4321.0;
+
+void PresetCache(KFS_Stream const* stream)
+{
+    std::fill_n(KFSp_Numbers(stream->GetCache()), stream->GetDimension(), Untouched);
+}
+
+std::vector<double> Cached(KFS_Stream const* stream)
+{
+    double const* const numbers = KFSp_Numbers(stream->GetCache());
+    return {numbers, numbers + stream->GetDimension()};
+}
+
+using Interpolator = int (*)(KFS_Stream const*, long, int, int);
+
+std::vector<double> Evaluate(Interpolator interpolator, KFS_Stream const* stream, int time, int hint)
+{
+    PresetCache(stream);
+    EXPECT_EQ(0, interpolator(stream, 0, time, hint)) << "at " << time << " with hint " << hint;
+    return Cached(stream);
+}
+
+// The true curve of a segment: handles as speed and influence, a linear side's on the chord at 0.16666666667.
+struct Truth {
+    long double x[4];
+    long double y[4];
+
+    Truth(KFS_KeyScalar const* a, KFS_KeyScalar const* b, int dimension, int i, unsigned int scale)
+    {
+        auto const from = KFSp_GetTemporalRuns(a, dimension);
+        auto const to = KFSp_GetTemporalRuns(b, dimension);
+        long double const dt = (static_cast<long double>(b->time) - a->time) / scale;
+        long double const rise = static_cast<long double>(to.value[i]) - from.value[i];
+        bool const outLinear = a->outInterp == KFS_Interp_Linear;
+        bool const inLinear = b->inInterp == KFS_Interp_Linear;
+        long double const out = outLinear ? 0.16666666667L : from.outInfluence[i];
+        long double const in = inLinear ? 0.16666666667L : to.inInfluence[i];
+        long double const outSlope = outLinear ? rise / dt : from.outSpeed[i];
+        long double const inSlope = inLinear ? rise / dt : to.inSpeed[i];
+        x[0] = 0.0L;
+        x[1] = out * dt;
+        x[2] = dt - in * dt;
+        x[3] = dt;
+        y[0] = from.value[i];
+        y[1] = y[0] + out * dt * outSlope;
+        y[3] = to.value[i];
+        y[2] = y[3] - in * dt * inSlope;
+    }
+    long double ValueAt(long double seconds) const { return CubicAt(y, SolveCubic(x, seconds)); }
+    long double SlopeAt(long double seconds) const
+    {
+        long double const t = SolveCubic(x, seconds);
+        return CubicSlopeAt(y, t) / CubicSlopeAt(x, t);
+    }
+};
+
+// Random keys with random handles, of every pair of codes that has a curve.
+KeyedStream MakeRandom(std::mt19937& random, short dimension, unsigned int scale)
+{
+    std::uniform_real_distribution<double> value(-100.0, 100.0);
+    std::uniform_real_distribution<double> influence(0.02, 0.98);
+    std::uniform_int_distribution<int> step(20, 3000);
+    std::uniform_int_distribution<int> code(KFS_Interp_Linear, KFS_Interp_Spline);
+    StreamOptions options;
+    options.dimension = dimension;
+    options.timeScale = scale;
+    KeyedStream stream(options);
+    int time = -5000;
+    for (int k = 0; k < 12; ++k) {
+        std::vector<double> values;
+        for (int i = 0; i < dimension; ++i) values.push_back(value(random));
+        stream.Key(time += step(random), values, KFS_Interp_Spline);
+    }
+    stream.Settle();
+    for (int k = 0; k < stream.Count(); ++k) {
+        stream.Codes(k, code(random), code(random));
+        for (int i = 0; i < dimension; ++i) {
+            stream.SetHandle(k, {value(random), influence(random), value(random), influence(random)}, i);
+        }
+    }
+    return stream;
+}
+
+TEST_F(InterpolateTest, ValuesAndSpeedsAreThoseOfTheTrueCurve)
+{
+    std::mt19937 random(20240607);
+    for (short const dimension : {1, 2, 3, 4}) {
+        for (unsigned int const scale : {25U, 600U, 254016000U}) {
+            KeyedStream const stream = MakeRandom(random, dimension, scale);
+            for (int k = 0; k + 1 < stream.Count(); ++k) {
+                KFS_KeyScalar const* const a = stream.Record(k);
+                KFS_KeyScalar const* const b = stream.Record(k + 1);
+                bool const straight = a->outInterp == KFS_Interp_Linear && b->inInterp == KFS_Interp_Linear;
+                for (int part = 1; part < 8; ++part) {
+                    int const time = a->time + (b->time - a->time) * part / 8;
+                    SCOPED_TRACE(testing::Message() << "dimension " << dimension << ", segment " << k << ", part " << part);
+                    std::vector<double> const values = Evaluate(KFSp_Interpolate, stream, time, k);
+                    std::vector<double> const speeds = Evaluate(KFSp_InterpDeriv, stream, time, k);
+                    for (int i = 0; i < dimension; ++i) {
+                        Truth const truth(a, b, dimension, i, scale);
+                        long double const seconds = (static_cast<long double>(time) - a->time) / scale;
+                        auto const index = static_cast<std::size_t>(i);
+                        if (straight) {
+                            double const f = static_cast<double>(time - a->time) / static_cast<double>(b->time - a->time);
+                            double const va = KFSp_Numbers(a)[i];
+                            EXPECT_EQ(va + (KFSp_Numbers(b)[i] - va) * f, values[index]);
+                            EXPECT_EQ(Untouched, speeds[index]) << "a straight segment's speed isn't computed here";
+                            continue;
+                        }
+                        double const size = 1.0 + std::fabs(static_cast<double>(truth.y[1])) + std::fabs(static_cast<double>(truth.y[2]));
+                        double const slope = static_cast<double>(truth.SlopeAt(seconds));
+                        // The solver may be off by 1e-13 of the segment in x, which counts as much in y as the curve is steep.
+                        double const steepness = 1.0 + std::fabs(slope * static_cast<double>(truth.x[3]));
+                        EXPECT_NEAR(static_cast<double>(truth.ValueAt(seconds)), values[index], 1e-11 * (size + steepness));
+                        EXPECT_NEAR(slope, speeds[index], 1e-7 * (1.0 + std::fabs(slope)) * steepness);
+                    }
+                }
+            }
+        }
+    }
+}
+
+// The hint saves a search and must not show in any bit, on any kind of stream.
+TEST_F(InterpolateTest, AWrongHintChangesNothing)
+{
+    std::mt19937 random(7);
+    for (bool const spatialFlags : {false, true}) {
+        KeyedStream stream = MakeRandom(random, 3, 600);
+        std::uniform_int_distribution<int> any(stream.Record(0)->time + 1, stream.Record(11)->time - 1);
+        for (int n = 0; n < 300; ++n) {
+            int const time = any(random);
+            if (spatialFlags) stream.Flag(n % 12, KFS_KeyFlag_Float);
+            for (Interpolator const interpolator : {&KFSp_Interpolate, &KFSp_InterpDeriv}) {
+                std::vector<double> const expected = Evaluate(interpolator, stream, time, KFS_INVALID_INDEX);
+                for (int hint = -2; hint < 14; ++hint) EXPECT_EQ(expected, Evaluate(interpolator, stream, time, hint)) << time << " " << hint;
+                EXPECT_EQ(expected, Evaluate(interpolator, stream, time, std::numeric_limits<int>::max()));
+            }
+        }
+    }
+}
+
+// A time that stands on a key isn't bracketed by the hint: the answer is that of the search, from the key before to the key after.
+TEST_F(InterpolateTest, TheHintBracketsStrictly)
+{
+    KeyedStream const stream = MakeKeyed({{0, 0.0}, {100, 7.0}, {400, 40.0}}, KFS_Interp_Linear);
+    for (int const hint : {-1, 0, 1}) EXPECT_EQ(std::vector<double>{10.0}, Evaluate(KFSp_Interpolate, stream, 100, hint)) << hint;
+}
+
+TEST_F(InterpolateTest, OtherPairsOfCodesWriteNothing)
+{
+    KeyedStream stream = MakeKeyed({{0, 1.0}, {600, 2.0}}, KFS_Interp_Spline);
+    for (int out = -1; out <= 4; ++out) {
+        for (int in = -1; in <= 4; ++in) {
+            bool const shaped = (out == KFS_Interp_Linear || out == KFS_Interp_Spline) && (in == KFS_Interp_Linear || in == KFS_Interp_Spline);
+            bool const straight = out == KFS_Interp_Linear && in == KFS_Interp_Linear;
+            stream.Codes(0, KFS_Interp_Linear, out).Codes(1, in, KFS_Interp_Linear);
+            EXPECT_EQ(shaped, Evaluate(KFSp_Interpolate, stream, 300, 0)[0] != Untouched) << out << " to " << in;
+            EXPECT_EQ(shaped && !straight, Evaluate(KFSp_InterpDeriv, stream, 300, 0)[0] != Untouched) << out << " to " << in;
+        }
+    }
+}
+
+TEST_F(InterpolateTest, ALinearSideIgnoresItsStoredHandle)
+{
+    KeyedStream stream = MakeKeyed({{0, 0.0}, {600, 6.0}}, KFS_Interp_Spline);
+    stream.Codes(0, KFS_Interp_Linear, KFS_Interp_Linear);
+    stream.SetHandle(0, {1, 1, 500, 0.9}).SetHandle(1, {2, 0.3, 0, 0});
+    std::vector<double> const value = Evaluate(KFSp_Interpolate, stream, 250, 0);
+    stream.SetHandle(0, {8, 0, -70, 0.1});
+    EXPECT_EQ(value, Evaluate(KFSp_Interpolate, stream, 250, 0));
+}
+
+TEST_F(InterpolateTest, EachComponentHasItsOwnEase)
+{
+    StreamOptions options;
+    options.dimension = 2;
+    KeyedStream stream(options);
+    stream.Key(0, {0.0, 0.0}, KFS_Interp_Spline).Key(600, {1.0, 1.0}, KFS_Interp_Spline);
+    stream.Settle();
+    stream.SetHandle(0, {0, 0, 0, 0.9}, 0).SetHandle(1, {0, 0.1, 0, 0}, 0);     // starts slowly
+    stream.SetHandle(0, {0, 0, 0, 0.1}, 1).SetHandle(1, {0, 0.9, 0, 0}, 1);     // ends slowly
+    std::vector<double> const middle = Evaluate(KFSp_Interpolate, stream, 300, 0);
+    EXPECT_LT(middle[0], 0.3);
+    EXPECT_GT(middle[1], 0.7);
+    EXPECT_NEAR(1.0, middle[0] + middle[1], 1e-12);     // each is the other, turned round
+}
+
+TEST_F(InterpolateTest, NonDecreasingStreamsNeverFall)
+{
+    std::mt19937 random(99);
+    std::uniform_real_distribution<double> speed(-50.0, 50.0);
+    std::uniform_real_distribution<double> influence(0.0, 1.0);
+    int overshooting = 0;
+    for (int n = 0; n < 60; ++n) {
+        KeyedStream stream = MakeKeyed({{0, 0.0}, {600, 3.0}}, KFS_Interp_Spline);
+        stream.SetHandle(0, {0, 0, speed(random), influence(random)}).SetHandle(1, {speed(random), influence(random), 0, 0});
+        double previous = 0.0;
+        for (int time = 5; time < 600; time += 5) {
+            stream.StreamFlag(KFS_StreamFlag_NonDecreasing, false);
+            double const raw = Evaluate(KFSp_Interpolate, stream, time, 0)[0];
+            overshooting += raw < 0.0 || raw > 3.0;
+            stream.StreamFlag(KFS_StreamFlag_NonDecreasing);
+            double const value = Evaluate(KFSp_Interpolate, stream, time, 0)[0];
+            EXPECT_GE(value, previous - 1e-12);
+            EXPECT_LE(value, 3.0);
+            EXPECT_GE(Evaluate(KFSp_InterpDeriv, stream, time, 0)[0], -1e-6) << "the speed is the treated curve's";
+            previous = value;
+        }
+    }
+    EXPECT_GT(overshooting, 100);   // there was something to treat
+}
+
+// Straight segments of such a stream may fall: no curve is involved.
+TEST_F(InterpolateTest, NonDecreasingLeavesStraightSegmentsAlone)
+{
+    KeyedStream stream = MakeKeyed({{0, 8.0}, {400, 0.0}}, KFS_Interp_Linear);
+    stream.StreamFlag(KFS_StreamFlag_NonDecreasing);
+    EXPECT_EQ(std::vector<double>{6.0}, Evaluate(KFSp_Interpolate, stream, 100, 0));
+}
+
+TEST_F(InterpolateTest, TheFirstFailingComponentEndsIt)
+{
+    StreamOptions options;
+    options.dimension = 3;
+    KeyedStream stream(options);
+    stream.Key(0, {0, 0, 0}, KFS_Interp_Spline).Key(600, {2, 2, 2}, KFS_Interp_Spline);
+    stream.Settle();
+    for (int i = 0; i < 3; ++i) stream.SetHandle(0, {0, 0, 2, 1.0 / 3.0}, i).SetHandle(1, {2, 1.0 / 3.0, 0, 0}, i);
+    stream.SetHandle(1, {std::numeric_limits<double>::infinity(), 0.2, 0, 0}, 1);
+    for (Interpolator const interpolator : {&KFSp_Interpolate, &KFSp_InterpDeriv}) {
+        PresetCache(stream);
+        EXPECT_EQ(CRV_Err_NotFinite, interpolator(stream, 0, 300, 0));
+        EXPECT_NE(Untouched, Cached(stream)[0]);
+        EXPECT_EQ((std::vector<double>{Untouched, Untouched}), (std::vector<double>{Cached(stream)[1], Cached(stream)[2]}));
+    }
+}
+
+TEST_F(InterpolateTest, AnEmptyStreamIsReported)
+{
+    TestStream const stream;
+    for (Interpolator const interpolator : {&KFSp_Interpolate, &KFSp_InterpDeriv}) {
+        EXPECT_EQ(KFS_Err_NoKeys, interpolator(stream, 0, 10, 0));
+        EXPECT_REPORT(reports, 85, NoKeysText("inquire about a key value in"));
+    }
+}
+
+TEST_F(InterpolateTest, WithoutComponentsThereIsNothingToDo)
+{
+    StreamOptions options;
+    options.dimension = 0;
+    KeyedStream stream(options);
+    stream.Key(0, {}, KFS_Interp_Spline).Key(600, {}, KFS_Interp_Spline);
+    EXPECT_EQ(0, KFSp_Interpolate(stream, 0, 300, 0));
+    EXPECT_EQ(0, KFSp_InterpDeriv(stream, 0, 300, 0));
+}
+
+} // namespace

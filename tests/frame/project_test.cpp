@@ -1,0 +1,123 @@
+#include "frame/project.h"
+
+#include "host/session.h"
+#include "keystore/cachestate.h"
+#include "overrides/parambag.h"
+#include "tests/support/streams.h"
+#include "tree/streamgroup.h"
+
+namespace {
+
+class ForeignContext : public Q_Context {};
+
+class Projects : public StreamTest {};
+
+TEST_F(Projects, TheCurrentProjectIsTheThreadsContexts)
+{
+    EXPECT_EQ(&session.GetProject(), KFS_GetCurrentProject());
+    EXPECT_EQ(&session.GetProject(), KFS_GetCurrentConstProject());
+    {
+        const Q_ScSetCurrentContext foreign(boost::shared_ptr<Q_Context>(new ForeignContext));
+        EXPECT_EQ(nullptr, KFS_GetCurrentProject()) << "a context that belongs to no project";
+    }
+    {
+        const Q_ScSetCurrentContext none{boost::shared_ptr<Q_Context>()};
+        EXPECT_EQ(nullptr, KFS_GetCurrentProject());
+    }
+    kfshost::Project other;
+    EXPECT_EQ(&other, KFS_GetProject(&other, false));
+    EXPECT_EQ(&session.GetProject(), KFS_GetProject(static_cast<KFS_Project*>(nullptr), false));
+    EXPECT_EQ(&session.GetProject(), KFS_GetProject(static_cast<KFS_StreamBase*>(nullptr), false));
+    EXPECT_EQ(&session.GetProject(), KFS_GetConstProject(TestStream().get(), true)) << "a stream without a parent";
+}
+
+TEST_F(Projects, TheCurrentRenderContextIsUsedOnlyWhenAsked)
+{
+    kfshost::Project other;
+    Q_RenderContext* const own = other.GetRenderContext(false);
+    EXPECT_NE(own, Q_RenderContext::PeekCurrent());
+    EXPECT_EQ(Q_RenderContext::PeekCurrent(), other.GetRenderContext(true));
+    const Q_ScSetCurrentRenderContext none{boost::shared_ptr<Q_RenderContext>()};
+    EXPECT_EQ(own, other.GetRenderContext(true));
+}
+
+TEST_F(Projects, InitializingAgainReplacesBothContexts)
+{
+    kfshost::Project project;
+    const boost::shared_ptr<KFS_Context> context = project.GetContext();
+    project.InitializeContexts();
+    EXPECT_NE(context, project.GetContext());
+    EXPECT_EQ(&project, project.GetContext()->GetProject());
+    EXPECT_EQ(nullptr, project.GetRenderContext(false)->PeekState(KFS_ExpState::S_StateName)) << "states are the host's affair";
+}
+
+TEST_F(Projects, StatesAreFoundByTheirNames)
+{
+    Q_RenderContext const* const context = Q_RenderContext::PeekCurrent();
+    for (char const* const name : {"ExpState", "RenderState", "KFS_CapsuleOverrides", "KFS_StreamCacheState"}) {
+        EXPECT_NE(nullptr, context->PeekState(hearth::utility::ImmutableString::Create(name))) << name;
+    }
+}
+
+TEST_F(Projects, DetectingErrorsNestsAndTheOutermostClearsTheCount)
+{
+    kfshost::ExpState state;
+    state.errorCount = 3;
+    {
+        const KFS_DetectExpressionErrors outer(&state);
+        {
+            const KFS_DetectExpressionErrors inner(&state);
+            state.errorCount = 5;
+        }
+        EXPECT_TRUE(state.detectingErrors);
+        EXPECT_EQ(5, state.errorCount);
+    }
+    EXPECT_FALSE(state.detectingErrors);
+    EXPECT_EQ(0, state.errorCount);
+}
+
+TEST_F(Projects, SuspensionsNestWhateverTheOrderOfTheirLastReferences)
+{
+    KFS_RenderState state;
+    {
+        const KFS_RenderState::Suspension outer = state.SuspendAutoDecanonicalize();
+        {
+            const KFS_RenderState::Suspension inner = state.SuspendAutoDecanonicalize();
+            const KFS_RenderState::Suspension second = inner;
+            EXPECT_TRUE(state.GetAutoDecanonicalizeIsSuspended());
+        }
+        EXPECT_TRUE(state.GetAutoDecanonicalizeIsSuspended());
+    }
+    EXPECT_FALSE(state.GetAutoDecanonicalizeIsSuspended());
+}
+
+// A bag that holds entries without streams, to see contents come and go.
+class FilledBag : public KFS_ParamBag {
+public:
+    explicit FilledBag(std::initializer_list<unsigned short> names)
+    {
+        for (const unsigned short name : names) {
+            overrides_[u16str(1, name)] = nullptr;
+        }
+    }
+};
+
+TEST_F(Projects, CapsuleBagsAreReplacedAndMergedForAScope)
+{
+    KFS_CapsuleOverrides overrides(nullptr);
+    EXPECT_EQ(0u, overrides.GetCapsuleParamBag()->GetOverrideCount());
+    {
+        Q_ScSetReset<KFS_ParamBag> first;
+        overrides.SetScopedCapsuleParamBag(first, FilledBag{'a', 'b'});
+        EXPECT_EQ(2u, overrides.GetCapsuleParamBag()->GetOverrideCount());
+        {
+            Q_ScSetReset<KFS_ParamBag> second;
+            overrides.MergeInScopedCapsuleParamBag(second, FilledBag{'b', 'c'});
+            EXPECT_EQ(3u, overrides.GetCapsuleParamBag()->GetOverrideCount());
+        }
+        EXPECT_EQ(2u, overrides.GetCapsuleParamBag()->GetOverrideCount());
+    }
+    EXPECT_EQ(0u, overrides.GetCapsuleParamBag()->GetOverrideCount());
+}
+
+} // namespace

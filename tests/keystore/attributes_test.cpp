@@ -1,0 +1,297 @@
+#include "keystore/attributes.h"
+
+#include "keystore/attributes_private.h"
+#include "tests/support/listening.h"
+#include "tests/support/streams.h"
+
+#include <functional>
+#include <stdexcept>
+
+namespace {
+
+class Attributes : public StreamTest {};
+
+constexpr StreamOptions Spatial2D{.dimension = 2, .spatial = true};
+
+void FillCurvedPath(TestStream& stream)
+{
+    stream.Key(0, {0.0, 0.0}, KFS_Interp_Linear).Key(100, {10.0, 40.0}, KFS_Interp_Linear).Key(200, {50.0, 0.0}, KFS_Interp_Linear);
+}
+
+std::vector<double> Samples(TestStream const& stream)
+{
+    std::vector<double> samples;
+    for (int time = 0; time <= 200; time += 10) {
+        for (const double number : stream.At(time)) {
+            samples.push_back(number);
+        }
+    }
+    return samples;
+}
+
+TEST_F(Attributes, ADamagedStreamIsRefusedByEverySetterAndGetter)
+{
+    const DamagedStream damaged;
+    KFS_Stream* stream = damaged.get();
+    const TestStream good;
+    KFS_Stream* goodStream = good.get();
+    double number = 77.0;
+    struct Row {
+        int operation;
+        char const* action;
+        std::function<int()> call;
+    };
+    const Row rows[] = {
+        {8, "merge", [&] { return KFS_MergeStream(stream, nullptr, &goodStream); }},
+        {8, "merge", [&] { return KFS_MergeStream(goodStream, nullptr, &stream); }},
+        {16, "set imask", [&] { return KFS_SetStreamIMask(stream, 1); }},
+        {47, "set spatial imask", [&] { return KFS_SetStreamSpIMask(stream, 1); }},
+        {49, "set spatial interp", [&] { return KFS_SetStreamSpInterp(stream, 1); }},
+        {50, "set spatial interp", [&] { return KFS_SetStreamSParametrize(stream, 1); }},
+        {39, "set custom functions in", [&] { return KFS_SetCustomFuncs(stream, nullptr, nullptr); }},
+        {117, "set value description", [&] { return KFS_GetStreamAccuracy(stream, &number); }},
+        {88, "set value description", [&] { return KFS_SetStreamAccuracy(stream, &number, &number); }},
+        {118, "set value description", [&] { return KFS_GetStreamMultiplier(stream, &number); }},
+        {102, "set value description", [&] { return KFS_SetStreamMultiplier(stream, &number, &number); }},
+        {10, "alter time-varyingness of", [&] { return stream->SetConstant(1, 1); }},
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(row.operation);
+        EXPECT_EQ(2, row.call());
+        EXPECT_EQ(reports.Take(), std::vector<Reported>{DamagedReport(row.operation, row.action)});
+    }
+    EXPECT_TRUE(damaged.Untouched());
+    EXPECT_EQ(77.0, number);
+}
+
+TEST_F(Attributes, MergingLeavesBothStreamsAlone)
+{
+    TestStream a;
+    TestStream b;
+    a.Key(0, {1.0});
+    b.Key(5, {2.0}).Key(9, {3.0});
+    const auto bytes = a.Bytes();
+    const T_Time at{3, 600};
+    KFS_Stream* other = b.get();
+    EXPECT_EQ(0, KFS_MergeStream(a, &at, &other));
+    EXPECT_EQ(b.get(), other);
+    EXPECT_EQ(bytes, a.Bytes());
+    EXPECT_EQ(2, b.Count());
+}
+
+TEST_F(Attributes, ASpatialSettingIsPermittedByTheTemporalMask)
+{
+    for (unsigned mask = 0; mask < 16; ++mask) {
+        const TestStream stream({.dimension = 2, .spatial = true, .interpMask = static_cast<unsigned short>(mask), .spInterpMask = 0});
+        for (unsigned code = 0; code < 20; ++code) {
+            SCOPED_TRACE(testing::Message() << "mask " << mask << " code " << code);
+            ASSERT_EQ(0, KFS_SetStreamSpIMask(stream, code % 2 ? 0 : 0xFFFF)) << "which has no say";
+            const auto setting = static_cast<unsigned short>(code);
+            const bool permitted = code == 0 || ((mask << 1 >> code) & 1) != 0;
+            const unsigned short before = stream->GetSpInterp();
+            EXPECT_EQ(permitted ? 0 : 7431, KFS_SetStreamSpInterp(stream, setting));
+            EXPECT_EQ(permitted ? setting : before, stream->GetSpInterp());
+            if (!permitted) {
+                EXPECT_REPORT(reports, 15,
+                              "spatial interpolation method not allowed for this stream (" + std::to_string(code) + ").");
+            }
+        }
+        EXPECT_EQ(7431, KFSp_CanDoSpInterp(stream, 0xFFFF));
+        reports.Take();
+    }
+}
+
+TEST_F(Attributes, AccuracyIsKeptSquared)
+{
+    const TestStream stream;
+    double accuracy = 0.0;
+    EXPECT_EQ(0, KFS_GetStreamAccuracy(stream, &accuracy));
+    EXPECT_DOUBLE_EQ(0.01, accuracy);
+    const double half = -0.5;
+    EXPECT_EQ(0, KFS_SetStreamAccuracy(stream, &half, &accuracy));
+    EXPECT_DOUBLE_EQ(0.01, accuracy);
+    EXPECT_EQ(0.25, stream->GetAccuracy());
+    EXPECT_EQ(0, KFS_SetStreamAccuracy(stream, nullptr, &accuracy));
+    EXPECT_EQ(0.5, accuracy);
+    EXPECT_EQ(0, KFS_SetStreamAccuracy(stream, nullptr, nullptr));
+    EXPECT_EQ(0.25, stream->GetAccuracy());
+}
+
+TEST_F(Attributes, DimensionsShareTheFourComponentsOfTheMultiplier)
+{
+    const TestStream six({.dimension = 6, .spatial = true});
+    const double first[6] = {2.0, 3.0, 4.0, 5.0, 6.0, 7.0};
+    double old[7] = {77.0, 77.0, 77.0, 77.0, 77.0, 77.0, 77.0};
+    ASSERT_EQ(0, KFS_SetStreamMultiplier(six, first, old));
+    EXPECT_EQ((std::vector{1.0, 1.0, 1.0, 1.0, 2.0, 3.0, 77.0}), std::vector(old, old + 7)) << "old and new go component by component";
+    double now[6];
+    ASSERT_EQ(0, KFS_GetStreamMultiplier(six, now));
+    EXPECT_EQ((std::vector{6.0, 7.0, 4.0, 5.0, 6.0, 7.0}), std::vector(now, now + 6));
+
+    const TestStream two(Spatial2D);
+    ASSERT_EQ(0, KFS_SetStreamMultiplier(two, first, nullptr));
+    EXPECT_EQ((M_Vector4T<double>{{2.0, 3.0, 1.0, 1.0}}), two->GetMultiplier());
+    ASSERT_EQ(0, KFS_SetStreamMultiplier(two, nullptr, now));
+    EXPECT_EQ(3.0, now[1]);
+}
+
+TEST_F(Attributes, OnlyASpatialStreamHasAMultiplierAndArcs)
+{
+    TestStream plain({.dimension = 2});
+    plain.Key(0, {1.0, 2.0});
+    double number = 77.0;
+    EXPECT_EQ(7434, KFS_GetStreamMultiplier(plain, &number));
+    EXPECT_REPORT(reports, 102, "attempt to set multiplier of a non-spatial stream.");
+    EXPECT_EQ(7434, KFS_SetStreamMultiplier(plain, &number, &number));
+    EXPECT_REPORT(reports, 102, "attempt to set multiplier of a non-spatial stream.");
+    EXPECT_EQ(77.0, number);
+    EXPECT_EQ(7434, KFS_SetStreamSParametrize(plain, 1));
+    EXPECT_REPORT(reports, 50, "stream isn#{rsquo}t spatial");
+    EXPECT_FALSE(plain->IsSParametrized());
+}
+
+// What a change must not leave behind: the value that was computed before it.
+TEST_F(Attributes, AReadAfterAChangeIsThatOfAStreamThatAlwaysWasSo)
+{
+    const double multiplier[2] = {1.0, 20.0};
+    struct Row {
+        char const* why;
+        std::function<int(KFS_Stream*)> change;
+    };
+    const Row rows[] = {
+        {"multiplier", [&](KFS_Stream* stream) { return KFS_SetStreamMultiplier(stream, multiplier, nullptr); }},
+        {"arc length off", [](KFS_Stream* stream) { return KFS_SetStreamSParametrize(stream, 0); }},
+        {"another scale", [](KFS_Stream* stream) {
+             const int code = KFS_RescaleStream(stream, 1200);
+             return code ? code : KFS_RescaleStream(stream, 600);
+         }},
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(row.why);
+        TestStream changed(Spatial2D);
+        FillCurvedPath(changed);
+        TestStream fresh(Spatial2D);
+        ASSERT_EQ(0, row.change(fresh));
+        FillCurvedPath(fresh);
+        const std::vector<double> truth = Samples(fresh);
+        static_cast<void>(Samples(changed));
+        for (int time = 5; time <= 195; time += 95) {       // reads that leave a computed value behind
+            const std::vector<double> before = changed.At(time);
+            ASSERT_EQ(0, row.change(changed));
+            EXPECT_EQ(fresh.At(time), changed.At(time)) << time;
+        }
+        EXPECT_EQ(truth, Samples(changed));
+    }
+}
+
+TEST_F(Attributes, AChangedParametrizationMarksAllKeysAndAlwaysNotifies)
+{
+    TestStream stream(Spatial2D);
+    FillCurvedPath(stream);
+    HeardRoot root;
+    root.Store(stream);
+    ValueListener listener;
+    ASSERT_EQ(0, stream->UpdateStream());
+    EXPECT_EQ(0, KFS_SetStreamSParametrize(stream, 1));
+    EXPECT_EQ(TestStream::NotStale, stream.Stale());
+    EXPECT_EQ(1, listener.Take()) << "no change, but heard";
+    EXPECT_EQ(0, KFS_SetStreamSParametrize(stream, 0));
+    EXPECT_FALSE(stream->IsSParametrized());
+    EXPECT_EQ((std::array{0, 2}), stream.Stale());
+    EXPECT_EQ((std::array{0, 2}), stream.ArcStale());
+    EXPECT_EQ(1, listener.Take());
+    ASSERT_EQ(0, stream->UpdateStream());
+    const double multiplier[2] = {2.0, 2.0};
+    EXPECT_EQ(0, KFS_SetStreamMultiplier(stream, nullptr, nullptr));
+    EXPECT_EQ(TestStream::NotStale, stream.ArcStale());
+    EXPECT_EQ(0, listener.Take()) << "nothing was set";
+    EXPECT_EQ(0, KFS_SetStreamMultiplier(stream, multiplier, nullptr));
+    EXPECT_EQ((std::array{0, 2}), stream.Stale());
+    EXPECT_EQ((std::array{0, 2}), stream.ArcStale());
+    EXPECT_EQ(1, listener.Take());
+    EXPECT_EQ(0, KFS_SetStreamIMask(stream, 1));
+    EXPECT_EQ(0, KFS_SetStreamSpIMask(stream, 1));
+    EXPECT_EQ(0, KFS_SetStreamSpInterp(stream, 1));
+    EXPECT_EQ(0, KFS_SetStreamAccuracy(stream, multiplier, nullptr));
+    EXPECT_EQ(0, listener.Take()) << "masks, settings and accuracy are silent";
+}
+
+// A mark reaches back by a short.
+TEST_F(Attributes, ALongStreamIsMarkedFromEndToEnd)
+{
+    TestStream stream(Spatial2D);
+    for (int i = 0; i < 70000; ++i) {
+        stream.Key(i, {1.0 * i, 0.0}, KFS_Interp_Linear);
+    }
+    stream->SetKFSFlags(stream->GetKFSFlags() & ~KFS_StreamFlag_SParametrize);  // chords: quick to repair
+    ASSERT_EQ(0, stream->UpdateStream());
+    EXPECT_EQ(0, KFS_SetStreamSParametrize(stream, 1));
+    EXPECT_EQ((std::array{0, 69999}), stream.Stale());
+    EXPECT_EQ((std::array{0, 69999}), stream.ArcStale());
+}
+
+TEST_F(Attributes, AListenersExceptionBecomesTheResult)
+{
+    TestStream stream(Spatial2D);
+    FillCurvedPath(stream);
+    HeardRoot root;
+    root.Store(stream);
+    const double multiplier[2] = {2.0, 3.0};
+    {
+        ValueListener listener([] { throw 815; });
+        EXPECT_EQ(815, KFS_SetStreamSParametrize(stream, 0));
+        EXPECT_EQ(815, KFS_SetStreamMultiplier(stream, multiplier, nullptr));
+        EXPECT_EQ(815, stream->SetConstant(1, 0));
+    }
+    EXPECT_FALSE(stream->IsSParametrized());
+    EXPECT_EQ(3.0, stream->GetMultiplier()[1]);
+    EXPECT_TRUE(stream->HasNoKeys());
+    EXPECT_NO_REPORT(reports);
+    ValueListener listener([] { throw std::runtime_error("a listener"); });
+    EXPECT_EQ(Q_Err_Exception, KFS_SetStreamSParametrize(stream, 1));
+    ASSERT_EQ(1u, reports.Take().size());
+}
+
+int copies;
+
+int CountingCopy(KFS_Stream const* stream, long, short, void const* source, void* destination)
+{
+    ++copies;
+    std::memmove(destination, source, stream->GetValueDesc()->itemSize);
+    return 0;
+}
+
+int disposals;
+
+int CountingDispose(KFS_Stream const*, long, short, void*)
+{
+    ++disposals;
+    return 0;
+}
+
+TEST_F(Attributes, TheKeyListFollowsTheClientsFunctions)
+{
+    KFS_ValueDesc desc{1, 8, 42, [](KFS_Stream const*, long, int, int) { return 0; }};
+    KFS_Stream stream(1, 600, 0, 0, KFS_InterpMask_Hold, 0, desc, nullptr, nullptr, false);
+    const long value = 5;
+    for (int time = 0; time < 3; ++time) {
+        const T_Time at{time, 600};
+        ASSERT_EQ(0, KFS_InsertKey(&stream, &at, 0, &value, KFS_Interp_Hold, KFS_Interp_Hold));
+    }
+    ASSERT_EQ(0, KFS_SetCustomFuncs(&stream, CountingCopy, CountingDispose));
+    alignas(16) unsigned char record[128];
+    copies = disposals = 0;
+    ASSERT_EQ(0, SEQ_GetItemCopy(stream.GetKeys(), 0, 1, record));
+    EXPECT_EQ(1, copies);
+    ASSERT_EQ(0, SEQ_Remove(1, stream.GetKeys(), 0, nullptr));
+    stream.SetKeys(stream.GetKeys());
+    EXPECT_EQ(1, disposals);
+    ASSERT_EQ(0, KFS_SetCustomFuncs(&stream, nullptr, nullptr));
+    ASSERT_EQ(0, SEQ_GetItemCopy(stream.GetKeys(), 0, 1, record));
+    ASSERT_EQ(0, SEQ_Remove(1, stream.GetKeys(), 0, nullptr));
+    stream.SetKeys(stream.GetKeys());
+    EXPECT_EQ(1, copies);
+    EXPECT_EQ(1, disposals);
+}
+
+} // namespace

@@ -1,0 +1,122 @@
+#include "keystore/stream.h"
+
+#include "tests/support/listening.h"
+#include "tests/support/streams.h"
+
+namespace {
+
+class Constants : public StreamTest {};
+
+TEST_F(Constants, AValueBecomesTheFirstKeyIfItIsKept)
+{
+    for (const bool spatial : {false, true}) {
+        SCOPED_TRACE(spatial);
+        const StreamOptions options{.dimension = 2, .noKeys = true, .spatial = spatial};
+        TestStream kept(options);
+        kept.Key(70, {4.0, 5.0}, KFS_Interp_Linear);
+        EXPECT_EQ(0, kept->SetConstant(0, 1));
+        EXPECT_TRUE(kept->HasKeys());
+        ASSERT_EQ((std::vector{70}), kept.Times());
+        EXPECT_EQ(4.0, kept.Numbers(0)[0]);
+        EXPECT_EQ(5.0, kept.Numbers(0)[1]);
+        EXPECT_TRUE(kept.CacheIsEmpty());
+        EXPECT_EQ((std::vector{4.0, 5.0}), kept.At(0));
+
+        TestStream dropped(options);
+        dropped.Key(70, {4.0, 5.0});
+        EXPECT_EQ(0, dropped->SetConstant(0, 0));
+        EXPECT_EQ(0, dropped.Count());
+        EXPECT_TRUE(dropped.CacheIsEmpty());
+
+        const TestStream empty(options);
+        EXPECT_EQ(0, empty->SetConstant(0, 1));
+        EXPECT_TRUE(empty->HasKeys());
+        EXPECT_EQ(0, empty.Count());
+    }
+}
+
+TEST_F(Constants, KeysGoAndTheLastReadValueStays)
+{
+    for (const bool spatial : {false, true}) {
+        SCOPED_TRACE(spatial);
+        TestStream stream({.dimension = 2, .spatial = spatial});
+        stream.Key(0, {0.0, 0.0}).Key(100, {10.0, 20.0}).Key(200, {0.0, 40.0});
+        const std::vector<double> read = stream.At(50);
+        const Q_MemoryCount before = Q_MemoryLive(nullptr);
+        EXPECT_EQ(0, stream->SetConstant(1, 0));
+        EXPECT_LT(Q_MemoryLive(nullptr).blocks, before.blocks);
+        EXPECT_EQ(nullptr, stream->GetKeys());
+        EXPECT_EQ(TestStream::NotStale, stream.Stale());
+        EXPECT_EQ(TestStream::NotStale, stream.ArcStale());
+        for (const int time : {-5, 50, 999}) {
+            EXPECT_EQ(read, stream.At(time));
+        }
+        // And back again: the value is a key like any other, as if it had been set.
+        EXPECT_EQ(0, stream->SetConstant(0, 1));
+        EXPECT_EQ(1, stream.Count());
+        stream.Key(stream.Times()[0] + 100, {0.0, 0.0});
+        EXPECT_EQ(read, stream.At(stream.Times()[0]));
+    }
+}
+
+TEST_F(Constants, WithoutAReadThereIsNoValueLeft)
+{
+    TestStream stream;
+    stream.Key(0, {1.0});
+    EXPECT_EQ(0, stream->SetConstant(1, 1));
+    double value = 77.0;
+    EXPECT_EQ(7427, KFS_GetValueFPlus(stream, nullptr, 0, &value, nullptr, nullptr));
+    EXPECT_EQ(1u, reports.Take().size());
+}
+
+TEST_F(Constants, OnlyAChangeIsHeard)
+{
+    TestStream stream;
+    stream.Key(0, {1.0});
+    HeardRoot root;
+    root.Store(stream);
+    ValueListener listener;
+    EXPECT_EQ(0, stream->SetConstant(1, 0));
+    EXPECT_EQ(1, listener.Take());
+    EXPECT_EQ(0, stream->SetConstant(1, 0));
+    EXPECT_EQ(0, stream->SetConstant(7, 1));
+    EXPECT_EQ(0, listener.Take());
+    EXPECT_EQ(0, stream->SetConstant(0, 0));
+    EXPECT_EQ(1, listener.Take());
+}
+
+TEST_F(Constants, AFailureIsTheResultAndIsHeardAllTheSame)
+{
+    KFS_ValueDesc desc{1, 8, 42, [](KFS_Stream const*, long, int, int) { return 0; }};
+    KFS_Stream stream(1, 600, 0, 0, KFS_InterpMask_Hold, 0, desc, nullptr, nullptr, false);
+    const long value = 5;
+    ASSERT_EQ(0, KFS_InsertKey(&stream, nullptr, 0, &value, KFS_Interp_Hold, KFS_Interp_Hold));
+    stream.SetDisposeItemFunc([](KFS_Stream const*, long, short, void*) { return 4711; });
+    ASSERT_EQ(0, SEQ_SetFuncs(stream.GetKeys(), 3, std::array{SEQ_Funcs{nullptr, [](void*, SEQ_Head**, void*) { return 4711; }, nullptr}}.data()));
+    HeardRoot root;
+    root.Store(&stream);
+    ValueListener listener;
+    EXPECT_EQ(4711, stream.SetConstant(1, 0));
+    EXPECT_EQ(1, listener.Take());
+    EXPECT_EQ(nullptr, stream.GetKeys()) << "a list whose disposal failed is gone all the same";
+    EXPECT_TRUE(stream.HasKeys());
+    stream.SetDisposeItemFunc(nullptr);
+}
+
+TEST_F(Constants, WhatShouldNotBeAnimatedIsReportedAndAnimated)
+{
+    TestStream still({.noKeys = true, .interpMask = 0});
+    EXPECT_EQ(0, still->SetConstant(0, 0));
+    EXPECT_EQ(reports.Take(), (std::vector<Reported>{{0x1d000a, 8, "attempt to animate a non-animatable stream", 0}}));
+    EXPECT_TRUE(still->HasKeys());
+
+    TestStream canonical({.noKeys = true});
+    canonical->SetCanonical(true);
+    EXPECT_EQ(0, canonical->SetConstant(0, 0));
+    EXPECT_EQ(reports.Take(), (std::vector<Reported>{{0x1d000a, 8, "attempt to animate the canonical instance stream", 0}}));
+    EXPECT_TRUE(canonical->HasKeys());
+    EXPECT_EQ(0, canonical->SetConstant(1, 0));
+    EXPECT_NO_REPORT(reports);
+}
+
+} // namespace

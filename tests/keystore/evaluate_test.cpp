@@ -1,0 +1,401 @@
+#include "keystore/evaluate.h"
+
+#include "keystore/attributes.h"
+#include "keystore/lookup.h"
+#include "overrides/parambag.h"
+#include "tests/support/streams.h"
+#include "tree/streamgroup.h"
+
+#include <stdexcept>
+
+namespace {
+
+u16str Text(char const* text)
+{
+    return Q_MBToUTF16String(text);
+}
+
+// An engine whose expression is a lambda.
+class Engine : public KFS_ExpState {
+public:
+    std::function<int(KFS_Stream const*, int, double*)> expression;
+    KFS_Stream const* target = nullptr;
+    bool canRun = true;
+    int asked = 0;
+
+    void EvalExprValue(KFS_Stream const* stream, int time, int, void* value, KFS_ParamBag const*) override
+    {
+        double number = 0.0;
+        Run(stream, time, &number);
+        const short whole = static_cast<short>(number);
+        std::memcpy(value, &whole, sizeof whole);
+    }
+    void EvalExprValueF(KFS_Stream const* stream, int time, int, double* value, KFS_ParamBag const*) override
+    {
+        Run(stream, time, value);
+    }
+    void EvalNoExprValue(KFS_Stream const* stream, int time, int, void* value, unsigned char* atKey, KFS_ParamBag const*,
+                         KFS_InterpFunc* interpFunc, long refcon) override
+    {
+        KFS_GetValueNoExpr(stream, time, 0, value, atKey, nullptr, interpFunc, refcon);
+    }
+    void EvalNoExprValueF(KFS_Stream const* stream, int time, int, double* value, unsigned char* atKey, KFS_ParamBag const*) override
+    {
+        KFS_GetValueFNoExpr(stream, time, 0, value, atKey, nullptr);
+    }
+    void ResolveExprTarget(KFS_Stream const** stream, int*, KFS_ParamBag const*, KFS_ParamBag*) override
+    {
+        ++asked;
+        if (target) {
+            *stream = target;
+        }
+    }
+    boost::shared_ptr<KFS_ExprContext> GetExprContext(KFS_Stream const*) override
+    {
+        struct Context : KFS_ExprContext {
+            explicit Context(bool can) : can_(can) {}
+            bool CanEvaluate() const override { return can_; }
+            bool can_;
+        };
+        return boost::shared_ptr<KFS_ExprContext>(new Context(canRun));
+    }
+
+private:
+    void Run(KFS_Stream const* stream, int time, double* value)
+    {
+        if (const int code = expression(stream, time, value)) {
+            throw int{code};
+        }
+    }
+};
+
+class Evaluate : public StreamTest {
+protected:
+    Evaluate() : engine(new Engine)
+    {
+        context = Q_RenderContext::MakeNewContext(false);
+        context->SetState(engine);
+        engine->expression = [](KFS_Stream const*, int time, double* value) { return *value = 1000.0 + time, 0; };
+    }
+    boost::shared_ptr<Engine> engine;
+    boost::shared_ptr<Q_RenderContext> context;
+};
+
+TEST_F(Evaluate, TheStagesGoInTheirOrder)
+{
+    const Q_ScSetCurrentRenderContext current(context);
+    TestStream stream;
+    stream.Key(0, {1.0}).Key(100, {2.0});
+    KFS_ExprInfo& info = stream->GetExprInfoForModify();
+    struct Row {
+        char const* why;
+        std::function<void()> arrange;
+        int flags;
+        int code;
+        double value;
+        int atKey;  // 9: untouched
+    };
+    const Row rows[] = {
+        {"no expression", [] {}, 0, 0, 2.0, 1},
+        {"an expression answers, and no key stands there", [&] { info.SetExpression(Text("x")); }, 0, 0, 1100.0, 0},
+        {"the flag goes straight to the keys", [] {}, 1, 0, 2.0, 1},
+        {"the host's flags don't", [] {}, 0xF0, 0, 1100.0, 0},
+        {"switched off", [&] { info.SetFlags(KFS_ExprFlag_Disabled); }, 0, 0, 2.0, 1},
+        {"the engine can't run now", [&] { info.SetFlags(0), engine->canRun = false; }, 0, 0, 2.0, 1},
+        {"no value here: the keys answer",
+         [&] {
+             engine->canRun = true;
+             engine->expression = [](KFS_Stream const*, int, double*) { return KFS_Err_ExprNoValue; };
+         },
+         0, 0, 2.0, 1},
+        {"any other error is the result", [&] { engine->expression = [](KFS_Stream const*, int, double*) { return 99; }; }, 0, 99, -1.0, 9},
+    };
+    const T_Time at{100, 600};
+    for (const Row& row : rows) {
+        SCOPED_TRACE(row.why);
+        row.arrange();
+        double value = -1.0;
+        unsigned char atKey = 9;
+        EXPECT_EQ(row.code, KFS_GetValueFPlus(stream, &at, row.flags, &value, &atKey, nullptr));
+        EXPECT_EQ(row.value, value);
+        EXPECT_EQ(row.atKey, atKey);
+    }
+    engine->expression = [](KFS_Stream const*, int, double*) -> int { throw std::runtime_error("bad token"); };
+    double value = 0.0;
+    EXPECT_NE(0, KFS_GetValueFPlus(stream, &at, 0, &value, nullptr, nullptr));
+    EXPECT_EQ("bad token", reports.Take().at(0).text);
+    const int asked = engine->asked;
+    EXPECT_EQ(0, KFS_GetValueFPlus(stream, &at, 0, nullptr, nullptr, nullptr)) << "nobody wants a value";
+    EXPECT_EQ(asked, engine->asked);
+}
+
+TEST_F(Evaluate, AnotherStreamsExpressionIsConvertedThroughDoubles)
+{
+    const Q_ScSetCurrentRenderContext current(context);
+    TestStream stream({.type = KFS_Type_Fixed});
+    const TestStream source({.type = KFS_Type_S16});
+    stream.Key(0, {0.0});
+    stream->GetExprInfoForModify().SetExpression(Text("other"));
+    engine->target = source;
+    engine->expression = [](KFS_Stream const*, int, double* value) { return *value = 3.0, 0; };
+    int fixed = 0;
+    const T_Time at{0, 600};
+    ASSERT_EQ(0, KFS_GetValuePlus(stream, &at, 0, &fixed, nullptr, nullptr, nullptr, 0));
+    EXPECT_EQ(3 * 65536, fixed);
+}
+
+TEST_F(Evaluate, ExternalFormConvertsAndDoubleFormDoesNot)
+{
+    TestStream stream({.dimension = 2, .type = KFS_Type_U8});
+    stream.Key(0, {0.0, 10.0}).Key(100, {3.0, 300.0});
+    const T_Time at{50, 600};
+    unsigned char bytes[2] = {};
+    ASSERT_EQ(0, KFS_GetValue(stream, &at, 1, bytes, nullptr, nullptr)) << "the third argument has no say";
+    EXPECT_EQ(2, bytes[0]) << "halves round away from zero";
+    EXPECT_EQ(155, bytes[1]);
+    EXPECT_EQ((std::vector{1.5, 155.0}), stream.At(50));
+}
+
+TEST_F(Evaluate, TimesComeInAnyScale)
+{
+    TestStream stream({.timeScale = 600});
+    stream.Key(0, {0.0}).Key(600, {6.0});
+    double value = 0.0;
+    for (const T_Time at : {T_Time{1, 2}, T_Time{300, 600}, T_Time{15, 30}}) {
+        ASSERT_EQ(0, KFS_GetValueFPlus(stream, &at, 0, &value, nullptr, nullptr));
+        EXPECT_DOUBLE_EQ(3.0, value);
+    }
+    ASSERT_EQ(0, KFS_GetValueFPlus(stream, nullptr, 0, &value, nullptr, nullptr));
+    EXPECT_EQ(0.0, value) << "no time is the origin";
+    const T_Time beyond{2000000000, 1};
+    EXPECT_EQ(T_Err_Overflow, KFS_GetValueFPlus(stream, &beyond, 0, &value, nullptr, nullptr));
+    const T_Time noScale{1, 0};
+    EXPECT_NE(0, KFS_GetValuePlus(stream, &noScale, 0, &value, nullptr, nullptr, nullptr, 0));
+}
+
+TEST_F(Evaluate, WhatHasNoValueSaysSo)
+{
+    const TestStream keyed;
+    const TestStream constant({.noKeys = true});
+    const T_Time at{0, 600};
+    double value = -1.0;
+    for (KFS_Stream* const stream : {keyed.get(), constant.get()}) {
+        EXPECT_EQ(7427, KFS_GetValueFPlus(stream, &at, 0, &value, nullptr, nullptr));
+        EXPECT_REPORT(reports, 36, "attempt to get a value from a time stream with no key values.");
+        EXPECT_EQ(7427, KFS_GetValuePlus(stream, &at, 0, &value, nullptr, nullptr, nullptr, 0));
+        EXPECT_REPORT(reports, 36, "attempt to get a value from a time stream with no key values.");
+    }
+    EXPECT_EQ(-1.0, value);
+}
+
+TEST_F(Evaluate, DoublesAreRefusedForCustomValues)
+{
+    KFS_ValueDesc desc;
+    desc.isCustom = 1;
+    desc.itemSize = 8;
+    desc.interpFunc = [](KFS_Stream const*, long, int, int) { return 0; };
+    KFS_Stream stream(1, 600, 0, 0, 7, 0, desc, nullptr, nullptr, false);
+    const T_Time at{0, 600};
+    double value = -1.0;
+    char** handle = nullptr;
+    EXPECT_EQ(7441, KFS_GetValueF(&stream, &at, 0, &value, nullptr, nullptr));
+    EXPECT_REPORT(reports, 115, "can#{rsquo}t compute floating point value(s) for a custom value");
+    EXPECT_EQ(7441, KFS_GetValuesFPlus(&stream, &at, &at, 1, 0, &handle));
+    EXPECT_REPORT(reports, 78, "can#{rsquo}t compute floating point value(s) for a custom value");
+    EXPECT_EQ(7441, KFSp_Boundary([&] { KFS_GetValueFNoExpr(&stream, 0, 0, &value, nullptr, nullptr); }));
+    EXPECT_REPORT(reports, 78, "can#{rsquo}t compute floating point value(s) for a custom value");
+    EXPECT_EQ(-1.0, value);
+}
+
+TEST_F(Evaluate, DamagedStreamsAreRefusedUntouched)
+{
+    const DamagedStream damaged;
+    const T_Time at{0, 600};
+    double value = -1.0;
+    unsigned char atKey = 9;
+    char** handle = nullptr;
+    KFS_Stream* const stream = damaged.get();
+    struct Row {
+        int operation;
+        char const* action;
+        std::function<int()> call;
+    };
+    const Row rows[] = {
+        {113, "get a value from", [&] { return KFS_GetValue(stream, &at, 0, &value, &atKey, nullptr); }},
+        {113, "get a value from", [&] { return KFS_GetValuePlus(stream, &at, 0, &value, &atKey, nullptr, nullptr, 0); }},
+        {113, "get a value from", [&] { return KFS_GetValueF(stream, &at, 0, &value, &atKey, nullptr); }},
+        {113, "get a value from", [&] { return KFS_GetValueFPlus(stream, &at, 0, &value, &atKey, nullptr); }},
+        {36, "get a value from",
+         [&] { return KFSp_Boundary([&] { KFS_GetValueNoExpr(stream, 0, 0, &value, &atKey, nullptr, nullptr, 0); }); }},
+        {36, "get a value from", [&] { return KFSp_Boundary([&] { KFS_GetValueFNoExpr(stream, 0, 0, &value, &atKey, nullptr); }); }},
+        {115, "get a value from", [&] { return KFS_GetValuesFPlus(stream, &at, &at, 1, 0, &handle); }},
+        {105, "dispose", [&] { return KFS_DisposeValue(stream, &value); }},
+        {9, "set value description", [&] { return KFS_SetValueDescription(stream, nullptr, nullptr); }},
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(row.operation);
+        EXPECT_EQ(2, row.call());
+        EXPECT_EQ(std::vector{DamagedReport(row.operation, row.action)}, reports.Take());
+    }
+    EXPECT_TRUE(damaged.Untouched());
+    EXPECT_EQ(-1.0, value);
+    EXPECT_EQ(9, atKey);
+}
+
+TEST_F(Evaluate, WithoutAStateThatSaysHowThereIsACodeAndNoCrash)
+{
+    TestStream stream;
+    stream.Key(0, {1.0});
+    const T_Time at{0, 600};
+    double value = -1.0;
+    const Q_ScSetCurrentRenderContext bare(Q_RenderContext::MakeNewContext(false));
+    EXPECT_EQ(3, KFS_GetValueFPlus(stream, &at, 0, &value, nullptr, nullptr));
+    EXPECT_EQ(3, reports.Take().at(0).code);
+}
+
+TEST_F(Evaluate, AnOverridesValueTakesThePlaceOfTheKeys)
+{
+    TestStream stream;
+    stream.Key(0, {1.0}).Key(100, {2.0});
+    const double overriding = 42.0;
+    double value = 0.0;
+    unsigned char atKey = 0;
+    KFS_GetValueFNoExpr(stream, 100, 0, &value, &atKey, &overriding);
+    EXPECT_EQ(42.0, value);
+    EXPECT_EQ(1, atKey);
+    EXPECT_EQ(2.0, stream.At1(100));
+}
+
+TEST_F(Evaluate, SamplesComeInOneHandle)
+{
+    TestStream stream({.dimension = 2});
+    stream.Key(0, {0.0, 10.0}).Key(60, {6.0, 16.0});
+    const T_Time start{0, 600}, step{1, 30};
+    char** handle = nullptr;
+    ASSERT_EQ(0, KFS_GetValuesFPlus(stream, &start, &step, 3, 0, &handle));
+    ASSERT_EQ(3 * 2 * sizeof(double), Q_GetHandleSize(handle));
+    auto const* const values = reinterpret_cast<double const*>(*handle);
+    EXPECT_EQ((std::vector{0.0, 10.0, 2.0, 12.0, 4.0, 14.0}), std::vector(values, values + 6));
+    Q_FreeHandle(handle);
+    ASSERT_EQ(0, KFS_GetValuesFPlus(stream, &start, &step, 0, 0, &handle));
+    EXPECT_EQ(0u, Q_GetHandleSize(handle));
+    Q_FreeHandle(handle);
+
+    handle = nullptr;
+    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    const T_Time hugeStep{1000000000, 600};
+    EXPECT_NE(0, KFS_GetValuesFPlus(stream, &start, &hugeStep, 4, 0, &handle)) << "the fourth time can't be held";
+    EXPECT_EQ(nullptr, handle);
+    EXPECT_EQ(before, Q_MemoryLive(nullptr));
+    EXPECT_EQ(3, KFS_GetValuesFPlus(stream, &start, &step, 1, 0, nullptr));
+    EXPECT_EQ((std::vector<Reported>{{0x1D0072, 8, "", 3}}), reports.Take());
+    Q_FailAllocation(1);
+    EXPECT_EQ(4, KFS_GetValuesFPlus(stream, &start, &step, 1, 0, &handle));
+    Q_FailAllocation(0);
+}
+
+// Leaves that stand for the dimensions of a separated leader.
+class Leader : public KFS_Stream {
+public:
+    using KFS_Stream::KFS_Stream;
+    KFS_Stream const* GetSeparationFollower(int dimension) const override
+    {
+        return dimension < static_cast<int>(followers.size()) ? followers[static_cast<std::size_t>(dimension)] : nullptr;
+    }
+    void GetSeparationFollowers(std::vector<KFS_Stream const*>& found) const override { found = followers; }
+    std::vector<KFS_Stream const*> followers;
+};
+
+class Root : public KFS_StreamGroup {
+public:
+    Root() : KFS_StreamGroup(nullptr, nullptr, false) {}
+    unsigned int GetNumStreams() const override { return 0; }
+    KFS_StreamBase const* GetStream(unsigned int) const override { return nullptr; }
+    KFS_StreamBase* GetEditableStreamNullOK(unsigned int) override { return nullptr; }
+    KFS_StreamBase* CloneStream(KFS_CloneStreamParams const&) const override { return nullptr; }
+    bool IsAnimated(bool) const override { return false; }
+    bool AffectsRendering(KFS_RenderOptionsBase const&) const override { return true; }
+    hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const&, GetRenderGuidFilter*) const override { return {}; }
+};
+
+TEST_F(Evaluate, SeparatedDimensionsAnswerFromTheirFollowers)
+{
+    KFS_ValueDesc desc;
+    desc.dataType = KFS_Type_Double;
+    Leader leader(3, 600, 0, 0, 7, 0, desc, nullptr, nullptr, false);
+    TestStream x, y;
+    x.Key(0, {10.0}).Key(100, {20.0});
+    y.Key(0, {5.0});
+    leader.followers = {x.get(), y.get()};
+    const double own[3] = {1.0, 2.0, 3.0};
+    const T_Time zero{0, 600}, at{50, 600};
+    ASSERT_EQ(0, KFS_InsertKeyF(&leader, &zero, 1, own, KFS_Interp_Linear, KFS_Interp_Linear));
+    leader.SetDimensionsSeparated(true);
+    double value[3] = {-1.0, -1.0, -1.0};
+    unsigned char atKey = 9;
+    ASSERT_EQ(0, KFS_GetValueFPlus(&leader, &at, 0, value, &atKey, nullptr));
+    EXPECT_EQ(1.0, value[0]) << "without a parent it reads its own keys";
+    Root root;
+    leader.SetParent(&root);
+    double separated[3] = {-1.0, -1.0, -1.0};
+    atKey = 9;
+    ASSERT_EQ(0, KFS_GetValueFPlus(&leader, &at, 0, separated, &atKey, nullptr));
+    EXPECT_EQ((std::vector{15.0, 5.0, -1.0}), std::vector(separated, separated + 3)) << "without a follower a place stays";
+    EXPECT_EQ(9, atKey);
+    char** handle = nullptr;
+    ASSERT_EQ(0, KFS_GetValuesFPlus(&leader, &at, &at, 2, 0, &handle));
+    auto const* const values = reinterpret_cast<double const*>(*handle);
+    EXPECT_EQ((std::vector{15.0, 5.0, 0.0, 20.0, 5.0, 0.0}), std::vector(values, values + 6));
+    Q_FreeHandle(handle);
+}
+
+TEST_F(Evaluate, ForcedValuesStandInTheCache)
+{
+    TestStream stream;
+    stream.Key(0, {0.0}).Key(100, {1.0});
+    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    stream->ValidateCacheAtTime({50, 600});
+    EXPECT_EQ(50, stream->GetCache()->time);
+    stream->ForceInterpolateAtTime({20, 600});
+    EXPECT_EQ(20, stream->GetCache()->time);
+    EXPECT_EQ(before, Q_MemoryLive(nullptr));
+    const TestStream empty;
+    EXPECT_THROW(empty->ForceInterpolateAtTime({0, 600}), int);
+    reports.Take();
+    EXPECT_EQ(before, Q_MemoryLive(nullptr));
+}
+
+TEST_F(Evaluate, AVectorGoesIntoAValueBuffer)
+{
+    const TestStream bytes({.dimension = 4, .type = KFS_Type_U8});
+    const M_Vector4T<double> vector{{1.0, 2.0, 3.4, 254.6}};
+    unsigned char value[4] = {};
+    KFS_PostCacheVector4Value(bytes, 0, vector, nullptr, value);
+    EXPECT_EQ((std::vector<unsigned char>{1, 2, 3, 255}), std::vector(value, value + 4));
+    void* pointer = nullptr;
+    KFS_PostCacheVector4Value(bytes, 0, vector, value, &pointer);
+    EXPECT_EQ(value, pointer);
+}
+
+TEST_F(Evaluate, ReadsAllocateNothing)
+{
+    TestStream plain({.dimension = 3});
+    TestStream spatial({.dimension = 3, .spatial = true});
+    for (int i = 0; i < 20; ++i) {
+        plain.Key(i * 10, {1.0 * i, 2.0, 3.0}, i % 2 ? KFS_Interp_Spline : KFS_Interp_Linear);
+        spatial.Key(i * 10, {1.0 * i, 2.0 * (i % 3), 3.0}, KFS_Interp_Spline);
+    }
+    plain.At(5);
+    spatial.At(5);
+    double value[3];
+    Q_FailAllocation(1);
+    for (int time = -5; time < 200; ++time) {
+        const T_Time at{time, 600};
+        ASSERT_EQ(0, KFS_GetValueFPlus(plain, &at, 0, value, nullptr, nullptr));
+        ASSERT_EQ(0, KFS_GetValuePlus(spatial, &at, 0, value, nullptr, nullptr, nullptr, 0));
+    }
+    EXPECT_FALSE(Q_FailAllocationFired());
+    Q_FailAllocation(0);
+}
+
+} // namespace

@@ -1,0 +1,559 @@
+#include "keystore/lookup.h"
+
+#include "frame/services/context.h"
+#include "frame/statics_private.h"
+#include "tests/support/streams.h"
+
+#include <algorithm>
+#include <functional>
+#include <random>
+#include <stdexcept>
+
+namespace {
+
+constexpr T_Time NoTime{KFS_INVALID_INDEX, 0};
+
+bool Same(T_Time const& a, T_Time const& b)
+{
+    return a.value == b.value && a.scale == b.scale;
+}
+
+class Lookup : public StreamTest {};
+
+std::unique_ptr<TestStream> WithKeys(std::vector<int> times, bool backwards = false)
+{
+    auto stream = std::make_unique<TestStream>();
+    if (backwards) {
+        std::reverse(times.begin(), times.end());
+    }
+    for (const int time : times) {
+        stream->Key(time, {static_cast<double>(time)});
+    }
+    return stream;
+}
+
+// Every look-up's answer at one time.
+struct Answers {
+    int nearest = 77;
+    T_Time nearestTime{77, 77};
+    int atOrBefore = 77;
+    unsigned char exactly = 77;
+    int at = 77;
+
+    static Answers Of(KFS_Stream const* stream, T_Time const& time)
+    {
+        Answers answers;
+        EXPECT_EQ(0, KFS_FindNearestKeyTime(stream, &time, &answers.nearest, &answers.nearestTime));
+        EXPECT_EQ(0, KFS_GetKeyIndex(stream, &time, &answers.atOrBefore, &answers.exactly));
+        EXPECT_EQ(0, KFS_TimeToIndex(stream, &time, &answers.at));
+        return answers;
+    }
+};
+
+struct Step {
+    int code = 77;
+    unsigned char found = 77;
+    int index = 77;
+    T_Time time{77, 77};
+
+    static Step Of(KFS_Stream const* stream, T_Time const& time, int direction)
+    {
+        Step step;
+        step.code = KFS_FindKeyTime(stream, &time, static_cast<short>(direction), &step.found, &step.index, &step.time);
+        return step;
+    }
+};
+
+constexpr int None = KFS_INVALID_INDEX;
+
+TEST_F(Lookup, AnswersAlikeHoweverItIsAsked)
+{
+    struct Ask {
+        char const* why;
+        std::vector<int> keys;
+        int at;
+        int nearest, nearestTime, atOrBefore, exactly;
+    };
+    const Ask asks[] = {
+        {"the only key, from afar", {20}, -9000, 0, 20, None, None},
+        {"before the first", {10, 20, 30}, 5, 0, 10, None, None},
+        {"exactly on a key", {10, 20, 30}, 20, 1, 20, 1, 1},
+        {"a tie goes to the past", {10, 20, 30}, 15, 0, 10, 0, None},
+        {"one unit after the tie", {10, 20, 30}, 16, 1, 20, 0, None},
+        {"in the last segment", {10, 20, 30}, 25, 1, 20, 1, None},
+        {"after the last", {10, 20, 30}, 99, 2, 30, 2, None},
+        {"negative times", {-30, -10}, -20, 0, -30, 0, None},
+        {"far apart", {-1000000000, 1000000000}, 1, 1, 1000000000, 0, None},
+    };
+    for (const Ask& ask : asks) {
+        for (const bool backwards : {false, true}) {    // the order of insertion must not show
+            for (const int finer : {1, 7}) {            // nor must the scale of the question
+                if (finer > 1 && std::abs(ask.keys.front()) > 1000000) {
+                    continue;
+                }
+                SCOPED_TRACE(testing::Message() << ask.why << ", backwards " << backwards << ", scale x" << finer);
+                const auto stream = WithKeys(ask.keys, backwards);
+                const T_Time at{ask.at * finer, 600u * static_cast<unsigned>(finer)};
+                const Answers answers = Answers::Of(stream->get(), at);
+                EXPECT_EQ(ask.nearest, answers.nearest);
+                EXPECT_TRUE(Same({ask.nearestTime, 600}, answers.nearestTime));
+                EXPECT_EQ(ask.atOrBefore, answers.atOrBefore);
+                EXPECT_EQ(ask.exactly != None, answers.exactly != 0);
+                EXPECT_EQ(ask.exactly, answers.at);
+                EXPECT_EQ(0, stream->Pins());
+            }
+        }
+    }
+}
+
+TEST_F(Lookup, StepsFromATimeToTheNextKey)
+{
+    struct Row {
+        int at;
+        int direction;
+        int index;      // None: nothing there
+    };
+    const Row rows[] = {
+        {20, 0, 2},       {20, KFS_Find_Backward, 0},     {20, KFS_Find_AtTime, 1},  {20, KFS_Find_AtTime | KFS_Find_Backward, 1},
+        {25, 0, 2},       {25, KFS_Find_Backward, 1},     {25, KFS_Find_AtTime, 2},  {25, KFS_Find_AtTime | KFS_Find_Backward, 1},
+        {30, 0, None},    {10, KFS_Find_Backward, None},  {30, KFS_Find_AtTime, 2},  {10, KFS_Find_AtTime | KFS_Find_Backward, 0},
+        {5, 0, 0},        {5, KFS_Find_Backward, None},   {31, 0, None},             {31, KFS_Find_Backward, 2},
+    };
+    const auto stream = WithKeys({10, 20, 30});
+    for (const Row& row : rows) {
+        SCOPED_TRACE(testing::Message() << "at " << row.at << " direction 0x" << std::hex << row.direction);
+        const Step step = Step::Of(stream->get(), stream->Time(row.at), row.direction);
+        EXPECT_EQ(0, step.code);
+        EXPECT_EQ(row.index != None, step.found != 0);
+        EXPECT_EQ(row.index, step.index);
+        EXPECT_TRUE(Same(row.index == None ? NoTime : T_Time{10 * (row.index + 1), 600}, step.time));
+    }
+}
+
+// The list as a sorted vector, and every answer worked out by looking at all of it.
+TEST_F(Lookup, AgreesWithAPlainWalkOverRandomKeys)
+{
+    std::mt19937 random(24);
+    for (int round = 0; round < 40; ++round) {
+        std::vector<int> times;
+        TestStream stream;
+        const int count = 1 + static_cast<int>(random() % 60);
+        const int span = round % 2 ? 100 : 2000000;
+        for (int i = 0; i < count; ++i) {
+            const int time = static_cast<int>(random() % static_cast<unsigned>(span)) - span / 2;
+            stream.Key(time, {0.0});
+            times.push_back(time);
+        }
+        std::sort(times.begin(), times.end());
+        times.erase(std::unique(times.begin(), times.end()), times.end());
+        for (int ask = 0; ask < 50; ++ask) {
+            const bool onKey = ask % 3 == 0;
+            const int at = onKey ? times[random() % times.size()] : static_cast<int>(random() % static_cast<unsigned>(span)) - span / 2;
+            SCOPED_TRACE(testing::Message() << "round " << round << " at " << at);
+            const auto next = std::lower_bound(times.begin(), times.end(), at);
+            const bool exactly = next != times.end() && *next == at;
+            const int position = static_cast<int>(next - times.begin());
+            const auto nearest = std::min_element(times.begin(), times.end(), [at](int a, int b) {
+                return std::abs(a - at) < std::abs(b - at);
+            });
+            const Answers answers = Answers::Of(stream, stream.Time(at));
+            EXPECT_EQ(nearest - times.begin(), answers.nearest);
+            EXPECT_EQ(*nearest, answers.nearestTime.value);
+            EXPECT_EQ(exactly ? position : None, answers.at);
+            EXPECT_EQ(exactly, answers.exactly != 0);
+            EXPECT_EQ(exactly ? position : position > 0 ? position - 1 : None, answers.atOrBefore);
+            const int size = static_cast<int>(times.size());
+            const int forward = exactly ? position + 1 : position;
+            EXPECT_EQ(forward < size ? forward : None, Step::Of(stream, stream.Time(at), 0).index);
+            EXPECT_EQ(position > 0 ? position - 1 : None, Step::Of(stream, stream.Time(at), KFS_Find_Backward).index);
+        }
+    }
+}
+
+TEST_F(Lookup, NullTimeIsTheOriginAndAnswersMayBeNull)
+{
+    const auto stream = WithKeys({-10, 0, 10});
+    int index = 77;
+    EXPECT_EQ(0, KFS_TimeToIndex(*stream, nullptr, &index));
+    EXPECT_EQ(1, index);
+    EXPECT_EQ(0, KFS_GetKeyIndex(*stream, nullptr, &index, nullptr));
+    EXPECT_EQ(1, index);
+    EXPECT_EQ(0, KFS_FindNearestKeyTime(*stream, nullptr, nullptr, nullptr));
+    EXPECT_EQ(0, KFS_FindKeyTime(*stream, nullptr, 0, nullptr, &index, nullptr));
+    EXPECT_EQ(2, index);
+    EXPECT_EQ(0, KFS_GetKey(*stream, 1, nullptr, nullptr, nullptr));
+}
+
+TEST_F(Lookup, IndexToTimeAnswersForKeysAndForTheLast)
+{
+    const auto stream = WithKeys({10, 20, 30});
+    struct Row {
+        int index;
+        T_Time time;
+    };
+    for (const Row& row : {Row{0, {10, 600}}, Row{2, {30, 600}}, Row{-1, {30, 600}}, Row{3, NoTime}, Row{-2, NoTime}, Row{None, NoTime}}) {
+        T_Time time{77, 77};
+        EXPECT_EQ(0, KFS_IndexToTime(*stream, row.index, &time));
+        EXPECT_TRUE(Same(row.time, time)) << row.index << " gave " << time.value << "/" << time.scale;
+    }
+    EXPECT_EQ(0, stream->Pins());
+}
+
+TEST_F(Lookup, AConstantHasOneKeyWhereverItIsAsked)
+{
+    TestStream stream({.noKeys = true});
+    stream.Key(5, {2.5}, KFS_Interp_Linear, KFS_Interp_Hold);
+    int index = 77;
+    unsigned char found = 77;
+    T_Time time{77, 77};
+    const T_Time asked{300, 1200};
+    EXPECT_EQ(0, KFS_FindNearestKeyTime(stream, &asked, &index, &time));
+    EXPECT_EQ(0, index);
+    EXPECT_TRUE(Same({150, 600}, time)) << "in the stream's scale";
+    EXPECT_EQ(0, KFS_IndexToTime(stream, 99, &time));
+    EXPECT_TRUE(Same({150, 600}, time)) << "the value has moved there";
+    const T_Time later = stream.Time(42);
+    EXPECT_EQ(0, KFS_GetKeyIndex(stream, &later, &index, &found));
+    EXPECT_EQ(0, index);
+    EXPECT_EQ(1, found);
+    EXPECT_EQ(42, stream->GetCache()->time);
+    // The one time that would say that there is no value.
+    const T_Time none = stream.Time(KFS_INVALID_INDEX);
+    EXPECT_EQ(0, KFS_GetKeyIndex(stream, &none, &index, &found));
+    EXPECT_EQ(0, KFS_FindNearestKeyTime(stream, &none, &index, &time));
+    EXPECT_DOUBLE_EQ(2.5, stream.At1(0));
+
+    double value = 0.0;
+    char in = 77;
+    char out = 77;
+    EXPECT_EQ(0, KFS_GetKey(stream, 1234, &value, &in, &out));
+    EXPECT_EQ(2.5, value);
+    EXPECT_EQ(KFS_Interp_Linear, in);
+    EXPECT_EQ(KFS_Interp_Hold, out);
+    EXPECT_NO_REPORT(reports);
+
+    EXPECT_EQ(7426, Step::Of(stream, later, 0).code);
+    EXPECT_REPORT(reports, 22, "attempt to get a key value from a constant time stream.");
+    index = 77;
+    EXPECT_EQ(7426, KFS_TimeToIndex(stream, &later, &index));
+    EXPECT_EQ(None, index);
+    EXPECT_REPORT(reports, 24, "attempt to inquire about a key value in a constant time stream.");
+}
+
+// Without a value, and with keys but none there: the same questions, other answers.
+TEST_F(Lookup, WhatThereIsToSayWithoutAnything)
+{
+    const TestStream constant({.noKeys = true});
+    const TestStream keyed;
+    const T_Time at = keyed.Time(5);
+    int index = 77;
+    T_Time time{77, 77};
+    unsigned char found = 77;
+    unsigned short flags = 77;
+
+    EXPECT_EQ(7427, KFS_FindNearestKeyTime(constant, &at, &index, &time));
+    EXPECT_EQ(None, index);
+    EXPECT_TRUE(Same(NoTime, time));
+    EXPECT_REPORT(reports, 23, "attempt to get a value from a time stream with no key values.");
+    EXPECT_EQ(0, KFS_FindNearestKeyTime(keyed, &at, &index, &time));
+    EXPECT_EQ(None, index);
+    EXPECT_TRUE(Same({KFS_INVALID_INDEX, 600}, time)) << "no time, in the stream's scale";
+
+    const Step step = Step::Of(keyed, at, 0);
+    EXPECT_EQ(0, step.code);
+    EXPECT_EQ(0, step.found);
+    EXPECT_EQ(None, step.index);
+    EXPECT_TRUE(Same(NoTime, step.time));
+
+    EXPECT_EQ(7427, KFS_TimeToIndex(keyed, &at, &index));
+    EXPECT_REPORT(reports, 24, "attempt to inquire about a key value in a time stream with no key values.");
+    EXPECT_EQ(7426, KFS_IndexToTime(constant, 0, &time));
+    EXPECT_TRUE(Same(NoTime, time));
+    EXPECT_REPORT(reports, 25, "attempt to inquire about a key value in a constant time stream.");
+    time = {77, 77};
+    EXPECT_EQ(0, KFS_IndexToTime(keyed, -1, &time));
+    EXPECT_TRUE(Same(NoTime, time));
+
+    for (const TestStream* const stream : {&constant, &keyed}) {
+        double value = 77.0;
+        char in = 77;
+        char out = 77;
+        index = 77;
+        EXPECT_EQ(7427, KFS_GetKeyIndex(*stream, &at, &index, &found));
+        EXPECT_EQ(None, index);
+        EXPECT_EQ(0, found);
+        EXPECT_REPORT(reports, 26, "attempt to get a value from a time stream with no key values.");
+        EXPECT_EQ(7427, KFS_GetKeyFlags(*stream, 0, &flags));
+        EXPECT_EQ(77, flags);
+        EXPECT_REPORT(reports, 72, "attempt to inquire about a key value in a time stream with no key values.");
+        EXPECT_EQ(7427, KFS_GetKey(*stream, 0, &value, &in, &out));
+        EXPECT_REPORT(reports, 28, "attempt to get a value from a time stream with no key values.");
+        EXPECT_EQ(7427, KFS_GetKeyF(*stream, 0, &value, &in, &out));
+        EXPECT_REPORT(reports, 28, "attempt to get a value from a time stream with no key values.");
+        EXPECT_EQ(77.0, value);
+        EXPECT_EQ(KFS_Interp_None, in);
+        EXPECT_EQ(KFS_Interp_None, out);
+        EXPECT_TRUE(stream->CacheIsEmpty());
+    }
+}
+
+TEST_F(Lookup, ATimeThatDoesNotFitIsRefusedWithoutAReport)
+{
+    const auto stream = WithKeys({10, 20});
+    const T_Time tooFar{2000000000, 1};
+    const T_Time noTime = NoTime;
+    int index = 77;
+    unsigned char found = 77;
+    T_Time time{77, 77};
+    EXPECT_EQ(T_Err_Overflow, KFS_FindKeyTime(*stream, &tooFar, 0, &found, &index, &time));
+    EXPECT_EQ(0, found);
+    EXPECT_EQ(None, index);
+    EXPECT_TRUE(Same(NoTime, time));
+    for (const T_Time& bad : {tooFar, noTime}) {
+        const int code = bad.scale == 0 ? T_Err_Scale : T_Err_Overflow;
+        index = 77;
+        EXPECT_EQ(code, KFS_FindNearestKeyTime(*stream, &bad, &index, &time));
+        EXPECT_EQ(None, index);
+        index = 77;
+        EXPECT_EQ(code, KFS_TimeToIndex(*stream, &bad, &index));
+        EXPECT_EQ(None, index);
+        index = 77;
+        EXPECT_EQ(code, KFS_GetKeyIndex(*stream, &bad, &index, &found));
+        EXPECT_EQ(None, index);
+    }
+    EXPECT_NO_REPORT(reports);
+}
+
+TEST_F(Lookup, ADamagedStreamIsRefusedByEveryQuestion)
+{
+    const DamagedStream damaged;
+    KFS_Stream* const stream = damaged.get();
+    const T_Time at{5, 600};
+    int index;
+    double value;
+    unsigned short flags;
+    T_Time time;
+    const auto never = [](KFS_Stream*, long, int, KFS_KeyScalar*) { return 99; };
+    struct Row {
+        int operation;
+        char const* action;
+        std::function<int()> ask;
+    };
+    const Row rows[] = {
+        {22, "get a key value from", [&] { return KFS_FindKeyTime(stream, &at, 0, nullptr, &index, nullptr); }},
+        {23, "inquire about a key value in", [&] { return KFS_FindNearestKeyTime(stream, &at, &index, nullptr); }},
+        {24, "inquire about a key value in", [&] { return KFS_TimeToIndex(stream, &at, &index); }},
+        {26, "inquire about a key value in", [&] { return KFS_GetKeyIndex(stream, &at, &index, nullptr); }},
+        {25, "inquire about a key value in", [&] { return KFS_IndexToTime(stream, 0, &time); }},
+        {72, "inquire about a key value in", [&] { return KFS_GetKeyFlags(stream, 0, &flags); }},
+        {28, "get a value from", [&] { return KFS_GetKey(stream, 0, &value, nullptr, nullptr); }},
+        {28, "get a value from", [&] { return KFS_GetKeyF(stream, 0, &value, nullptr, nullptr); }},
+        {34, "iterate over", [&] { return KFS_ForRange(stream, nullptr, nullptr, 0, never, nullptr); }},
+        {35, "iterate over", [&] { return KFS_ForIndexRange(stream, 0, 0, 0, never, nullptr); }},
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(row.operation);
+        EXPECT_EQ(2, row.ask());
+        EXPECT_EQ(reports.Take(), std::vector<Reported>{DamagedReport(row.operation, row.action)});
+    }
+    EXPECT_TRUE(damaged.Untouched());
+}
+
+TEST_F(Lookup, KeysAreReadInTheStreamsExternalForm)
+{
+    TestStream stream({.dimension = 3, .type = KFS_Type_S16});
+    stream.Key(0, {0.0, 0.0, 0.0}, KFS_Interp_Hold).Key(10, {-1.5, 2.25, 40000.0}, KFS_Interp_Linear, KFS_Interp_Spline);
+    short value[4] = {77, 77, 77, 77};
+    char in = 77;
+    char out = 77;
+    EXPECT_EQ(0, KFS_GetKey(stream, 1, value, &in, &out));
+    EXPECT_EQ(-2, value[0]) << "halves away from zero";
+    EXPECT_EQ(2, value[1]);
+    EXPECT_EQ(static_cast<short>(40000), value[2]) << "nothing is clamped";
+    EXPECT_EQ(77, value[3]);
+    EXPECT_EQ(KFS_Interp_Linear, in);
+    EXPECT_EQ(KFS_Interp_Spline, out);
+    double numbers[4] = {77.0, 77.0, 77.0, 77.0};
+    EXPECT_EQ(0, KFS_GetKeyF(stream, -1, numbers, &in, &out)) << "-1 names the last key";
+    EXPECT_EQ(-1.5, numbers[0]);
+    EXPECT_EQ(40000.0, numbers[2]);
+    EXPECT_EQ(77.0, numbers[3]);
+    unsigned short flags = 0;
+    stream.Record(1)->flags |= KFS_KeyFlag_Continuous;
+    EXPECT_EQ(0, KFS_GetKeyFlags(stream, 1, &flags));
+    EXPECT_EQ(stream.Record(1)->flags, flags);
+    for (const int bad : {2, -2}) {
+        EXPECT_EQ(SEQ_Err_BadIndex, KFS_GetKeyFlags(stream, bad, &flags));
+        EXPECT_EQ(SEQ_Err_BadIndex, KFS_GetKey(stream, bad, value, &in, &out));
+        EXPECT_EQ(SEQ_Err_BadIndex, KFS_GetKeyF(stream, bad, numbers, &in, &out));
+        EXPECT_EQ(KFS_Interp_None, in);
+    }
+}
+
+// A key whose flag says so has its value behind the short head, on a spatial stream too.
+TEST_F(Lookup, TheRecordSaysWhereItsValueIs)
+{
+    TestStream stream({.dimension = 2, .spatial = true});
+    stream.Key(0, {3.0, 4.0});
+    KFS_KeyScalar* const key = stream.Record(0);
+    key->flags = static_cast<unsigned short>(key->flags & ~KFS_KeyFlag_SpatialBlock);
+    KFSp_Numbers(key)[0] = 8.0;
+    KFSp_Numbers(key)[1] = 9.0;
+    double numbers[2];
+    EXPECT_EQ(0, KFS_GetKeyF(stream, 0, numbers, nullptr, nullptr));
+    EXPECT_EQ(8.0, numbers[0]);
+    EXPECT_EQ(9.0, numbers[1]);
+    key->flags |= KFS_KeyFlag_SpatialBlock;
+    key->remapTable = nullptr;
+}
+
+struct CopyCall {
+    KFS_Stream const* stream;
+    long refcon;
+    short kind;
+};
+CopyCall lastCopy;
+
+int RememberingCopy(KFS_Stream const* stream, long refcon, short kind, void const* source, void* destination)
+{
+    lastCopy = {stream, refcon, kind};
+    std::memcpy(destination, source, stream->GetValueDesc()->itemSize);
+    return refcon < 0 ? 4711 : 0;
+}
+
+TEST_F(Lookup, ACustomValueGoesThroughTheClientsFunctionAndNeverAsDoubles)
+{
+    for (const bool noKeys : {false, true}) {
+        for (const long word : {42L, -42L}) {
+            KFS_ValueDesc desc{1, 8, word, [](KFS_Stream const*, long, int, int) { return 0; }};
+            KFS_Stream stream(1, 600, noKeys, 0, KFS_InterpMask_Hold, 0, desc, nullptr, nullptr, false);
+            const long stored = 0x1122334455667788;
+            ASSERT_EQ(0, KFS_InsertKey(&stream, nullptr, 1, &stored, KFS_Interp_Hold, KFS_Interp_Hold));
+            stream.SetCopyItemFunc(RememberingCopy);
+            long value = 0;
+            char in = 77;
+            EXPECT_EQ(word < 0 ? 4711 : 0, KFS_GetKey(&stream, 0, &value, &in, nullptr));
+            EXPECT_EQ(stored, value);
+            EXPECT_EQ(KFS_Interp_Hold, in) << "also where the copy fails";
+            EXPECT_EQ(&stream, lastCopy.stream);
+            EXPECT_EQ(word, lastCopy.refcon);
+            EXPECT_EQ(noKeys ? KFS_Item_CacheValue : KFS_Item_KeyValue, lastCopy.kind);
+            stream.SetCopyItemFunc(nullptr);
+            value = 0;
+            EXPECT_EQ(0, KFS_GetKey(&stream, 0, &value, nullptr, nullptr)) << "the bytes, without a function";
+            EXPECT_EQ(stored, value);
+            double number = 77.0;
+            EXPECT_EQ(7441, KFS_GetKeyF(&stream, 99, &number, nullptr, nullptr)) << "before the index is looked at";
+            EXPECT_EQ(77.0, number);
+            EXPECT_REPORT(reports, 115, "can#{rsquo}t compute floating point value(s) for a custom value");
+            EXPECT_EQ(0, KFS_GetKeyF(&stream, 0, nullptr, &in, nullptr)) << "the codes are no value";
+        }
+    }
+}
+
+// Stale marks are left or consumed as a look-up does or doesn't bring the stream up to date.
+class Updates : public StreamTest {
+protected:
+    Updates()
+    {
+        for (int i = 0; i < 5; ++i) {
+            stream.Key(i * 100, {100.0 * i, 10.0 * i * i}, KFS_Interp_Linear);
+        }
+        EXPECT_EQ(0, stream->UpdateStream());
+        stream.Record(2)->flags |= KFS_KeyFlag_Float;
+        MakeStale();
+    }
+    void MakeStale()
+    {
+        EXPECT_EQ(0, stream->SetInvalid(-1, 5));
+        EXPECT_EQ(0, stream->SetArcInvalid(-1, 5));
+    }
+    bool IsStale() const { return stream.Stale() != TestStream::NotStale && stream.ArcStale() != TestStream::NotStale; }
+    int At(int time)
+    {
+        int index = 77;
+        const T_Time at = stream.Time(time);
+        EXPECT_EQ(0, KFS_TimeToIndex(stream, &at, &index));
+        return index;
+    }
+
+    TestStream stream{{.dimension = 2, .spatial = true}};
+};
+
+TEST_F(Updates, AFloatKeyIsTakenWhereItStands)
+{
+    EXPECT_EQ(2, At(200));
+    EXPECT_TRUE(IsStale());
+    EXPECT_EQ(3, At(300)) << "a key that doesn't float";
+    EXPECT_FALSE(IsStale());
+    MakeStale();
+    stream.Record(2)->time = 190;
+    stream->SetKeys(stream->GetKeys());
+    const int moved = At(200);
+    EXPECT_FALSE(IsStale()) << "nothing there";
+    EXPECT_EQ(stream.Record(2)->time == 200 ? 2 : None, moved) << "the answer is that after the update";
+}
+
+TEST_F(Updates, IndexToTimeAnswersWhereAStaleFloatKeyComesToStand)
+{
+    T_Time time{77, 77};
+    EXPECT_EQ(0, KFS_IndexToTime(stream, 1, &time));
+    EXPECT_TRUE(IsStale()) << "a key that doesn't float needs no update";
+    stream.Record(2)->time = 101;
+    stream->SetKeys(stream->GetKeys());
+    EXPECT_EQ(0, KFS_IndexToTime(stream, 2, &time));
+    EXPECT_FALSE(IsStale());
+    EXPECT_EQ(stream.Record(2)->time, time.value);
+    EXPECT_NE(101, time.value);
+}
+
+TEST_F(Updates, NoUpdateStartsInsideAnother)
+{
+    EXPECT_EQ(3, At(300));
+    int* const level = KFSp_GetTimeToIndexCheck().get();
+    ASSERT_NE(nullptr, level);
+    EXPECT_EQ(0, *level);
+    MakeStale();
+    *level = 1;
+    EXPECT_EQ(3, At(300));
+    EXPECT_EQ(None, At(333));
+    EXPECT_TRUE(IsStale());
+    EXPECT_EQ(1, *level);
+    *level = 0;
+    EXPECT_EQ(None, At(333));
+    EXPECT_FALSE(IsStale());
+    EXPECT_EQ(0, *level);
+}
+
+TEST_F(Updates, AFailedUpdateIsTheResultAndIsOverAfterIt)
+{
+    MakeStale();
+    *stream->GetArcInvalidKeyIndexForModify() = 77;     // a range beside the list
+    stream->GetArcInvalidKeyIndexForModify()[1] = 78;
+    int index = 77;
+    const T_Time at = stream.Time(300);
+    const int code = KFS_TimeToIndex(stream, &at, &index);
+    EXPECT_EQ(SEQ_Err_BadIndex, code);
+    EXPECT_EQ(None, index);
+    EXPECT_EQ(0, *KFSp_GetTimeToIndexCheck());
+    EXPECT_EQ(0, stream.Pins());
+}
+
+TEST_F(Updates, ARenderAsksItsOwnKeys)
+{
+    TestStream constant({.noKeys = true});
+    constant.Key(5, {1.0});
+    {
+        const Q_ScSetCurrentRenderContext current(kfshost::MakeRenderContext(true));
+        int index = 77;
+        const T_Time at = constant.Time(99);
+        EXPECT_EQ(0, KFS_GetKeyIndex(constant, &at, &index, nullptr));
+        EXPECT_EQ(99, constant->GetCache()->time);
+        EXPECT_EQ(3, At(300));
+        EXPECT_FALSE(IsStale());
+    }
+    EXPECT_EQ(5, constant->GetCache()->time);
+    EXPECT_TRUE(IsStale());
+}
+
+} // namespace

@@ -1,0 +1,339 @@
+#include "keystore/lookup.h"
+
+#include "tests/support/listening.h"
+#include "tests/support/streams.h"
+
+#include <cmath>
+#include <limits>
+
+namespace {
+
+u16str Text(char const* text)
+{
+    return Q_MBToUTF16String(text);
+}
+
+class Queries : public StreamTest {};
+
+TEST_F(Queries, AnimatedMeansKeysOrAnExpressionThatRuns)
+{
+    const TestStream stream({.noKeys = true});
+    struct Row {
+        char const* why;
+        char const* expression;
+        unsigned flags;
+        char const* error;
+        bool active, any;
+    };
+    const Row rows[] = {
+        {"nothing", "", 0, "", false, false},
+        {"an expression", "time", 0, "", true, true},
+        {"switched off", "time", KFS_ExprFlag_Disabled, "", false, true},
+        {"with an error", "time", 0, "no such thing", false, true},
+        {"an error alone", "", 0, "no such thing", false, false},
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(row.why);
+        stream->GetExprInfoForModify().SetExpression(Text(row.expression));
+        stream->GetExprInfoForModify().SetFlags(row.flags);
+        stream->GetExprInfoForModify().SetExpressionError(Text(row.error), -1, u16str());
+        EXPECT_EQ(row.active, stream->IsAnimated(false));
+        EXPECT_EQ(row.any, stream->IsAnimated(true));
+        EXPECT_TRUE(stream->IsModified()) << "a leaf's value counts as modified";
+    }
+    stream->GetExprInfoForModify().clear();
+    ASSERT_EQ(0, stream->SetConstant(0, 0));
+    EXPECT_TRUE(stream->IsAnimated(false)) << "keys, though there is none yet";
+    stream->SetCanonical(true);
+    EXPECT_FALSE(stream->IsModified());
+}
+
+TEST_F(Queries, MasksAndParameterFlagsSayHowItMayBeAnimated)
+{
+    for (const unsigned short mask : {0, 1, 4, 7}) {
+        for (const unsigned flags : {0u, FX_ParamFlag_CannotAnimate, FX_ParamFlag_HoldOnly}) {
+            SCOPED_TRACE(testing::Message() << "mask " << mask << " flags " << flags);
+            const TestStream stream({.interpMask = mask});
+            FX_ParamDef def{};
+            def.paramType = FX_Param_FLOAT_SLIDER;
+            def.paramFlags = flags;
+            stream->SetParamDef(def);
+            EXPECT_EQ(mask != 0 && flags != FX_ParamFlag_CannotAnimate, stream->CanBeAnimated());
+            EXPECT_EQ(mask == 4 || flags == FX_ParamFlag_HoldOnly, stream->IsHoldOnly());
+        }
+    }
+}
+
+TEST_F(Queries, WhichKindsCanHaveAnExpression)
+{
+    KFS_ValueDesc desc;
+    desc.dataType = KFS_Type_Double;
+    const KFS_MatchName name("a kind", true);
+    KFS_Stream stream(1, 600, 0, 0, KFS_InterpMask_All, 0, desc, &name, nullptr, false);
+    const TestStream nameless;
+    for (int kind = -1; kind < 20; ++kind) {
+        FX_ParamDef def{};
+        def.paramType = kind;
+        stream.SetParamDef(def);
+        nameless->SetParamDef(def);
+        const bool cannot = kind == 0 || kind == 8 || kind == 9 || (kind >= 12 && kind <= 14);
+        EXPECT_EQ(!cannot, stream.CanHaveExpression()) << kind;
+        EXPECT_TRUE(nameless->CanHaveExpression()) << kind;
+    }
+    stream.SetInterpMask(0);
+    EXPECT_FALSE(stream.CanHaveExpression()) << "what can't be animated";
+}
+
+TEST_F(Queries, SameHoldSameValue)
+{
+    TestStream hold({.interpMask = KFS_InterpMask_Hold});
+    hold.Key(10, {1.0}, KFS_Interp_Hold).Key(20, {1.0}, KFS_Interp_Hold).Key(30, {2.0}, KFS_Interp_Hold);
+    struct Row {
+        int a, b;
+        bool same;
+    };
+    const Row rows[] = {{10, 19, true}, {19, 20, false}, {5, 10, true}, {-99, 5, true}, {30, 999, true}, {5, 25, false}, {20, 20, true}};
+    TestStream curve;
+    curve.Key(10, {1.0}).Key(20, {1.0});
+    for (const Row& row : rows) {
+        SCOPED_TRACE(testing::Message() << row.a << " and " << row.b);
+        const T_Time finer{row.b * 3, 1800};
+        EXPECT_EQ(row.same, hold->SameValueAtTimes(hold.Time(row.a), finer, nullptr));
+        EXPECT_EQ(row.a == row.b, curve->SameValueAtTimes(curve.Time(row.a), finer, nullptr)) << "a curve isn't looked at";
+    }
+    hold->GetExprInfoForModify().SetExpression(Text("time"));
+    EXPECT_FALSE(hold->SameValueAtTimes(hold.Time(10), hold.Time(19), nullptr)) << "an expression may answer anything";
+    EXPECT_TRUE(hold->SameValueAtTimes(hold.Time(10), hold.Time(10), nullptr));
+    TestStream constant({.noKeys = true});
+    constant.Key(0, {1.0});
+    EXPECT_TRUE(constant->SameValueAtTimes(constant.Time(-5), constant.Time(5), nullptr));
+    const TestStream empty({.interpMask = KFS_InterpMask_Hold});
+    EXPECT_EQ(7427, KFSp_Boundary([&] { static_cast<void>(empty->SameValueAtTimes(empty.Time(1), empty.Time(2), nullptr)); }));
+    EXPECT_EQ(1u, reports.Take().size());
+}
+
+TEST_F(Queries, ASetValueFindsAKeyAtItsTime)
+{
+    TestStream stream;
+    stream.Key(0, {0.0}).Key(100, {10.0});
+    const auto bytes = stream.Bytes();
+    stream->PrepareSetValue(stream.Time(100));
+    EXPECT_EQ(bytes, stream.Bytes()) << "there is one";
+    stream->PrepareSetValue({50, 1200});
+    EXPECT_EQ((std::vector{0, 25, 100}), stream.Times());
+    EXPECT_DOUBLE_EQ(2.5, stream.Numbers(1)[0]) << "with the value that the stream has there";
+    EXPECT_EQ(T_Err_Overflow, KFSp_Boundary([&] { stream->PrepareSetValue({2000000000, 1}); }));
+
+    TestStream constant({.noKeys = true});
+    constant.Key(0, {1.0});
+    constant->PrepareSetValue(constant.Time(50));
+    EXPECT_TRUE(constant->HasNoKeys());
+    EXPECT_EQ(0, constant->GetCache()->time);
+}
+
+// Remembers what it was asked to evaluate.
+class EvaluatingRoot : public HeardRoot {
+public:
+    int EvaluateExpression(KFS_Stream const* stream, T_Time const* time, double* values, void**, KFS_ParamBag const*) override
+    {
+        asked = stream;
+        values[0] = time->value;
+        return 4711;
+    }
+    KFS_Stream const* asked = nullptr;
+};
+
+TEST_F(Queries, AnExpressionIsEvaluatedAtTheRoot)
+{
+    const TestStream stream;
+    const T_Time at = stream.Time(7);
+    double value = 0.0;
+    EXPECT_EQ(1, stream->EvaluateExpression(&at, &value, nullptr, nullptr)) << "no root, no value";
+    HeardRoot middle;
+    EvaluatingRoot root;
+    middle.SetParent(&root);
+    middle.Store(stream);
+    EXPECT_EQ(4711, stream->EvaluateExpression(&at, &value, nullptr, nullptr));
+    EXPECT_EQ(stream.get(), root.asked);
+    EXPECT_EQ(7.0, value);
+}
+
+// A leaf whose limits are those of its parameter record.
+class LimitedStream : public KFS_Stream {
+public:
+    LimitedStream(short dimension, bool hasMin, bool hasMax)
+        : KFS_Stream(dimension, 600, 0, 0, KFS_InterpMask_All, 0, {0, 0, KFS_Type_Double, nullptr}, nullptr, nullptr, false),
+          hasMin_(hasMin), hasMax_(hasMax)
+    {
+    }
+    bool HasMinValue() const override { return hasMin_; }
+    bool HasMaxValue() const override { return hasMax_; }
+
+private:
+    bool hasMin_;
+    bool hasMax_;
+};
+
+FX_ParamDef MakeDef(int kind)
+{
+    FX_ParamDef def{};
+    def.paramType = kind;
+    switch (kind) {
+    case FX_Param_INT_SLIDER:
+        def.value.intSlider = {-5, 6, -2, 3, 0};
+        break;
+    case FX_Param_FIXED_SLIDER:
+        def.value.fixedSlider = {-98304, 98304, -65536, 32768, 0, 2, 0};
+        break;
+    case FX_Param_FIXED_ANGLE:
+        def.value.fixedAngle = {0, -65536, 131072};
+        break;
+    case FX_Param_CHOICE:
+        def.value.choice = {5, 1, nullptr};
+        break;
+    case FX_Param_FLOAT_SLIDER:
+        def.value.floatSlider = {3, 0, -0.5f, 8.25f, 0.0f, 1.0f, 0.0f, 0};
+        break;
+    default:
+        break;
+    }
+    return def;
+}
+
+TEST_F(Queries, LimitsComeFromTheParameterRecord)
+{
+    struct Row {
+        int kind;
+        double min, max, uiMin, uiMax;
+        int precision;
+    };
+    const Row rows[] = {
+        {FX_Param_INT_SLIDER, -5.0, 6.0, -2.0, 3.0, 0},
+        {FX_Param_FIXED_SLIDER, -1.5, 1.5, -1.0, 0.5, 2},
+        {FX_Param_FIXED_ANGLE, -1.0, 2.0, -1.0, 2.0, 0},
+        {FX_Param_BOOL, 0.0, 1.0, 0.0, 1.0, 0},
+        {FX_Param_CHOICE, 1.0, 5.0, 1.0, 5.0, 0},
+        {FX_Param_FLOAT_SLIDER, -0.5, 8.25, 0.0, 1.0, 3},
+        {FX_Param_COLOR, -1e9, 1e9, -1e9, 1e9, 0},
+        {FX_Param_GROUP, -1e9, 1e9, -1e9, 1e9, 0},
+        {FX_Param_NotFilledIn, -1e9, 1e9, -1e9, 1e9, 0},
+    };
+    LimitedStream limited(1, true, true);
+    for (const Row& row : rows) {
+        SCOPED_TRACE(row.kind);
+        limited.SetParamDef(MakeDef(row.kind));
+        EXPECT_EQ(row.min, limited.GetMinValue());
+        EXPECT_EQ(row.max, limited.GetMaxValue());
+        EXPECT_EQ(row.uiMin, limited.GetUIMinValue());
+        EXPECT_EQ(row.uiMax, limited.GetUIMaxValue());
+        EXPECT_EQ(row.precision, limited.GetPrecision());
+        const bool isSlider = row.kind == FX_Param_INT_SLIDER || row.kind == FX_Param_FIXED_SLIDER || row.kind == FX_Param_FLOAT_SLIDER;
+        limited.SetUIMinValue(-4.0);
+        limited.SetUIMaxValue(2.0);
+        EXPECT_EQ(isSlider ? -4.0 : row.uiMin, limited.GetUIMinValue());
+        EXPECT_EQ(isSlider ? 2.0 : row.uiMax, limited.GetUIMaxValue());
+        EXPECT_EQ(row.min, limited.GetMinValue()) << "the valid range is another";
+    }
+    const TestStream plain;
+    plain->SetParamDef(MakeDef(FX_Param_FIXED_ANGLE));
+    EXPECT_EQ(-32768.0, plain->GetMinValue()) << "an angle without limits has those of its numbers";
+    EXPECT_EQ(32767.99998474121, plain->GetMaxValue());
+    plain->SetParamDef(MakeDef(FX_Param_FIXED_SLIDER));
+    plain->SetUIMinValue(0.1);
+    plain->SetUIMaxValue(-1.5);
+    EXPECT_EQ(6554, plain->GetParamDef().value.fixedSlider.sliderMin);
+    EXPECT_EQ(-98304, plain->GetParamDef().value.fixedSlider.sliderMax);
+    plain->SetUIMaxValue(1e300);
+    EXPECT_EQ(std::numeric_limits<int>::max(), plain->GetParamDef().value.fixedSlider.sliderMax);
+}
+
+TEST_F(Queries, ALegalValueLiesWithinTheLimitsThatThereAre)
+{
+    constexpr double nan = std::numeric_limits<double>::quiet_NaN();
+    constexpr double infinity = std::numeric_limits<double>::infinity();
+    for (const bool hasMin : {false, true}) {
+        for (const bool hasMax : {false, true}) {
+            SCOPED_TRACE(testing::Message() << hasMin << hasMax);
+            LimitedStream stream(5, hasMin, hasMax);
+            stream.SetParamDef(MakeDef(FX_Param_FLOAT_SLIDER));
+            const std::vector<double> values{-7.0, 2.0, 8.25, 99.0, infinity};
+            const std::vector<double> legal{hasMin ? -0.5 : -7.0, 2.0, 8.25, hasMax ? 8.25 : 99.0, hasMax ? 8.25 : infinity};
+            std::vector<double> result = values;
+            stream.LegalizeValue(result.data());
+            EXPECT_EQ(legal, result);
+            std::vector<double> nans(5, nan);
+            stream.LegalizeValue(nans.data());
+            if (hasMin || hasMax) {
+                EXPECT_EQ(std::vector<double>(5, hasMin ? -0.5 : 8.25), nans) << "a NaN becomes a limit";
+            } else {
+                EXPECT_TRUE(std::isnan(nans[0]));
+            }
+            stream.DisableLegalizeValue(true);
+            stream.DisableLegalizeValue(true);
+            stream.DisableLegalizeValue(false);
+            result = values;
+            stream.LegalizeValue(result.data());
+            EXPECT_EQ(values, result) << "disabled twice, enabled once";
+        }
+    }
+}
+
+TEST_F(Queries, UnitsAndComponentsHaveNames)
+{
+    struct Row {
+        int kind;
+        short dimension;
+        unsigned short displayFlags;    // of the float slider's place in the record
+        char const* units;
+        std::vector<char const*> components;
+    };
+    const Row rows[] = {
+        {FX_Param_FIXED_ANGLE, 1, 0, "degrees", {"", ""}},
+        {FX_Param_POINT_2D, 2, 0, "pixels", {"X", "Y", "Z", "", ""}},
+        {FX_Param_POINT_3D, 3, 0, "pixels", {"X", "Y", "Z", ""}},
+        {FX_Param_FLOAT_SLIDER, 1, 0, "", {"", ""}},
+        {FX_Param_FLOAT_SLIDER, 2, 1, "percent", {"X", "Y"}},
+        {FX_Param_FLOAT_SLIDER, 1, 4, "pixels", {""}},
+        {FX_Param_FLOAT_SLIDER, 1, 5, "percent", {""}},
+        {FX_Param_COLOR, 4, 0, "", {"alpha", "red", "green", "blue", ""}},
+        {FX_Param_BOOL, 2, 0, "", {"", ""}},
+        {FX_Param_NotFilledIn, 2, 0, "", {"", ""}},
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(testing::Message() << "kind " << row.kind << " flags " << row.displayFlags);
+        const TestStream stream({.dimension = row.dimension});
+        FX_ParamDef def{};
+        def.paramType = row.kind;
+        def.value.floatSlider.displayFlags = row.displayFlags;
+        stream->SetParamDef(def);
+        EXPECT_EQ(Text(row.units), stream->GetUnitsName());
+        EXPECT_EQ(Text(row.units), stream->GetEnglishUnitsName());
+        for (std::size_t i = 0; i < row.components.size(); ++i) {
+            EXPECT_EQ(Text(row.components[i]), stream->GetDimensionName(static_cast<short>(i))) << i;
+            EXPECT_EQ(Text(row.components[i]), stream->GetEnglishDimensionName(static_cast<short>(i))) << i;
+        }
+        EXPECT_EQ(u16str(), stream->GetDimensionName(-1));
+    }
+}
+
+// The flags of a fixed slider are looked for in two places, of which one is the integer part of its minimum.
+TEST_F(Queries, AFixedSlidersMinimumReadsAsUnits)
+{
+    struct Row {
+        int wholeMin;
+        unsigned short displayFlags;
+        char const* units;
+    };
+    for (const Row& row : {Row{0, 0, ""}, Row{0, 1, "percent"}, Row{3, 0, "percent"}, Row{4, 0, "pixels"}, Row{2, 4, ""}, Row{-2, 0, "pixels"}}) {
+        const TestStream stream;
+        FX_ParamDef def{};
+        def.paramType = FX_Param_FIXED_SLIDER;
+        def.value.fixedSlider.validMin = row.wholeMin * 65536;
+        def.value.fixedSlider.displayFlags = row.displayFlags;
+        stream->SetParamDef(def);
+        EXPECT_EQ(Text(row.units), stream->GetUnitsName()) << row.wholeMin << " " << row.displayFlags;
+        EXPECT_EQ(Text(row.units), stream->GetEnglishUnitsName());
+    }
+}
+
+} // namespace

@@ -1,0 +1,160 @@
+#include "keystore/attributes.h"
+
+#include "keystore/lookup.h"
+#include "tests/support/streams.h"
+
+#include <algorithm>
+#include <cstdint>
+#include <map>
+#include <random>
+
+namespace {
+
+class Rescale : public StreamTest {
+protected:
+    // Each key's value is its index, so that it can be told which ones are left.
+    static std::unique_ptr<TestStream> WithKeys(std::vector<int> const& times, unsigned scale)
+    {
+        auto stream = std::make_unique<TestStream>(StreamOptions{.timeScale = scale});
+        for (std::size_t i = 0; i < times.size(); ++i) {
+            stream->Key(times[i], {static_cast<double>(i)});
+        }
+        return stream;
+    }
+    static std::vector<int> Survivors(TestStream const& stream)
+    {
+        std::vector<int> survivors;
+        for (int i = 0; i < stream.Count(); ++i) {
+            survivors.push_back(static_cast<int>(stream.Numbers(i)[0]));
+        }
+        return survivors;
+    }
+};
+
+TEST_F(Rescale, OfTwoKeysOnATickTheNearerStays)
+{
+    struct Row {
+        char const* why;
+        unsigned from, to;
+        std::vector<int> times, newTimes, survivors;
+    };
+    const Row rows[] = {
+        {"finer, exactly", 600, 1200, {-10, 0, 10}, {-20, 0, 20}, {0, 1, 2}},
+        {"coarser, all apart", 600, 300, {0, 10, 20}, {0, 5, 10}, {0, 1, 2}},
+        {"0.10 and 0.12 s meet on 0.1: the earlier is there", 100, 10, {10, 12}, {1}, {0}},
+        {"0.07 and 0.11 s: the later is nearer", 100, 10, {7, 11}, {1}, {1}},
+        {"0.08 and 0.12 s: a tie", 100, 10, {8, 12}, {1}, {0}},
+        {"0.04 s goes elsewhere", 100, 10, {4, 8, 12}, {0, 1}, {0, 1}},
+        {"what comes after stays in step", 100, 10, {7, 11, 30, 50}, {1, 3, 5}, {1, 2, 3}},
+        {"two meetings", 100, 10, {7, 11, 20, 22}, {1, 2}, {1, 2}},
+        {"negative: -0.12 and -0.10 s", 100, 10, {-12, -10}, {-1}, {1}},
+        {"three on a tick, the middle one nearest", 100, 10, {8, 10, 12}, {1}, {1}},
+        {"three on a tick, the first one nearest", 100, 10, {10, 11, 12, 20}, {1, 2}, {0, 3}},
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(row.why);
+        const auto stream = WithKeys(row.times, row.from);
+        EXPECT_EQ(0, KFS_RescaleStream(*stream, row.to));
+        EXPECT_EQ(row.to, (*stream)->GetTimeScale());
+        EXPECT_EQ(row.newTimes, stream->Times());
+        EXPECT_EQ(row.survivors, Survivors(*stream));
+        EXPECT_EQ(0, stream->Pins());
+        EXPECT_TRUE(stream->CacheIsEmpty());
+    }
+}
+
+// Against the ticks worked out key by key in exact arithmetic: every tick that a key comes to holds one key in the end, the nearest.
+TEST_F(Rescale, EveryTickKeepsOneOfItsKeys)
+{
+    std::mt19937 random(28);
+    const unsigned scales[] = {24, 25, 30, 100, 600, 1000, 48000};
+    for (int round = 0; round < 60; ++round) {
+        const std::int64_t from = scales[random() % 7];
+        const std::int64_t to = scales[random() % 7];
+        std::vector<int> times;
+        for (int time = -40; times.size() < 30; time += 1 + static_cast<int>(random() % 7)) {
+            times.push_back(time);
+        }
+        const auto stream = WithKeys(times, static_cast<unsigned>(from));
+        ASSERT_EQ(0, KFS_RescaleStream(*stream, static_cast<unsigned>(to)));
+        std::map<int, std::vector<int>> met;    // by tick, the keys
+        for (std::size_t i = 0; i < times.size(); ++i) {
+            const std::int64_t doubled = 2 * times[i] * to;
+            const std::int64_t rounded = doubled >= 0 ? (doubled + from) / (2 * from) : -((-doubled + from) / (2 * from));
+            met[static_cast<int>(rounded)].push_back(static_cast<int>(i));
+        }
+        ASSERT_EQ(met.size(), static_cast<std::size_t>(stream->Count()));
+        const std::vector<int> survivors = Survivors(*stream);
+        int position = 0;
+        for (const auto& [tick, keys] : met) {
+            SCOPED_TRACE(testing::Message() << "round " << round << ", " << from << " to " << to << ", tick " << tick);
+            EXPECT_EQ(tick, stream->Record(position)->time);
+            const auto far = [&](int key) { return std::abs(times[static_cast<std::size_t>(key)] * to - tick * from); };
+            const int nearest = *std::min_element(keys.begin(), keys.end(), [&](int a, int b) { return far(a) < far(b); });
+            EXPECT_EQ(nearest, survivors[static_cast<std::size_t>(position)]) << "a tie goes to the earlier";
+            // And look-ups know of it.
+            int index = 77;
+            const T_Time at{tick, static_cast<unsigned>(to)};
+            EXPECT_EQ(0, KFS_TimeToIndex(*stream, &at, &index));
+            EXPECT_EQ(position, index);
+            ++position;
+        }
+    }
+}
+
+TEST_F(Rescale, ValuesStayWhereTheyAreInSeconds)
+{
+    TestStream stream;
+    stream.Key(0, {0.0}, KFS_Interp_Spline).Key(300, {4.0}, KFS_Interp_Spline).Key(600, {1.0}, KFS_Interp_Spline);
+    std::vector<double> before;
+    for (int i = 0; i <= 20; ++i) {
+        before.push_back(stream.At1(30 * i));
+    }
+    ASSERT_EQ(0, KFS_RescaleStream(stream, 2400));
+    for (int i = 0; i <= 20; ++i) {
+        EXPECT_DOUBLE_EQ(before[static_cast<std::size_t>(i)], stream.At1(120 * i));
+    }
+}
+
+TEST_F(Rescale, AStreamWithoutKeysOnlyTakesTheScale)
+{
+    TestStream constant({.noKeys = true});
+    constant.Key(7, {1.0});
+    const TestStream empty;
+    for (TestStream const* const stream : {static_cast<TestStream const*>(&constant), &empty}) {
+        EXPECT_EQ(0, KFS_RescaleStream(*stream, 30));
+        EXPECT_EQ(30u, (*stream)->GetTimeScale());
+    }
+    EXPECT_EQ(7, constant->GetCache()->time);
+}
+
+TEST_F(Rescale, TheSameScaleIsNoEdit)
+{
+    const auto stream = WithKeys({0, 10}, 600);
+    EXPECT_DOUBLE_EQ(0.5, stream->At1(5));
+    const auto before = stream->Bytes();
+    EXPECT_EQ(0, KFS_RescaleStream(*stream, 600));
+    EXPECT_EQ(before, stream->Bytes());
+    EXPECT_EQ(5, (*stream)->GetCache()->time);
+}
+
+TEST_F(Rescale, ATimeThatDoesNotFitEndsIt)
+{
+    const auto stream = WithKeys({10, 1500000000, 1600000000}, 600);
+    EXPECT_EQ(T_Err_Overflow, KFS_RescaleStream(*stream, 1200));
+    EXPECT_EQ(600u, (*stream)->GetTimeScale());
+    EXPECT_EQ((std::vector{20, 1500000000, 1600000000}), stream->Times()) << "what was converted stays so";
+    EXPECT_EQ(0, stream->Pins());
+    EXPECT_EQ(T_Err_Scale, KFS_RescaleStream(*stream, 0));
+    EXPECT_NO_REPORT(reports);
+}
+
+TEST_F(Rescale, ADamagedStreamIsRefused)
+{
+    const DamagedStream damaged;
+    EXPECT_EQ(2, KFS_RescaleStream(damaged.get(), 30));
+    EXPECT_EQ(reports.Take(), std::vector<Reported>{DamagedReport(7, "time stream rescale")});
+    EXPECT_TRUE(damaged.Untouched());
+}
+
+} // namespace

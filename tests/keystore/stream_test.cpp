@@ -1,0 +1,258 @@
+#include "keystore/stream.h"
+
+#include "keystore/attributes.h"
+#include "keystore/copykeys.h"
+#include "keystore/lookup.h"
+#include "tests/support/streams.h"
+
+namespace {
+
+class Streams : public StreamTest {};
+
+int ConstructionCode(short dimension, bool spatial, unsigned short interpMask, unsigned short spInterpMask, KFS_ValueDesc const& desc)
+{
+    return KFSp_Boundary([&] { KFS_Stream(dimension, 600, 0, spatial, interpMask, spInterpMask, desc, nullptr, nullptr, false); });
+}
+
+KFS_ValueDesc Plain(int type)
+{
+    KFS_ValueDesc desc;
+    desc.dataType = type;
+    return desc;
+}
+
+int CopyBlock(KFS_Stream const* stream, long, short, void const* source, void* destination)
+{
+    std::memmove(destination, source, stream->GetValueDesc()->itemSize);
+    return 0;
+}
+
+int HoldFirst(KFS_Stream const*, long, int, int)
+{
+    return 0;
+}
+
+KFS_ValueDesc Custom(unsigned short size)
+{
+    KFS_ValueDesc desc;
+    desc.isCustom = 1;
+    desc.itemSize = size;
+    desc.dataType = 42;
+    desc.interpFunc = HoldFirst;
+    return desc;
+}
+
+TEST_F(Streams, ConstructionSetsWhatItsArgumentsAskFor)
+{
+    struct Row {
+        short dimension;
+        bool spatial;
+        unsigned short spInterpMask;
+        unsigned short flags;
+        unsigned short spInterp;
+    };
+    const Row rows[] = {
+        {1, false, 8, 0, 0},
+        {2, true, 0, 0x2 | 0x4 | 0x8, 0},
+        {3, true, 8, 0x2 | 0x4 | 0x8, 3},
+        {4, true, 8, 0x2 | 0x4, 0},     // no arc length, and no automatic tangents, above three dimensions
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(row.dimension);
+        const TestStream stream({.dimension = row.dimension, .spatial = row.spatial, .spInterpMask = row.spInterpMask});
+        EXPECT_EQ(row.flags, stream->GetKFSFlags());
+        EXPECT_EQ(row.spInterp, stream->GetSpInterp());
+        EXPECT_EQ(nullptr, stream->GetKeys());
+        EXPECT_TRUE(stream.CacheIsEmpty());
+        EXPECT_EQ(TestStream::NotStale, stream.Stale());
+        EXPECT_EQ(TestStream::NotStale, stream.ArcStale());
+        EXPECT_EQ(8, stream->GetValueDesc()->itemSize);
+        EXPECT_EQ((M_Vector4T<double>{{1.0, 1.0, 1.0, 1.0}}), stream->GetMultiplier());
+    }
+}
+
+TEST_F(Streams, ConstructionRefusesWhatCannotBe)
+{
+    EXPECT_EQ(7433, ConstructionCode(1, false, 7, 0, Plain(10)));
+    EXPECT_EQ(7433, ConstructionCode(1, false, 7, 0, Plain(127)));
+    EXPECT_EQ(7433, ConstructionCode(-1, false, 7, 0, Plain(KFS_Type_Double)));
+    EXPECT_EQ(7433, ConstructionCode(820, false, 7, 0, Plain(KFS_Type_Double))) << "a record of 32808 bytes";
+    EXPECT_EQ(0, ConstructionCode(818, false, 7, 0, Plain(KFS_Type_Double)));
+    EXPECT_EQ(7433, ConstructionCode(1, false, 7, 0, Custom(40000)));
+    EXPECT_NO_REPORT(reports);
+    // Automatic tangents are code 3, whose permit is the hold bit of the temporal mask.
+    EXPECT_EQ(7431, ConstructionCode(2, true, KFS_InterpMask_Linear | KFS_InterpMask_Spline, 8, Plain(KFS_Type_Double)));
+    EXPECT_REPORT(reports, 15, "spatial interpolation method not allowed for this stream (3).");
+}
+
+TEST_F(Streams, ConstructionWithoutMemoryThrows4AndLeaksNothing)
+{
+    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    for (int n = 1;; ++n) {
+        Q_FailAllocation(n);
+        const int code = ConstructionCode(3, true, 7, 8, Plain(KFS_Type_Double));
+        const bool fired = Q_FailAllocationFired();
+        Q_FailAllocation(0);
+        EXPECT_EQ(before, Q_MemoryLive(nullptr));
+        if (!fired) {
+            EXPECT_EQ(0, code);
+            EXPECT_GT(n, 1);
+            break;
+        }
+        EXPECT_EQ(4, code);
+        ASSERT_LT(n, 20);
+    }
+}
+
+TEST_F(Streams, ADescriptionFollowsItsDataType)
+{
+    const TestStream stream;
+    const int sizes[] = {1, 1, 2, 2, 4, 4, 4, 4, 4, 8};
+    for (int type = 0; type <= 9; ++type) {
+        const KFS_ValueDesc desc = Plain(type);
+        ASSERT_EQ(0, KFS_SetValueDescription(stream, &desc, nullptr));
+        EXPECT_EQ(sizes[type], stream->GetValueDesc()->itemSize) << type;
+    }
+    KFS_ValueDesc old;
+    const KFS_ValueDesc bad = Plain(10);
+    EXPECT_EQ(7433, KFS_SetValueDescription(stream, &bad, &old));
+    EXPECT_EQ(KFS_Type_Double, old.dataType & 0xFF);
+    EXPECT_EQ(KFS_Type_Double, stream->GetValueDesc()->dataType & 0xFF) << "a refused description changes nothing";
+    EXPECT_EQ(0, KFS_SetValueDescription(stream, nullptr, nullptr));
+    EXPECT_NO_REPORT(reports);
+}
+
+TEST_F(Streams, ACustomStreamIsPlainOnlyForAWhile)
+{
+    KFS_Stream stream(1, 600, 0, 0, KFS_InterpMask_Hold, 0, Custom(16), nullptr, nullptr, false);
+    EXPECT_EQ(HoldFirst, stream.GetInterpFunc());
+    EXPECT_NE(nullptr, stream.GetCopyItemFunc()) << "bytes are copied where the client has no function";
+    EXPECT_EQ(42, stream.GetItemRefcon());
+    const KFS_ValueDesc plain = Plain(KFS_Type_Double);
+    KFS_ValueDesc custom;
+    ASSERT_EQ(0, KFS_SetValueDescription(&stream, &plain, &custom));
+    EXPECT_TRUE(stream.IsTemporarilyNonCustom());
+    EXPECT_FALSE(stream.IsCustom());
+    EXPECT_EQ(0, stream.GetItemRefcon());
+    ASSERT_EQ(0, KFS_SetValueDescription(&stream, &custom, nullptr));
+    EXPECT_FALSE(stream.IsTemporarilyNonCustom());
+    EXPECT_EQ(16, stream.GetValueDesc()->itemSize);
+    EXPECT_EQ(42, stream.GetValueDesc()->dataType);
+    stream.SetCopyItemFunc(CopyBlock);
+    ASSERT_EQ(0, KFS_SetValueDescription(&stream, &custom, nullptr));
+    EXPECT_EQ(CopyBlock, stream.GetCopyItemFunc()) << "the client's function stays";
+}
+
+// A negative data type is the word for taking the item functions away.
+TEST_F(Streams, ANegativeDataTypeClearsTheItemFunctions)
+{
+    const TestStream stream;
+    stream.get()->SetCopyItemFunc(CopyBlock);
+    const KFS_ValueDesc negative = Plain(0x80);
+    EXPECT_EQ(0, KFS_SetValueDescription(stream, &negative, nullptr));
+    EXPECT_EQ(nullptr, stream->GetCopyItemFunc());
+    EXPECT_EQ(8, stream->GetValueDesc()->itemSize) << "the size stays what it was";
+}
+
+TEST_F(Streams, CountersNest)
+{
+    const TestStream stream;
+    stream->SetDisabledUpdateStream(true);
+    stream->SetDisabledUpdateStream(true);
+    stream->SetDisabledUpdateStream(false);
+    EXPECT_FALSE(stream->CanUpdateStream());
+    stream->SetDisabledUpdateStream(false);
+    EXPECT_TRUE(stream->CanUpdateStream());
+    stream->DisableLegalizeValue(true);
+    EXPECT_FALSE(stream->CanLegalizeValue());
+    stream->DisableLegalizeValue(false);
+    EXPECT_TRUE(stream->CanLegalizeValue());
+    {
+        const KFS_Stream::QuietExpressionErrorToken outer(stream);
+        const KFS_Stream::QuietExpressionErrorToken inner(stream);
+        EXPECT_TRUE(stream->ExpressionErrorsAreQuiet());
+    }
+    EXPECT_FALSE(stream->ExpressionErrorsAreQuiet());
+}
+
+TEST_F(Streams, TheNumberOfKeysOfAConstantIsOneLess)
+{
+    const TestStream constant({.noKeys = true});
+    EXPECT_EQ(0, constant->GetKeyCount());
+    EXPECT_TRUE(constant->HasNoValue());
+    const T_Time zero{0, 600};
+    const double value = 3.0;
+    ASSERT_EQ(0, KFS_InsertKeyF(constant, &zero, 1, &value, 0, 0));
+    EXPECT_EQ(-1, constant->GetKeyCount());
+    EXPECT_FALSE(constant->HasNoValue());
+}
+
+TEST_F(Streams, AClonesKeysAreItsOwn)
+{
+    TestStream source({.dimension = 2, .spatial = true});
+    source.Key(0, {0.0, 0.0}).Key(600, {3.0, 4.0}).Key(1200, {6.0, 0.0});
+    ASSERT_EQ((std::vector{3.0, 4.0}), source.At(600));
+    source.At(300);     // measures the arcs
+    ASSERT_NE(nullptr, source.Record(0)->remapTable);
+    source->SetDisabledUpdateStream(true);
+    const std::unique_ptr<KFS_StreamBase> base(source->Clone(true));
+    source->SetDisabledUpdateStream(false);
+    KFS_Stream* const clone = base->GetAsLeaf();
+    EXPECT_TRUE(clone->CanUpdateStream());
+    EXPECT_EQ(3, clone->GetKeyCount());
+    EXPECT_EQ(0, clone->GetInvalidKeyIndex()[0]);
+    EXPECT_EQ(2, clone->GetArcInvalidKeyIndex()[1]);
+    void const* item = nullptr;
+    ASSERT_EQ(0, SEQ_GetConstAddress(clone->GetKeys(), 0, &item));
+    EXPECT_EQ(nullptr, static_cast<KFS_KeyScalar const*>(item)->remapTable);
+    EXPECT_EQ(clone, (*clone->GetKeys())->refcon);
+    ASSERT_EQ(0, KFS_RemoveKey(source, 1, nullptr));
+    double value[2] = {};
+    const T_Time at{600, 600};
+    ASSERT_EQ(0, KFS_GetValueFPlus(clone, &at, 0, value, nullptr, nullptr));
+    EXPECT_EQ(4.0, value[1]);
+    const std::unique_ptr<KFS_StreamBase> empty(source->Clone(false));
+    EXPECT_EQ(nullptr, empty->GetAsLeaf()->GetKeys());
+    const DamagedStream damaged;
+    EXPECT_EQ(2, KFSp_Boundary([&] { KFS_Stream(*damaged.get(), KFS_CloneStreamParams{true, true}); }));
+    EXPECT_EQ(std::vector{DamagedReport(5, "duplicate")}, reports.Take());
+}
+
+TEST_F(Streams, CloningWithoutMemoryThrows4AndLeaksNothing)
+{
+    TestStream source({.dimension = 2, .spatial = true});
+    source.Key(0, {0.0, 0.0}).Key(600, {3.0, 4.0});
+    source.At(300);
+    const int failures = FailEveryAllocation([&] { return std::make_unique<KFS_StreamBase*>(nullptr); },
+                                             [&](KFS_StreamBase*& clone) {
+                                                 clone = source->Clone(true);
+                                                 delete clone;
+                                                 return 0;
+                                             },
+                                             [](KFS_StreamBase*&, int, Q_MemoryCount const& before) {
+                                                 EXPECT_EQ(before, Q_MemoryLive(nullptr));
+                                             });
+    EXPECT_GE(failures, 3);
+    reports.Take();     // std::bad_alloc is reported where it is translated
+}
+
+TEST_F(Streams, NothingIsLeftAfterEverything)
+{
+    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    {
+        TestStream plain({.dimension = 3});
+        TestStream spatial({.dimension = 3, .spatial = true});
+        for (int i = 0; i < 50; ++i) {
+            plain.Key(i * 7, {1.0 * i, 2.0, 3.0}, KFS_Interp_Spline);
+            spatial.Key(i * 7, {1.0 * i, 2.0 * (i % 3), 3.0}, KFS_Interp_Spline);
+        }
+        plain.At(100);
+        spatial.At(100);
+        EXPECT_EQ(0, plain.Pins());
+        EXPECT_EQ(0, spatial.Pins());
+        EXPECT_NE(before, Q_MemoryLive(nullptr));
+    }
+    EXPECT_EQ(before, Q_MemoryLive(nullptr));
+}
+
+} // namespace

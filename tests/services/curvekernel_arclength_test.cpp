@@ -1,0 +1,414 @@
+// Arc lengths and the tables from distance to parameter.
+
+#include "curvekernel_truth.h"
+
+#include "frame/services/memory.h"
+#include "frame/services/sequence.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <limits>
+#include <vector>
+
+namespace {
+
+using truth::Curve;
+using truth::Dice;
+using truth::Real;
+
+constexpr double kNaN = std::numeric_limits<double>::quiet_NaN();
+
+// The length of a path by Gauss's five points on ever smaller stretches. It starts from the places where the speed is
+// smallest: a cusp next to the end of a stretch is what such a rule can miss.
+class Ruler {
+public:
+    explicit Ruler(Curve const& curve) : curve_(curve)
+    {
+        for (std::size_t k = 0; k < 3; ++k)
+            polygon_ += std::hypot(curve.p[k + 1][0] - curve.p[k][0], curve.p[k + 1][1] - curve.p[k][1],
+                                   curve.p[k + 1][2] - curve.p[k][2]);
+        for (int i = 0; i < 200; ++i) {
+            Real low = i / 200.0L;
+            Real high = (i + 1) / 200.0L;
+            if (!(Slowing(low) < 0 && Slowing(high) >= 0)) continue;
+            for (int half = 0; half < 70; ++half) (Slowing((low + high) / 2) < 0 ? low : high) = (low + high) / 2;
+            cuts_.push_back(low);
+        }
+    }
+
+    double Polygon() const { return polygon_; }
+    Real Length(Real from, Real to) const
+    {
+        if (to < from) return -Length(to, from);
+        Real sum = 0;
+        for (const Real cut : cuts_)
+            if (cut > from && cut < to) {
+                sum += Refined(from, cut, Rule(from, cut), 0);
+                from = cut;
+            }
+        return sum + Refined(from, to, Rule(from, to), 0);
+    }
+
+private:
+    Real Slowing(Real t) const
+    {
+        Real sum = 0;
+        for (std::size_t i = 0; i < 3; ++i) sum += truth::FirstAt(curve_, i, t) * truth::SecondAt(curve_, i, t);
+        return sum;
+    }
+    Real Speed(Real t) const
+    {
+        Real squares = 0;
+        for (std::size_t i = 0; i < 3; ++i) squares += truth::FirstAt(curve_, i, t) * truth::FirstAt(curve_, i, t);
+        return std::sqrt(squares);
+    }
+    Real Rule(Real from, Real to) const
+    {
+        static constexpr Real kPlaces[] = {0, 0.538469310105683091036L, 0.906179845938663992798L};
+        static constexpr Real kWeights[] = {0.568888888888888888889L, 0.478628670499366468041L,
+                                            0.236926885056189087514L};
+        const Real half = (to - from) / 2;
+        const Real middle = (to + from) / 2;
+        Real sum = kWeights[0] * Speed(middle);
+        for (int k = 1; k < 3; ++k)
+            sum += kWeights[k] * (Speed(middle - kPlaces[k] * half) + Speed(middle + kPlaces[k] * half));
+        return half * sum;
+    }
+    Real Refined(Real from, Real to, Real whole, int depth) const
+    {
+        const Real middle = (from + to) / 2;
+        const Real left = Rule(from, middle);
+        const Real right = Rule(middle, to);
+        if (depth > 40 || std::fabs(left + right - whole) <= 1e-13L * polygon_) return left + right;
+        return Refined(from, middle, left, depth + 1) + Refined(middle, to, right, depth + 1);
+    }
+
+    Curve const& curve_;
+    double polygon_ = 0.0;
+    std::vector<Real> cuts_;
+};
+
+// A table that gives itself back.
+class Table {
+public:
+    Table(Curve& curve, double accuracy) : kernel_(curve.Get())
+    {
+        code = CRV_BuildArcSpline(&kernel_, &list, &length, accuracy);
+    }
+    ~Table()
+    {
+        if (list) {
+            EXPECT_EQ(0, SEQ_Dispose(list, 0));
+        }
+    }
+    Table(Table const&) = delete;
+    Table& operator=(Table const&) = delete;
+
+    double T(double s)
+    {
+        double t = kNaN;
+        EXPECT_EQ(0, CRV_TFromSSpline(&kernel_, &list, &t, s, 1.0));
+        return t;
+    }
+    int Items() const { return (*list)->count; }
+
+    int code = 0;
+    SEQ_Head** list = nullptr;
+    double length = kNaN;
+
+private:
+    CRV_Curve kernel_;
+};
+
+Curve Path(std::array<std::array<double, 3>, 4> const& points, short dimension)
+{
+    Curve curve;
+    curve.dimension = dimension;
+    for (std::size_t k = 0; k < 4; ++k) std::copy_n(points[k].begin(), 3, curve.p[k].begin());
+    return curve;
+}
+
+struct Named {
+    const char* name;
+    Curve curve;
+    int mostItems;
+};
+
+const std::vector<Named> kMuseum = {
+    {"a line at even speed", Path({{{0, 0}, {1, 2}, {2, 4}, {3, 6}}}, 2), 2},
+    {"a line without handles", Path({{{0, 0}, {0, 0}, {3, 6}, {3, 6}}}, 2), 12},
+    {"a line that turns back twice", Path({{{0, 0}, {30, 0}, {-20, 0}, {10, 0}}}, 2), 40},
+    {"a gentle arc", Path({{{0, 0}, {30, 20}, {70, 20}, {100, 0}}}, 2), 6},
+    {"a cusp in the middle", Path({{{0, 0}, {100, 100}, {0, 100}, {100, 0}}}, 2), 24},
+    {"almost a cusp", Path({{{0, 0}, {100, 100}, {0.01, 100}, {100, 0}}}, 2), 90},
+    {"a loop", Path({{{0, 0}, {150, 100}, {-50, 100}, {100, 0}}}, 2), 30},
+    {"a loop back to its start", Path({{{0, 0}, {100, 50}, {-100, 50}, {0, 0}}}, 2), 30},
+    {"no out handle", Path({{{0, 0}, {0, 0}, {50, 80}, {100, 0}}}, 2), 24},
+    {"no in handle", Path({{{0, 0}, {50, 80}, {100, 0}, {100, 0}}}, 2), 24},
+    {"three points in one", Path({{{0, 0}, {0, 0}, {0, 0}, {100, 40}}}, 2), 50},
+    {"both handles at the end", Path({{{0, 0}, {100, 40}, {100, 40}, {100, 40}}}, 2), 50},
+    {"one dimension", Path({{{0}, {5}, {7}, {10}}}, 1), 8},
+    {"one dimension, overshooting", Path({{{0}, {50}, {-30}, {10}}}, 1), 40},
+    {"a turn through space", Path({{{0, 0, 0}, {10, 0, 30}, {0, 40, 30}, {5, 5, -20}}}, 3), 40},
+    {"handles a thousand chords long", Path({{{0, 0, 0}, {1000, 20, 3}, {-40, 900, 300}, {1, 0, 0}}}, 3), 60},
+};
+
+// Length and places within the accuracy, and steps alike.
+void CheckTable(Curve curve, double accuracy, int samples)
+{
+    Table table(curve, accuracy);
+    ASSERT_EQ(0, table.code);
+    const Ruler ruler(curve);
+    EXPECT_NEAR(static_cast<double>(ruler.Length(0, 1)), table.length, accuracy);
+    EXPECT_EQ(0, table.T(0));
+    EXPECT_EQ(1, table.T(table.length));
+
+    Real reached = 0;
+    double before = 0;
+    for (int i = 1; i <= samples; ++i) {
+        const double s = table.length * i / samples;
+        const double t = table.T(s);
+        EXPECT_TRUE(t >= before && t <= 1) << t << " after " << before;
+        reached += ruler.Length(before, t);
+        EXPECT_NEAR(s, static_cast<double>(reached), accuracy) << "sample " << i << ", t " << t;
+        before = t;
+    }
+}
+
+TEST(CurveKernelArc, MuseumIsMeasuredWithinTheAccuracy)
+{
+    for (Named const& piece : kMuseum)
+        for (const double accuracy : {1.0, 1e-2, 1e-4, 1e-6}) {
+            SCOPED_TRACE(testing::Message() << piece.name << ", accuracy " << accuracy);
+            CheckTable(piece.curve, accuracy, 100);
+        }
+}
+
+TEST(CurveKernelArc, TablesAreNoLargerThanTheyNeed)
+{
+    for (Named const& piece : kMuseum) {
+        Curve curve = piece.curve;
+        Table table(curve, 1e-4 * Ruler(curve).Polygon());
+        ASSERT_EQ(0, table.code) << piece.name;
+        EXPECT_LE(table.Items(), piece.mostItems) << piece.name;
+    }
+}
+
+TEST(CurveKernelArc, EqualDistancesAreEqualSteps)
+{
+    for (Named const& piece : kMuseum) {
+        SCOPED_TRACE(piece.name);
+        Curve curve = piece.curve;
+        const Ruler ruler(curve);
+        Table table(curve, 1e-3 * ruler.Polygon());
+        Real shortest = std::numeric_limits<Real>::max();
+        Real longest = 0;
+        double before = 0;
+        for (int i = 1; i <= 1000; ++i) {
+            const double t = table.T(table.length * i / 1000);
+            const Real step = ruler.Length(before, t);
+            shortest = std::min(shortest, step);
+            longest = std::max(longest, step);
+            before = t;
+        }
+        EXPECT_LT(static_cast<double>((longest - shortest) / (ruler.Length(0, 1) / 1000)), 1e-3);
+    }
+}
+
+TEST(CurveKernelArc, RandomSegmentsOfAllKinds)
+{
+    Dice dice(61);
+    for (int i = 0; i < 3000; ++i) {
+        Curve curve;
+        curve.dimension = static_cast<short>(2 + i % 2);
+        const std::size_t dimension = static_cast<std::size_t>(curve.dimension);
+        const double reach = dice.Below(4) ? 1.0 : 1000.0;
+        for (std::size_t k = 0; k < dimension; ++k) {
+            curve.p[0][k] = dice.Between(-100, 100);
+            curve.p[3][k] = curve.p[0][k] + dice.Between(-100, 100);
+            curve.p[1][k] = curve.p[0][k] + reach * dice.Between(-100, 100);
+            curve.p[2][k] = curve.p[3][k] + reach * dice.Between(-100, 100);
+        }
+        switch (dice.Below(8)) {
+        case 0: curve.p[1] = curve.p[0]; break;
+        case 1: curve.p[2] = curve.p[3]; break;
+        case 2:
+            curve.p[1] = curve.p[0];
+            curve.p[2] = curve.p[3];
+            break;
+        case 3: curve.p[3] = curve.p[0]; break;
+        case 4: curve.p[2] = curve.p[1]; break;
+        case 5: curve.p[2] = curve.p[0]; break;
+        default: break;
+        }
+        SCOPED_TRACE(testing::Message() << curve);
+        CheckTable(curve, std::max(1e-4, 1e-7 * Ruler(curve).Polygon()), 12);
+    }
+}
+
+TEST(CurveKernelArc, CoincidentPointsHaveNoLength)
+{
+    Curve curve = Path({{{7, -3, 2}, {7, -3, 2}, {7, -3, 2}, {7, -3, 2}}}, 3);
+    Table table(curve, 1e-4);
+    ASSERT_EQ(0, table.code);
+    EXPECT_EQ(0, table.length);
+    ASSERT_NE(nullptr, table.list);
+    for (const double s : {-1.0, 0.0, 1.0}) EXPECT_EQ(0, table.T(s));
+}
+
+TEST(CurveKernelArc, AnyFiniteCurveHasATableWithoutNaN)
+{
+    Dice dice(62);
+    for (int i = 0; i < 3000; ++i) {
+        Curve curve;
+        curve.dimension = static_cast<short>(1 + i % 4);
+        for (auto& point : curve.p)
+            for (std::size_t k = 0; k < static_cast<std::size_t>(curve.dimension); ++k)
+                point[k] = dice.Below(5) == 0 ? 0.0 : dice.Wild(306);
+        const double accuracies[] = {1e-4, 0.0, -1.0, kNaN, 1e300, std::numeric_limits<double>::infinity()};
+        Table table(curve, accuracies[dice.Below(6)]);
+        ASSERT_EQ(0, table.code) << curve;
+        EXPECT_TRUE(std::isfinite(table.length) && table.length >= 0) << curve;
+        for (const double share : {-1.0, 0.0, 1e-9, 0.3, 0.7, 1.0, 2.0}) {
+            const double t = table.T(share * table.length);
+            EXPECT_TRUE(t >= 0 && t <= 1) << curve << t;
+        }
+        EXPECT_EQ(table.length > 0 ? 1 : 0, table.T(std::numeric_limits<double>::infinity()));
+    }
+}
+
+TEST(CurveKernelArc, ScaleDoesntMatter)
+{
+    const Curve plain = kMuseum[6].curve;
+    Curve same = plain;
+    Table unit(same, 1e-3);
+    for (const int power : {-1000, -500, -20, 20, 500, 1000}) {
+        Curve curve = plain;
+        for (auto& point : curve.p)
+            for (double& c : point) c = std::ldexp(c, power);
+        Table table(curve, std::ldexp(1e-3, power));
+        ASSERT_EQ(0, table.code) << power;
+        EXPECT_EQ(unit.Items(), table.Items()) << power;
+        EXPECT_EQ(unit.length, std::ldexp(table.length, -power)) << power;
+        EXPECT_EQ(unit.T(0.3 * unit.length), table.T(0.3 * table.length)) << power;
+    }
+}
+
+TEST(CurveKernelArc, ASecondBuildReplacesTheTable)
+{
+    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    {
+        Curve curve = kMuseum[4].curve;
+        Table table(curve, 1e-6);
+        const int many = table.Items();
+        Curve line = kMuseum[0].curve;
+        const CRV_Curve kernel = line.Get();
+        ASSERT_EQ(0, CRV_BuildArcSpline(&kernel, &table.list, &table.length, 1e-4));
+        EXPECT_LT(table.Items(), many);
+        EXPECT_DOUBLE_EQ(std::sqrt(45.0), table.length);
+        EXPECT_NEAR(0.25, table.T(0.25 * table.length), 1e-12);
+    }
+    EXPECT_EQ(before.blocks, Q_MemoryLive(nullptr).blocks);
+    EXPECT_EQ(before.bytes, Q_MemoryLive(nullptr).bytes);
+}
+
+TEST(CurveKernelArc, EachFailingAllocationLeavesNothing)
+{
+    Curve curve = kMuseum[6].curve;
+    const CRV_Curve kernel = curve.Get();
+    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    int failures = 0;
+    for (int n = 1; n < 20; ++n) {
+        SEQ_Head** list = nullptr;
+        double length = 77;
+        ASSERT_EQ(0, CRV_BuildArcSpline(&kernel, &list, &length, 1e-4));  // the older table is given up first
+        Q_FailAllocation(n);
+        const int code = CRV_BuildArcSpline(&kernel, &list, &length, 1e-4);
+        const bool fired = Q_FailAllocationFired();
+        Q_FailAllocation(0);
+        if (!fired) {
+            EXPECT_EQ(0, code);
+            EXPECT_EQ(0, SEQ_Dispose(list, 0));
+            break;
+        }
+        ++failures;
+        EXPECT_EQ(4, code) << n;
+        EXPECT_EQ(nullptr, list) << n;
+        EXPECT_EQ(0, length) << n;
+        EXPECT_EQ(before.blocks, Q_MemoryLive(nullptr).blocks) << n;
+    }
+    EXPECT_GE(failures, 1);
+    EXPECT_EQ(before.blocks, Q_MemoryLive(nullptr).blocks);
+}
+
+TEST(CurveKernelArc, WithoutATableTheCurveItselfIsMeasured)
+{
+    for (Named const& piece : kMuseum) {
+        Curve curve = piece.curve;
+        const CRV_Curve kernel = curve.Get();
+        Table table(curve, 1e-6);
+        for (int i = 0; i <= 10; ++i) {
+            SEQ_Head** none = nullptr;
+            double t = kNaN;
+            const double s = table.length * i / 10;
+            ASSERT_EQ(0, CRV_TFromSSpline(&kernel, &none, &t, s, 1.0));
+            EXPECT_EQ(nullptr, none);
+            EXPECT_NEAR(table.T(s), t, 1e-4) << piece.name;
+        }
+    }
+}
+
+TEST(CurveKernelArc, TheFifthArgumentIsTheParameterAtTheEnd)
+{
+    Curve curve = kMuseum[3].curve;
+    const CRV_Curve kernel = curve.Get();
+    Table table(curve, 1e-4);
+    double t = kNaN;
+    ASSERT_EQ(0, CRV_TFromSSpline(&kernel, &table.list, &t, table.length, 4.0));
+    EXPECT_EQ(4.0, t);
+    ASSERT_EQ(0, CRV_TFromSSpline(&kernel, &table.list, &t, 0.5 * table.length, 4.0));
+    EXPECT_DOUBLE_EQ(4.0 * table.T(0.5 * table.length), t);
+}
+
+// The same in every build so far, with gcc and clang, with and without optimisation; see CurveKernelBits.
+TEST(CurveKernelArc, BitsAreTheSameInEveryBuild)
+{
+    truth::BitHash hash;
+    for (Named const& piece : kMuseum) {
+        Curve curve = piece.curve;
+        Table table(curve, 1e-4);
+        hash.Mix(table.length);
+        for (int i = 1; i < 100; ++i) hash.Mix(table.T(0.01 * i * table.length));
+    }
+    EXPECT_EQ(13409314404416890409u, hash.Get());
+}
+
+TEST(CurveKernelArc, RefusalsLeaveNoTable)
+{
+    Curve curve = kMuseum[3].curve;
+    CRV_Curve kernel = curve.Get();
+    SEQ_Head** list = nullptr;
+    double length = 77;
+    double t = 77;
+    EXPECT_EQ(CRV_Err_NullArgument, CRV_BuildArcSpline(&kernel, nullptr, &length, 1e-4));
+    EXPECT_EQ(CRV_Err_NullArgument, CRV_BuildArcSpline(&kernel, &list, nullptr, 1e-4));
+    EXPECT_EQ(CRV_Err_NullArgument, CRV_TFromSSpline(&kernel, nullptr, &t, 0, 1.0));
+    EXPECT_EQ(CRV_Err_NullArgument, CRV_TFromSSpline(&kernel, &list, nullptr, 0, 1.0));
+    EXPECT_EQ(CRV_Err_NotFinite, CRV_TFromSSpline(&kernel, &list, &t, kNaN, 1.0));
+    EXPECT_EQ(CRV_Err_NullArgument, CRV_TFromSSpline(nullptr, &list, &t, 0, 1.0));
+
+    ASSERT_EQ(0, CRV_BuildArcSpline(&kernel, &list, &length, 1e-4));
+    curve.p[2][1] = kNaN;
+    EXPECT_EQ(CRV_Err_NotFinite, CRV_BuildArcSpline(&kernel, &list, &length, 1e-4));
+    EXPECT_EQ(nullptr, list);
+    EXPECT_EQ(0, length);
+    for (const short dimension : {-1, 0, 5}) {
+        kernel.dimension = dimension;
+        EXPECT_EQ(CRV_Err_Dimension, CRV_BuildArcSpline(&kernel, &list, &length, 1e-4));
+        EXPECT_EQ(CRV_Err_Dimension, CRV_TFromSSpline(&kernel, &list, &t, 0, 1.0));
+    }
+    EXPECT_EQ(77, t);
+}
+
+}  // namespace

@@ -1,0 +1,464 @@
+#include "frame/services/memory.h"
+#include "frame/services/sequence.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <climits>
+#include <cstdint>
+#include <cstring>
+#include <functional>
+#include <random>
+#include <utility>
+#include <vector>
+
+namespace {
+
+// A list of ints in items of a given size; the int stands at the front and the rest of an item is its shadow, so that a
+// move that loses bytes shows.
+class IntList {
+public:
+    explicit IntList(short itemSize = 8, std::vector<int> const& values = {})
+    {
+        EXPECT_EQ(0, SEQ_New(0, itemSize, 4, 1, &list_));
+        for (const int value : values) EXPECT_EQ(0, SEQ_Insert(Item(value).data(), -1, list_));
+    }
+    explicit IntList(SEQ_Head** list) : list_(list) {}
+    IntList(IntList const&) = delete;
+    IntList& operator=(IntList const&) = delete;
+    ~IntList()
+    {
+        if (list_) SEQ_Dispose(list_, 0);
+    }
+
+    SEQ_Head** get() const { return list_; }
+    SEQ_Head** release() { return std::exchange(list_, nullptr); }
+    int Count() const { return (*list_)->count; }
+
+    std::vector<unsigned char> Item(int value) const
+    {
+        std::vector<unsigned char> item(static_cast<std::size_t>((*list_)->itemSize));
+        for (std::size_t i = 0; i < item.size(); ++i)
+            item[i] = static_cast<unsigned char>(value * 31 + static_cast<int>(i));
+        std::memcpy(item.data(), &value, std::min(item.size(), sizeof value));
+        return item;
+    }
+
+    // The values, read item by item; -1 for an item whose shadow is wrong.
+    std::vector<int> Values() const
+    {
+        std::vector<int> values;
+        for (int i = 0; i < Count(); ++i) {
+            void const* address = nullptr;
+            EXPECT_EQ(0, SEQ_GetConstAddress(list_, i, &address));
+            int value = 0;
+            std::memcpy(&value, address, std::min<std::size_t>(sizeof value, Item(0).size()));
+            values.push_back(std::memcmp(address, Item(value).data(), Item(value).size()) == 0 ? value : -1);
+        }
+        return values;
+    }
+
+private:
+    SEQ_Head** list_ = nullptr;
+};
+
+int CompareInts(void*, SEQ_Head const* const*, void const* a, void const* b)
+{
+    int left, right;
+    std::memcpy(&left, a, sizeof left);
+    std::memcpy(&right, b, sizeof right);
+    return (left > right) - (left < right);
+}
+
+void SetSort(SEQ_Head** list, SEQ_SortFunc sort = CompareInts)
+{
+    const SEQ_Funcs funcs{nullptr, nullptr, sort};
+    ASSERT_EQ(0, SEQ_SetFuncs(list, 3, &funcs));
+}
+
+// ---- search
+
+struct Search {
+    const char* why;
+    std::vector<int> items;
+    int probe;
+    bool found;
+    int index;
+};
+
+const Search Searches[] = {
+    {"an item", {10, 20, 30}, 20, true, 1},
+    {"between two", {10, 20, 30}, 25, false, 2},
+    {"after all", {10, 20, 30}, 35, false, 3},
+    {"before all", {10, 20, 30}, 5, false, 0},
+    {"nothing there", {}, 5, false, 0},
+    {"the only one", {7}, 7, true, 0},
+    {"the lowest of equals", {1, 4, 4, 4, 9}, 4, true, 1},
+    {"all equal", {4, 4, 4, 4}, 4, true, 0},
+};
+
+TEST(SequenceSearch, FindsTheItemOrItsPlace)
+{
+    for (Search const& search : Searches) {
+        SCOPED_TRACE(search.why);
+        const IntList list(12, search.items);
+        SetSort(list.get());
+        unsigned char found = 77;
+        int index = 77;
+        ASSERT_EQ(0, SEQ_GetSortedItem(list.get(), 0, list.Item(search.probe).data(), &found, 0, &index));
+        EXPECT_EQ(search.found ? 1 : 0, found);
+        EXPECT_EQ(search.index, index);
+    }
+}
+
+TEST(SequenceSearch, AgreesWithTheStandardLibraryAtEveryCount)
+{
+    std::mt19937 random(11);
+    for (int count = 0; count < 70; ++count) {
+        std::vector<int> items(static_cast<std::size_t>(count));
+        for (int& item : items) item = static_cast<int>(random() % 60) * 2;
+        std::sort(items.begin(), items.end());
+        const IntList list(8, items);
+        SetSort(list.get());
+        for (int probe = -1; probe <= 121; ++probe) {
+            const auto place = std::lower_bound(items.begin(), items.end(), probe);
+            unsigned char found = 0;
+            int index = -1;
+            ASSERT_EQ(0, SEQ_GetSortedConstItem(list.get(), 0, list.Item(probe).data(), &found, 0, &index));
+            ASSERT_EQ(place - items.begin(), index) << count << " items, probe " << probe;
+            ASSERT_EQ(place != items.end() && *place == probe, found == 1) << count << " items, probe " << probe;
+        }
+    }
+}
+
+TEST(SequenceSearch, WithoutSortFunctionIsRefusedAndAnswersNothing)
+{
+    const IntList list(8, {1, 2});
+    unsigned char found = 77;
+    int index = 77;
+    EXPECT_EQ(SEQ_Err_NoSortFunc, SEQ_GetSortedItem(list.get(), 0, list.Item(1).data(), &found, 0, &index));
+    EXPECT_EQ(77, found);
+    EXPECT_EQ(77, index);
+}
+
+// ---- indices
+
+TEST(SequenceIndex, OnlyIndicesInTheListAreTaken)
+{
+    const int asked[] = {INT_MIN, INT_MIN + 1, -2, -1, 0, 1, 2, 3, INT_MAX};
+    for (const int count : {0, 1, 3})
+        for (const int index : asked) {
+            SCOPED_TRACE(testing::Message() << count << " items, index " << index);
+            std::vector<int> values(static_cast<std::size_t>(count));
+            for (int i = 0; i < count; ++i) values[static_cast<std::size_t>(i)] = 100 + i;
+            const IntList list(8, values);
+            const bool inList = index >= 0 && index < count;
+            const bool namesLast = index == -1 && count > 0;
+
+            void* item = nullptr;
+            EXPECT_EQ(inList ? 0 : SEQ_Err_BadIndex, SEQ_GetAddress(list.get(), index, 1, &item));
+            EXPECT_EQ(inList, item != nullptr);
+            EXPECT_EQ(inList ? 1 : 0, SEQ_GetPinCount(list.get())) << "a failure owes no unlock";
+
+            void const* constItem = nullptr;
+            EXPECT_EQ(inList || namesLast ? 0 : SEQ_Err_BadIndex, SEQ_GetConstAddress(list.get(), index, &constItem));
+            if (inList || namesLast) {
+                const int wanted = namesLast ? values.back() : values[static_cast<std::size_t>(index)];
+                EXPECT_EQ(0, std::memcmp(list.Item(wanted).data(), constItem, 8));
+            }
+
+            unsigned char copy[8];
+            EXPECT_EQ(inList ? 0 : SEQ_Err_BadIndex, SEQ_GetItemCopy(list.get(), 0, index, copy));
+            if (!inList) {
+                EXPECT_EQ(SEQ_Err_BadIndex, SEQ_SetItemCopy(list.Item(5).data(), index, list.get(), 0, 0));
+                EXPECT_EQ(SEQ_Err_BadIndex, SEQ_Remove(index, list.get(), 0, nullptr));
+                EXPECT_EQ(SEQ_Err_BadIndex, SEQ_ForRange(
+                                                list.get(), index, index, 0,
+                                                [](SEQ_Head**, long, int, void*) {
+                                                    ADD_FAILURE();
+                                                    return 0;
+                                                },
+                                                nullptr));
+            }
+            const bool insertable = index >= -1 && index <= count;
+            EXPECT_EQ(insertable ? 0 : SEQ_Err_BadIndex, SEQ_InsertCopy(list.Item(5).data(), index, list.get(), 0));
+            EXPECT_EQ(insertable ? count + 1 : count, list.Count());
+        }
+}
+
+TEST(SequenceNew, RefusesItemSizesThatAreNone)
+{
+    for (const short size : {SHRT_MIN, -1, 0}) {
+        SEQ_Head** list = nullptr;
+        EXPECT_EQ(SEQ_Err_BadArgument, SEQ_New(0, size, 4, 1, &list));
+        EXPECT_EQ(nullptr, list);
+    }
+}
+
+int OtherSort(void*, SEQ_Head const* const*, void const* a, void const* b)
+{
+    return -CompareInts(nullptr, nullptr, a, b);
+}
+
+TEST(SequenceFuncs, NullLeavesAndRemoveTakesAway)
+{
+    const IntList list(8, {1, 2, 3});
+    unsigned char found = 0;
+    int index = 0;
+    const auto search = [&] { return SEQ_GetSortedItem(list.get(), 0, list.Item(9).data(), &found, 0, &index); };
+
+    SetSort(list.get());
+    EXPECT_EQ(0, search());
+    EXPECT_EQ(3, index);
+    const SEQ_Funcs removeOthers{SEQ_RemoveFunc, SEQ_RemoveFunc, nullptr};
+    EXPECT_EQ(0, SEQ_SetFuncs(list.get(), 3, &removeOthers));
+    EXPECT_EQ(0, search());
+    EXPECT_EQ(3, index) << "the sort function stays";
+    SetSort(list.get(), OtherSort);
+    EXPECT_EQ(0, search());
+    EXPECT_EQ(0, index) << "the other order";
+    SetSort(list.get(), SEQ_RemoveFunc);
+    EXPECT_EQ(SEQ_Err_NoSortFunc, search());
+}
+
+// ---- an item of the list as the source
+
+TEST(SequenceEdits, AnItemOfTheListCanBeTheSource)
+{
+    const std::vector<int> start = {11, 22, 33, 44};  // a full first block: the insertion moves it
+    for (const bool full : {false, true})
+        for (int from = 0; from < 4; ++from)
+            for (int to = 0; to <= 4; ++to) {
+                const IntList list(24, start);
+                if (!full) SEQ_ReserveSpace(40, list.get());
+                void const* source = nullptr;
+                ASSERT_EQ(0, SEQ_GetConstAddress(list.get(), from, &source));
+                ASSERT_EQ(0, SEQ_InsertCopy(source, to, list.get(), 0));
+                std::vector<int> wanted = start;
+                wanted.insert(wanted.begin() + to, start[static_cast<std::size_t>(from)]);
+                EXPECT_EQ(wanted, list.Values()) << "from " << from << " to " << to;
+
+                ASSERT_EQ(0, SEQ_GetConstAddress(list.get(), from, &source));
+                ASSERT_EQ(0, SEQ_SetItemCopy(source, to, list.get(), 0, 0));
+                wanted[static_cast<std::size_t>(to)] = wanted[static_cast<std::size_t>(from)];
+                EXPECT_EQ(wanted, list.Values()) << "set from " << from << " to " << to;
+            }
+}
+
+// ---- walking
+
+struct Walk {
+    int first, last, stopAt;
+    std::vector<int> visited;
+    int code, lastVisited;
+};
+
+TEST(SequenceWalk, ARangeGoesEitherWayAndStopsOnOrder)
+{
+    const Walk walks[] = {
+        {3, 1, -1, {3, 2, 1}, 0, 1},           {1, 3, -1, {1, 2, 3}, 0, 3}, {2, 2, -1, {2}, 0, 2},
+        {0, 4, 2, {0, 1, 2}, 99, 2},           {4, 0, 4, {4}, 99, 4},       {0, 5, -1, {}, SEQ_Err_BadIndex, 77},
+        {-1, 2, -1, {}, SEQ_Err_BadIndex, 77},
+    };
+    static std::vector<int> visited;
+    const IntList list(8, {100, 101, 102, 103, 104});
+    for (Walk const& walk : walks) {
+        SCOPED_TRACE(testing::Message() << walk.first << " to " << walk.last << ", stop at " << walk.stopAt);
+        visited.clear();
+        int lastVisited = 77;
+        const auto visit = [](SEQ_Head** handle, long stopAt, int index, void* item) {
+            void const* address = nullptr;
+            EXPECT_EQ(0, SEQ_GetConstAddress(handle, index, &address));
+            EXPECT_EQ(address, item);
+            visited.push_back(index);
+            return index == stopAt ? 99 : 0;
+        };
+        EXPECT_EQ(walk.code, SEQ_ForRange(list.get(), walk.first, walk.last, walk.stopAt, visit, &lastVisited));
+        EXPECT_EQ(walk.visited, visited);
+        EXPECT_EQ(walk.lastVisited, lastVisited);
+        EXPECT_EQ(0, SEQ_GetPinCount(list.get()));
+    }
+}
+
+TEST(SequenceWalk, ForEachFollowsAListThatShrinksUnderIt)
+{
+    const IntList list(8, {1, 2, 3, 4, 5, 6});
+    const auto removeEven = [](SEQ_Head** handle, long, int index, void* item) {
+        int value;
+        std::memcpy(&value, item, sizeof value);
+        return value % 2 == 0 ? SEQ_Remove(index, handle, 0, nullptr) : 0;
+    };
+    EXPECT_EQ(0, SEQ_ForEach(list.get(), 0, removeEven, 0));
+    EXPECT_EQ((std::vector<int>{1, 3, 5}), list.Values());
+
+    long visits = 0;
+    const auto countTo2 = [](SEQ_Head const* const*, long refcon, int index, void const*) {
+        ++*reinterpret_cast<long*>(refcon);
+        return index == 1 ? 42 : 0;
+    };
+    EXPECT_EQ(42, SEQ_ForEachConst(list.get(), reinterpret_cast<long>(&visits), countTo2, 0));
+    EXPECT_EQ(2, visits);
+}
+
+// ---- pins and room
+
+TEST(SequencePins, NestAndNeverFallBelowZero)
+{
+    const IntList list(8, {1});
+    EXPECT_EQ(0, SEQ_Lock(1, list.get()));
+    EXPECT_EQ(0, SEQ_LockConst(1, list.get()));
+    void* item = nullptr;
+    EXPECT_EQ(0, SEQ_GetAddress(list.get(), 0, 1, &item));
+    EXPECT_EQ(0, SEQ_GetAddress(list.get(), 0, 0, &item));
+    EXPECT_EQ(3, SEQ_GetPinCount(list.get()));
+    EXPECT_EQ(0, SEQ_Unlock(list.get()));
+    EXPECT_EQ(0, SEQ_UnlockConst(list.get()));
+    EXPECT_EQ(0, SEQ_Unlock(list.get()));
+    EXPECT_EQ(SEQ_Err_NotPinned, SEQ_Unlock(list.get()));
+    EXPECT_EQ(SEQ_Err_NotPinned, SEQ_UnlockConst(list.get()));
+    EXPECT_EQ(0, SEQ_GetPinCount(list.get()));
+    EXPECT_EQ(0, SEQ_Lock(1, list.get()));
+    EXPECT_EQ(1, SEQ_GetPinCount(list.get())) << "a surplus unlock isn't paid for later";
+}
+
+TEST(SequencePins, HoldAddressesThroughEverythingButGrowth)
+{
+    const IntList list(8, {1, 2, 3});
+    ASSERT_EQ(0, SEQ_ReserveSpace(10, list.get()));
+    void* pinned = nullptr;
+    ASSERT_EQ(0, SEQ_GetAddress(list.get(), 0, 1, &pinned));
+    EXPECT_EQ(0, SEQ_Compact(list.get()));
+    for (int i = 0; i < 7; ++i) EXPECT_EQ(0, SEQ_InsertCopy(list.Item(9).data(), -1, list.get(), 0));
+    EXPECT_EQ(0, SEQ_SetItemCopy(list.Item(4).data(), 2, list.get(), 0, 0));
+    EXPECT_EQ(0, SEQ_SetNumItems(2, list.get(), 0));
+    void* again = nullptr;
+    ASSERT_EQ(0, SEQ_GetAddress(list.get(), 0, 0, &again));
+    EXPECT_EQ(pinned, again);
+    EXPECT_EQ((std::vector<int>{1, 2}), list.Values());
+}
+
+TEST(SequenceRoom, ReservedRoomNeedsNoMemoryAndCompactReturnsIt)
+{
+    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    const IntList list(104);
+    const Q_MemoryCount empty = Q_MemoryLive(nullptr);
+    ASSERT_EQ(0, SEQ_ReserveSpace(50, list.get()));
+    EXPECT_EQ(empty.bytes + 50 * 104, Q_MemoryLive(nullptr).bytes);
+    Q_FailAllocation(1);
+    for (int i = 0; i < 50; ++i) ASSERT_EQ(0, SEQ_Insert(list.Item(i).data(), 0, list.get()));
+    EXPECT_FALSE(Q_FailAllocationFired());
+    EXPECT_EQ(4, SEQ_Insert(list.Item(50).data(), -1, list.get()));
+    EXPECT_EQ(50, list.Count());
+    ASSERT_EQ(0, SEQ_SetNumItems(7, list.get(), 0));
+    ASSERT_EQ(0, SEQ_Compact(list.get()));
+    EXPECT_EQ(empty.bytes + 7 * 104, Q_MemoryLive(nullptr).bytes);
+    ASSERT_EQ(0, SEQ_SetNumItems(0, list.get(), 0));
+    ASSERT_EQ(0, SEQ_Compact(list.get()));
+    EXPECT_EQ(empty, Q_MemoryLive(nullptr));
+    EXPECT_NE(before, empty);
+}
+
+TEST(SequenceRoom, NumbersInItemsAreAlignedAndWholeSizesLeaveNoGaps)
+{
+    for (const short itemSize : {1, 4, 8, 9, 16, 24, 61, 104, 600}) {
+        const IntList list(itemSize, {1, 2, 3, 4, 5, 6, 7});
+        std::vector<std::uintptr_t> addresses;
+        for (int i = 0; i < list.Count(); ++i) {
+            void const* item = nullptr;
+            ASSERT_EQ(0, SEQ_GetConstAddress(list.get(), i, &item));
+            addresses.push_back(reinterpret_cast<std::uintptr_t>(item));
+            EXPECT_EQ(0u, addresses.back() % 8) << "size " << itemSize << ", item " << i;
+            if (itemSize % 8 == 0) {
+                EXPECT_EQ(addresses[0] + static_cast<std::uintptr_t>(i) * static_cast<std::uintptr_t>(itemSize),
+                          addresses.back());
+            }
+        }
+        EXPECT_EQ(0u, addresses[0] % 16);
+    }
+}
+
+TEST(SequenceRoom, NewItemsAreZeroAlsoWhereOldOnesLay)
+{
+    const IntList list(8, {1, 2, 3, 4, 5});
+    ASSERT_EQ(0, SEQ_SetNumItems(1, list.get(), 0));
+    ASSERT_EQ(0, SEQ_SetNumItems(20, list.get(), 0));
+    const std::vector<unsigned char> zero(8);
+    for (int i = 1; i < 20; ++i) {
+        void const* item = nullptr;
+        ASSERT_EQ(0, SEQ_GetConstAddress(list.get(), i, &item));
+        EXPECT_EQ(0, std::memcmp(zero.data(), item, 8)) << i;
+    }
+    EXPECT_EQ(SEQ_Err_BadArgument, SEQ_SetNumItems(-1, list.get(), 0));
+    EXPECT_EQ(20, list.Count());
+}
+
+TEST(SequenceRoom, AppendingMovesTheItemsARareNumberOfTimes)
+{
+    const IntList list(16);
+    int moves = 0;
+    void const* last = nullptr;
+    for (int i = 0; i < 100000; ++i) {
+        ASSERT_EQ(0, SEQ_Insert(list.Item(i).data(), -1, list.get()));
+        void const* first = nullptr;
+        SEQ_GetConstAddress(list.get(), 0, &first);
+        moves += first != last;
+        last = first;
+    }
+    EXPECT_LE(moves, 30);
+}
+
+TEST(SequenceHandle, NullIsRefusedEverywhere)
+{
+    SEQ_Head** const none = nullptr;
+    const std::vector<std::function<int()>> calls = {
+        [&] { return SEQ_Dispose(none, 0); },
+        [&] {
+            SEQ_Head** out;
+            return SEQ_Duplicate(none, 0, &out);
+        },
+        [&] {
+            SEQ_Funcs funcs{};
+            return SEQ_SetFuncs(none, 3, &funcs);
+        },
+        [&] { return SEQ_SetRefcon(nullptr, none); },
+        [&] { return SEQ_Lock(1, none); },
+        [&] { return SEQ_Unlock(none); },
+        [&] {
+            void* item;
+            return SEQ_GetAddress(none, 0, 1, &item);
+        },
+        [&] {
+            void const* item;
+            return SEQ_GetConstAddress(none, 0, &item);
+        },
+        [&] {
+            int item;
+            return SEQ_GetItemCopy(none, 0, 0, &item);
+        },
+        [&] {
+            int item = 0;
+            return SEQ_SetItemCopy(&item, 0, none, 0, 0);
+        },
+        [&] {
+            int item = 0;
+            return SEQ_InsertCopy(&item, 0, none, 0);
+        },
+        [&] { return SEQ_Remove(0, none, 0, nullptr); },
+        [&] {
+            unsigned char f;
+            int i;
+            int probe = 0;
+            return SEQ_GetSortedItem(none, 0, &probe, &f, 0, &i);
+        },
+        [&] {
+            return SEQ_ForEach(
+                none, 0, [](SEQ_Head**, long, int, void*) { return 0; }, 0);
+        },
+        [&] { return SEQ_ReserveSpace(1, none); },
+        [&] { return SEQ_Compact(none); },
+        [&] { return SEQ_SetNumItems(1, none, 0); },
+    };
+    for (std::size_t i = 0; i < calls.size(); ++i) EXPECT_EQ(SEQ_Err_BadList, calls[i]()) << "call " << i;
+}
+
+}  // namespace

@@ -1,0 +1,63 @@
+#pragma once
+
+#include "keystore/stream.h"
+#include "tree/listener.h"
+#include "tree/streamgroup.h"
+
+#include <functional>
+#include <utility>
+
+// A root whose streams are heard. It holds leaves without owning them and keeps them at the scale they have.
+class HeardRoot : public KFS_StreamGroup {
+public:
+    HeardRoot() : KFS_StreamGroup(nullptr, nullptr, false) {}
+    void Store(KFS_Stream* leaf)
+    {
+        timeScale_ = leaf->GetTimeScale();
+        leaf->SetParent(this);
+    }
+    int ProbeListenerState() override { return KFS_ListenerState_Heard; }
+    unsigned int GetNumStreams() const override { return 0; }
+    KFS_StreamBase const* GetStream(unsigned int) const override { return nullptr; }
+    KFS_StreamBase* GetEditableStreamNullOK(unsigned int) override { return nullptr; }
+    unsigned int GetPreferredTimeScale() const override { return timeScale_; }
+    KFS_StreamBase* CloneStream(KFS_CloneStreamParams const&) const override { return nullptr; }
+    bool IsAnimated(bool) const override { return false; }
+    bool AffectsRendering(KFS_RenderOptionsBase const&) const override { return true; }
+    hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const&, GetRenderGuidFilter*) const override { return {}; }
+
+private:
+    unsigned int timeScale_ = 600;
+};
+
+// Counts the changes of value that it hears while it lives, and may do something about them.
+class ValueListener : public KFS_StreamListener {
+public:
+    explicit ValueListener(std::function<void()> reaction = {}) : reaction_(std::move(reaction)) { KFS_RegisterMainListener(this); }
+    ~ValueListener() override { KFS_UnregisterMainListener(this); }
+    // Since the last call.
+    int Take() { return std::exchange(count_, 0); }
+
+    void StreamAboutToBeInserted(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int) override {}
+    void StreamInserted(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int) override {}
+    void StreamAboutToBeRemoved(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int) override {}
+    void StreamRemoved(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int) override {}
+    void StreamAboutToBeSwapped(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int) override {}
+    void StreamSwapped(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int) override {}
+    void StreamsAboutToBeReordered(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int, unsigned int) override {}
+    void StreamsReordered(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int, unsigned int) override {}
+    void StreamDestroyed(KFS_StreamBase const*) override {}
+    void StreamValueChanged(KFS_Stream*) override
+    {
+        ++count_;
+        if (reaction_) {
+            reaction_();
+        }
+    }
+    void StreamFlagsChanged(KFS_StreamBase*, unsigned int, unsigned int) override {}
+    void StreamDisplayNameChanged(KFS_StreamBase*) override {}
+
+private:
+    int count_ = 0;
+    std::function<void()> reaction_;
+};

@@ -1,0 +1,289 @@
+#include "tree/streambase.h"
+
+#include "tests/support/streams.h"
+#include "tree/listener.h"
+#include "tree/streamgroup.h"
+
+#include <stdexcept>
+
+namespace {
+
+u16str Text(char const* text)
+{
+    return Q_MBToUTF16String(text);
+}
+
+// A group that holds children without owning them, so that a test can build any tree.
+class Group : public KFS_StreamGroup {
+public:
+    explicit Group(unsigned int timeScale = 0) : KFS_StreamGroup(nullptr, nullptr, false), timeScale_(timeScale) {}
+    void Store(KFS_StreamBase* child)
+    {
+        children_.push_back(child);
+        child->SetParent(this);
+    }
+    unsigned int GetNumStreams() const override { return static_cast<unsigned int>(children_.size()); }
+    KFS_StreamBase const* GetStream(unsigned int index) const override { return children_[index]; }
+    KFS_StreamBase* GetEditableStreamNullOK(unsigned int index) override
+    {
+        return children_[index]->IsCanonical() ? nullptr : children_[index];
+    }
+    unsigned int GetPreferredTimeScale() const override
+    {
+        return timeScale_ ? timeScale_ : KFS_StreamGroup::GetPreferredTimeScale();
+    }
+    void NotifyStreamStored(KFS_StreamGroup* group, KFS_StreamBase* stream) override
+    {
+        stored.push_back({group, stream});
+        if (alsoStore) {
+            KFS_StreamBase* const child = std::exchange(alsoStore, nullptr);
+            Store(child);
+        }
+    }
+    KFS_StreamBase* CloneStream(KFS_CloneStreamParams const&) const override { return nullptr; }
+    bool IsAnimated(bool) const override { return false; }
+    bool AffectsRendering(KFS_RenderOptionsBase const&) const override { return true; }
+    hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const&, GetRenderGuidFilter*) const override { return {}; }
+
+    std::vector<std::pair<KFS_StreamGroup*, KFS_StreamBase*>> stored;
+    KFS_StreamBase* alsoStore = nullptr;
+
+private:
+    std::vector<KFS_StreamBase*> children_;
+    unsigned int timeScale_;
+};
+
+class HeardRoot : public Group {
+public:
+    int ProbeListenerState() override { return ++probes, KFS_ListenerState_Heard; }
+    int probes = 0;
+};
+
+// Writes down what it hears.
+class Listener : public KFS_StreamListener {
+public:
+    Listener() { KFS_RegisterMainListener(this); }
+    ~Listener() override { KFS_UnregisterMainListener(this); }
+    std::vector<std::string> Take() { return std::exchange(heard_, {}); }
+
+    void StreamAboutToBeInserted(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int) override {}
+    void StreamInserted(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int) override {}
+    void StreamAboutToBeRemoved(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int) override {}
+    void StreamRemoved(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int) override {}
+    void StreamAboutToBeSwapped(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int) override {}
+    void StreamSwapped(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int) override {}
+    void StreamsAboutToBeReordered(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int, unsigned int) override {}
+    void StreamsReordered(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int, unsigned int) override {}
+    void StreamDestroyed(KFS_StreamBase const*) override { heard_.push_back("destroyed"); }
+    void StreamValueChanged(KFS_Stream*) override { heard_.push_back("value"); }
+    void StreamFlagsChanged(KFS_StreamBase*, unsigned int oldFlags, unsigned int newFlags) override
+    {
+        heard_.push_back("flags " + std::to_string(oldFlags) + " to " + std::to_string(newFlags));
+    }
+    void StreamDisplayNameChanged(KFS_StreamBase*) override { heard_.push_back("name"); }
+
+private:
+    std::vector<std::string> heard_;
+};
+
+using Heard = std::vector<std::string>;
+
+class StreamBase : public StreamTest {};
+
+TEST_F(StreamBase, ANewNodeIsActiveAndConstrained)
+{
+    const TestStream stream;
+    EXPECT_EQ(1u, stream->GetStreamBaseFlags());
+    EXPECT_TRUE(stream->AreDimensionsConstrained());
+    stream->SetDimensionsConstrained(false);
+    EXPECT_EQ(0x2001u, stream->GetStreamBaseFlags());
+    EXPECT_EQ(FX_Param_NotFilledIn, stream->GetParamDef().paramType);
+    KFS_ValueDesc desc;
+    desc.dataType = KFS_Type_Double;
+    EXPECT_EQ(5u, KFS_Stream(1, 600, 0, 0, 7, 0, desc, nullptr, nullptr, true).GetStreamBaseFlags());
+}
+
+TEST_F(StreamBase, FlagAccessorsHoldTheirBits)
+{
+    const TestStream stream;
+    struct Row {
+        void (KFS_StreamBase::*set)(bool);
+        bool (KFS_StreamBase::*get)() const;
+        unsigned int bit;
+    };
+    using B = KFS_StreamBase;
+    const Row rows[] = {
+        {&B::SetActive, &B::IsActive, 0x1},
+        {&B::SetHidden, &B::IsHidden, 0x2},
+        {&B::SetCanonical, &B::IsCanonical, 0x4},
+        {&B::ShowActiveSwitch, &B::IsShowingActiveSwitch, 0x8},
+        {&B::SetDisabled, &B::IsDisabled, 0x10},
+        {&B::SetElided, &B::IsElided, 0x20},
+        {&B::MakeIndependent, &B::IsIndependent, 0x40},
+        {&B::SetMarkedGraph, &B::IsMarkedGraph, 0x200},
+        {&B::SetShownWhenEmpty, &B::IsShownWhenEmpty, 0x400},
+        {&B::SetDimensionsSeparated, &B::AreDimensionsSeparated, 0x800},
+        {&B::SetAffectsRenderingWhenHidden, &B::AffectsRenderingWhenHidden, 0x1000},
+        {&B::SetAddedDStream, &B::IsAddedDStream, 0x20000},
+        {&B::SetNamesSameInitted, &B::NamesSameInitted, 0x40000},
+        {&B::SetNamesSame, &B::NamesSame, 0x80000},
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(row.bit);
+        KFS_StreamBase* const base = stream.get();
+        base->SetStreamBaseFlags(0, 0xFFFFFFFF);
+        (base->*row.set)(true);
+        EXPECT_EQ(row.bit, base->GetStreamBaseFlags());
+        EXPECT_TRUE((base->*row.get)());
+        base->SetStreamBaseFlags(0xFFFFFFFF, 0xFFFFFFFF);
+        (base->*row.set)(false);
+        EXPECT_EQ(~row.bit, base->GetStreamBaseFlags());
+        EXPECT_FALSE((base->*row.get)());
+    }
+}
+
+TEST_F(StreamBase, WalksUpToTheRoot)
+{
+    Group root, middle;
+    const TestStream leaf;
+    root.Store(&middle);
+    middle.Store(leaf);
+    EXPECT_EQ(&root, leaf->GetRoot());
+    EXPECT_EQ(nullptr, root.GetRoot()) << "a root isn't its own root";
+    EXPECT_EQ(nullptr, root.GetProject());
+    unsigned int depth = 77;
+    EXPECT_TRUE(leaf->IsChildOf(&root, &depth));
+    EXPECT_EQ(2u, depth);
+    EXPECT_TRUE(leaf->IsChildOf(&middle, nullptr));
+    EXPECT_FALSE(leaf->IsChildOf(nullptr, &depth));
+    EXPECT_FALSE(root.IsChildOf(&middle, nullptr));
+    EXPECT_TRUE(leaf->AreAllParentsActive());
+    middle.SetActive(false);
+    EXPECT_FALSE(leaf->AreAllParentsActive());
+    EXPECT_TRUE(middle.AreAllParentsActive());
+    EXPECT_FALSE(leaf->IsHiddenByAncestor());
+    root.SetHidden(true);
+    EXPECT_TRUE(leaf->IsHiddenByAncestor());
+}
+
+TEST_F(StreamBase, AnArrivingTreeTakesTheScaleOfItsPlace)
+{
+    Group root(30), arriving;
+    TestStream leaf, canonical;
+    leaf.Key(600, {1.0}).Key(1200, {2.0});
+    canonical->SetCanonical(true);
+    arriving.Store(leaf);
+    arriving.Store(canonical);
+    EXPECT_EQ(600u, leaf->GetTimeScale()) << "the scale of a root without a parent";
+    root.Store(&arriving);
+    EXPECT_EQ(30u, leaf->GetTimeScale());
+    EXPECT_EQ((std::vector{30, 60}), leaf.Times());
+    EXPECT_EQ(600u, canonical->GetTimeScale()) << "canonical leaves stay";
+}
+
+TEST_F(StreamBase, AncestorsHearOfAStoredStreamOnce)
+{
+    Group root, middle;
+    const TestStream leaf, second;
+    root.Store(&middle);
+    root.stored.clear();
+    root.alsoStore = second;    // stores a further stream from inside the notification
+    middle.Store(leaf);
+    using Pairs = std::vector<std::pair<KFS_StreamGroup*, KFS_StreamBase*>>;
+    EXPECT_EQ((Pairs{{&middle, leaf.get()}}), middle.stored);
+    EXPECT_EQ((Pairs{{&middle, leaf.get()}}), root.stored) << "no notification from inside one";
+    EXPECT_EQ(&root, second->GetParent());
+}
+
+TEST_F(StreamBase, NamesAreFilledInOnDemandAndCompared)
+{
+    const TestStream stream;
+    stream->SetMatchName(KFS_MatchName("scale", true));
+    EXPECT_EQ(Text("scale"), stream->GetMatchName16Str());
+    stream->SetMatchName(KFS_MatchName("rotation", true));
+    EXPECT_EQ(Text("rotation"), stream->GetMatchName16Str());
+    stream->SetDisplayName(Text("rotation"));
+    EXPECT_TRUE(stream->IsMatchNameSameAsDisplayName());
+    EXPECT_TRUE(stream->NamesSameInitted());
+    stream->SetDisplayName(Text("Rotation"));
+    EXPECT_FALSE(stream->NamesSameInitted());
+    EXPECT_FALSE(stream->IsMatchNameSameAsDisplayName());
+    stream->pSetDisplayName(Text("rotation"));
+    EXPECT_TRUE(stream->IsMatchNameSameAsDisplayName());
+    EXPECT_THROW(stream->SetEnglishDisplayName(Text("x")), std::logic_error);
+}
+
+TEST_F(StreamBase, ListenersHearOnlyTreesThatAskToBeHeard)
+{
+    Listener listener;
+    HeardRoot root;
+    {
+        const TestStream leaf;
+        leaf->SetHidden(true);
+        leaf->NotifyValueChanged();
+        EXPECT_EQ(KFS_ListenerState_Unknown, leaf->GetListenerState()) << "without a parent the answer stays open";
+        EXPECT_EQ(Heard{}, listener.Take());
+        root.Store(leaf);
+        leaf->SetHidden(false);
+        leaf->SetHidden(false);     // changes nothing
+        leaf->NotifyValueChanged();
+        leaf->SetDisplayName(Text("y"));
+        EXPECT_EQ(1, root.probes) << "asked once";
+        EXPECT_EQ((Heard{"flags 3 to 1", "value", "name"}), listener.Take());
+        bool wasPaused = true;
+        EXPECT_EQ(0, KFS_PauseMainListener(true, wasPaused));
+        EXPECT_FALSE(wasPaused);
+        leaf->NotifyValueChanged();
+        EXPECT_EQ(0, KFS_PauseMainListener(wasPaused, wasPaused));
+        EXPECT_TRUE(wasPaused);
+        Q_SetRunMode(Q_RunMode_Silent);
+        leaf->NotifyValueChanged();
+        Q_SetRunMode(0);
+        leaf->SetCanonical(true);
+        leaf->NotifyValueChanged();
+        leaf->SetCanonical(false);
+        EXPECT_EQ(Heard{}, listener.Take());
+    }
+    EXPECT_EQ(Heard{"destroyed"}, listener.Take());
+}
+
+TEST_F(StreamBase, SilenceCostsNoAllocation)
+{
+    const Listener listener;
+    const TestStream leaf;
+    Q_FailAllocation(1);
+    leaf->NotifyValueChanged();
+    leaf->SetHidden(true);
+    EXPECT_FALSE(Q_FailAllocationFired());
+    Q_FailAllocation(0);
+}
+
+TEST_F(StreamBase, IndependenceIsHeldForAScope)
+{
+    const TestStream stream;
+    {
+        const KFS_ScSetResetIndependent outer(stream, true);
+        EXPECT_TRUE(stream->IsIndependent());
+        const KFS_ScSetResetIndependent inner(stream, true);
+        stream->MakeIndependent(false);
+    }
+    EXPECT_FALSE(stream->IsIndependent());
+}
+
+TEST_F(StreamBase, SwappingTheBaseLeavesThePlace)
+{
+    Group root;
+    const TestStream a, b;
+    root.Store(a);
+    a->SetMatchName(KFS_MatchName("a", true));
+    a->SetDisplayName(Text("A"));
+    b->SetHidden(true);
+    a->SwapBase(*b.get());
+    EXPECT_EQ(&root, a->GetParent());
+    EXPECT_FALSE(a->GetMatchName().IsValid());
+    EXPECT_EQ(Text("A"), b->GetDisplayName());
+    EXPECT_TRUE(a->IsHidden());
+    EXPECT_FALSE(b->IsHidden());
+}
+
+} // namespace

@@ -1,0 +1,3 @@
+#include "tree/factory.h"
+
+KFS_StreamFactory::~KFS_StreamFactory() = default;

@@ -1,0 +1,94 @@
+#include "tree/listener.h"
+
+#include "frame/services/reports.h"
+#include "frame/services/threads.h"
+#include "frame/statics_private.h"
+#include "tree/listener_private.h"
+#include "tree/streambase.h"
+
+#include <utility>
+
+static KFS_StreamListenerManager* S_KFS_MainListenerManager = nullptr;
+
+namespace {
+
+bool& ThisThreadsPause()
+{
+    boost::thread_specific_ptr<bool>& state = KFSp_GetMainListenerPauseState();
+    if (!state.get()) {
+        state.reset(new bool(false));
+    }
+    return *state;
+}
+
+} // namespace
+
+KFS_StreamListener::~KFS_StreamListener() = default;
+
+void KFS_StreamListener::ReservedListenerOperation() {}
+
+bool KFS_StreamListener::ListenOnThisThread() const
+{
+    return !mainThreadOnly || hearth::threads::CurrentThreadIsMainThread();
+}
+
+KFS_StreamListenerManager::~KFS_StreamListenerManager() = default;
+
+void KFS_StreamListenerManager::NotifyAllListeners(KFS_Notification const& call)
+{
+    for (KFS_StreamListener* const listener : listeners_) {
+        if (listener->ListenOnThisThread()) {
+            call(listener);
+        }
+    }
+}
+
+int KFS_RegisterMainListener(KFS_StreamListener* listener)
+{
+    S_KFS_MainListenerManager->Add(listener);
+    return 0;
+}
+
+int KFS_UnregisterMainListener(KFS_StreamListener* listener)
+{
+    S_KFS_MainListenerManager->Remove(listener);
+    return 0;
+}
+
+int KFS_PauseMainListener(bool pause, bool& wasPaused)
+{
+    wasPaused = std::exchange(ThisThreadsPause(), pause);
+    return 0;
+}
+
+bool KFSp_IsHeard(KFS_StreamBase* stream)
+{
+    if (stream->GetListenerState() == KFS_ListenerState_Silent) {
+        return false;
+    }
+    if (Q_GetRunMode() == Q_RunMode_Silent || stream->IsCanonical() || ThisThreadsPause() || !S_KFS_MainListenerManager) {
+        return false;
+    }
+    int state = stream->GetListenerState();
+    if (state == KFS_ListenerState_Unknown) {
+        state = stream->ProbeListenerState();
+    }
+    return state == KFS_ListenerState_Heard;
+}
+
+void KFS_NotifyListeners(KFS_StreamBase* stream, KFS_Notification const& call)
+{
+    if (KFSp_IsHeard(stream)) {
+        S_KFS_MainListenerManager->NotifyAllListeners(call);
+    }
+}
+
+void KFSp_MakeMainListenerManager()
+{
+    S_KFS_MainListenerManager = new KFS_StreamListenerManager;
+}
+
+void KFSp_DestroyMainListenerManager() noexcept
+{
+    delete std::exchange(S_KFS_MainListenerManager, nullptr);
+}
