@@ -1,7 +1,7 @@
 // Tables from distance to parameter: building one, and looking up.
 //
-// The yardstick is a table of 64 equal steps of the parameter, chord lengths added up and interpolated between: quick to
-// read, and off. Both sides count their largest error ("worst", as a share of the polygon's length) against a sum of
+// The yardstick is a table of 64 equal steps of the parameter, chord lengths added up and interpolated between: quick
+// to read, and off. Both sides count their largest error ("worst", as a share of the polygon's length) against a sum of
 // 20,000 chords, and ours counts its items.
 
 #include "frame/services/curvekernel.h"

@@ -98,17 +98,18 @@ Fixture const& Get(int keys, short dimension, char interp)
     return *fixture;
 }
 
-// Branchless, over times packed side by side.
+// Branchless, over times packed side by side. The first time is before the one asked for.
 int Search(std::vector<int> const& times, int time)
 {
     int const* base = times.data();
-    std::size_t count = times.size();
+    auto count = static_cast<unsigned int>(times.size());
     while (count > 1) {
-        std::size_t const half = count / 2;
-        base += base[half - 1] < time ? half : 0;
+        unsigned int const half = count / 2;
+        unsigned int const before = (static_cast<unsigned int>(base[half - 1]) - static_cast<unsigned int>(time)) >> 31;
+        base += half & (0U - before);
         count -= half;
     }
-    return static_cast<int>(base - times.data());
+    return static_cast<int>(base - times.data()) + (*base < time ? 1 : 0);
 }
 
 void Read(benchmark::State& state, Fixture const& fixture, Order order)

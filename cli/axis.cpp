@@ -17,9 +17,10 @@ double RoundStep(double raw)
 }  // namespace
 
 Axis::Axis(double low, double high, int ticks, double leastStep)
-    : low_(low), high_(high), step_(std::max(RoundStep((high - low) / ticks), leastStep))
-{
-}
+    : low_(low),
+      high_(high),
+      step_(std::max(RoundStep((high - low) / ticks), leastStep))
+{}
 
 std::vector<double> Axis::Ticks() const
 {
@@ -34,19 +35,18 @@ std::string Axis::Label(double tick) const
 {
     double const largest = std::max(std::abs(low_), std::abs(high_));
     if (largest >= 1e6 || step_ < 1e-5) {
-        return std::abs(tick) < step_ / 2 ? "0" : fmt::format("{:.{}e}", tick, std::clamp(static_cast<int>(std::ceil(std::log10(largest / step_))), 0, 15));
+        return std::abs(tick) < step_ / 2
+                   ? "0"
+                   : fmt::format("{:.{}e}", tick,
+                                 std::clamp(static_cast<int>(std::ceil(std::log10(largest / step_))), 0, 15));
     }
     int const places = std::max(0, static_cast<int>(std::ceil(-std::log10(step_) - 1e-9)));
     return fmt::format("{:.{}f}", std::abs(tick) < step_ / 2 ? 0.0 : tick, places);
 }
 
-Range WithAir(Range range, double share)
+Range WithAir(Range range, double share, double leastExtent)
 {
-    double extent = range.high - range.low;
-    double const size = std::max(std::abs(range.low), std::abs(range.high));
-    if (!(extent > size * 1e-9)) {
-        extent = size > 0.0 ? size : 1.0;
-        return {range.low - extent * 0.5, range.high + extent * 0.5};
-    }
-    return {range.low - extent * share, range.high + extent * share};
+    double const middle = (range.low + range.high) / 2;
+    double const extent = std::max(range.high - range.low, leastExtent) * (0.5 + share);
+    return {middle - extent, middle + extent};
 }

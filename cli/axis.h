@@ -22,9 +22,9 @@ private:
     double step_;
 };
 
-// A range with some air around it; an empty one gets some extent.
 struct Range {
     double low;
     double high;
 };
-Range WithAir(Range range, double share);
+// A range of at least `leastExtent`, above 0, with a share of its extent as air at both ends.
+Range WithAir(Range range, double share, double leastExtent);

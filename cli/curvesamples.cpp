@@ -17,8 +17,12 @@ namespace {
 class Sampler {
 public:
     Sampler(KFS_Stream const& stream, double pointsPerSecond)
-        : stream_(stream), dimension_(static_cast<std::size_t>(stream.GetDimension())), scale_(stream.GetTimeScale()),
-          pointsPerSecond_(pointsPerSecond), row_(dimension_), nextRow_(dimension_)
+        : stream_(stream),
+          dimension_(static_cast<std::size_t>(stream.GetDimension())),
+          scale_(stream.GetTimeScale()),
+          pointsPerSecond_(pointsPerSecond),
+          row_(dimension_),
+          nextRow_(dimension_)
     {
         curves_.components.resize(dimension_);
     }

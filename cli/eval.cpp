@@ -101,7 +101,8 @@ std::string ToTables(Evaluation const& evaluation)
         }
         Table table(std::move(columns));
         for (std::size_t i = 0; i < evaluation.times.size(); ++i) {
-            std::vector<std::string> cells{TimeText(evaluation.times[i] * evaluation.fps), TimeText(evaluation.times[i])};
+            std::vector<std::string> cells{TimeText(evaluation.times[i] * evaluation.fps),
+                                           TimeText(evaluation.times[i])};
             for (std::size_t d = 0; d < samples.Dimension(); ++d) {
                 cells.push_back(fmt::format("{}", samples.Row(i)[d]));
             }

@@ -21,7 +21,8 @@ std::string Summary(kfshost::Scene const& scene, std::vector<StreamItem const*> 
     for (StreamItem const* item : items) {
         keys += static_cast<std::size_t>(kfshost::KeyCount(*item->stream));
     }
-    std::string text = fmt::format("{}: {}, {}", scene.name, Plural(items.size(), "stream", "streams"), Plural(keys, "key", "keys"));
+    std::string text =
+        fmt::format("{}: {}, {}", scene.name, Plural(items.size(), "stream", "streams"), Plural(keys, "key", "keys"));
     if (auto const span = SpanOf(items)) {
         text += fmt::format(", {} s to {} s", TimeText(span->first), TimeText(span->last));
     }

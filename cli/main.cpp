@@ -53,16 +53,22 @@ void AddEval(CLI::App& app, EvalOptions& options)
 {
     CLI::App* const command = app.add_subcommand("eval", "Print values at regular times");
     AddSelection(*command, options.selection);
-    command->add_option("--from", options.from, "first time: seconds like 0.5 or 1/24, or frames like 12f (default: first key)")
+    command
+        ->add_option("--from", options.from,
+                     "first time: seconds like 0.5 or 1/24, or frames like 12f (default: first key)")
         ->type_name("TIME");
     command->add_option("--to", options.to, "last time (default: last key)")->type_name("TIME");
-    command->add_option("--fps", options.fps, "samples a second, like 24 or 30000/1001")->type_name("RATE")->capture_default_str();
-    static std::map<std::string, Format> const formats{{"table", Format::Table}, {"csv", Format::Csv}, {"json", Format::Json}};
+    command->add_option("--fps", options.fps, "samples a second, like 24 or 30000/1001")
+        ->type_name("RATE")
+        ->capture_default_str();
+    static std::map<std::string, Format> const formats{
+        {"table", Format::Table}, {"csv", Format::Csv}, {"json", Format::Json}};
     command->add_option("--format", options.format, "table, csv or json (default: table)")
         ->transform(CLI::CheckedTransformer(formats))
         ->type_name("FORMAT");
-    command->footer("Numbers are printed with as many digits as it takes to read the same number back. In tables times are exact\n"
-                    "fractions; JSON gives them as [numerator, denominator] in seconds.");
+    command->footer(
+        "Numbers are printed with as many digits as it takes to read the same number back. In tables times are exact\n"
+        "fractions; JSON gives them as [numerator, denominator] in seconds.");
     command->callback([&options] { RunEval(options); });
 }
 
@@ -70,7 +76,9 @@ void AddPlot(CLI::App& app, PlotOptions& options)
 {
     CLI::App* const command = app.add_subcommand("plot", "Draw value and speed graphs into an SVG file");
     AddSelection(*command, options.selection);
-    command->add_option("-o,--output", options.output, "the drawing; - for the standard output")->required()->type_name("SVG");
+    command->add_option("-o,--output", options.output, "the drawing; - for the standard output")
+        ->required()
+        ->type_name("SVG");
     command->add_flag("--frames", options.inFrames, "label the time axis in frames");
     command->add_option("--fps", options.fps, "frames a second for --frames")->type_name("RATE")->capture_default_str();
     command->callback([&options] { RunPlot(options); });
@@ -98,7 +106,8 @@ try {
     kfshost::Session const session;
     Q_SetReportSink(RememberFirstReport);
 
-    CLI::App app{"Takes the animation out of a file, holds it in streams of keys, and answers with values and drawings.", "kfs"};
+    CLI::App app{
+        "Takes the animation out of a file, holds it in streams of keys, and answers with values and drawings.", "kfs"};
     app.require_subcommand(1);
     app.footer("Examples:\n"
                "  kfs info walk.glb\n"

@@ -19,7 +19,7 @@ constexpr std::size_t MostLegendLines = 14;
 
 constexpr double Width = 1600.0;
 constexpr double Left = 110.0;
-constexpr double Right = 1390.0;
+constexpr double Right = 1360.0;
 constexpr double HeaderHeight = 76.0;
 constexpr double TitleHeight = 40.0;
 constexpr double ValueHeight = 300.0;
@@ -35,6 +35,9 @@ constexpr std::array<std::string_view, 3> Dashes{"", "9 4", "2 4"};
 // For a curve on top of one, two or more others: their colours show in the gaps.
 constexpr std::array<std::string_view, 3> OverlapDashes{"14 14", "14 28", "14 42"};
 
+// A graph isn't blown up to show less than this share of its numbers: below lies the noise of 32-bit floats.
+constexpr double LeastShare = 1e-4;
+
 using CurvePoints = std::vector<Point> ComponentCurve::*;
 
 bool Coincide(std::vector<Point> const& a, std::vector<Point> const& b)
@@ -42,16 +45,32 @@ bool Coincide(std::vector<Point> const& a, std::vector<Point> const& b)
     return std::ranges::equal(a, b, [](Point const& p, Point const& q) { return p.x == q.x && p.y == q.y; });
 }
 
-// The pen of a component, which tells it from those before it also where their curves are one.
-Pen CurvePen(StreamCurves const& curves, std::size_t component, CurvePoints points)
+// The first component whose curve is the same as that of `component`, which may be itself.
+std::size_t FirstAlike(StreamCurves const& curves, std::size_t component, CurvePoints points)
 {
-    std::size_t covered = 0;
-    for (std::size_t d = 0; d < component; ++d) {
-        covered += Coincide(curves.components[d].*points, curves.components[component].*points) ? 1 : 0;
+    std::size_t d = 0;
+    while (!Coincide(curves.components[d].*points, curves.components[component].*points)) {
+        ++d;
     }
-    std::string_view const dashes = covered == 0 ? Dashes[component / Colors.size() % Dashes.size()]
-                                                 : OverlapDashes[std::min(covered, OverlapDashes.size()) - 1];
-    return {Colors[component % Colors.size()], 2.0, dashes};
+    return d;
+}
+
+// How often a curve was drawn already before that of `component` comes.
+std::size_t CountAlike(StreamCurves const& curves, std::size_t component, CurvePoints points)
+{
+    std::size_t count = 0;
+    for (std::size_t d = 0; d < component; ++d) {
+        count += Coincide(curves.components[d].*points, curves.components[component].*points) ? 1 : 0;
+    }
+    return count;
+}
+
+// Components that belong to an axis have its colour wherever they stand; others have one by their place.
+std::string_view ColorOf(StreamItem const& item, std::size_t component)
+{
+    char const letter = item.components[component].front();
+    std::size_t const axis = std::string_view("XYZ").find(letter);
+    return Colors[axis == std::string_view::npos ? component % Colors.size() : axis];
 }
 
 // The time axis of all panels: seconds, or frames.
@@ -73,11 +92,19 @@ TimeUnit UnitOf(PlotOptions const& options)
 // One graph: maps what it shows to the drawing.
 class Panel {
 public:
-    Panel(double top, double height, Axis const& time, Axis const& values) : top_(top), height_(height), time_(time), values_(values) {}
+    Panel(double top, double height, Axis const& time, Axis const& values)
+        : top_(top),
+          height_(height),
+          time_(time),
+          values_(values)
+    {}
 
     double Bottom() const { return top_ + height_; }
     double X(double time) const { return Left + (time - time_.Low()) / (time_.High() - time_.Low()) * (Right - Left); }
-    double Y(double value) const { return Bottom() - (value - values_.Low()) / (values_.High() - values_.Low()) * height_; }
+    double Y(double value) const
+    {
+        return Bottom() - (value - values_.Low()) / (values_.High() - values_.Low()) * height_;
+    }
 
     void DrawFrame(Svg& svg, std::string const& caption) const
     {
@@ -114,8 +141,10 @@ private:
 class Plot {
 public:
     Plot(PlotOptions const& options, kfshost::Scene const& scene, std::vector<StreamItem const*> const& all)
-        : unit_(UnitOf(options)), shown_(all.begin(), all.begin() + static_cast<std::ptrdiff_t>(std::min(all.size(), MostStreams))),
-          svg_(Width, HeaderHeight + StreamHeight * static_cast<double>(shown_.size())), time_(TimeAxis())
+        : unit_(UnitOf(options)),
+          shown_(all.begin(), all.begin() + static_cast<std::ptrdiff_t>(std::min(all.size(), MostStreams))),
+          svg_(Width, HeaderHeight + StreamHeight * static_cast<double>(shown_.size())),
+          time_(TimeAxis())
     {
         DrawHeader(scene.name, all.size());
     }
@@ -134,7 +163,8 @@ private:
     Axis TimeAxis() const
     {
         auto const span = SpanOf(shown_).value_or(TimeSpan{});
-        Range const range = WithAir({span.first.ToDouble() * unit_.perSecond, span.last.ToDouble() * unit_.perSecond}, 0.02);
+        Range const keys{span.first.ToDouble() * unit_.perSecond, span.last.ToDouble() * unit_.perSecond};
+        Range const range = WithAir(keys, 0.02, keys.low == keys.high ? unit_.perSecond : 1e-9);
         return {range.low, range.high, 12, unit_.leastStep};
     }
 
@@ -142,8 +172,10 @@ private:
     {
         svg_.Text({Left, 38}, name, {22.0, "#111111", Anchor::Start, true});
         if (selected > shown_.size()) {
-            svg_.Text({Left, 60}, fmt::format("the first {} of {} streams with keys; --stream chooses others", shown_.size(), selected),
-                      {13.0, "#666666"});
+            svg_.Text(
+                {Left, 60},
+                fmt::format("the first {} of {} streams with keys; --stream chooses others", shown_.size(), selected),
+                {13.0, "#666666"});
         }
         double const y = 33;
         svg_.Diamond({Right - 170, y}, 5.5, "#555555", {"#ffffff", 1.2});
@@ -164,14 +196,14 @@ private:
         Axis const values = ValueAxis(curves, showHandles);
         Panel const valuePanel(valueTop, ValueHeight, time_, values);
         valuePanel.DrawFrame(svg_, std::string(NameOf(item.kind)) + ", " + std::string(NameOf(item.interpolation)));
-        DrawCurves(valuePanel, curves, &ComponentCurve::value);
-        DrawKeys(valuePanel, curves, showHandles);
+        DrawCurves(valuePanel, item, curves, &ComponentCurve::value);
+        DrawKeys(valuePanel, item, curves, showHandles);
         DrawLegend(item, curves, valueTop);
 
-        Axis const speeds = SpeedAxis(curves);
+        Axis const speeds = SpeedAxis(curves, values);
         Panel const speedPanel(valuePanel.Bottom() + PanelGap, SpeedHeight, time_, speeds);
-        speedPanel.DrawFrame(svg_, "speed, a second");
-        DrawCurves(speedPanel, curves, &ComponentCurve::speed);
+        speedPanel.DrawFrame(svg_, "speed, units a second");
+        DrawCurves(speedPanel, item, curves, &ComponentCurve::speed);
         speedPanel.DrawTimeLabels(svg_, unit_.name);
     }
 
@@ -191,7 +223,8 @@ private:
     double PixelsPerKey(StreamCurves const& curves) const
     {
         auto const& keys = curves.components.front().keys;
-        double const extent = (keys.back().x - keys.front().x) * unit_.perSecond / (time_.High() - time_.Low()) * (Right - Left);
+        double const extent =
+            (keys.back().x - keys.front().x) * unit_.perSecond / (time_.High() - time_.Low()) * (Right - Left);
         return keys.size() < 2 ? Right - Left : extent / static_cast<double>(keys.size() - 1);
     }
 
@@ -203,7 +236,13 @@ private:
                 range = {std::min(range.low, point.y), std::max(range.high, point.y)};
             }
         }
-        return range.low <= range.high ? range : Range{0.0, 0.0};
+        if (range.low > range.high) {
+            return {0.0, 0.0};
+        }
+        if (!std::isfinite(range.high - range.low)) {
+            throw UserError("plot", "the numbers are too large to draw");
+        }
+        return range;
     }
 
     // Room for the curves, and for the ends of the handles where they are drawn.
@@ -215,21 +254,36 @@ private:
                 range = {std::min(range.low, handle.end.y), std::max(range.high, handle.end.y)};
             }
         }
-        range = WithAir(range, 0.07);
+        double const size = std::max(std::abs(range.low), std::abs(range.high));
+        range = WithAir(range, 0.07, size == 0.0 ? 1.0 : size * LeastShare);
         return {range.low, range.high, 9};
     }
 
     // Speed 0 is always in sight: it is where things rest.
-    static Axis SpeedAxis(StreamCurves const& curves)
+    Axis SpeedAxis(StreamCurves const& curves, Axis const& values) const
     {
         Range range = Extent(curves, &ComponentCurve::speed);
-        range = WithAir({std::min(range.low, 0.0), std::max(range.high, 0.0)}, 0.07);
+        double const seconds = (time_.High() - time_.Low()) / unit_.perSecond;
+        double const drift = (values.High() - values.Low()) / seconds;
+        range = WithAir({std::min(range.low, 0.0), std::max(range.high, 0.0)}, 0.07, drift / 100);
         return {range.low, range.high, 6};
     }
 
-    Point Place(Panel const& panel, Point const& point) const { return {panel.X(point.x * unit_.perSecond), panel.Y(point.y)}; }
+    Point Place(Panel const& panel, Point const& point) const
+    {
+        return {panel.X(point.x * unit_.perSecond), panel.Y(point.y)};
+    }
 
-    void DrawCurves(Panel const& panel, StreamCurves const& curves, CurvePoints points)
+    // A pen that tells a component from those before it also where their curves are one.
+    static Pen CurvePen(StreamItem const& item, StreamCurves const& curves, std::size_t component, CurvePoints points)
+    {
+        std::size_t const covered = CountAlike(curves, component, points);
+        std::string_view const dashes = covered == 0 ? Dashes[component / Colors.size() % Dashes.size()]
+                                                     : OverlapDashes[std::min(covered, OverlapDashes.size()) - 1];
+        return {ColorOf(item, component), 2.0, dashes};
+    }
+
+    void DrawCurves(Panel const& panel, StreamItem const& item, StreamCurves const& curves, CurvePoints points)
     {
         std::vector<Point> placed;
         for (std::size_t d = 0; d < curves.components.size(); ++d) {
@@ -237,16 +291,16 @@ private:
             for (Point const& point : curves.components[d].*points) {
                 placed.push_back(Place(panel, point));
             }
-            svg_.Polyline(placed, CurvePen(curves, d, points));
+            svg_.Polyline(placed, CurvePen(item, curves, d, points));
         }
     }
 
     // Fewer marks the closer the keys are, so that the curve stays in sight.
-    void DrawKeys(Panel const& panel, StreamCurves const& curves, bool showHandles)
+    void DrawKeys(Panel const& panel, StreamItem const& item, StreamCurves const& curves, bool showHandles)
     {
         for (Handle const& handle : curves.handles) {
             if (showHandles) {
-                std::string_view const color = Colors[handle.component % Colors.size()];
+                std::string_view const color = ColorOf(item, handle.component);
                 svg_.Line(Place(panel, handle.key), Place(panel, handle.end), {color, 1.2, "", 0.75});
                 svg_.Circle(Place(panel, handle.end), 3.5, "#ffffff", {color, 1.4});
             }
@@ -255,9 +309,10 @@ private:
         if (spacing < 4.0) {
             return;
         }
+        double const radius = std::clamp(spacing / 5, 2.5, 5.5);
         for (std::size_t d = 0; d < curves.components.size(); ++d) {
             for (Point const& key : curves.components[d].keys) {
-                svg_.Diamond(Place(panel, key), spacing < 14.0 ? 3.0 : 5.5, Colors[d % Colors.size()], {"#ffffff", 1.2});
+                svg_.Diamond(Place(panel, key), radius, ColorOf(item, d), {"#ffffff", radius / 5});
             }
         }
     }
@@ -267,13 +322,15 @@ private:
         double y = top + 12;
         for (std::size_t d = 0; d < item.components.size(); ++d) {
             if (d == MostLegendLines) {
-                svg_.Text({Right + 22, y + 4.5}, fmt::format("and {} more", item.components.size() - d), {13.0, "#666666"});
+                svg_.Text({Right + 22, y + 4.5}, fmt::format("and {} more", item.components.size() - d),
+                          {13.0, "#666666"});
                 return;
             }
-            Pen pen = CurvePen(curves, d, &ComponentCurve::value);
-            pen.width = 3.0;
-            svg_.Line({Right + 22, y}, {Right + 54, y}, pen);
-            svg_.Text({Right + 64, y + 4.5}, item.components[d], {14.0, "#222222"});
+            std::size_t const alike = FirstAlike(curves, d, &ComponentCurve::value);
+            std::string const note = alike == d ? "" : " = " + item.components[alike];
+            svg_.Line({Right + 22, y}, {Right + 54, y},
+                      {ColorOf(item, d), 3.0, Dashes[d / Colors.size() % Dashes.size()]});
+            svg_.Text({Right + 64, y + 4.5}, item.components[d] + note, {14.0, "#222222"});
             y += 22;
         }
     }

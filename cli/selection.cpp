@@ -23,8 +23,9 @@ std::vector<StreamItem const*> SelectStreams(kfshost::Scene const& scene, Select
         throw UserError(selection.file, "nothing is animated");
     }
     if (items.empty()) {
-        throw UserError(selection.file, fmt::format("--stream {}: none of the {} streams has such a path (kfs info lists them)",
-                                                    selection.glob, scene.streams.size()));
+        throw UserError(selection.file,
+                        fmt::format("--stream {}: none of the {} streams has such a path (kfs info lists them)",
+                                    selection.glob, scene.streams.size()));
     }
     return items;
 }

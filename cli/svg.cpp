@@ -56,14 +56,14 @@ Svg::Svg(double width, double height)
 void Svg::Rectangle(Point corner, double width, double height, std::string_view fill, Pen const& border)
 {
     fmt::format_to(std::back_inserter(text_),
-                   "<rect x=\"{:.2f}\" y=\"{:.2f}\" width=\"{:.2f}\" height=\"{:.2f}\" fill=\"{}\" {}/>\n", corner.x, corner.y,
-                   width, height, fill, Stroke(border));
+                   "<rect x=\"{:.2f}\" y=\"{:.2f}\" width=\"{:.2f}\" height=\"{:.2f}\" fill=\"{}\" {}/>\n", corner.x,
+                   corner.y, width, height, fill, Stroke(border));
 }
 
 void Svg::Line(Point from, Point to, Pen const& pen)
 {
-    fmt::format_to(std::back_inserter(text_), "<line x1=\"{:.2f}\" y1=\"{:.2f}\" x2=\"{:.2f}\" y2=\"{:.2f}\" {}/>\n", from.x,
-                   from.y, to.x, to.y, Stroke(pen));
+    fmt::format_to(std::back_inserter(text_), "<line x1=\"{:.2f}\" y1=\"{:.2f}\" x2=\"{:.2f}\" y2=\"{:.2f}\" {}/>\n",
+                   from.x, from.y, to.x, to.y, Stroke(pen));
 }
 
 void Svg::Polyline(std::span<Point const> points, Pen const& pen)
@@ -81,8 +81,8 @@ void Svg::Polyline(std::span<Point const> points, Pen const& pen)
 
 void Svg::Circle(Point center, double radius, std::string_view fill, Pen const& border)
 {
-    fmt::format_to(std::back_inserter(text_), "<circle cx=\"{:.2f}\" cy=\"{:.2f}\" r=\"{}\" fill=\"{}\" {}/>\n", center.x,
-                   center.y, radius, fill, Stroke(border));
+    fmt::format_to(std::back_inserter(text_), "<circle cx=\"{:.2f}\" cy=\"{:.2f}\" r=\"{}\" fill=\"{}\" {}/>\n",
+                   center.x, center.y, radius, fill, Stroke(border));
 }
 
 void Svg::Diamond(Point center, double radius, std::string_view fill, Pen const& border)
@@ -96,6 +96,7 @@ void Svg::Diamond(Point center, double radius, std::string_view fill, Pen const&
 void Svg::Text(Point at, std::string_view text, Font const& font)
 {
     fmt::format_to(std::back_inserter(text_),
-                   "<text x=\"{:.2f}\" y=\"{:.2f}\" font-size=\"{}\" fill=\"{}\" text-anchor=\"{}\"{}>{}</text>\n", at.x, at.y,
-                   font.size, font.color, NameOf(font.anchor), font.bold ? " font-weight=\"bold\"" : "", Escape(text));
+                   "<text x=\"{:.2f}\" y=\"{:.2f}\" font-size=\"{}\" fill=\"{}\" text-anchor=\"{}\"{}>{}</text>\n",
+                   at.x, at.y, font.size, font.color, NameOf(font.anchor), font.bold ? " font-weight=\"bold\"" : "",
+                   Escape(text));
 }

@@ -103,8 +103,8 @@ int AddArcsBetween(KFS_StreamKeyData const* data, int first, int last, double* d
     return 0;
 }
 
-// Two of the keys on a line of distance along the path. Of three keys the middle one stays empty, so a middle key with one straight side
-// gets speed 0. Plain streams differ; saved projects rely on both.
+// Two of the keys on a line of distance along the path. Of three keys the middle one stays empty, so a middle key with
+// one straight side gets speed 0. Plain streams differ; saved projects rely on both.
 struct Distances {
     Level prev;
     Level at;

@@ -1,9 +1,9 @@
 #include "curves/floatkeys.h"
 
+#include "curves/arcs_private.h"
 #include "curves/floatkeys_private.h"
 #include "curves/neighbours_private.h"
 #include "curves/segment_private.h"
-#include "frame/report_private.h"
 #include "keystore/keyflags.h"
 #include "keystore/keylist_private.h"
 #include "keystore/lookup.h"
@@ -13,11 +13,6 @@
 
 namespace {
 
-bool Floats(KFS_KeyScalar const* key)
-{
-    return (key->flags & KFS_KeyFlag_Float) != 0;
-}
-
 // The keys between two anchors, and the speed graph from the one to the other.
 class FloatRun {
 public:
@@ -25,11 +20,11 @@ public:
 
     // Finds the anchors around a key and builds the graph. False, without an error, where no key lies between anchors.
     bool Begin(int index, int* code);
-    // Gives the float keys from `first` to `last` their times, as far as they lie in the run, and answers behind which key it stopped.
+    // Gives the float keys from `first` to `last` their times, as far as they lie in the run, and answers behind which
+    // key it stopped.
     int Place(int first, int last, int* placed);
 
 private:
-    int SumArcs();
     int BuildGraph();
     int ProposeTime(double s, long long* time);
     int PlaceKey(int index, KFS_KeyScalar* key, double s);
@@ -60,22 +55,11 @@ bool FloatRun::Begin(int index, int* code)
 {
     *code = KFSp_GetNeighborsFromIndex(stream_, index, 0, &prev_, &next_, &prevIndex_, &nextIndex_);
     if (*code != 0 || !prev_ || !next_ || nextIndex_ - prevIndex_ < 2) return false;
-    *code = SumArcs();
+    *code = KFSp_SumArcs(data_, prevIndex_, nextIndex_, &total_);
     if (*code == 0) {
         *code = BuildGraph();
     }
     return *code == 0;
-}
-
-int FloatRun::SumArcs()
-{
-    total_ = prev_->arcLength;
-    for (int i = prevIndex_ + 1; i < nextIndex_; ++i) {
-        KFS_KeyScalar* key = nullptr;
-        if (int const code = GetKey(data_, i, &key); code != 0) return code;
-        total_ += key->arcLength;
-    }
-    return 0;
 }
 
 int FloatRun::BuildGraph()
@@ -86,7 +70,8 @@ int FloatRun::BuildGraph()
     return CRV_CurveSetNonDecreasing(&graph_.curve, nullptr);
 }
 
-// The part of the way, in time units from the earlier anchor, cut off towards the earlier time. Keys that all lie on one point have no way.
+// The part of the way, in time units from the earlier anchor, cut off towards the earlier time. Keys that all lie on
+// one point have no way.
 long long LinearOffset(double fraction, int from, int to)
 {
     double const exact = static_cast<double>(KFSp_TimeDifference(to, from)) * fraction + static_cast<double>(from);
@@ -94,7 +79,8 @@ long long LinearOffset(double fraction, int from, int to)
     return static_cast<long long>(exact);
 }
 
-// The moment at which the speed graph reaches a distance. A hold stays at the earlier anchor, as do codes without a shape.
+// The moment at which the speed graph reaches a distance. A hold stays at the earlier anchor, as do codes without a
+// shape.
 int FloatRun::ProposeTime(double s, long long* time)
 {
     *time = prev_->time;
@@ -158,7 +144,7 @@ int FloatRun::Place(int first, int last, int* placed)
     for (int i = prevIndex_ + 1; i <= end; ++i) {
         KFS_KeyScalar* key = nullptr;
         if (int const code = GetKey(data_, i, &key); code != 0) return code;
-        if (i >= first && Floats(key)) {
+        if (i >= first && KFSp_Floats(key)) {
             if (int const code = PlaceKey(i, key, s); code != 0) return code;
         }
         s += key->arcLength;
@@ -167,21 +153,14 @@ int FloatRun::Place(int first, int last, int* placed)
     return 0;
 }
 
-int CheckDimension(KFS_Stream const* stream)
-{
-    bool const curved = stream->GetDimension() == 2 || stream->GetDimension() == 3;
-    if (curved || !stream->IsSpatial() || !stream->IsSParametrized()) return 0;
-    return KFSp_ReportErr(KFSp_Op_InterpolateSpatial, KFS_Err_Only2D3D, 0);
-}
-
 int PlaceFloatKeys(KFS_Stream const* stream, int first, int last)
 {
     KFS_StreamKeyData* const data = stream->GetKeyDataForModify();
     for (int i = first; i <= last; ++i) {
         KFS_KeyScalar* key = nullptr;
         if (int const code = GetKey(data, i, &key); code != 0) return code;
-        if (!Floats(key)) continue;
-        int code = CheckDimension(stream);
+        if (!KFSp_Floats(key)) continue;
+        int code = KFSp_CheckPathDimension(stream);
         FloatRun run(stream, data);
         if (code == 0 && run.Begin(i, &code)) {
             code = run.Place(i, last, &i);
@@ -191,11 +170,11 @@ int PlaceFloatKeys(KFS_Stream const* stream, int first, int last)
     return 0;
 }
 
-} // namespace
+}  // namespace
 
 int KFSp_ComputeFloatTime(KFS_Stream const* stream, int index)
 {
-    if (int const code = CheckDimension(stream); code != 0) return code;
+    if (int const code = KFSp_CheckPathDimension(stream); code != 0) return code;
     return PlaceFloatKeys(stream, index, index);
 }
 

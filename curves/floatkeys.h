@@ -3,8 +3,9 @@
 #include "frame/export.h"
 #include "keystore/stream.h"
 
-// A float key's place on the path is fixed and its time isn't: it roves, so that the point passes it at the moment that the speed graph between
-// the anchors around it dictates. Only keys of spatial streams between the first and the last one can float.
+// A float key's place on the path is fixed and its time isn't: it roves, so that the point passes it at the moment that
+// the speed graph between the anchors around it dictates. Only keys of spatial streams between the first and the last
+// one can float.
 
 // KFS_SetKeyFlags for KFS_KeyFlag_Float, and its results. On the first or the last key turning it on changes nothing.
 KFS_API int KFS_SetKeyFloat(KFS_Stream* stream, unsigned char on, int index);
@@ -13,12 +14,15 @@ KFS_API int KFS_SetKeyFloat(KFS_Stream* stream, unsigned char on, int index);
 //
 //   index         the key; on a stream without keys not looked at, and the value's record takes the time
 //   newTime       in, any scale; null: `newTimeValue` in the stream's scale is meant
-//   newIndex      out or null: the key's index after the move; KFS_INVALID_INDEX on an error. Without meaning on a stream without keys.
-//   oldTime       out or null: where the key stood, in the stream's scale; value KFS_INVALID_INDEX when an error came before that was known
+//   newIndex      out or null: the key's index after the move; KFS_INVALID_INDEX on an error. Without meaning on a
+//                 stream without keys.
+//   oldTime       out or null: where the key stood, in the stream's scale; value KFS_INVALID_INDEX when an error came
+//                 before that was known
 //
-// The first and the last key get the default influence on the side that has no segment, and lose KFS_KeyFlag_Modifiable. Float keys between the
-// anchors around the key, or around the new time if that lies past the only neighbour, get place-holding times, one tick apart, and their
-// true times with the next update; also when the key stays where it is.
+// The first and the last key get the default influence on the side that has no segment, and lose
+// KFS_KeyFlag_Modifiable. Float keys between the anchors around the key, or around the new time if that lies past the
+// only neighbour, get place-holding times, one tick apart, and their true times with the next update; also when the key
+// stays where it is.
 //
 //      anchor  f  f    key        f  anchor      before
 //      anchor f f      key         f anchor      float keys packed: the key may go to any tick in between

@@ -76,8 +76,7 @@ int KFS_SetKeyInfluence(KFS_Stream* stream, int index, double const* inInfluence
     }
     KFSp_FirstError error;
     if (stream->HasKeys()) {
-        // A key that turns the user's keeps its speeds for good, so they had better be right.
-        (void)stream->UpdateStreamIfStaleTangents(index);
+        KFSp_SettleAutomaticKey(stream, index);
         error.Keep(SetInfluences(stream, index, inInfluence, outInfluence));
     }
     return KFSp_FinishHandleEdit(stream, error);

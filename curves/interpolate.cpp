@@ -11,10 +11,11 @@ struct Segment {
     KFS_KeyScalar const* b = nullptr;
 };
 
-// Whether the hint names the key right before the time; `segment` is the answer then.
+// Whether the hint names the key right before the time; `segment` is the answer then. An index past the end is refused
+// by the look-up.
 bool TakeHint(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int keyIndex, Segment* segment)
 {
-    if (keyIndex < 0 || keyIndex >= KFSp_ItemCount(data) - 1 || stream->HasNoKeys()) return false;
+    if (keyIndex < 0 || stream->HasNoKeys()) return false;
     if (stream->IsSpatial() && stream->IsSParametrized()) return false;  // a neighbour may be a float key
     return KFSp_GetConstKey(data, keyIndex, &segment->a) == 0 &&
            KFSp_GetConstKey(data, keyIndex + 1, &segment->b) == 0 && segment->a->time < time && time < segment->b->time;
@@ -68,13 +69,11 @@ inline int EvaluateCurved(KFS_Stream const* stream, Segment const& segment, int 
 
 }  // namespace
 
-int KFSp_Interpolate(KFS_Stream const* stream, long, int time, int keyIndex)
+int KFSp_InterpolateBetween(KFS_Stream const* stream, KFS_KeyScalar const* a, KFS_KeyScalar const* b, int time,
+                            double* result)
 {
-    KFS_StreamKeyData const* const data = stream->GetKeyData();
-    Segment segment;
-    if (int const code = FindSegment(stream, data, time, keyIndex, &segment)) return code;
-    double* const result = KFSp_Numbers(data->cache);
-    switch (KFSp_GetSegmentKind(segment.a->outInterp, segment.b->inInterp)) {
+    Segment const segment{a, b};
+    switch (KFSp_GetSegmentKind(a->outInterp, b->inInterp)) {
     case KFSp_SegmentKind::Linear: InterpolateLinear(stream->GetDimension(), segment, time, result); return 0;
     case KFSp_SegmentKind::Curved:
         return EvaluateCurved(stream, segment, time, result, [](CRV_Curve const* curve, double* y, double x) {
@@ -84,6 +83,14 @@ int KFSp_Interpolate(KFS_Stream const* stream, long, int time, int keyIndex)
     case KFSp_SegmentKind::Other: break;
     }
     return 0;
+}
+
+int KFSp_Interpolate(KFS_Stream const* stream, long, int time, int keyIndex)
+{
+    KFS_StreamKeyData const* const data = stream->GetKeyData();
+    Segment segment;
+    if (int const code = FindSegment(stream, data, time, keyIndex, &segment)) return code;
+    return KFSp_InterpolateBetween(stream, segment.a, segment.b, time, KFSp_Numbers(data->cache));
 }
 
 int KFSp_InterpDeriv(KFS_Stream const* stream, long, int time, int keyIndex)

@@ -18,8 +18,8 @@ struct KFSp_Handles {
     int count = 0;
 };
 
-// Whether the keys' value data are runs of numbers with handles. While a custom stream carries a plain description its records still hold
-// the client's bytes.
+// Whether the keys' value data are runs of numbers with handles. While a custom stream carries a plain description its
+// records still hold the client's bytes.
 inline bool KFSp_HasHandleRuns(KFS_Stream const* stream)
 {
     return !stream->IsSpatial() && !stream->IsCustom() && !stream->IsTemporarilyNonCustom();
@@ -61,7 +61,8 @@ inline int KFSp_CheckHandleAccess(KFS_Stream const* stream, KFSp_Refusal const& 
                : 0;
 }
 
-// The key at an index, or a constant's record whatever the index. -1 isn't the last key here: its neighbours would not be.
+// The key at an index, or a constant's record whatever the index. -1 isn't the last key here: its neighbours would not
+// be.
 inline int KFSp_GetHandleKey(KFS_Stream const* stream, KFS_StreamKeyData const* data, int index, KFS_KeyScalar** key)
 {
     if (stream->HasNoKeys()) {
@@ -75,6 +76,15 @@ inline int KFSp_GetHandleKey(KFS_Stream const* stream, KFS_StreamKeyData const* 
     return code;
 }
 
+// To be called before a key turns the user's: what it leaves unset stays for good, so an automatic key is brought up to
+// date first.
+inline void KFSp_SettleAutomaticKey(KFS_Stream const* stream, int index)
+{
+    KFS_KeyScalar* key = nullptr;
+    bool const found = KFSp_GetHandleKey(stream, stream->GetKeyData(), index, &key) == 0;
+    if (found && (key->flags & KFS_KeyFlag_Modifiable)) (void)stream->UpdateStreamIfStaleTangents(index);
+}
+
 // The cache record as room for numbers of the key's own layout. What it held is gone, unless it is the key itself.
 inline KFS_KeyScalar* KFSp_BorrowCache(KFS_StreamKeyData const* data, KFS_KeyScalar const* key)
 {
@@ -82,7 +92,8 @@ inline KFS_KeyScalar* KFSp_BorrowCache(KFS_StreamKeyData const* data, KFS_KeySca
     return data->cache;
 }
 
-// The end of every setter: the cached value may be of the curve as it was, and whoever listens is told once nothing failed.
+// The end of every setter: the cached value may be of the curve as it was, and whoever listens is told once nothing
+// failed.
 inline int KFSp_FinishHandleEdit(KFS_Stream* stream, KFSp_FirstError& error)
 {
     if (stream->HasKeys()) error.Keep(KFSp_ClearCache(stream));

@@ -136,8 +136,8 @@ int KFSp_GetNeighborsFromIndex(KFS_Stream const* stream, int index, unsigned cha
 
 namespace {
 
-// The words of a record's value data, read one at a time. Those before it, back to the record's start, can be asked for as well; what lies
-// outside the record is 0.
+// The words of a record's value data, read one at a time. Those before it, back to the record's start, can be asked for
+// as well; what lies outside the record is 0.
 class Words {
 public:
     Words(KFS_Stream const* stream, KFS_KeyScalar const* key)
@@ -180,7 +180,8 @@ int FindSegment(KFS_Stream const* stream, int keyIndex, int time, unsigned char 
         return code;
     KFS_KeyScalar* key = nullptr;
     if (int const code = ReadKey(stream->GetKeyData(), keyIndex, &key)) return code;
-    // Between anchors the speed graph runs through a float key, so the segment that contains it begins at the anchor before.
+    // Between anchors the speed graph runs through a float key, so the segment that contains it begins at the anchor
+    // before.
     bool const insideSegment = !spatial && stream->IsSpatial() && IsFloat(key);
     if (!insideSegment) *first = key;
     return 0;

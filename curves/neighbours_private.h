@@ -5,22 +5,25 @@
 
 // Which keys bound a time or a key, and the curve between them.
 //
-// Float keys (f) of a spatial stream with arc-length parametrisation take their time from the anchors (A) around them, so they are no
-// neighbours there unless all keys are asked for:
+// Float keys (f) of a spatial stream with arc-length parametrisation take their time from the anchors (A) around them,
+// so they are no neighbours there unless all keys are asked for:
 //
 //      A ---- f ---- f ---- A            allKeys 0 answers the two A, at any time between them and at both f
 //                 ^ time                 allKeys 1 answers the two f
 //
-// The path runs through the float keys: whoever works on it asks for all keys. On any other stream all keys are neighbours.
+// The path runs through the float keys: whoever works on it asks for all keys. On any other stream all keys are
+// neighbours.
 //
 // The pointers go into the key list's storage and are good until the list changes; nothing is pinned here.
 
-// The key at exactly `time` (in the stream's scale) in `at`, and the keys before and after the time in `prev` and `next`: never the key at
-// that time itself. A missing key is null. Float keys at an end of the list, with no anchor beyond, answer the outermost of them.
+// The key at exactly `time` (in the stream's scale) in `at`, and the keys before and after the time in `prev` and
+// `next`: never the key at that time itself. A missing key is null. Float keys at an end of the list, with no anchor
+// beyond, answer the outermost of them.
 //
 //   prevIndex, nextIndex, atIndex   out or null; written only where the key was found.
 //
-// Operation 85. Errors: KFS_Err_NoKeys, reported, on a constant or an empty list; the list service's, with the answers as far as they got.
+// Operation 85. Errors: KFS_Err_NoKeys, reported, on a constant or an empty list; the list service's, with the answers
+// as far as they got.
 int KFSp_GetNeighborsFromTime(KFS_Stream const* stream, int time, unsigned char allKeys, KFS_KeyScalar** at,
                               KFS_KeyScalar** prev, KFS_KeyScalar** next, int* prevIndex, int* nextIndex, int* atIndex);
 
@@ -30,16 +33,17 @@ int KFSp_GetNeighborsFromIndex(KFS_Stream const* stream, int index, unsigned cha
 
 // Builds the curve of a segment.
 //
-//   keyIndex        the key at which the segment begins, or KFS_INVALID_INDEX: the segment around `time`, in the stream's scale. A temporal
-//                   segment of a spatial stream that is asked for by a float key begins at the key before that.
-//   dimensionIndex  component of the value; not looked at with `spatial`. -1 reads the word before each run: only x is meant then. A word
-//                   that lies outside the record counts as 0.
+//   keyIndex        the key at which the segment begins, or KFS_INVALID_INDEX: the segment around `time`, in the
+//                   stream's scale. A temporal segment of a spatial stream that is asked for by a float key begins at
+//                   the key before that.
+//   dimensionIndex  component of the value; not looked at with `spatial`. -1 reads the word before each run: only x is
+//                   meant then. A word that lies outside the record counts as 0.
 //   relativeTime    non-zero: x begins at 0; zero: x in seconds of the stream. Temporal segments only.
 //   spatial         non-zero: the path in space, through float keys. Zero: a temporal curve of one component.
 //   isHold          out: 1 where a side is a hold, and `curve` is untouched then; else 0.
 //   curve           comes with its dimension and four points of as many doubles, which are filled.
 //
-// Pins the list. Operation 100. Errors: KFS_Err_TimeOutsideKeys, reported, where there is no key on one side; the list service's; the
-// kernel's.
+// Pins the list. Operation 100. Errors: KFS_Err_TimeOutsideKeys, reported, where there is no key on one side; the list
+// service's; the kernel's.
 int KFSp_ConstructCurve(KFS_Stream const* stream, int keyIndex, int time, int dimensionIndex,
                         unsigned char relativeTime, unsigned char spatial, unsigned char* isHold, CRV_Curve* curve);

@@ -38,7 +38,8 @@ struct Span {
     int to;
 };
 
-// Whether a neighbour derives its handles on the far side from its own neighbours, so that an edit next to it reaches beyond it.
+// Whether a neighbour derives its handles on the far side from its own neighbours, so that an edit next to it reaches
+// beyond it.
 bool IsAutomatic(KFS_Stream const* stream, KFS_KeyScalar const* key, signed char farInterp)
 {
     if (farInterp == KFS_Interp_Spline && (key->flags & KFS_KeyFlag_Modifiable) != 0) return true;
@@ -101,8 +102,8 @@ int ReachOfSide(Place const& place, Reach reach, Span* span)
 int FindReach(KFS_Stream const* stream, Reach reach, int time, Span* span)
 {
     Place place{stream};
-    if (int const code = KFSp_GetNeighborsFromTime(stream, time, 0, &place.at, &place.prev, &place.next, &place.prevIndex,
-                                                   &place.nextIndex, nullptr);
+    if (int const code = KFSp_GetNeighborsFromTime(stream, time, 0, &place.at, &place.prev, &place.next,
+                                                   &place.prevIndex, &place.nextIndex, nullptr);
         code != 0) {
         return code;
     }
@@ -117,7 +118,8 @@ int FindReach(KFS_Stream const* stream, Reach reach, int time, Span* span)
 
 int Predict(KFS_Stream const* stream, unsigned short action, T_Time const* time, T_Time* from, T_Time* to)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_PredictInvalid, stream, KFSp_Row_PredictInvalid); code != 0) return code;
+    if (int const code = KFSp_CheckStream(KFSp_Op_PredictInvalid, stream, KFSp_Row_PredictInvalid); code != 0)
+        return code;
 
     unsigned int const timeScale = stream->GetTimeScale();
     T_Time converted{time ? time->value : 0, timeScale};
@@ -150,7 +152,7 @@ int Predict(KFS_Stream const* stream, unsigned short action, T_Time const* time,
     return error.Code();
 }
 
-} // namespace
+}  // namespace
 
 int KFS_PredictInvalid(KFS_Stream const* stream, unsigned short action, T_Time const* time, T_Time* from, T_Time* to)
 {

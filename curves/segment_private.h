@@ -5,12 +5,12 @@
 
 // The one place that turns two keys into the control points of a segment.
 
-// Where a linear side has its handle, as a fraction of the segment, and the influence that a new key gets. Files and renders depend on
-// this literal: it isn't one sixth as a double.
+// Where a linear side has its handle, as a fraction of the segment, and the influence that a new key gets. Files and
+// renders depend on this literal: it isn't one sixth as a double.
 inline constexpr double KFSp_OneSixth = 0.16666666667;
 
-// Storage for a segment's four control points and the curve that points to them. 2 coordinates are a temporal segment; the path of a
-// spatial stream has the stream's dimension, 4 at most. The points aren't set here.
+// Storage for a segment's four control points and the curve that points to them. 2 coordinates are a temporal segment;
+// the path of a spatial stream has the stream's dimension, 4 at most. The points aren't set here.
 struct KFSp_SegmentCurve {
     static constexpr int MaxDimension = 4;
 
@@ -45,8 +45,8 @@ inline KFSp_SegmentKind KFSp_GetSegmentKind(signed char outInterp, signed char i
     return KFSp_SegmentKind::Other;
 }
 
-// One end of a temporal segment: the value there, and the handle on the segment's side. The handle counts on a spline side only; any other
-// side has its handle on the chord.
+// One end of a temporal segment: the value there, and the handle on the segment's side. The handle counts on a spline
+// side only; any other side has its handle on the chord.
 struct KFSp_TemporalEnd {
     double value;
     double speed;
@@ -80,7 +80,8 @@ inline void KFSp_FillTemporalSegment(KFSp_TemporalEnd const& a, KFSp_TemporalEnd
     }
 }
 
-// Fills the speed graph between two anchors of a spatial stream: distance along the path, 0 to `total`, over `dt` seconds.
+// Fills the speed graph between two anchors of a spatial stream: distance along the path, 0 to `total`, over `dt`
+// seconds.
 inline void KFSp_FillSpeedGraph(KFS_KeyScalar const* a, KFS_KeyScalar const* b, double total, double dt,
                                 CRV_Curve const& curve)
 {

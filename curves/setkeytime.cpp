@@ -1,3 +1,4 @@
+#include "curves/arcs_private.h"
 #include "curves/floatkeys.h"
 #include "curves/neighbours_private.h"
 #include "curves/segment_private.h"
@@ -62,7 +63,7 @@ int Pack(Move const& move, int first, int last, PlaceHolder&& placeHolder)
     for (int i = first; i <= last; ++i) {
         KFS_KeyScalar* key = nullptr;
         if (int const code = GetKey(move, i, &key); code != 0) return code;
-        if ((key->flags & KFS_KeyFlag_Float) != 0) {
+        if (KFSp_Floats(key)) {
             KFSp_RetimeKey(move.data, i, key, placeHolder(i));
         }
     }
@@ -94,8 +95,8 @@ int MakeRoomInside(Move const& move, Neighbours const& around)
     return around.next ? PackAheadOf(move, around, move.index + 1) : 0;
 }
 
-// The same between the anchors around the target, for an end key that passes its only neighbour. They stay on the side to which the key
-// doesn't come.
+// The same between the anchors around the target, for an end key that passes its only neighbour. They stay on the side
+// to which the key doesn't come.
 int MakeRoomOutside(Move* move, int present)
 {
     Neighbours around;
@@ -185,9 +186,10 @@ int SetKeyTime(Move* move)
     return MoveInList(move);
 }
 
-} // namespace
+}  // namespace
 
-int KFS_SetKeyTime(KFS_Stream* stream, int index, T_Time const* newTime, int newTimeValue, int* newIndex, T_Time* oldTime)
+int KFS_SetKeyTime(KFS_Stream* stream, int index, T_Time const* newTime, int newTimeValue, int* newIndex,
+                   T_Time* oldTime)
 {
     return KFSp_Boundary([&] {
         if (int const code = KFSp_CheckStream(KFSp_Op_SetKeyTime, stream, KFSp_Row_AlterKey); code != 0) return code;

@@ -67,6 +67,14 @@ int StoreTangents(KFS_Stream* stream, KFS_KeyScalar* key, short kind, void const
     return error.Code();
 }
 
+// What is automatic of a key is derived, its being continuous included. An edit that leaves some of it as it is, and
+// stops it from being automatic, means what a read would find now.
+int RepairTangents(KFS_Stream const* stream, KFS_StreamKeyData const* data, int index)
+{
+    int const* const stale = data->arcInvalidKeyIndex;
+    return index >= stale[0] && index <= stale[1] ? stream->UpdateStream() : 0;
+}
+
 // From now on the arcs around the key are measured anew, and its tangents are the user's.
 void MarkEdited(KFS_Stream* stream, int index, KFSp_FirstError& error)
 {
@@ -87,6 +95,7 @@ int SetTangents(KFS_Stream* stream, int index, void const* inTangent, void const
     if (KFSp_ItemCount(data) == 0) {
         return KFSp_ReportErr(KFSp_Op_SetKeySpaceTangents, KFS_Err_NoKeys, KFSp_Row_AlterKey);
     }
+    if (int const code = RepairTangents(stream, data, index); code != 0) return code;
     error.Keep(KFSp_ClearCache(stream));
     {
         KFSp_ScKey const key(data->keys, index, error);
@@ -141,13 +150,15 @@ int ChangeBits(KFS_Stream* stream, short operation, unsigned int mask, unsigned 
 
 int GetTangents(KFS_Stream const* stream, int index, double* inTangent, double* outTangent)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_GetKeySpaceTangents, stream, KFSp_Row_GetValue); code != 0) return code;
+    if (int const code = KFSp_CheckStream(KFSp_Op_GetKeySpaceTangents, stream, KFSp_Row_GetValue); code != 0)
+        return code;
     if (int const code = CheckSpatial(stream, KFSp_Op_GetKeySpaceTangents); code != 0) return code;
     KFS_StreamKeyData const* const data = stream->GetKeyData();
     if (KFSp_HasNoValue(stream, data)) {
         return KFSp_ReportErr(KFSp_Op_GetKeySpaceTangents, KFS_Err_NoKeys, KFSp_Row_GetValue);
     }
-    if (int const code = RefuseCustom(stream, KFSp_Op_GetKeySpaceTangents, KFSp_Row_ConvertFrom); code != 0) return code;
+    if (int const code = RefuseCustom(stream, KFSp_Op_GetKeySpaceTangents, KFSp_Row_ConvertFrom); code != 0)
+        return code;
 
     int const update = stream->UpdateStream();
     KFS_KeyScalar const* key = data->cache;
@@ -169,7 +180,8 @@ int GetTangents(KFS_Stream const* stream, int index, double* inTangent, double* 
 
 int GetSpFlags(KFS_Stream const* stream, int index, unsigned int* flags)
 {
-    if (int const code = CheckKeys(stream, KFSp_Op_UnsetKeySpaceFlags, KFSp_Row_InquireKey, KFSp_Op_KeyFlags); code != 0) {
+    if (int const code = CheckKeys(stream, KFSp_Op_UnsetKeySpaceFlags, KFSp_Row_InquireKey, KFSp_Op_KeyFlags);
+        code != 0) {
         return code;
     }
     KFS_StreamKeyData const* const data = stream->GetKeyData();
@@ -184,10 +196,24 @@ int GetSpFlags(KFS_Stream const* stream, int index, unsigned int* flags)
     return 0;
 }
 
+int StopAutomaticTangents(KFS_Stream* stream, int index)
+{
+    if (int const code = CheckKeys(stream, KFSp_Op_UnsetKeySpaceFlags, KFSp_Row_AlterKey, KFSp_Op_KeyFlags);
+        code != 0) {
+        return code;
+    }
+    if (int const code = RepairTangents(stream, stream->GetKeyData(), index); code != 0) return code;
+    return KFSp_UnsetKeySpaceFlags(stream, KFS_KeySpFlag_Modifiable, index);
+}
+
 int SetSpFlags(KFS_Stream* stream, int index, unsigned int mask, unsigned int values)
 {
-    if (int const code = CheckKeys(stream, KFSp_Op_SetKeySpFlags, KFSp_Row_AlterKey, KFSp_Op_SetKeySpFlags); code != 0) {
+    if (int const code = CheckKeys(stream, KFSp_Op_SetKeySpFlags, KFSp_Row_AlterKey, KFSp_Op_SetKeySpFlags);
+        code != 0) {
         return code;
+    }
+    if ((mask & ~values & KFS_KeySpFlag_Modifiable) != 0) {
+        if (int const code = RepairTangents(stream, stream->GetKeyData(), index); code != 0) return code;
     }
     int result = ChangeSpFlags(stream, index, mask, values);
     if (stream->HasNoKeys()) return result;
@@ -198,7 +224,7 @@ int SetSpFlags(KFS_Stream* stream, int index, unsigned int mask, unsigned int va
     return result != 0 ? result : cleared;
 }
 
-} // namespace
+}  // namespace
 
 int KFSp_SetKeySpaceFlags(KFS_Stream* stream, unsigned int bits, int index)
 {
@@ -213,19 +239,23 @@ int KFSp_UnsetKeySpaceFlags(KFS_Stream* stream, unsigned int bits, int index)
 int KFS_SetKeySpaceTangents(KFS_Stream* stream, int index, int, void const* inTangent, void const* outTangent)
 {
     return KFSp_Boundary([&] {
-        if (int const code = KFSp_CheckStream(KFSp_Op_SetKeySpaceTangents, stream, KFSp_Row_AlterKey); code != 0) return code;
+        if (int const code = KFSp_CheckStream(KFSp_Op_SetKeySpaceTangents, stream, KFSp_Row_AlterKey); code != 0)
+            return code;
         if (int const code = CheckSpatial(stream, KFSp_Op_SetKeySpaceTangents); code != 0) return code;
-        if (int const code = RefuseCustom(stream, KFSp_Op_SetKeySpaceTangents, KFSp_Row_ConvertTo); code != 0) return code;
+        if (int const code = RefuseCustom(stream, KFSp_Op_SetKeySpaceTangents, KFSp_Row_ConvertTo); code != 0)
+            return code;
         if (int const code = SetTangents(stream, index, inTangent, outTangent); code != 0) return code;
         stream->NotifyValueChanged();
         return 0;
     });
 }
 
-int KFS_SetKeySpaceTangentsF(KFS_Stream* stream, int index, int unused, double const* inTangent, double const* outTangent)
+int KFS_SetKeySpaceTangentsF(KFS_Stream* stream, int index, int unused, double const* inTangent,
+                             double const* outTangent)
 {
     return KFSp_Boundary([&] {
-        if (int const code = KFSp_CheckStream(KFSp_Op_SetKeySpaceTangentsF, stream, KFSp_Row_AlterKey); code != 0) return code;
+        if (int const code = KFSp_CheckStream(KFSp_Op_SetKeySpaceTangentsF, stream, KFSp_Row_AlterKey); code != 0)
+            return code;
         KFSp_FirstError error;
         KFSp_ScDoubleValues doubles(stream, &KFSp_FakeCopyItemFuncNoLimits);
         error.Keep(doubles.Code());
@@ -245,7 +275,7 @@ int KFS_GetKeySpaceTangentsF(KFS_Stream const* stream, int index, int, double* i
 int KFS_SetKeySpModifiable(KFS_Stream* stream, unsigned char on, int index)
 {
     return KFSp_Boundary([&] {
-        if (on == 0) return KFSp_UnsetKeySpaceFlags(stream, KFS_KeySpFlag_Modifiable, index);
+        if (on == 0) return StopAutomaticTangents(stream, index);
         if (int const code = KFSp_SetKeySpaceFlags(stream, KFS_KeySpFlag_Modifiable, index); code != 0) return code;
         return stream->SetArcInvalid(index + 1, 2);
     });

@@ -1,12 +1,12 @@
 #include "curves/spatial.h"
 
+#include "curves/arcs_private.h"
 #include "curves/neighbours_private.h"
 #include "curves/segment_private.h"
 #include "curves/spatial_private.h"
 #include "curves/update.h"
 #include "curves/update_private.h"
 #include "frame/boundary_private.h"
-#include "frame/report_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/valuedata_private.h"
 
@@ -30,32 +30,12 @@ struct Place {
     double s;
 };
 
-bool HasCurvedDimension(KFS_Stream const* stream)
-{
-    return stream->GetDimension() == 2 || stream->GetDimension() == 3;
-}
-
-int RefuseDimension()
-{
-    return KFSp_ReportErr(KFSp_Op_InterpolateSpatial, KFS_Err_Only2D3D, 0);
-}
-
-int CheckDimension(KFS_Stream const* stream)
-{
-    if (HasCurvedDimension(stream) || !stream->IsSpatial() || !stream->IsSParametrized()) return 0;
-    return RefuseDimension();
-}
-
-bool Floats(KFS_KeyScalar const* key)
-{
-    return (key->flags & KFS_KeyFlag_Float) != 0;
-}
-
 // Whether the hint is right: the time lies strictly between the key at `keyIndex` and the one behind it.
 bool TakeHint(KFS_StreamKeyData const* data, int time, int keyIndex, Run* run)
 {
     if (keyIndex < 0 || keyIndex >= KFSp_ItemCount(data) - 1) return false;
-    if (KFSp_GetConstKey(data, keyIndex, &run->a) != 0 || KFSp_GetConstKey(data, keyIndex + 1, &run->b) != 0) return false;
+    if (KFSp_GetConstKey(data, keyIndex, &run->a) != 0 || KFSp_GetConstKey(data, keyIndex + 1, &run->b) != 0)
+        return false;
     run->aIndex = keyIndex;
     run->bIndex = keyIndex + 1;
     return run->a->time < time && time < run->b->time;
@@ -64,32 +44,21 @@ bool TakeHint(KFS_StreamKeyData const* data, int time, int keyIndex, Run* run)
 int FindAnchors(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int keyIndex, Run* run)
 {
     bool const hinted = TakeHint(data, time, keyIndex, run);
-    bool const floats = hinted && stream->IsSParametrized() && (Floats(run->a) || Floats(run->b));
+    bool const floats = hinted && stream->IsSParametrized() && (KFSp_Floats(run->a) || KFSp_Floats(run->b));
     if (hinted && !floats) return 0;
 
     // From a float key of the pair the anchors on both sides are those of the time.
     KFS_KeyScalar* at = nullptr;
     KFS_KeyScalar* a = nullptr;
     KFS_KeyScalar* b = nullptr;
-    int const code = floats ? KFSp_GetNeighborsFromIndex(stream, Floats(run->a) ? run->aIndex : run->bIndex, 0, &a, &b,
-                                                         &run->aIndex, &run->bIndex)
-                            : KFSp_GetNeighborsFromTime(stream, time, 0, &at, &a, &b, &run->aIndex, &run->bIndex, nullptr);
+    int const code = floats
+                         ? KFSp_GetNeighborsFromIndex(stream, KFSp_Floats(run->a) ? run->aIndex : run->bIndex, 0, &a,
+                                                      &b, &run->aIndex, &run->bIndex)
+                         : KFSp_GetNeighborsFromTime(stream, time, 0, &at, &a, &b, &run->aIndex, &run->bIndex, nullptr);
     run->a = a;
     run->b = b;
     if (code != 0) return code;
     return a && b ? 0 : KFS_Err_TimeOutsideKeys;
-}
-
-// Sums the arcs in the order of the keys. The sum so far stands also after an error.
-int SumArcs(KFS_StreamKeyData const* data, Run* run)
-{
-    run->total = run->a->arcLength;
-    for (int i = run->aIndex + 1; i < run->bIndex; ++i) {
-        KFS_KeyScalar const* key = nullptr;
-        if (int const code = KFSp_GetConstKey(data, i, &key); code != 0) return code;
-        run->total += key->arcLength;
-    }
-    return 0;
 }
 
 double LinearFraction(KFS_KeyScalar const* a, KFS_KeyScalar const* b, int time)
@@ -120,8 +89,8 @@ int GetDistance(KFS_Stream const* stream, Run const& run, int time, KFSp_Segment
     return CRV_EvaluateYFromX(&graph.curve, s, KFSp_Seconds(time, run.a->time, stream->GetTimeScale()));
 }
 
-// Walks from anchor to anchor to the piece on which the distance lies; a distance at a key belongs to the piece before it. The last piece
-// takes what rounding has left over.
+// Walks from anchor to anchor to the piece on which the distance lies; a distance at a key belongs to the piece before
+// it. The last piece takes what rounding has left over.
 int FindPiece(KFS_StreamKeyData const* data, Run const& run, double s, Place* place)
 {
     *place = {run.a, run.b, s};
@@ -148,9 +117,10 @@ SEQ_Head** TableOf(KFS_KeyScalar const* key)
     return KFSp_HasSpatialBlock(key) ? key->remapTable : nullptr;
 }
 
-// The path's parameter at a place. `path` is filled here, with the piece's points in the value's coordinates, where `fill` asks for it or the
-// table is missing.
-int GetParameter(KFS_Stream const* stream, Run const& run, Place const& place, bool fill, KFSp_SegmentCurve& path, double* t)
+// The path's parameter at a place. `path` is filled here, with the piece's points in the value's coordinates, where
+// `fill` asks for it or the table is missing.
+int GetParameter(KFS_Stream const* stream, Run const& run, Place const& place, bool fill, KFSp_SegmentCurve& path,
+                 double* t)
 {
     if (!TableOf(place.first)) {
         if (int const code = KFS_ForceUpdateStream(stream); code != 0) return code;
@@ -166,8 +136,8 @@ int GetParameter(KFS_Stream const* stream, Run const& run, Place const& place, b
     return 0;
 }
 
-// The point of the straight line between the anchors. The parameter goes behind the in tangent here, where the path's point leaves it
-// behind the value.
+// The point of the straight line between the anchors. The parameter goes behind the in tangent here, where the path's
+// point leaves it behind the value.
 void WriteStraight(KFS_Stream const* stream, Run const& run, double t, double* result)
 {
     int const dimension = stream->GetDimension();
@@ -181,12 +151,12 @@ void WriteStraight(KFS_Stream const* stream, Run const& run, double t, double* r
 
 int FindRun(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int keyIndex, Run* run)
 {
-    if (int const code = CheckDimension(stream); code != 0) return code;
+    if (int const code = KFSp_CheckPathDimension(stream); code != 0) return code;
     if (int const code = FindAnchors(stream, data, time, keyIndex, run); code != 0) return code;
-    return SumArcs(data, run);
+    return KFSp_SumArcs(data, run->aIndex, run->bIndex, &run->total);
 }
 
-} // namespace
+}  // namespace
 
 int KFSp_InterpolateSpatial(KFS_Stream const* stream, long, int time, int keyIndex)
 {
@@ -199,9 +169,10 @@ int KFSp_InterpolateSpatial(KFS_Stream const* stream, long, int time, int keyInd
     if (int const code = GetDistance(stream, run, time, curve, &s); code != 0) return code;
 
     bool const onPath = stream->GetSpInterp() == KFS_SpInterp_Auto;
-    if (onPath && !HasCurvedDimension(stream)) return RefuseDimension();
+    if (onPath && !KFSp_HasPathDimension(stream)) return KFSp_RefusePathDimension();
     Place place{run.a, run.b, s};
-    if (int const code = onPath ? FindPiece(data, run, s, &place) : TakeFirstPiece(data, run, &place); code != 0) return code;
+    if (int const code = onPath ? FindPiece(data, run, s, &place) : TakeFirstPiece(data, run, &place); code != 0)
+        return code;
     double t = 0.0;
     if (int const code = GetParameter(stream, run, place, onPath, curve, &t); code != 0) return code;
 
@@ -224,7 +195,8 @@ int KFSp_InterpTangentSpatial(KFS_Stream const* stream, long, int time, int keyI
     KFSp_SegmentCurve curve(2);
     double s = 0.0;
     // Codes without a shape stand still at the first anchor.
-    if (int const code = GetDistance(stream, run, time, curve, &s); code != 0 && code != KFS_Err_InterpNotAllowed) return code;
+    if (int const code = GetDistance(stream, run, time, curve, &s); code != 0 && code != KFS_Err_InterpNotAllowed)
+        return code;
 
     int const dimension = stream->GetDimension();
     bool const onPath = stream->IsSParametrized() || (stream->GetSpInterp() == KFS_SpInterp_Auto && dimension == 2);
@@ -248,13 +220,13 @@ int KFSp_InterpTangentSpatial(KFS_Stream const* stream, long, int time, int keyI
 
 int KFSp_InterpDerivSpatial(KFS_Stream const* stream, long, int time, int keyIndex)
 {
-    if (int const code = CheckDimension(stream); code != 0) return code;
+    if (int const code = KFSp_CheckPathDimension(stream); code != 0) return code;
     KFS_StreamKeyData const* const data = stream->GetKeyData();
     Run run;
     if (int const code = FindAnchors(stream, data, time, keyIndex, &run); code != 0) return code;
     // Between two splines the sum may be a partial one.
     bool const bothSpline = run.a->outInterp == KFS_Interp_Spline && run.b->inInterp == KFS_Interp_Spline;
-    if (int const code = SumArcs(data, &run); code != 0 && !bothSpline) return code;
+    if (int const code = KFSp_SumArcs(data, run.aIndex, run.bIndex, &run.total); code != 0 && !bothSpline) return code;
     if (KFSp_GetSegmentKind(run.a->outInterp, run.b->inInterp) != KFSp_SegmentKind::Curved) return 0;
 
     KFSp_SegmentCurve graph(2);
@@ -300,7 +272,8 @@ int GetArcDistance(KFS_Stream const* stream, KFS_KeyScalar const* a, KFS_KeyScal
     return CRV_EvaluateYFromX(&graph.curve, s, KFSp_Seconds(time, a->time, stream->GetTimeScale()));
 }
 
-int CalculateT(KFS_Stream const* stream, int time, int keyIndex, KFS_KeyScalar** first, KFS_KeyScalar** second, double* t)
+int CalculateT(KFS_Stream const* stream, int time, int keyIndex, KFS_KeyScalar** first, KFS_KeyScalar** second,
+               double* t)
 {
     KFS_StreamKeyData const* const data = stream->GetKeyData();
     if (KFSp_IsStale(data)) {
@@ -318,7 +291,7 @@ int CalculateT(KFS_Stream const* stream, int time, int keyIndex, KFS_KeyScalar**
     return 0;
 }
 
-} // namespace
+}  // namespace
 
 int KFS_CalculateTFromStream(KFS_Stream const* stream, long, int time, int keyIndex, KFS_KeyScalar** first,
                              KFS_KeyScalar** second, double* t)

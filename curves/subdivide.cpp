@@ -1,5 +1,6 @@
 #include "curves/subdivide_private.h"
 
+#include "curves/arcs_private.h"
 #include "curves/autotangents_private.h"
 #include "curves/interpolate_private.h"
 #include "curves/neighbours_private.h"
@@ -33,7 +34,10 @@ struct Place {
     bool Wants(char tangents) const { return (mode & tangents) != 0; }
     bool PrevIsLinear() const { return prev && prev->outInterp == KFS_Interp_Linear; }
     bool NextIsLinear() const { return next && next->inInterp == KFS_Interp_Linear; }
-    bool IsHeld() const { return Between() && (prev->outInterp == KFS_Interp_Hold || next->inInterp == KFS_Interp_Hold); }
+    bool IsHeld() const
+    {
+        return Between() && (prev->outInterp == KFS_Interp_Hold || next->inInterp == KFS_Interp_Hold);
+    }
     bool NonDecreasing() const { return (stream->GetKFSFlags() & KFS_StreamFlag_NonDecreasing) != 0; }
     double X() const { return prev ? KFSp_Seconds(time, prev->time, stream->GetTimeScale()) : 0.0; }
     double Duration() const { return Between() ? KFSp_Seconds(next->time, prev->time, stream->GetTimeScale()) : 0.0; }
@@ -47,7 +51,8 @@ void FlattenTangents(KFS_KeyScalar* key, int dimension)
     std::fill_n(runs.outTangent, dimension, 0.0);
 }
 
-// What a new key has where nothing else gives it handles: the record is scratch, and holds numbers of whatever was read last.
+// What a new key has where nothing else gives it handles: the record is scratch, and holds numbers of whatever was read
+// last.
 void RestHandles(Place const& place)
 {
     int const dimension = place.Dimension();
@@ -86,7 +91,8 @@ int TakeValue(Place const& place)
     return code;
 }
 
-// The path's half. The neighbours' facing tangents become absolute handles in place, so that the curve lies on the keys' own numbers.
+// The path's half. The neighbours' facing tangents become absolute handles in place, so that the curve lies on the
+// keys' own numbers.
 int SplitPath(Place const& place)
 {
     if (int const code = KFSp_InterpolateSpatial(place.stream, 0, place.time, -1); code != 0) return code;
@@ -141,17 +147,6 @@ void SetSpeedNumbers(KFS_KeyScalar* key, SpeedNumbers const& numbers)
     key->outInfluence = numbers[4];
 }
 
-int SumArcs(Place const& place, double* total)
-{
-    *total = place.prev->arcLength;
-    for (int i = place.prevIndex + 1; i < place.nextIndex; ++i) {
-        KFS_KeyScalar const* key = nullptr;
-        if (int const code = KFSp_GetConstKey(place.data, i, &key); code != 0) return code;
-        *total += key->arcLength;
-    }
-    return 0;
-}
-
 void ClearModifiable(Place const& place)
 {
     for (KFS_KeyScalar* const changed : {place.key, place.prev, place.next}) {
@@ -164,7 +159,7 @@ void ClearModifiable(Place const& place)
 int SplitSpeedGraph(Place const& place)
 {
     double total = 0.0;
-    if (int const code = SumArcs(place, &total); code != 0) return code;
+    if (int const code = KFSp_SumArcs(place.data, place.prevIndex, place.nextIndex, &total); code != 0) return code;
     double const prevArc = place.prev->arcLength;
     double const nextArc = place.next->arcLength;
     place.prev->arcLength = 0.0;
@@ -173,9 +168,9 @@ int SplitSpeedGraph(Place const& place)
     SpeedNumbers prev = GetSpeedNumbers(place.prev);
     SpeedNumbers next = GetSpeedNumbers(place.next);
     SpeedNumbers key = GetSpeedNumbers(place.key);
-    int const code = KFSp_ComputeTempSubdivision(1, place.X(), place.Duration(), place.NonDecreasing() ? 1 : 0,
-                                                 place.PrevIsLinear(), place.NextIsLinear(), prev.data(), next.data(),
-                                                 key.data());
+    int const code =
+        KFSp_ComputeTempSubdivision(1, place.X(), place.Duration(), place.NonDecreasing() ? 1 : 0, place.PrevIsLinear(),
+                                    place.NextIsLinear(), prev.data(), next.data(), key.data());
     SetSpeedNumbers(place.prev, prev);
     SetSpeedNumbers(place.next, next);
     SetSpeedNumbers(place.key, key);
@@ -203,8 +198,8 @@ int SplitHandles(Place const& place)
     bool const prevLinear = place.PrevIsLinear();
     bool const nextLinear = place.NextIsLinear();
     int const code = KFSp_ComputeTempSubdivision(
-        place.stream->GetDimension(), place.X(), place.Duration(), place.NonDecreasing() ? 1 : 0, prevLinear, nextLinear,
-        place.prev ? KFSp_Numbers(place.prev) : nullptr, place.next ? KFSp_Numbers(place.next) : nullptr,
+        place.stream->GetDimension(), place.X(), place.Duration(), place.NonDecreasing() ? 1 : 0, prevLinear,
+        nextLinear, place.prev ? KFSp_Numbers(place.prev) : nullptr, place.next ? KFSp_Numbers(place.next) : nullptr,
         KFSp_Numbers(place.key));
     ClearModifiable(place);
     // The handles carry the line now.
@@ -248,7 +243,7 @@ bool NeedsPlainValue(Place const& place)
     return place.IsNewKey() || !place.stream->IsSpatial() || place.Wants(KFSp_Tangents_Spatial);
 }
 
-} // namespace
+}  // namespace
 
 int KFSp_SubdivideSpline(KFS_Stream* stream, int time, char mode, KFS_KeyScalar* key)
 {

@@ -5,8 +5,8 @@
 
 namespace {
 
-// Where a linear side's handle ends before the later key. Not the same number as 1 - KFSp_OneSixth, from which reads take it: the split has
-// its own literal.
+// Where a linear side's handle ends before the later key. Not the same number as 1 - KFSp_OneSixth, from which reads
+// take it: the split has its own literal.
 constexpr double FiveSixths = 0.83333333333;
 
 using Runs = KFSp_TemporalRuns<double>;
@@ -39,9 +39,10 @@ double Slope(Point const& a, Point const& b)
     return a.x == b.x ? 0.0 : (b.y - a.y) / (b.x - a.x);
 }
 
-// The halves' handles as speeds and influences. `rows` is the kernel's: left p1, left p2, the split, right p1, right p2.
-void StoreHalves(Split const& split, CRV_Curve const& curve, Point const (&rows)[5], int i, Runs const& prev, Runs const& next,
-                 Runs const& out)
+// The halves' handles as speeds and influences. `rows` is the kernel's: left p1, left p2, the split, right p1, right
+// p2.
+void StoreHalves(Split const& split, CRV_Curve const& curve, Point const (&rows)[5], int i, Runs const& prev,
+                 Runs const& next, Runs const& out)
 {
     double const x = split.x;
     Point const at{x, rows[2].y};
@@ -58,13 +59,15 @@ void StoreHalves(Split const& split, CRV_Curve const& curve, Point const (&rows)
     next.inInfluence[i] = std::fabs((rows[4].x - end.x) / (x - split.dt));
 }
 
-int SplitComponent(Split const& split, CRV_Curve const& curve, int i, Runs const& prev, Runs const& next, Runs const& out)
+int SplitComponent(Split const& split, CRV_Curve const& curve, int i, Runs const& prev, Runs const& next,
+                   Runs const& out)
 {
     double t = 0.0;
     if (int const code = CRV_TFromX(&curve, &t, split.x); code != 0) return code;
     double rows[10];
     if (int const code = CRV_SubdivideCurve(&curve, rows, t); code != 0) return code;
-    Point const points[5] = {{rows[0], rows[1]}, {rows[2], rows[3]}, {rows[4], rows[5]}, {rows[6], rows[7]}, {rows[8], rows[9]}};
+    Point const points[5] = {
+        {rows[0], rows[1]}, {rows[2], rows[3]}, {rows[4], rows[5]}, {rows[6], rows[7]}, {rows[8], rows[9]}};
     StoreHalves(split, curve, points, i, prev, next, out);
     return 0;
 }
@@ -81,7 +84,7 @@ void Rest(int dimension, double const* neighbour, Runs const& out)
     }
 }
 
-} // namespace
+}  // namespace
 
 int KFSp_ComputeTempSubdivision(short dimension, double x, double dt, unsigned char nonDecreasing, bool prevLinear,
                                 bool nextLinear, double* prev, double* next, double* out)

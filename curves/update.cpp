@@ -1,5 +1,6 @@
 #include "curves/update.h"
 
+#include "curves/arcs_private.h"
 #include "curves/autotangents_private.h"
 #include "curves/floatkeys_private.h"
 #include "curves/segment_private.h"
@@ -12,10 +13,11 @@
 #include <algorithm>
 #include <cmath>
 
-// The repair of stale keys. It touches the marked ranges only, so its cost doesn't depend on how many keys the list has.
+// The repair of stale keys. It touches the marked ranges only, so its cost doesn't depend on how many keys the list
+// has.
 //
-// The order is part of the result: path lengths first, because the automatic speeds of spatial keys are distances over time; float times
-// last, because they depend on lengths and speeds.
+// The order is part of the result: path lengths first, because the automatic speeds of spatial keys are distances over
+// time; float times last, because they depend on lengths and speeds.
 
 namespace {
 
@@ -24,7 +26,8 @@ struct StaleRange {
     int last;
 };
 
-// What one pass works on. The ranges are copies: a lookup inside the pass may run a second one, which consumes the marks.
+// What one pass works on. The ranges are copies: a lookup inside the pass may run a second one, which consumes the
+// marks.
 struct Pass {
     KFS_Stream const* stream;
     KFS_StreamKeyData const* data;
@@ -94,8 +97,8 @@ int RepairSpatialTangents(Pass const& pass)
     });
 }
 
-// The path is measured in the coordinates that the stream's multiplier makes of the value's, so that a distance means what it means to
-// the host, pixel aspect and all.
+// The path is measured in the coordinates that the stream's multiplier makes of the value's, so that a distance means
+// what it means to the host, pixel aspect and all.
 int MeasurePath(Pass const& pass, KFS_KeyScalar* a, KFS_KeyScalar const* b)
 {
     int const dimension = pass.stream->GetDimension();
@@ -140,8 +143,7 @@ int MeasureStraight(Pass const& pass, Length&& length)
 
 bool HasCurvedPath(Pass const& pass)
 {
-    int const dimension = pass.stream->GetDimension();
-    return pass.stream->IsSParametrized() && (dimension == 2 || dimension == 3);
+    return pass.stream->IsSParametrized() && KFSp_HasPathDimension(pass.stream);
 }
 
 int RepairArcs(Pass const& pass)
@@ -155,9 +157,8 @@ int RepairArcs(Pass const& pass)
     if (HasCurvedPath(pass)) {
         return ForArcs(pass, [&](KFS_KeyScalar* a, KFS_KeyScalar* b, int) { return MeasurePath(pass, a, b); });
     }
-    return MeasureStraight(pass, [&](KFS_KeyScalar const* a, KFS_KeyScalar const* b) {
-        return Chord(a, b, pass.stream->GetDimension());
-    });
+    return MeasureStraight(
+        pass, [&](KFS_KeyScalar const* a, KFS_KeyScalar const* b) { return Chord(a, b, pass.stream->GetDimension()); });
 }
 
 bool HasAutomaticHandles(KFS_KeyScalar const* key)
@@ -184,7 +185,7 @@ int Repair(Pass const& pass)
     return RepairHandlesAndTimes(pass);
 }
 
-} // namespace
+}  // namespace
 
 int KFS_Stream::UpdateStream() const
 {
@@ -216,7 +217,7 @@ int KFS_Stream::UpdateStreamIfStaleTangents(int index) const
 
 int KFS_Stream::UpdateStreamIfFloatItem(KFS_KeyScalar const* key, int index) const
 {
-    if ((key->flags & KFS_KeyFlag_Float) == 0) return 0;
+    if (!KFSp_Floats(key)) return 0;
     int const* const stale = GetArcInvalidKeyIndex();
     return index >= stale[0] && index <= stale[1] ? UpdateStream() : 0;
 }

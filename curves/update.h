@@ -3,16 +3,17 @@
 #include "frame/export.h"
 #include "keystore/stream.h"
 
-// Derived data of keys (automatic tangents, arc lengths and their tables, times of float keys) isn't recomputed by edits. An edit marks a
-// range of keys, and KFS_Stream::UpdateStream repairs that range when something reads it.
+// Derived data of keys (automatic tangents, arc lengths and their tables, times of float keys) isn't recomputed by
+// edits. An edit marks a range of keys, and KFS_Stream::UpdateStream repairs that range when something reads it.
 
 // Marks every key and repairs the stream, whether anything was stale or not.
 //
-// With a list of more than 32767 keys the count is narrowed to a short: from 32768 to 65536 keys nothing is marked, and only what was
-// stale before is repaired.
+// With a list of more than 32767 keys the count is narrowed to a short: from 32768 to 65536 keys nothing is marked, and
+// only what was stale before is repaired.
 //
 // Operation 59. Result: 0; 2 for a damaged stream; the list service's, the curve kernel's or the tangents' first error.
-// Threads: writes derived data of the calling thread's key data. Cost: linear in the keys, some microseconds a curved arc.
+// Threads: writes derived data of the calling thread's key data. Cost: linear in the keys, some microseconds a curved
+// arc.
 KFS_API int KFS_ForceUpdateStream(KFS_Stream const* stream);
 
 // Tells how far in time an edit at `time` would change the stream's curve.
@@ -25,9 +26,11 @@ KFS_API int KFS_ForceUpdateStream(KFS_Stream const* stream);
 //   from    out, not null; in the stream's scale
 //   to      out, not null; in the stream's scale
 //
-//      |-- from -----------------------------------------------------------to --|
-//      key --- automatic previous key --- edited key --- automatic next key --- key        (actions 1 and 2)
-//              previous key ------------- edited key --- next key                          (their sides alone, or keys that aren't automatic)
+// Actions 1 and 2 reach the neighbours, and beyond one that is automatic (a), whose handles follow from both its own
+// neighbours. A side alone reaches its neighbour; both neighbours if the key is continuous.
+//
+//      from                 to
+//       k ---- a ---- K ---- k            K the edited key, k keys that aren't automatic
 //
 // A stream without keys answers the time itself, with the code of the time's conversion.
 //

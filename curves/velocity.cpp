@@ -62,8 +62,7 @@ int SumArcs(KFS_StreamKeyData const* data, int first, int last, double* distance
 // The speed of a straight run between anchors: up to the key, from it on, or, for a float key, through it.
 int GetRunSpeed(AskedKey const& asked, KFSp_Side side, double* speed)
 {
-    bool const through =
-        (asked.key->flags & KFS_KeyFlag_Float) != 0 && !asked.IsFirst() && !asked.IsLast() && asked.prev && asked.next;
+    bool const through = (asked.key->flags & KFS_KeyFlag_Float) != 0 && asked.prev && asked.next;
     bool const fromPrev = through || side == KFSp_Side::In;
     bool const toNext = through || side == KFSp_Side::Out;
     KFS_KeyScalar const* const from = fromPrev ? asked.prev : asked.key;
@@ -162,8 +161,8 @@ int SetSpatialSpeeds(KFS_Stream* stream, int index, KFS_KeyScalar* key, double c
     return error.Code();
 }
 
-// The library's own copies move a whole custom value, and a custom record has no room for a second one behind the first. A client's function
-// knows its record.
+// The library's own copies move a whole custom value, and a custom record has no room for a second one behind the
+// first. A client's function knows its record.
 bool CanStoreSpeeds(KFS_Stream const* stream)
 {
     if (KFSp_HasHandleRuns(stream)) return true;
@@ -212,8 +211,7 @@ int KFS_SetKeyVelocity(KFS_Stream* stream, int index, void const* inVelocity, vo
     }
     KFSp_FirstError error;
     if (stream->HasKeys()) {
-        // A key that turns the user's keeps what it has on the other side for good, so that had better be right.
-        (void)stream->UpdateStreamIfStaleTangents(index);
+        KFSp_SettleAutomaticKey(stream, index);
         error.Keep(SetSpeeds(stream, index, inVelocity, outVelocity));
     }
     return KFSp_FinishHandleEdit(stream, error);

@@ -11,7 +11,8 @@ class KFS_RenderOptionsBase;
 class KFS_StreamFactory;
 class KFS_StreamIDPath;
 
-// What the library asks of its application. No call goes through a null entry unguarded: the host sets all those that its streams need.
+// What the library asks of its application. An entry is called without a look whether it is null: the host sets all those that its
+// streams need before it uses them.
 struct KFS_AppCallbacks {
     // An old file stored a type number in place of a path: fills the path in.
     void (*oldPathFixupFunc)(int oldType, KFS_StreamIDPath* path) = nullptr;

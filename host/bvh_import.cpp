@@ -90,9 +90,11 @@ private:
             if (frame > 0 && units <= times_.back()) {
                 throw ImportError("Frame Time", "frames are closer than 1/" + std::to_string(scene_.timeScale) + " s");
             }
-            Rational const error = Rational(units, scene_.timeScale) - time;
-            scene_.exactTimes = scene_.exactTimes && error == Rational();
-            scene_.worstTimeError = std::max(scene_.worstTimeError, std::abs(error.ToDouble()));
+            Rational const placed(units, scene_.timeScale);
+            if (placed != time) {
+                scene_.exactTimes = false;
+                scene_.worstTimeError = std::max(scene_.worstTimeError, std::abs(placed.ToDouble() - time.ToDouble()));
+            }
             times_.push_back(units);
         }
     } catch (std::overflow_error const&) {

@@ -199,16 +199,16 @@ private:
         }
         std::size_t const mostNumbers = words_.BytesLeft() / 2;
         if (motion_.frames > mostNumbers / motion_.channelCount) {
-            throw ImportError(words_.Place(), "the file is too short for " + std::to_string(motion_.frames) + " frames of " +
-                                                  std::to_string(motion_.channelCount) + " channels");
+            throw ImportError(words_.Place(), "the file is too short for " + std::to_string(motion_.frames) +
+                                                  " frames of " + std::to_string(motion_.channelCount) + " channels");
         }
         motion_.numbers.resize(motion_.frames * motion_.channelCount);
         for (double& number : motion_.numbers) {
             number = words_.NextNumber("a number of a frame");
         }
         if (!words_.AtEnd()) {
-            throw ImportError(words_.Place(), "there is more than the " + std::to_string(motion_.frames) + " frames of " +
-                                                  std::to_string(motion_.channelCount) + " channels");
+            throw ImportError(words_.Place(), "there is more than the " + std::to_string(motion_.frames) +
+                                                  " frames of " + std::to_string(motion_.channelCount) + " channels");
         }
     }
 

@@ -49,8 +49,11 @@ std::size_t ReadIndex(unsigned char const* bytes, std::size_t size)
 }  // namespace
 
 AccessorReader::AccessorReader(tinygltf::Model const& model, int index, std::string const& place)
-    : model_(&model), place_("accessors[" + std::to_string(index) + ']'), accessor_(FindAccessor(model, index, place)),
-      components_(static_cast<std::size_t>(tinygltf::GetNumComponentsInType(static_cast<std::uint32_t>(accessor_->type))))
+    : model_(&model),
+      place_("accessors[" + std::to_string(index) + ']'),
+      accessor_(FindAccessor(model, index, place)),
+      components_(
+          static_cast<std::size_t>(tinygltf::GetNumComponentsInType(static_cast<std::uint32_t>(accessor_->type))))
 {
     int const type = accessor_->componentType;
     int const size = tinygltf::GetComponentSizeInBytes(static_cast<std::uint32_t>(type));
@@ -65,7 +68,8 @@ AccessorReader::AccessorReader(tinygltf::Model const& model, int index, std::str
     auto const& sparse = accessor_->sparse;
     auto const sparseCount = sparse.isSparse ? static_cast<std::size_t>(std::max(sparse.count, 0)) : 0;
     if (sparseCount > accessor_->count) {
-        throw ImportError(place_, "replaces " + std::to_string(sparseCount) + " elements of " + std::to_string(Count()));
+        throw ImportError(place_,
+                          "replaces " + std::to_string(sparseCount) + " elements of " + std::to_string(Count()));
     }
     // Zeros that no byte stands for are good for little; a great many of them are a trap.
     constexpr std::size_t mostZeros = 1 << 16;
@@ -114,8 +118,9 @@ AccessorReader::Elements AccessorReader::Find(int view, std::size_t offset, std:
     }
     bool const startsInside = offset <= bufferView.byteLength && bufferView.byteLength - offset >= size;
     if (!startsInside || (bufferView.byteLength - offset - size) / stride < count - 1) {
-        throw ImportError(place_, "says it has " + std::to_string(count) + ' ' + what + ", more than its bufferView of " +
-                                      std::to_string(bufferView.byteLength) + " bytes holds");
+        throw ImportError(place_, "says it has " + std::to_string(count) + ' ' + what +
+                                      ", more than its bufferView of " + std::to_string(bufferView.byteLength) +
+                                      " bytes holds");
     }
     return {data.data() + bufferView.byteOffset + offset, count, stride};
 }

@@ -76,8 +76,8 @@ Container OpenBinary(std::string_view bytes)
     }
     std::uint32_t const length = ReadWord(bytes, 8);
     if (length < HeaderSize || length > bytes.size()) {
-        throw ImportError("header", "the file has " + std::to_string(bytes.size()) + " bytes and says " +
-                                        std::to_string(length));
+        throw ImportError("header",
+                          "the file has " + std::to_string(bytes.size()) + " bytes and says " + std::to_string(length));
     }
     std::string_view rest = bytes.substr(HeaderSize, length - HeaderSize);
     Container container;
@@ -242,10 +242,12 @@ tinygltf::Model Parse(json const& document, Container const& container, BufferFi
     std::string const text = document.dump();
     if (container.isBinary) {
         std::string const bytes = Reassemble(text, container.binary);
-        done = reader.LoadBinaryFromMemory(&model, &error, &warning, reinterpret_cast<unsigned char const*>(bytes.data()),
-                                           static_cast<unsigned int>(bytes.size()), "");
+        done =
+            reader.LoadBinaryFromMemory(&model, &error, &warning, reinterpret_cast<unsigned char const*>(bytes.data()),
+                                        static_cast<unsigned int>(bytes.size()), "");
     } else if (text.size() <= std::numeric_limits<unsigned int>::max()) {
-        done = reader.LoadASCIIFromString(&model, &error, &warning, text.data(), static_cast<unsigned int>(text.size()), "");
+        done = reader.LoadASCIIFromString(&model, &error, &warning, text.data(), static_cast<unsigned int>(text.size()),
+                                          "");
     }
     if (!done || !error.empty()) {
         throw ImportError("", error.empty() ? "isn't glTF that can be read" : FirstLine(error));

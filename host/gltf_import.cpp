@@ -69,6 +69,7 @@ struct Channel {
     PathKind const* path;
     int input;
     int output;
+    std::size_t dimension;
     std::string samplerPlace;
 };
 
@@ -80,12 +81,16 @@ struct Values {
 
 class GltfImport {
 public:
-    explicit GltfImport(std::string const& fileName) : model_(LoadGltfDocument(fileName)) { scene_.name = StemOf(fileName); }
+    explicit GltfImport(std::string const& fileName) : model_(LoadGltfDocument(fileName))
+    {
+        scene_.name = StemOf(fileName);
+    }
 
     Scene Run(ImportOptions const& options)
     {
         CollectChannels();
         ReadTimes();
+        MeasureChannels();
         ChooseScale(options);
         for (Channel& channel : channels_) {
             MakeStream(channel);
@@ -99,7 +104,8 @@ private:
     {
         for (std::size_t i = 0; i < model_.animations.size(); ++i) {
             tinygltf::Animation const& animation = model_.animations[i];
-            std::string const name = animation.name.empty() ? "animation" + std::to_string(i) : CleanName(animation.name);
+            std::string const name =
+                animation.name.empty() ? "animation" + std::to_string(i) : CleanName(animation.name);
             for (std::size_t j = 0; j < animation.channels.size(); ++j) {
                 CollectChannel(animation, name, At("animations", i), j);
             }
@@ -107,8 +113,8 @@ private:
     }
 
     // A channel without a node, or with a path of some extension, moves nothing that is known here.
-    void CollectChannel(tinygltf::Animation const& animation, std::string const& animationName, std::string const& place,
-                        std::size_t index)
+    void CollectChannel(tinygltf::Animation const& animation, std::string const& animationName,
+                        std::string const& place, std::size_t index)
     {
         tinygltf::AnimationChannel const& source = animation.channels[index];
         auto const path = std::ranges::find(PathKinds, source.target_path, &PathKind::path);
@@ -157,7 +163,8 @@ private:
             std::ranges::transform(numbers, times.begin(), [](double time) { return static_cast<float>(time); });
             for (std::size_t i = 1; i < times.size(); ++i) {
                 if (!(times[i - 1] < times[i])) {
-                    throw ImportError(accessor.Place(), "time " + std::to_string(i) + " isn't later than the one before it");
+                    throw ImportError(accessor.Place(),
+                                      "time " + std::to_string(i) + " isn't later than the one before it");
                 }
             }
             times_.emplace(channel.input, std::move(times));
@@ -171,7 +178,8 @@ private:
             all.insert(all.end(), times.begin(), times.end());
         }
         try {
-            TimeScale const scale = options.timeScale == 0 ? ChooseTimeScale(all) : JudgeTimeScale(all, options.timeScale);
+            TimeScale const scale =
+                options.timeScale == 0 ? ChooseTimeScale(all) : JudgeTimeScale(all, options.timeScale);
             scene_.timeScale = scale.scale;
             scene_.exactTimes = scale.exact;
             scene_.worstTimeError = scale.worstError;
@@ -180,7 +188,21 @@ private:
         }
     }
 
-    Values ReadValues(Channel const& channel, std::size_t keys)
+    // Holds what the channels ask for against what there is, before anything of it is made.
+    void MeasureChannels()
+    {
+        std::size_t numbers = 0;
+        for (Channel& channel : channels_) {
+            std::size_t const keys = times_.at(channel.input).size();
+            channel.dimension = DimensionOf(channel, keys);
+            numbers += keys * channel.dimension * NumbersPerComponent;
+            if (numbers > MaxNumbers) {
+                throw ImportError(channel.item.place, "the file's channels ask for more keys than are accepted");
+            }
+        }
+    }
+
+    std::size_t DimensionOf(Channel const& channel, std::size_t keys) const
     {
         AccessorReader const accessor(model_, channel.output, channel.samplerPlace);
         accessor.RequireType(channel.path->type, channel.path->typeName);
@@ -192,22 +214,18 @@ private:
             throw ImportError(channel.samplerPlace, "has " + std::to_string(accessor.Count()) + " values for " +
                                                         std::to_string(keys) + " times");
         }
-        std::size_t const dimension = isWeights ? targets : channel.path->kind == StreamKind::Rotation ? 4 : 3;
-        if (dimension > static_cast<std::size_t>(StreamBuilder::MaxDimension)) {
-            throw ImportError(channel.samplerPlace, "has " + std::to_string(dimension) + " weights a key, more than " +
+        if (targets > static_cast<std::size_t>(StreamBuilder::MaxDimension)) {
+            throw ImportError(channel.samplerPlace, "has " + std::to_string(targets) + " weights a key, more than " +
                                                         std::to_string(StreamBuilder::MaxDimension));
         }
-        numbersUsed_ += keys * dimension * NumbersPerComponent;
-        if (numbersUsed_ > MaxNumbers) {
-            throw ImportError(channel.item.place, "the file's channels ask for more keys than are accepted");
-        }
-        return {accessor.ReadNumbers(), dimension};
+        return isWeights ? targets : channel.path->kind == StreamKind::Rotation ? 4 : 3;
     }
 
     void MakeStream(Channel& channel)
     {
         std::vector<float> const& times = times_.at(channel.input);
-        Values const values = ReadValues(channel, times.size());
+        AccessorReader const accessor(model_, channel.output, channel.samplerPlace);
+        Values const values{accessor.ReadNumbers(), channel.dimension};
         NameComponents(channel.item, values.dimension);
         try {
             StreamBuilder builder(static_cast<int>(values.dimension), scene_.timeScale, channel.item.path);
@@ -229,7 +247,8 @@ private:
         }
     }
 
-    void AppendKeys(StreamBuilder& builder, Channel const& channel, std::vector<float> const& times, Values const& values) const
+    void AppendKeys(StreamBuilder& builder, Channel const& channel, std::vector<float> const& times,
+                    Values const& values) const
     {
         bool const isSpline = channel.item.interpolation == SourceInterpolation::CubicSpline;
         std::size_t const stride = values.dimension * (isSpline ? 3 : 1);
@@ -239,7 +258,8 @@ private:
             int const time = ToUnits(times[i], scene_.timeScale);
             if (i > 0 && time <= ToUnits(times[i - 1], scene_.timeScale)) {
                 throw ImportError(channel.item.place, "keys " + std::to_string(i - 1) + " and " + std::to_string(i) +
-                                                          " are closer than 1/" + std::to_string(scene_.timeScale) + " s");
+                                                          " are closer than 1/" + std::to_string(scene_.timeScale) +
+                                                          " s");
             }
             builder.Append(time, values.numbers.data() + i * stride + offset, code, code);
         }
@@ -261,7 +281,6 @@ private:
     UniqueNames paths_;
     std::vector<Channel> channels_;
     std::map<int, std::vector<float>> times_;
-    std::size_t numbersUsed_ = 0;
 };
 
 }  // namespace

@@ -57,7 +57,7 @@ constexpr Field AnimationFields[] = {{"name", Shape::Text},
                                      {"channels", Shape::Objects, true, ChannelFields},
                                      {"samplers", Shape::Objects, true, SamplerFields}};
 constexpr Field DocumentFields[] = {
-    {"asset", Shape::Object, true, AssetFields},       {"buffers", Shape::Objects, false, BufferFields},
+    {"asset", Shape::Object, true, AssetFields},        {"buffers", Shape::Objects, false, BufferFields},
     {"bufferViews", Shape::Objects, false, ViewFields}, {"accessors", Shape::Objects, false, AccessorFields},
     {"nodes", Shape::Objects, false, NodeFields},       {"animations", Shape::Objects, false, AnimationFields}};
 
@@ -122,13 +122,13 @@ json CutDown(json const& object, std::span<Field const> fields, std::string cons
     return result;
 }
 
-// Where in a text a byte is, as people count.
+// Where in a text its `byte`-th byte is, as people count; the one behind the last counts too.
 std::string LineAndColumn(std::string_view text, std::size_t byte)
 {
     std::string_view const before = text.substr(0, std::min(byte, text.size()));
     auto const line = 1 + std::ranges::count(before, '\n');
     std::size_t const lineStart = before.rfind('\n') + 1;  // npos + 1 is 0
-    return "line " + std::to_string(line) + ", column " + std::to_string(before.size() - lineStart);
+    return "line " + std::to_string(line) + ", column " + std::to_string(byte - lineStart);
 }
 
 json ParseText(std::string_view text)
@@ -142,8 +142,8 @@ json ParseText(std::string_view text)
     try {
         return json::parse(text.begin(), text.end(), limitDepth);
     } catch (json::parse_error const& error) {
-        throw ImportError(LineAndColumn(text, error.byte), error.byte >= text.size() ? "the JSON text ends too early"
-                                                                                      : "this isn't JSON");
+        throw ImportError(LineAndColumn(text, error.byte),
+                          error.byte > text.size() ? "the JSON text ends too early" : "this isn't JSON");
     } catch (json::exception const&) {
         throw ImportError("", "the JSON has a number that is out of range");
     }

@@ -11,8 +11,7 @@ public:
     // `place`: where in the file, like "animations[0].channels[2]" or "line 17". May be empty: the file as a whole.
     ImportError(std::string const& place, std::string const& what)
         : std::runtime_error(place.empty() ? what : place + ": " + what)
-    {
-    }
+    {}
 };
 
 }  // namespace kfshost

@@ -173,9 +173,9 @@ std::strong_ordering operator<=>(Rational const& a, Rational const& b)
 {
     Wide const left = Wide(a.numerator_) * b.denominator_;
     Wide const right = Wide(b.numerator_) * a.denominator_;
-    return left < right    ? std::strong_ordering::less
-           : right < left  ? std::strong_ordering::greater
-                           : std::strong_ordering::equal;
+    return left < right   ? std::strong_ordering::less
+           : right < left ? std::strong_ordering::greater
+                          : std::strong_ordering::equal;
 }
 
 }  // namespace kfshost

@@ -1,6 +1,5 @@
 #include "host/scene.h"
 
-
 #include "frame/errors.h"
 #include "host/storeerror.h"
 #include "keystore/evaluate.h"

@@ -21,8 +21,8 @@ std::string_view NameOf(SourceInterpolation interpolation);
 
 // One animated property of a scene.
 struct StreamItem {
-    std::string path;                     // "animation/node/translation"; no two items of a scene have the same
-    std::string place;                    // where the file has it: "animations[0].channels[2]", "joint Hips"
+    std::string path;   // "animation/node/translation"; no two items of a scene have the same
+    std::string place;  // where the file has it: "animations[0].channels[2]", "joint Hips"
     StreamKind kind = StreamKind::Translation;
     SourceInterpolation interpolation = SourceInterpolation::Linear;
     std::vector<std::string> components;  // a name for each component of the value

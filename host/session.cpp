@@ -106,10 +106,10 @@ Session::Library::~Library()
 
 // The project owns its render context, so that reference shares the project's.
 Session::Session()
-    : project_(boost::make_shared<Project>()), currentContext_(project_->GetContext()),
+    : project_(boost::make_shared<Project>()),
+      currentContext_(project_->GetContext()),
       currentRenderContext_(boost::shared_ptr<Q_RenderContext>(project_, project_->GetRenderContext(false)))
-{
-}
+{}
 
 Session::~Session() = default;
 

@@ -9,8 +9,7 @@ namespace kfshost {
 class StoreError : public std::runtime_error {
 public:
     explicit StoreError(int code) : std::runtime_error("the library answers error " + std::to_string(code)), code_(code)
-    {
-    }
+    {}
     int Code() const noexcept { return code_; }
 
 private:

@@ -26,8 +26,7 @@ std::unique_ptr<KFS_Stream> MakeStream(int dimension, unsigned int timeScale, st
 
 StreamBuilder::StreamBuilder(int dimension, unsigned int timeScale, std::string const& name)
     : stream_(MakeStream(dimension, timeScale, name))
-{
-}
+{}
 
 // The value is in the external form, which is doubles here as well: KFS_InsertKey saves the detour of its double form.
 void StreamBuilder::Append(int time, double const* value, KFS_Interp inInterp, KFS_Interp outInterp)

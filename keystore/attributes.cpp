@@ -19,9 +19,8 @@ int MarkAllKeys(KFS_Stream const* stream, int (KFS_Stream::*mark)(int, short) co
         return (stream->*mark)(-1, static_cast<short>(count));
     }
     KFSp_FirstError error;
-    for (int last = count - 1; last >= 0; last -= SHRT_MAX) {
-        error.Keep((stream->*mark)(last, SHRT_MAX));
-    }
+    error.Keep((stream->*mark)(-1, SHRT_MAX));
+    error.Keep((stream->*mark)(0, 1));  // a range holds all that lies between its ends
     return error.Code();
 }
 
@@ -41,7 +40,7 @@ int RefuseMultiplier()
     return KFSp_ReportErr(KFSp_Op_SetMultiplier, KFS_Err_NotSpatial, KFSp_Row_SetMultiplier);
 }
 
-} // namespace
+}  // namespace
 
 int KFSp_CanDoSpInterp(KFS_Stream* stream, unsigned short code)
 {

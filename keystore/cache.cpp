@@ -1,5 +1,6 @@
 #include "keystore/cache_private.h"
 
+#include "curves/interpolate_private.h"
 #include "frame/boundary_private.h"
 #include "frame/report_private.h"
 #include "frame/services/memory.h"
@@ -43,7 +44,8 @@ int InterpolateToCache(KFS_Stream const* stream, KFS_StreamKeyData const* data, 
     return code;
 }
 
-// The value between, before or after keys. `next` is the index of the first key after the time.
+// The value between, before or after keys. `next` is the index of the first key after the time. Only a function that may call the list
+// again while it holds a key runs under a pin.
 int FillBetweenKeys(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int next, KFS_InterpFunc* interpFunc,
                     long refcon)
 {
@@ -69,8 +71,20 @@ int FillBetweenKeys(KFS_Stream const* stream, KFS_StreamKeyData const* data, int
         if (b->inInterp == KFS_Interp_Hold) {
             return CopyKeyToCache(data, next);
         }
+        if (!interpFunc && stream->GetInterpFunc() == KFSp_Interpolate) [[likely]] {
+            int const code = KFSp_InterpolateBetween(stream, a, b, time, KFSp_Numbers(data->cache));
+            data->cache->time = code == 0 ? time : KFS_INVALID_INDEX;
+            return code;
+        }
     }
-    return InterpolateToCache(stream, data, time, next - 1, interpFunc, refcon);
+    KFSp_FirstError error;
+    {
+        KFSp_ScConstPin const pin(data->keys, error);
+        if (error.None()) {
+            error.Keep(InterpolateToCache(stream, data, time, next - 1, interpFunc, refcon));
+        }
+    }
+    return error.Code();
 }
 
 } // namespace
@@ -199,14 +213,7 @@ void KFSp_UpdateCacheToTime(KFS_Stream const* stream, KFS_StreamKeyData const* d
         if (found) {
             KFSp_ThrowIf(CopyKeyToCache(data, index));
         } else if (!keyOnly && KFSp_ItemCount(data) > 0) {
-            KFSp_FirstError error;
-            {
-                KFSp_ScConstPin const pin(data->keys, error);
-                if (error.None()) {
-                    error.Keep(FillBetweenKeys(stream, data, time, index, interpFunc, refcon));
-                }
-            }
-            KFSp_ThrowIf(error.Code());
+            KFSp_ThrowIf(FillBetweenKeys(stream, data, time, index, interpFunc, refcon));
         }
     }
     if (atKey) {

@@ -49,7 +49,7 @@ int DisposeList(KFS_Stream* stream)
     }
     if (code == 0) {
         SEQ_Head** const keys = stream->GetKeys();
-        stream->SetKeys(nullptr);   // whatever the disposal says, the list is gone after it
+        stream->SetKeys(nullptr);  // whatever the disposal says, the list is gone after it
         code = SEQ_Dispose(keys, 0);
     }
     return code;
@@ -70,7 +70,7 @@ int MakeConstant(KFS_Stream* stream)
     return 0;
 }
 
-} // namespace
+}  // namespace
 
 int KFS_Stream::SetConstant(unsigned char constant, unsigned char keepValue)
 {

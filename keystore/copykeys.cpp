@@ -236,6 +236,9 @@ int CopyOneKey(Route const& route, int index, KFSp_CopyUndo& undo)
     if (int const code = undo.Note(at)) {
         return code;
     }
+    // Within one stream the record is about to be written over.
+    KFS_KeyScalar head{};
+    std::memcpy(static_cast<void*>(&head), record, static_cast<std::size_t>(KFSp_ValueDataOffset(record)));
     KFSp_FirstError error;
     error.Keep(SetupCopy(route, record, at));
     int newIndex = 0;
@@ -252,11 +255,11 @@ int CopyOneKey(Route const& route, int index, KFSp_CopyUndo& undo)
         return code;
     }
     auto* const copy = static_cast<KFS_KeyScalar*>(item);
-    if (copy == record || !KFSp_HasSpatialBlock(record) || !KFSp_HasSpatialBlock(copy)) {
+    if (!KFSp_HasSpatialBlock(&head) || !KFSp_HasSpatialBlock(copy)) {
         return 0;
     }
-    CopySpatialBlock(record, copy);
-    return DropRemapTable(copy);
+    CopySpatialBlock(&head, copy);
+    return copy == record ? 0 : DropRemapTable(copy);
 }
 
 // The n-th key to be copied.
@@ -323,7 +326,8 @@ int CopyIntoKeys(Route const& route, SEQ_Head const* const* keys)
             static_cast<void>(KFSp_Boundary([&] { route.destination->NotifyValueChanged(); }));
         }
     }
-    error.Keep(SEQ_Compact(route.to->keys));
+    // Room that can't be given back is no failure of the copy.
+    static_cast<void>(SEQ_Compact(route.to->keys));
     return error.Code();
 }
 

@@ -3,12 +3,13 @@
 #include "frame/export.h"
 #include "keystore/stream.h"
 
-// Copying keys from stream to stream, with tangents and flags. An arc table never goes along. Common to both: see keystore/edit.h for what an
-// edit leaves behind.
+// Copying keys from stream to stream, with tangents and flags. An arc table never goes along. Common to both: see
+// keystore/edit.h for what an edit leaves behind.
 //
 // Results: 0, or
 //   2                        a damaged stream; reported, the source's before the destination's
-//   3                        the source's records are too short for the destination; reported as "key data size mismatch"
+//   3                        the source's records are too short for the destination; reported as "key data size
+//                            mismatch"
 //   7425 KFS_Err_KeyValue    something stands at that time and `replace` is 0
 //   7426 KFS_Err_Constant    keys for a destination that holds one value
 //   7427 KFS_Err_NoKeys      the source has no value

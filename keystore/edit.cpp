@@ -44,7 +44,8 @@ int Notify(KFS_Stream* stream)
     return KFSp_Boundary([stream] { stream->NotifyValueChanged(); });
 }
 
-// The record as a key about to be inserted. Nothing that it held before is left in it, but the value where `keepValue` says so.
+// The record as a key about to be inserted. Nothing that it held before is left in it, but the value where `keepValue`
+// says so.
 int AssembleKey(KFS_Stream* stream, int time, void const* value, bool keepValue, char inInterp, char outInterp)
 {
     int const code = KFSp_SetupCache(stream, time, value, inInterp, outInterp, KFS_Item_KeyValue, 1);
@@ -64,7 +65,8 @@ int AssembleKey(KFS_Stream* stream, int time, void const* value, bool keepValue,
     return code;
 }
 
-// The new value goes into the record while the old one is put aside, which comes back if anything fails and is given back at the end if not.
+// The new value goes into the record while the old one is put aside, which comes back if anything fails and is given
+// back at the end if not.
 int InsertConstant(KFS_Stream* stream, int time, bool replace, void const* value, char inInterp, char outInterp)
 {
     bool const hasValue = !KFSp_CacheIsEmpty(stream->GetCache());

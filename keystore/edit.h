@@ -5,28 +5,33 @@
 
 // Adding, changing and removing keys.
 //
-// An edit that changed the stream ends with a notification of the listeners, whose exceptions become the result. One that failed leaves the
-// key list as it was; only the interpolation codes that KFS_SetKey stored before a value was refused stay. Derived data of the neighbourhood
-// is marked as stale, not computed. On a stream with keys the cache record is empty afterwards.
+// An edit that changed the stream ends with a notification of the listeners, whose exceptions become the result. One
+// that failed leaves the key list as it was; only the interpolation codes that KFS_SetKey stored before a value was
+// refused stay. Derived data of the neighbourhood is marked as stale, not computed. On a stream with keys the cache
+// record is empty afterwards.
 //
 // On a stream with one value and no list (KFS_StreamFlag_NoKeys) the same functions work on that value.
 //
-// Common to all: `time` is in any scale and is converted to the stream's; null is value 0. An interpolation code of 0 leaves a key's code as
-// it is, or lets the system choose for a new key. `value` is one value in external form, or `dimension` doubles in the F forms.
+// Common to all: `time` is in any scale and is converted to the stream's; null is value 0. An interpolation code of 0
+// leaves a key's code as it is, or lets the system choose for a new key. `value` is one value in external form, or
+// `dimension` doubles in the F forms.
 //
 // Results: 0, or
 //   2                            the stream is damaged; reported with the operation of the function
 //   7425 KFS_Err_KeyValue        a key (or a constant's value) is there and `replace` is 0
 //   7427 KFS_Err_NoKeys          no value, or no key
+//   7430 KFS_Err_TimeNotRepresentable  a time that comes to KFS_INVALID_INDEX in the stream's scale
 //   7431 KFS_Err_InterpNotAllowed  a code that the stream's mask refuses; reported with operation 13
-//   7441 KFS_Err_CustomValue     a value of doubles for a custom stream whose items have no room for them; reported with operation 81
+//   7441 KFS_Err_CustomValue     a value of doubles for a custom stream whose items have no room for them; reported
+//                                with operation 81
 //   the services' codes, an item function's, a listener's
 //
-// Threads: the main thread. The F forms change the stream's description while they run.
+// Threads: the main thread. The F forms change the stream's description while they run; listeners hear of the change
+// afterwards.
 
-// Puts a key at a time. A null `value` gives it the value that the stream has there; on a plain stream with splines the curve keeps its shape,
-// for which the neighbours' handles are shortened. With a value, spline sides get default handles. A key that stands there already is
-// changed as by KFS_SetKey if `replace` is set.
+// Puts a key at a time. A null `value` gives it the value that the stream has there; on a plain stream with splines the
+// curve keeps its shape, for which the neighbours' handles are shortened. With a value, spline sides get default
+// handles. A key that stands there already is changed as by KFS_SetKey if `replace` is set.
 // Operation 17. Cost: one search, and moving the records behind the key.
 KFS_API int KFS_InsertKey(KFS_Stream* stream, T_Time const* time, unsigned char replace, void const* value,
                           char inInterp, char outInterp);
@@ -40,16 +45,18 @@ KFS_API int KFS_SetKey(KFS_Stream* stream, int index, void const* value, char in
 // Operation 92 for the damaged stream, else KFS_SetKey's.
 KFS_API int KFS_SetKeyF(KFS_Stream* stream, int index, double const* value, char inInterp, char outInterp);
 
-// Removes a key. `value`, out or null, receives its value in external form, which belongs to the caller (KFS_DisposeValue); a failing
-// conversion isn't told. On a stream without a list the value is gone, and reads answer KFS_Err_NoKeys until it gets a new one.
-// Operation 18.
+// Removes a key. `value`, out or null, receives its value in external form, which belongs to the caller
+// (KFS_DisposeValue); a failing conversion isn't told. On a stream without a list the value is gone, and reads answer
+// KFS_Err_NoKeys until it gets a new one. Operation 18.
 KFS_API int KFS_RemoveKey(KFS_Stream* stream, int index, void* value);
 
-// The codes that a key inserted at a time ought to take, after its neighbours; 0 where there is nothing to go by. Any result may be null.
+// The codes that a key inserted at a time ought to take, after its neighbours; 0 where there is nothing to go by. Any
+// result may be null.
 //
 //      at a key            that key's codes
 //      before, after all   the facing code of the first, last key, for both
-//      A --- t --- B       A's out code and B's in code; if just one of them is a spline, both are; a hold in makes a hold out
+//      A --- t --- B       A's out code and B's in code; if just one of them is a spline, both are; a hold in makes a
+//                          hold out
 //
 // Operation 44.
 KFS_API int KFS_ChooseInterps(KFS_Stream* stream, T_Time const* time, char* inInterp, char* outInterp);

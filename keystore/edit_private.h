@@ -3,13 +3,14 @@
 #include "keystore/edit.h"
 #include "keystore/stream.h"
 
-// Puts the key that stands in the cache record into the list: the one way in. On a stream without a list it makes the value in the record the
-// stream's own. Notifies.
+// Puts the key that stands in the cache record into the list: the one way in. On a stream without a list it makes the
+// value in the record the stream's own. Notifies.
 //
 //   overwrite      a key at exactly that time may be replaced
 //   valueGiven     the record's value is meant; else the key takes the value that the stream has there
 //   tangentsGiven  the record's tangents stand; else they are to be computed
-//   clearCache     the record owns its value, which is disposed at the end; else the value is the caller's, and the record is only marked empty
+//   clearCache     the record owns its value, which is disposed at the end; else the value is the caller's, and the
+//                  record is only marked empty
 //   index          out or null: where the key stands; KFS_INVALID_INDEX on failure
 //
 // Operation 38.
@@ -20,8 +21,8 @@ int KFSp_InsertKeyFromCache(unsigned char overwrite, unsigned char valueGiven, u
 int KFSp_PutKeyFromCache(unsigned char overwrite, unsigned char valueGiven, unsigned char tangentsGiven,
                          unsigned char clearCache, KFS_Stream* stream, int* index);
 
-// KFS_ChooseInterps, with the key flags and the spatial flags that the new key ought to take. `spFlags` is left alone where no key with a
-// spatial block was looked at.
+// KFS_ChooseInterps, with the key flags and the spatial flags that the new key ought to take. `spFlags` is left alone
+// where no key with a spatial block was looked at.
 int KFSp_ChooseInterpsAndFlags(KFS_Stream* stream, T_Time const* time, char* inInterp, char* outInterp,
                                unsigned short* flags, unsigned int* spFlags);
 
@@ -33,8 +34,9 @@ int KFSp_SetKeySpatialState(SEQ_Head** list, long on, int index, void* key);
 // For SEQ_ForEach on a key list: makes each key forget its arc table, without disposing it.
 int KFSp_KeyClearRemap(SEQ_Head** list, long, int index, void* key);
 
-// Gives a stream the description of plain doubles, and a copy function that suits it, for a while: the functions that take values in
-// external form then take doubles. Restore() ends it and answers the code of restoring; the destructor restores too.
+// Gives a stream the description of plain doubles, and a copy function that suits it, for a while: the functions that
+// take values in external form then take doubles. Restore() ends it and answers the code of restoring; the destructor
+// restores too.
 class KFSp_ScDoubleValues {
 public:
     KFSp_ScDoubleValues(KFS_Stream* stream, KFS_CopyItemFunc copy);

@@ -272,6 +272,10 @@ void KFS_GetValueFNoExpr(KFS_Stream const* stream, int time, unsigned char keyOn
         return;
     }
     void const* const from = source ? source : KFSp_ValueData(data->cache);
+    if (stream->GetDimension() == 1 && !stream->IsFloatBased()) {   // the common read, without a call for eight bytes
+        std::memcpy(value, from, sizeof *value);
+        return;
+    }
     KFSp_ThrowIf(KFSp_FakeCopyItemFunc(stream, 0, KFS_Item_CacheValue, from, value));
 }
 

@@ -45,7 +45,8 @@ int CopyItem(Insertion const& insertion, short kind, void const* source, void* d
     return KFSp_Boundary([&] { return copy(stream, stream->GetItemRefcon(), kind, source, destination); });
 }
 
-// Splits and slopes read what is derived (arc lengths, automatic tangents) and float keys may move, so the repair comes before the search.
+// Splits and slopes read what is derived (arc lengths, automatic tangents) and float keys may move, so the repair comes
+// before the search.
 int BringUpToDate(Insertion const& insertion)
 {
     bool const readsDerived = !insertion.valueGiven || (insertion.stream->IsSpatial() && !insertion.tangentsGiven &&
@@ -178,7 +179,8 @@ int InsertNewKey(Insertion& insertion)
     return error.Code();
 }
 
-// The old key gives what the new one lacks. Its arc table stays with it: the record only carries it past the list's own copy.
+// The old key gives what the new one lacks. Its arc table stays with it: the record only carries it past the list's own
+// copy.
 int ReplaceOldKey(Insertion& insertion, KFSp_ScKey const& old)
 {
     KFS_KeyScalar* const key = insertion.key;
@@ -259,7 +261,8 @@ int InsertIntoKeyedStream(Insertion& insertion, bool clearCache)
     return error.Code();
 }
 
-// The record is the value itself, so it stays. With a value that is the caller's it becomes a copy of its own, in its place.
+// The record is the value itself, so it stays. With a value that is the caller's it becomes a copy of its own, in its
+// place.
 int TakeConstant(Insertion& insertion, bool ownsValue)
 {
     insertion.position = 0;

@@ -24,7 +24,8 @@ int TimeOf(void const* record)
     return time;
 }
 
-// Bytes of a block that every copy function is sure to write, at most a word: what a copied record gets beside its head.
+// Bytes of a block that every copy function is sure to write, at most a word: what a copied record gets beside its
+// head.
 std::size_t LeadingBytes(KFS_Stream const* stream)
 {
     int const bytes =

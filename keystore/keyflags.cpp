@@ -96,6 +96,12 @@ int ChangeKey(KFS_Stream* stream, KFS_StreamKeyData const* data, int index, Flag
             return code;
         }
     }
+    if ((change.mask & ~change.value & KFS_KeyFlag_Modifiable) != 0) {
+        // Handles that stop being automatic stay as a read would find them now.
+        if (int const code = stream->UpdateStreamIfStaleTangents(index)) {
+            return code;
+        }
+    }
     KFSp_FirstError error;
     {
         KFSp_ScKey const key(data->keys, index, error);

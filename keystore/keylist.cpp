@@ -19,6 +19,14 @@ int SearchList(KFS_StreamKeyData const* data, int time, bool* found, int* index)
     return code;
 }
 
+// A stale key that an insertion has moved up stays in its range.
+void KeepMarked(int* range, int inserted)
+{
+    if (range[1] != KFS_INVALID_INDEX && range[1] >= inserted) {
+        ++range[1];
+    }
+}
+
 } // namespace
 
 int KFSp_SearchKeys(KFS_StreamKeyData const* data, int time, bool* found, int* index)
@@ -42,10 +50,15 @@ int KFSp_InsertKeyItem(KFS_StreamKeyData* data, KFS_KeyScalar const* record, int
 {
     bool const mirrors = data->times.Mirrors((*data->keys)->count);
     int const code = SEQ_InsertCopy(record, index, data->keys, 0);
-    if (code == 0 && mirrors) {
+    if (code != 0) {
+        return code;
+    }
+    if (mirrors) {
         data->times.Inserted(index, record->time);
     }
-    return code;
+    KeepMarked(data->invalidKeyIndex, index);
+    KeepMarked(data->arcInvalidKeyIndex, index);
+    return 0;
 }
 
 int KFSp_RemoveKeyItem(KFS_StreamKeyData* data, int index, KFS_KeyScalar* record)

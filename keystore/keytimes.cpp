@@ -56,18 +56,22 @@ void KFS_KeyTimes::Retimed(int index, int time) noexcept
     }
 }
 
-// By the difference with wrap-around, as the list sorts. Halves the candidates without a branch that depends on the data, so random times can't be mispredicted.
+// By the difference with wrap-around, as the list sorts. The sign of the difference is turned into a step or none, because a branch on it
+// would be mispredicted every other time.
 int KFS_KeyTimes::LowerBound(int time) const noexcept
 {
     auto const isBefore = [time](int other) {
-        return static_cast<int>(static_cast<unsigned int>(other) - static_cast<unsigned int>(time)) < 0;
+        return (static_cast<unsigned int>(other) - static_cast<unsigned int>(time)) >> 31;
     };
     int const* base = times_.data();
     auto count = static_cast<unsigned int>(times_.size());
+    if (count == 0) {
+        return 0;
+    }
     while (count > 1) {
         unsigned int const half = count / 2;
-        base += isBefore(base[half - 1]) ? half : 0;
+        base += half & (0U - isBefore(base[half - 1]));
         count -= half;
     }
-    return static_cast<int>(base - times_.data()) + (count == 1 && isBefore(*base) ? 1 : 0);
+    return static_cast<int>(base - times_.data()) + static_cast<int>(isBefore(*base));
 }

@@ -37,7 +37,8 @@ void AnswerCodes(char* inInterp, char* outInterp, char in, char out)
 }
 
 // The record with its codes answered, for the two forms of the question.
-int GetRecordAndCodes(KFS_Stream const* stream, int index, char* inInterp, char* outInterp, KFS_KeyScalar const** record)
+int GetRecordAndCodes(KFS_Stream const* stream, int index, char* inInterp, char* outInterp,
+                      KFS_KeyScalar const** record)
 {
     int const code = GetRecord(stream, index, KFSp_Op_GetKey, KFSp_Row_GetValue, record);
     if (code == 0) {
@@ -54,7 +55,7 @@ KFS_CopyItemFunc ReadingFunc(KFS_Stream const* stream)
     return stream->IsCustom() ? KFSp_FakeCopyItemFunc : KFSp_ConvertItemFromFloat;
 }
 
-} // namespace
+}  // namespace
 
 int KFS_GetKeyFlags(KFS_Stream const* stream, int index, unsigned short* flags)
 {

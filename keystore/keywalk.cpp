@@ -25,10 +25,12 @@ int WalkConstant(KFSp_KeyWalk* walk)
 
 int WalkList(KFSp_KeyWalk* walk, int first, int last, int* lastIndex)
 {
-    return SEQ_ForRange(walk->stream->GetKeys(), first, last, reinterpret_cast<long>(walk), KFSp_InvokeItemFunc, lastIndex);
+    return SEQ_ForRange(walk->stream->GetKeys(), first, last, reinterpret_cast<long>(walk), KFSp_InvokeItemFunc,
+                        lastIndex);
 }
 
-// An end of a range of times as an index, which may lie beside the list. `onTheLeft`: between two keys the earlier one is meant.
+// An end of a range of times as an index, which may lie beside the list. `onTheLeft`: between two keys the earlier one
+// is meant.
 int FindEnd(KFS_Stream const* stream, T_Time const* time, bool onTheLeft, int* index)
 {
     int at = 0;
@@ -71,7 +73,7 @@ int WalkTimes(KFSp_KeyWalk* walk, T_Time const* first, T_Time const* last)
     return WalkList(walk, firstIndex, lastIndex, nullptr);
 }
 
-} // namespace
+}  // namespace
 
 int KFSp_InvokeItemFunc(SEQ_Head**, long walk, int index, void* item)
 {
@@ -81,7 +83,8 @@ int KFSp_InvokeItemFunc(SEQ_Head**, long walk, int index, void* item)
     return context->func(context->stream, context->refcon, index, key);
 }
 
-int KFS_ForRange(KFS_Stream* stream, T_Time const* first, T_Time const* last, long refcon, KFS_KeyFunc func, T_Time* lastTime)
+int KFS_ForRange(KFS_Stream* stream, T_Time const* first, T_Time const* last, long refcon, KFS_KeyFunc func,
+                 T_Time* lastTime)
 {
     if (lastTime) {
         *lastTime = {KFS_INVALID_INDEX, 0};
@@ -91,7 +94,8 @@ int KFS_ForRange(KFS_Stream* stream, T_Time const* first, T_Time const* last, lo
             return code;
         }
         KFSp_KeyWalk walk{stream, refcon, func};
-        int const code = KFSp_Boundary([&] { return stream->HasNoKeys() ? WalkConstant(&walk) : WalkTimes(&walk, first, last); });
+        int const code =
+            KFSp_Boundary([&] { return stream->HasNoKeys() ? WalkConstant(&walk) : WalkTimes(&walk, first, last); });
         if (lastTime) {
             *lastTime = {walk.lastTime, stream->GetTimeScale()};
         }

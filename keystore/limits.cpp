@@ -6,9 +6,9 @@
 
 namespace {
 
-constexpr double FixedToDouble = 1.52587890625e-5;      // 1 / 65536
+constexpr double FixedToDouble = 1.52587890625e-5;  // 1 / 65536
 constexpr double LeastFixed = -32768.0;
-constexpr double GreatestFixed = 32767.99998474121;     // the greatest 16.16 number
+constexpr double GreatestFixed = 32767.99998474121;  // the greatest 16.16 number
 constexpr double NoMinimum = -1e9;
 constexpr double NoMaximum = 1e9;
 
@@ -34,7 +34,7 @@ double FromFixed(int fixed)
     return fixed * FixedToDouble;
 }
 
-} // namespace
+}  // namespace
 
 bool KFS_Stream::HasMinValue() const
 {
@@ -50,20 +50,13 @@ double KFS_Stream::GetMinValue() const
 {
     FX_ParamDef const& def = GetParamDef();
     switch (def.paramType) {
-    case FX_Param_INT_SLIDER:
-        return def.value.intSlider.validMin;
-    case FX_Param_FIXED_SLIDER:
-        return FromFixed(def.value.fixedSlider.validMin);
-    case FX_Param_FIXED_ANGLE:
-        return HasMinValue() ? FromFixed(def.value.fixedAngle.validMin) : LeastFixed;
-    case FX_Param_BOOL:
-        return 0.0;
-    case FX_Param_CHOICE:
-        return 1.0;
-    case FX_Param_FLOAT_SLIDER:
-        return static_cast<double>(def.value.floatSlider.validMin);
-    default:
-        return NoMinimum;
+    case FX_Param_INT_SLIDER: return def.value.intSlider.validMin;
+    case FX_Param_FIXED_SLIDER: return FromFixed(def.value.fixedSlider.validMin);
+    case FX_Param_FIXED_ANGLE: return HasMinValue() ? FromFixed(def.value.fixedAngle.validMin) : LeastFixed;
+    case FX_Param_BOOL: return 0.0;
+    case FX_Param_CHOICE: return 1.0;
+    case FX_Param_FLOAT_SLIDER: return static_cast<double>(def.value.floatSlider.validMin);
+    default: return NoMinimum;
     }
 }
 
@@ -71,20 +64,13 @@ double KFS_Stream::GetMaxValue() const
 {
     FX_ParamDef const& def = GetParamDef();
     switch (def.paramType) {
-    case FX_Param_INT_SLIDER:
-        return def.value.intSlider.validMax;
-    case FX_Param_FIXED_SLIDER:
-        return FromFixed(def.value.fixedSlider.validMax);
-    case FX_Param_FIXED_ANGLE:
-        return HasMaxValue() ? FromFixed(def.value.fixedAngle.validMax) : GreatestFixed;
-    case FX_Param_BOOL:
-        return 1.0;
-    case FX_Param_CHOICE:
-        return def.value.choice.choiceCount;
-    case FX_Param_FLOAT_SLIDER:
-        return static_cast<double>(def.value.floatSlider.validMax);
-    default:
-        return NoMaximum;
+    case FX_Param_INT_SLIDER: return def.value.intSlider.validMax;
+    case FX_Param_FIXED_SLIDER: return FromFixed(def.value.fixedSlider.validMax);
+    case FX_Param_FIXED_ANGLE: return HasMaxValue() ? FromFixed(def.value.fixedAngle.validMax) : GreatestFixed;
+    case FX_Param_BOOL: return 1.0;
+    case FX_Param_CHOICE: return def.value.choice.choiceCount;
+    case FX_Param_FLOAT_SLIDER: return static_cast<double>(def.value.floatSlider.validMax);
+    default: return NoMaximum;
     }
 }
 
@@ -92,14 +78,10 @@ double KFS_Stream::GetUIMinValue() const
 {
     FX_ParamDef const& def = GetParamDef();
     switch (def.paramType) {
-    case FX_Param_INT_SLIDER:
-        return def.value.intSlider.sliderMin;
-    case FX_Param_FIXED_SLIDER:
-        return FromFixed(def.value.fixedSlider.sliderMin);
-    case FX_Param_FLOAT_SLIDER:
-        return static_cast<double>(def.value.floatSlider.sliderMin);
-    default:
-        return GetMinValue();   // the other kinds have no range of their own for a slider
+    case FX_Param_INT_SLIDER: return def.value.intSlider.sliderMin;
+    case FX_Param_FIXED_SLIDER: return FromFixed(def.value.fixedSlider.sliderMin);
+    case FX_Param_FLOAT_SLIDER: return static_cast<double>(def.value.floatSlider.sliderMin);
+    default: return GetMinValue();  // the other kinds have no range of their own for a slider
     }
 }
 
@@ -107,14 +89,10 @@ double KFS_Stream::GetUIMaxValue() const
 {
     FX_ParamDef const& def = GetParamDef();
     switch (def.paramType) {
-    case FX_Param_INT_SLIDER:
-        return def.value.intSlider.sliderMax;
-    case FX_Param_FIXED_SLIDER:
-        return FromFixed(def.value.fixedSlider.sliderMax);
-    case FX_Param_FLOAT_SLIDER:
-        return static_cast<double>(def.value.floatSlider.sliderMax);
-    default:
-        return GetMaxValue();
+    case FX_Param_INT_SLIDER: return def.value.intSlider.sliderMax;
+    case FX_Param_FIXED_SLIDER: return FromFixed(def.value.fixedSlider.sliderMax);
+    case FX_Param_FLOAT_SLIDER: return static_cast<double>(def.value.floatSlider.sliderMax);
+    default: return GetMaxValue();
     }
 }
 
@@ -122,17 +100,10 @@ void KFS_Stream::SetUIMinValue(double value)
 {
     FX_ParamDef& def = GetParamDef();
     switch (def.paramType) {
-    case FX_Param_INT_SLIDER:
-        def.value.intSlider.sliderMin = Truncate(value);
-        break;
-    case FX_Param_FIXED_SLIDER:
-        def.value.fixedSlider.sliderMin = ToFixed(value);
-        break;
-    case FX_Param_FLOAT_SLIDER:
-        def.value.floatSlider.sliderMin = static_cast<float>(value);
-        break;
-    default:
-        break;
+    case FX_Param_INT_SLIDER: def.value.intSlider.sliderMin = Truncate(value); break;
+    case FX_Param_FIXED_SLIDER: def.value.fixedSlider.sliderMin = ToFixed(value); break;
+    case FX_Param_FLOAT_SLIDER: def.value.floatSlider.sliderMin = static_cast<float>(value); break;
+    default: break;
     }
 }
 
@@ -140,17 +111,10 @@ void KFS_Stream::SetUIMaxValue(double value)
 {
     FX_ParamDef& def = GetParamDef();
     switch (def.paramType) {
-    case FX_Param_INT_SLIDER:
-        def.value.intSlider.sliderMax = Truncate(value);
-        break;
-    case FX_Param_FIXED_SLIDER:
-        def.value.fixedSlider.sliderMax = ToFixed(value);
-        break;
-    case FX_Param_FLOAT_SLIDER:
-        def.value.floatSlider.sliderMax = static_cast<float>(value);
-        break;
-    default:
-        break;
+    case FX_Param_INT_SLIDER: def.value.intSlider.sliderMax = Truncate(value); break;
+    case FX_Param_FIXED_SLIDER: def.value.fixedSlider.sliderMax = ToFixed(value); break;
+    case FX_Param_FLOAT_SLIDER: def.value.floatSlider.sliderMax = static_cast<float>(value); break;
+    default: break;
     }
 }
 
@@ -158,12 +122,9 @@ short KFS_Stream::GetPrecision() const
 {
     FX_ParamDef const& def = GetParamDef();
     switch (def.paramType) {
-    case FX_Param_FIXED_SLIDER:
-        return def.value.fixedSlider.precision;
-    case FX_Param_FLOAT_SLIDER:
-        return def.value.floatSlider.precision;
-    default:
-        return 0;
+    case FX_Param_FIXED_SLIDER: return def.value.fixedSlider.precision;
+    case FX_Param_FLOAT_SLIDER: return def.value.floatSlider.precision;
+    default: return 0;
     }
 }
 

@@ -44,7 +44,7 @@ int StepFromSearch(bool found, int index, short direction)
 {
     bool const backward = (direction & KFS_Find_Backward) != 0;
     if (!found) {
-        return backward ? index - 1 : index;    // the search stopped at the next later key
+        return backward ? index - 1 : index;  // the search stopped at the next later key
     }
     if (direction & KFS_Find_AtTime) {
         return index;
@@ -298,7 +298,7 @@ int IndexToTime(KFS_Stream const* stream, int index, T_Time* time)
     return error.Code();
 }
 
-} // namespace
+}  // namespace
 
 int KFS_FindKeyTime(KFS_Stream const* stream, T_Time const* time, short direction, unsigned char* found, int* index,
                     T_Time* keyTime)

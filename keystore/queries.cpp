@@ -31,7 +31,7 @@ int HoldingKey(KFS_Stream const* stream, T_Time const& time)
     return index == KFS_INVALID_INDEX ? 0 : index;
 }
 
-} // namespace
+}  // namespace
 
 bool KFS_Stream::IsModified() const
 {
@@ -175,10 +175,8 @@ bool KFS_Stream::CanHaveExpression() const
     case FX_Param_PATH:
     case 8:
     case 13:
-    case 14:
-        return false;
-    default:
-        return true;
+    case 14: return false;
+    default: return true;
     }
 }
 
@@ -193,13 +191,15 @@ u16str KFS_Stream::GetExprPreEvalString() const
     return {};
 }
 
-int KFS_Stream::EvaluateExpression(T_Time const* time, double* values, void** customValue, KFS_ParamBag const* bag) const
+int KFS_Stream::EvaluateExpression(T_Time const* time, double* values, void** customValue,
+                                   KFS_ParamBag const* bag) const
 {
     auto* const root = const_cast<KFS_StreamGroup*>(GetRoot());
     return root ? root->EvaluateExpression(this, time, values, customValue, bag) : 1;
 }
 
-// Separated dimensions. A leader's followers stand behind it in a named group, and no group is one yet, so there are none to find.
+// Separated dimensions. A leader's followers stand behind it in a named group, and no group is one yet, so there are
+// none to find.
 
 bool KFS_Stream::IsSeparationLeader() const
 {
@@ -248,15 +248,15 @@ KFS_Stream const* KFS_Stream::GetSeparationFollower(int) const
 
 // Render identity isn't computed yet: nothing is mixed in, and the Guid is the unset one.
 
-void KFS_Stream::MixInValueAtTime(hearth::utility::MixHashGuidT<hearth::utility::Murmur3MixerState>& hash, T_Time const& time) const
+void KFS_Stream::MixInValueAtTime(hearth::utility::MixHashGuidT<hearth::utility::Murmur3MixerState>& hash,
+                                  T_Time const& time) const
 {
     MixInValueAtTime(hash, time, nullptr);
 }
 
 void KFS_Stream::MixInValueAtTime(hearth::utility::MixHashGuidT<hearth::utility::Murmur3MixerState>&, T_Time const&,
                                   KFS_ParamBag const*) const
-{
-}
+{}
 
 hearth::utility::Guid KFS_Stream::GetRenderGuid(KFS_RenderOptionsBase const&, GetRenderGuidFilter*) const
 {

@@ -65,8 +65,8 @@ int RetimeKeys(KFS_Stream* stream, KFS_StreamKeyData* data, unsigned int newScal
         } else {
             ++index;
         }
-        // Whichever of two has gone. A third key on the tick then meets the later time; since of three times in a row the middle one
-        // is never the farthest from a tick, the nearest of all is left in the end.
+        // Whichever of two has gone. A third key on the tick then meets the later time; since of three times in a row
+        // the middle one is never the farthest from a tick, the nearest of all is left in the end.
         previousOld = oldTime;
         previousNew = tick.value;
     }
@@ -92,7 +92,7 @@ int RescaleKeys(KFS_Stream* stream, unsigned int newScale)
     return error.Code();
 }
 
-} // namespace
+}  // namespace
 
 int KFS_RescaleStream(KFS_Stream* stream, unsigned int newScale)
 {

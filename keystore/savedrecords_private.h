@@ -25,7 +25,8 @@ private:
     void* bytes_;
 };
 
-// The cache record as it is now. Not for a custom stream that passes for a plain one: its record's size isn't to be had then.
+// The cache record as it is now. Not for a custom stream that passes for a plain one: its record's size isn't to be had
+// then.
 class KFSp_SavedCache {
 public:
     explicit KFSp_SavedCache(KFS_Stream const* stream) noexcept;
@@ -41,8 +42,8 @@ private:
     KFSp_ScBytes bytes_;
 };
 
-// The keys `first` to `last` of the list as they are now. Restore() puts them back under the same indices, but for their arc tables and
-// times, which belong to the update pass.
+// The keys `first` to `last` of the list as they are now. Restore() puts them back under the same indices, but for
+// their arc tables and times, which belong to the update pass.
 class KFSp_SavedKeys {
 public:
     KFSp_SavedKeys(KFS_Stream const* stream, KFS_StreamKeyData const* data, int first, int last) noexcept;
@@ -60,8 +61,8 @@ private:
     int code_;
 };
 
-// The nearest keys on both sides that aren't float keys, looking from `before` down and from `after` up: whatever a split of the segment between
-// them may change lies in [first, last]. Clipped to the list.
+// The nearest keys on both sides that aren't float keys, looking from `before` down and from `after` up: whatever a
+// split of the segment between them may change lies in [first, last]. Clipped to the list.
 struct KFSp_AnchorRange {
     int first;
     int last;

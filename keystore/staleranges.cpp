@@ -19,7 +19,8 @@ struct Range {
     bool IsNone() const { return first == KFS_INVALID_INDEX; }
 };
 
-// The keys from `index` - `count` to `index`, cut to the list; `index` -1 counts from the last key. A mark that lies behind the list is none.
+// The keys from `index` - `count` to `index`, cut to the list; `index` -1 counts from the last key. A mark that lies
+// behind the list is none.
 Range MarkedRange(int keyCount, int index, int count)
 {
     int reach = count;
@@ -62,7 +63,8 @@ bool IsFloatKey(SEQ_Head** keys, int index, KFSp_FirstError& error)
     return code == 0 && (static_cast<KFS_KeyScalar*>(item)->flags & KFS_KeyFlag_Float) != 0;
 }
 
-// The time of a float key follows from the anchors around it, so a range never ends on one, except at the ends of the list.
+// The time of a float key follows from the anchors around it, so a range never ends on one, except at the ends of the
+// list.
 int WidenOverFloatKeys(SEQ_Head** keys, Range* range)
 {
     KFSp_FirstError error;
@@ -79,7 +81,7 @@ int WidenOverFloatKeys(SEQ_Head** keys, Range* range)
     return error.Code();
 }
 
-} // namespace
+}  // namespace
 
 int KFS_Stream::SetInvalid(int index, short count) const
 {

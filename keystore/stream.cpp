@@ -21,24 +21,41 @@
 
 namespace {
 
-// Gives the duplicate of a list arc tables of its own. A key whose table can't be had stays without one.
-int DuplicateRemapTable(SEQ_Head**, long, int, void* item)
+// The arc table of a key; null where there is none.
+SEQ_Head** RemapTableOf(KFS_KeyScalar const* key)
 {
-    auto* const key = static_cast<KFS_KeyScalar*>(item);
-    if (!KFSp_HasSpatialBlock(key) || !key->remapTable) {
-        return 0;
+    return KFSp_HasSpatialBlock(key) ? key->remapTable : nullptr;
+}
+
+// Gives the duplicate of a list arc tables of its own. All keys are visited, also after a failure: until a key has been, its table may
+// be the source's.
+int DuplicateRemapTables(SEQ_Head const* const* source, SEQ_Head** copy)
+{
+    KFSp_FirstError error;
+    for (int i = 0; i < (*copy)->count; ++i) {
+        void const* from = nullptr;
+        void* to = nullptr;
+        error.Keep(SEQ_GetConstAddress(source, i, &from));
+        error.Keep(SEQ_GetAddress(copy, i, 0, &to));
+        if (!from || !to) {
+            return error.Code();
+        }
+        auto* const key = static_cast<KFS_KeyScalar*>(to);
+        SEQ_Head** const table = RemapTableOf(static_cast<KFS_KeyScalar const*>(from));
+        if (KFSp_HasSpatialBlock(key)) {
+            key->remapTable = nullptr;
+        }
+        if (table && error.None()) {
+            error.Keep(SEQ_Duplicate(table, 0, &key->remapTable));
+        }
     }
-    SEQ_Head** const shared = std::exchange(key->remapTable, nullptr);
-    return SEQ_Duplicate(shared, 0, &key->remapTable);
+    return error.Code();
 }
 
 int DisposeRemapTable(SEQ_Head**, long, int, void* item)
 {
     auto* const key = static_cast<KFS_KeyScalar*>(item);
-    if (!KFSp_HasSpatialBlock(key) || !key->remapTable) {
-        return 0;
-    }
-    return SEQ_Dispose(std::exchange(key->remapTable, nullptr), 0);
+    return RemapTableOf(key) ? SEQ_Dispose(std::exchange(key->remapTable, nullptr), 0) : 0;
 }
 
 // The list with the arc tables that its keys own; null is fine. There is nobody to tell of a failure.
@@ -107,10 +124,7 @@ KFS_StreamKeyData::KFS_StreamKeyData(KFS_StreamKeyData const& source, KFS_Stream
     if (keys) {
         error.Keep(SEQ_SetRefcon((*source.keys)->refcon, keys));
         if (stream->IsSpatial()) {
-            // All of them, also after a failure: until a key has been visited, its table is the source's.
-            for (int i = 0; i < (*keys)->count; ++i) {
-                error.Keep(SEQ_ForRange(keys, i, i, 0, DuplicateRemapTable, nullptr));
-            }
+            error.Keep(DuplicateRemapTables(source.keys, keys));
         }
     }
     try {
@@ -262,9 +276,7 @@ bool KFS_Stream::HasNoValue() const
 
 void KFS_Stream::NotifyValueChanged()
 {
-    if (KFSp_IsHeard(this)) {
-        KFS_NotifyListeners(this, [this](KFS_StreamListener* listener) { listener->StreamValueChanged(this); });
-    }
+    KFSp_Notify(this, [this](KFS_StreamListener* listener) { listener->StreamValueChanged(this); });
 }
 
 KFS_Stream::QuietExpressionErrorToken::QuietExpressionErrorToken(KFS_Stream* stream)

@@ -4,8 +4,8 @@
 #include <array>
 #include <cstddef>
 
-// Names of units and of components, as the parameter record of the stream says. Each name stands in the message table, where it can be
-// translated, and here in English.
+// Names of units and of components, as the parameter record of the stream says. Each name stands in the message table,
+// where it can be translated, and here in English.
 
 namespace {
 
@@ -24,8 +24,9 @@ constexpr std::array<Name, 4> ColorNames{{{96, "alpha"}, {97, "red"}, {98, "gree
 constexpr unsigned short DisplayFlag_Percent = 0x1;
 constexpr unsigned short DisplayFlag_Pixels = 0x4;
 
-// Both slider kinds are asked for the float slider's flags. In the record of a fixed slider that word is the high half of validMin, so there
-// an odd integer part of the minimum reads as percent and its bit 2 as pixels. Users see these units, so it stays.
+// Both slider kinds are asked for the float slider's flags. In the record of a fixed slider that word is the high half
+// of validMin, so there an odd integer part of the minimum reads as percent and its bit 2 as pixels. Users see these
+// units, so it stays.
 Name SliderUnits(FX_ParamDef const& def)
 {
     unsigned short const flags = def.value.floatSlider.displayFlags;
@@ -38,17 +39,13 @@ Name SliderUnits(FX_ParamDef const& def)
 Name Units(FX_ParamDef const& def)
 {
     switch (def.paramType) {
-    case FX_Param_FIXED_ANGLE:
-        return Degrees;
+    case FX_Param_FIXED_ANGLE: return Degrees;
     case FX_Param_POINT_2D:
-    case FX_Param_POINT_3D:
-        return Pixels;
+    case FX_Param_POINT_3D: return Pixels;
     case FX_Param_FIXED_SLIDER:
         return (def.value.fixedSlider.displayFlags & DisplayFlag_Percent) != 0 ? Percent : SliderUnits(def);
-    case FX_Param_FLOAT_SLIDER:
-        return SliderUnits(def);
-    default:
-        return NoName;
+    case FX_Param_FLOAT_SLIDER: return SliderUnits(def);
+    default: return NoName;
     }
 }
 
@@ -65,12 +62,9 @@ Name Component(KFS_Stream const* stream, short component)
     case FX_Param_FIXED_SLIDER:
     case FX_Param_POINT_2D:
     case FX_Param_FLOAT_SLIDER:
-    case FX_Param_POINT_3D:
-        return stream->GetDimension() < 2 ? NoName : NameAt(AxisNames, component);
-    case FX_Param_COLOR:
-        return NameAt(ColorNames, component);
-    default:
-        return NoName;
+    case FX_Param_POINT_3D: return stream->GetDimension() < 2 ? NoName : NameAt(AxisNames, component);
+    case FX_Param_COLOR: return NameAt(ColorNames, component);
+    default: return NoName;
     }
 }
 
@@ -86,7 +80,7 @@ KFS_Stream const* UnitsOwner(KFS_Stream const* stream)
     return isPlacedFollower ? stream->GetSeparationLeader() : nullptr;
 }
 
-} // namespace
+}  // namespace
 
 u16str KFS_Stream::GetUnitsName() const
 {

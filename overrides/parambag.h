@@ -16,9 +16,11 @@ class KFS_API KFS_ParamBag {
 public:
     KFS_ParamBag() = default;
     KFS_ParamBag(KFS_ParamBag const&) = default;
+    KFS_ParamBag(KFS_ParamBag&&) = default;
     // The union of both; where both hold an override for one stream, `a` wins.
     KFS_ParamBag(KFS_ParamBag const& a, KFS_ParamBag const& b);
     KFS_ParamBag& operator=(KFS_ParamBag const&) = default;
+    KFS_ParamBag& operator=(KFS_ParamBag&&) = default;
     virtual ~KFS_ParamBag();
 
     std::size_t GetOverrideCount() const { return overrides_.size(); }

@@ -1,5 +1,6 @@
 #include "tree/listener.h"
 
+#include "frame/boundary_private.h"
 #include "frame/services/reports.h"
 #include "frame/services/threads.h"
 #include "frame/statics_private.h"
@@ -45,8 +46,7 @@ void KFS_StreamListenerManager::NotifyAllListeners(KFS_Notification const& call)
 
 int KFS_RegisterMainListener(KFS_StreamListener* listener)
 {
-    S_KFS_MainListenerManager->Add(listener);
-    return 0;
+    return KFSp_Boundary([&] { S_KFS_MainListenerManager->Add(listener); });
 }
 
 int KFS_UnregisterMainListener(KFS_StreamListener* listener)
@@ -57,8 +57,7 @@ int KFS_UnregisterMainListener(KFS_StreamListener* listener)
 
 int KFS_PauseMainListener(bool pause, bool& wasPaused)
 {
-    wasPaused = std::exchange(ThisThreadsPause(), pause);
-    return 0;
+    return KFSp_Boundary([&] { wasPaused = std::exchange(ThisThreadsPause(), pause); });
 }
 
 bool KFSp_IsHeard(KFS_StreamBase* stream)
@@ -78,9 +77,12 @@ bool KFSp_IsHeard(KFS_StreamBase* stream)
 
 void KFS_NotifyListeners(KFS_StreamBase* stream, KFS_Notification const& call)
 {
-    if (KFSp_IsHeard(stream)) {
-        S_KFS_MainListenerManager->NotifyAllListeners(call);
-    }
+    KFSp_Notify(stream, call);
+}
+
+KFS_StreamListenerManager* KFSp_GetMainListenerManager()
+{
+    return S_KFS_MainListenerManager;
 }
 
 void KFSp_MakeMainListenerManager()

@@ -12,7 +12,7 @@ class KFS_API KFS_MatchName {
 public:
     // A name that isn't set.
     KFS_MatchName() = default;
-    // `text`: NUL-terminated bytes; null counts as the empty text. The flag has no effect. Throws an int when the pool has no room.
+    // `text`: NUL-terminated bytes; null counts as the empty text. The flag has no effect. Throws std::bad_alloc.
     KFS_MatchName(unsigned char const* text, bool);
     KFS_MatchName(char const* text, bool);
     KFS_MatchName(std::basic_string<unsigned char> const& text, bool);

@@ -17,13 +17,13 @@ namespace {
 // Ends a run of paths in a file.
 constexpr char const* EndOfPathText = "ZQVM End of path sentinel";
 
-void RescaleLeaf(KFS_StreamBase* leaf, KFS_StreamGroup const* group)
+void RescaleLeaf(KFS_StreamBase* leaf, unsigned int scale)
 {
-    KFSp_ThrowIf(KFS_RescaleStream(leaf->GetAsLeaf(), group->GetPreferredTimeScale()));
+    KFSp_ThrowIf(KFS_RescaleStream(leaf->GetAsLeaf(), scale));
 }
 
 // Each real leaf below a group that has just found its place, in child order, depth first. Canonical leaves stay at their own scale.
-void RescaleNewlyInstalled(KFS_StreamGroup* installed, KFS_StreamGroup const* group)
+void RescaleNewlyInstalled(KFS_StreamGroup* installed, unsigned int scale)
 {
     for (unsigned int i = 0; i < installed->GetNumStreams(); ++i) {
         KFS_StreamBase* const child = installed->GetEditableStreamNullOK(i);
@@ -31,9 +31,9 @@ void RescaleNewlyInstalled(KFS_StreamGroup* installed, KFS_StreamGroup const* gr
             continue;
         }
         if (child->IsLeaf()) {
-            RescaleLeaf(child, group);
+            RescaleLeaf(child, scale);
         } else if (KFS_StreamGroup* const below = child->GetAsGroup()) {
-            RescaleNewlyInstalled(below, group);
+            RescaleNewlyInstalled(below, scale);
         }
     }
 }
@@ -78,9 +78,7 @@ KFS_StreamBase::KFS_StreamBase(KFS_StreamBase const& source)
 KFS_StreamBase::~KFS_StreamBase()
 {
     try {
-        if (KFSp_IsHeard(this)) {
-            KFS_NotifyListeners(this, [this](KFS_StreamListener* listener) { listener->StreamDestroyed(this); });
-        }
+        KFSp_Notify(this, [this](KFS_StreamListener* listener) { listener->StreamDestroyed(this); });
     } catch (int) {
         // A listener's failure doesn't keep a stream alive.
     } catch (std::exception& exception) {
@@ -208,9 +206,9 @@ void KFS_StreamBase::SetStreamBaseFlags(unsigned int value, unsigned int mask)
 {
     unsigned int const oldFlags = flags_;
     flags_ = (value & mask) | (oldFlags & ~mask);
-    if (flags_ != oldFlags && KFSp_IsHeard(this)) {
-        unsigned int const newFlags = flags_;
-        KFS_NotifyListeners(this, [this, oldFlags, newFlags](KFS_StreamListener* listener) {
+    unsigned int const newFlags = flags_;
+    if (newFlags != oldFlags) {
+        KFSp_Notify(this, [this, oldFlags, newFlags](KFS_StreamListener* listener) {
             listener->StreamFlagsChanged(this, oldFlags, newFlags);
         });
     }
@@ -321,15 +319,17 @@ void KFS_StreamBase::SetDisplayName(u16str const& name)
 {
     displayName_ = name;
     SetNamesSameInitted(false);
-    if (KFSp_IsHeard(this)) {
-        KFS_NotifyListeners(this, [this](KFS_StreamListener* listener) { listener->StreamDisplayNameChanged(this); });
-    }
+    KFSp_Notify(this, [this](KFS_StreamListener* listener) { listener->StreamDisplayNameChanged(this); });
 }
 
 void KFS_StreamBase::pSetDisplayName(u16str const& name) const
 {
     displayName_ = name;
-    const_cast<KFS_StreamBase*>(this)->SetNamesSameInitted(false);
+    // In the word itself, since a name that is filled in on demand is no news to listeners; and only where the bit is set, since
+    // readers fill names in beside other readers of the word.
+    if (NamesSameInitted()) {
+        const_cast<KFS_StreamBase*>(this)->flags_ &= ~static_cast<unsigned int>(KFS_BaseFlag_NamesSameInitted);
+    }
 }
 
 bool KFS_StreamBase::IsMatchNameSameAsDisplayName() const
@@ -351,10 +351,11 @@ void KFS_StreamBase::SetParent(KFS_StreamGroup* group)
         return;
     }
     KFS_StreamGroup::NotifyParentsStreamStored(group, this);
+    unsigned int const scale = group->GetPreferredTimeScale();
     if (IsLeaf()) {
-        RescaleLeaf(this, group);
+        RescaleLeaf(this, scale);
     } else if (KFS_StreamGroup* const self = GetAsGroup()) {
-        RescaleNewlyInstalled(self, group);
+        RescaleNewlyInstalled(self, scale);
     }
 }
 

@@ -9,8 +9,8 @@
 // The parameter t runs from 0 at p0 to 1 at p3.
 //
 // Results. 0, or one of the codes below; CRV_BuildArcSpline may also answer 4, out of memory. Nothing is reported.
-// On a non-zero result the outputs are untouched unless said otherwise. Finite input never gives a NaN, and no loop runs
-// without a fixed bound.
+// On a non-zero result the outputs are untouched unless said otherwise. Finite input never gives a NaN, and no loop
+// runs without a fixed bound.
 //
 // Threads. All operations are pure functions of their arguments, except that CRV_BuildArcSpline writes the table and
 // CRV_CurveSetNonDecreasing the curve. Many threads may read one table.
@@ -40,9 +40,9 @@
 struct SEQ_Head;
 
 // Codes of this service; 4, out of memory, is common to all services.
-inline constexpr int CRV_Err_NullArgument = 0x1601;  // a pointer that must not be null is null
-inline constexpr int CRV_Err_Dimension = 0x1602;     // the operation doesn't take a curve of this dimension
-inline constexpr int CRV_Err_NotFinite = 0x1603;     // NaN or infinity came in, or the answer doesn't fit a double
+inline constexpr int CRV_Err_NullArgument = 0x1801;  // a pointer that must not be null is null
+inline constexpr int CRV_Err_Dimension = 0x1802;     // the operation doesn't take a curve of this dimension
+inline constexpr int CRV_Err_NotFinite = 0x1803;     // NaN or infinity came in, or the answer doesn't fit a double
 
 // One segment. The points are arrays of `dimension` doubles that the curve doesn't own; p1 and p2 are the handle ends
 // as absolute positions. A const curve's points are only read.
@@ -91,7 +91,8 @@ KFS_SERVICE_API int CRV_EvaluatePoint(CRV_Curve const* curve, double* point, dou
 // The derivative by t at full size: at t = 0 it is 3 (p1 - p0). `dimension` doubles; t is limited to 0 to 1.
 KFS_SERVICE_API int CRV_EvaluateDeriv(CRV_Curve const* curve, double* vector, double t);
 
-// Splits the curve at t, which is limited to 0 to 1. Dimension 1 to 4. `rows` receives five points of `dimension` doubles:
+// Splits the curve at t, which is limited to 0 to 1. Dimension 1 to 4. `rows` receives five points of `dimension`
+// doubles:
 //
 //   row 0   left p1       p0 ---- row 0 ---- row 1 ---- row 2 ---- row 3 ---- row 4 ---- p3
 //   row 1   left p2       |___________ left ____________|___________ right ___________|
@@ -110,7 +111,8 @@ KFS_SERVICE_API int CRV_SubdivideCurve(CRV_Curve const* curve, double* rows, dou
 //   Handles between two equal values become flat.
 //
 // No curve from a high p0 to a low p3 can be non-decreasing: it is treated upside down, so that it falls steadily and
-// doesn't swing out. Coordinates are looked at only where a handle has to move: that is when CRV_Err_NotFinite is found.
+// doesn't swing out. Coordinates are looked at only where a handle has to move: that is when CRV_Err_NotFinite is
+// found.
 KFS_SERVICE_API int CRV_CurveSetNonDecreasing(CRV_Curve* curve, unsigned char* changed);
 
 // Measures a spatial curve and makes its table from distance to parameter.
@@ -118,9 +120,9 @@ KFS_SERVICE_API int CRV_CurveSetNonDecreasing(CRV_Curve* curve, unsigned char* c
 //   remapTable   in and out, not null. Holds null or a table of an earlier call, which is replaced. The table is a list
 //                for SEQ_Dispose; its items are private. On failure the older table is gone and null is left.
 //   arcLength    out, not null. In the units of the curve's coordinates. On failure 0.
-//   accuracy     absolute, in the same units. `arcLength` is that close to the true length, and the point that the table
-//                finds for a distance that close to the true one. Anything smaller than 1e-9 of the control polygon's
-//                length, negative or NaN counts as that.
+//   accuracy     absolute, in the same units. `arcLength` is that close to the true length, and the point that the
+//                table finds for a distance that close to the true one. Anything smaller than 1e-9 of the control
+//                polygon's length, negative or NaN counts as that.
 //
 // Whatever the accuracy, the table keeps the speed along the path even to 3e-4, so that equal distances stay equal
 // steps. A curve whose points coincide has length 0 and a table that answers 0.

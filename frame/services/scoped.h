@@ -61,7 +61,7 @@ public:
     void Reset()
     {
         if (!guarded_) return;
-        *guarded_->variable = guarded_->value;
+        *guarded_->variable = std::move(guarded_->value);  // a move needs no memory
         guarded_.reset();
     }
 

@@ -10,8 +10,8 @@ namespace {
 // Speed may be off by this share inside a piece, whatever the accuracy asked for.
 constexpr double kSpeedTolerance = 3e-4;
 
-// A stretch shorter than this share of the control polygon is a step that nobody sees: it isn't cut further, and a place
-// whose slow surroundings are that short counts as standing still.
+// A stretch shorter than this share of the control polygon is a step that nobody sees: it isn't cut further, and a
+// place whose slow surroundings are that short counts as standing still.
 constexpr double kNegligible = 1e-7;
 
 // The smallest accuracy that is worth pieces, as a share of the control polygon.
@@ -126,8 +126,8 @@ void SetHermite(double (&c)[6], double f0, double d0, double dd0, double f1, dou
     const double value = f1 - c[0] - c[1] - c[2];
     const double slope = d1 - c[1] - 2.0 * c[2];
     const double bend = dd1 - 2.0 * c[2];
-    // The three have the same pattern of signs on purpose: where signs alternate, gcc 12 fuses multiplication and addition
-    // on machines that can, also under -ffp-contract=off, and the bits would depend on the machine.
+    // The three have the same pattern of signs on purpose: where signs alternate, gcc 12 fuses multiplication and
+    // addition on machines that can, also under -ffp-contract=off, and the bits would depend on the machine.
     const double third = 10.0 * value - 4.0 * slope + 0.5 * bend;
     const double fourth = 15.0 * value - 7.0 * slope + bend;
     const double fifth = 6.0 * value - 3.0 * slope + 0.5 * bend;
@@ -140,7 +140,7 @@ void SetHermite(double (&c)[6], double f0, double d0, double dd0, double f1, dou
 template <int N>
 class Cutter {
 public:
-    Cutter(Path<N> const& path, double accuracy, KFSp_ArcTable& table)
+    Cutter(Path<N> const& path, double accuracy, CRVp_ArcTable& table)
         : path_(path),
           table_(table),
           accuracy_(accuracy),
@@ -158,7 +158,7 @@ public:
         pending[waiting++] = path_.KnotAt(1.0, negligible_);
         while (waiting > 0) {
             const Knot to = pending[waiting - 1];
-            const bool full = waiting >= kDeepest || table_.count + waiting >= KFSp_MostArcPieces - 1;
+            const bool full = waiting >= kDeepest || table_.count + waiting >= CRVp_MostArcPieces - 1;
             if (AddPiece(from, to, full)) {
                 from = to;
                 --waiting;
@@ -196,7 +196,7 @@ private:
     bool AddPiece(Knot const& from, Knot const& to, bool forced)
     {
         const double length = path_.Length(from.t, to.t);
-        KFSp_ArcPiece& piece = table_.pieces[table_.count];
+        CRVp_ArcPiece& piece = table_.pieces[table_.count];
         piece.start = table_.length;
         if (length <= negligible_ || forced) {
             piece.offset = 0.0;
@@ -214,7 +214,7 @@ private:
         return true;
     }
 
-    static void SetCoefficients(KFSp_ArcPiece& piece, Knot const& from, Knot const& to, double length)
+    static void SetCoefficients(CRVp_ArcPiece& piece, Knot const& from, Knot const& to, double length)
     {
         piece.root = from.standstill || to.standstill;
         piece.offset = to.standstill ? 1.0 : 0.0;
@@ -238,7 +238,7 @@ private:
     }
 
     // Whether the speed along the piece is 1 within tolerance, and its length trustworthy.
-    bool IsGood(KFSp_ArcPiece const& piece, Knot const& from, Knot const& to, double length) const
+    bool IsGood(CRVp_ArcPiece const& piece, Knot const& from, Knot const& to, double length) const
     {
         // The integral by the end values is of the order of the quintic, Gauss's far better: where they agree this well
         // there is nothing between the samples that either has missed.
@@ -257,14 +257,14 @@ private:
             const double distanceSlope = length * (piece.root ? 2.0 * r : 1.0);
             const double error = std::fabs(std::fabs(slope) * path_.Speed(t) - distanceSlope) / distanceSlope;
             if (!(error <= kSpeedTolerance)) return false;
-            worst = KFSp_Max(worst, error);
+            worst = CRVp_Max(worst, error);
         }
         return kErrorShare * worst * length <= 0.25 * accuracy_;
     }
 
     void Finish(double unscale)
     {
-        KFSp_ArcPiece& end = table_.pieces[table_.count++];
+        CRVp_ArcPiece& end = table_.pieces[table_.count++];
         end = {table_.length, 0.0, 0.0, {1.0, 0.0, 0.0, 0.0, 0.0, 0.0}, 0};
         if (unscale == 1.0) return;
         for (int i = 0; i < table_.count; ++i) {
@@ -275,13 +275,13 @@ private:
     }
 
     Path<N> const& path_;
-    KFSp_ArcTable& table_;
+    CRVp_ArcTable& table_;
     double accuracy_;
     double negligible_;
 };
 
 template <int N>
-void Measure(CRV_Curve const* curve, double accuracy, double scale, KFSp_ArcTable& table)
+void Measure(CRV_Curve const* curve, double accuracy, double scale, CRVp_ArcTable& table)
 {
     const Path<N> path(curve, scale);
     table.count = 0;
@@ -300,9 +300,9 @@ double ScaleFor(CRV_Curve const* curve)
 {
     double step = 0.0;
     for (int i = 0; i < curve->dimension; ++i) {
-        const double low = KFSp_Min(KFSp_Min(curve->p0[i], curve->p1[i]), KFSp_Min(curve->p2[i], curve->p3[i]));
-        const double high = KFSp_Max(KFSp_Max(curve->p0[i], curve->p1[i]), KFSp_Max(curve->p2[i], curve->p3[i]));
-        step = KFSp_Max(step, 0.5 * high - 0.5 * low);
+        const double low = CRVp_Min(CRVp_Min(curve->p0[i], curve->p1[i]), CRVp_Min(curve->p2[i], curve->p3[i]));
+        const double high = CRVp_Max(CRVp_Max(curve->p0[i], curve->p1[i]), CRVp_Max(curve->p2[i], curve->p3[i]));
+        step = CRVp_Max(step, 0.5 * high - 0.5 * low);
     }
     if (step > 0x1p400) return 0x1p-700;
     return step < 0x1p-300 ? 0x1p700 : 1.0;
@@ -310,15 +310,15 @@ double ScaleFor(CRV_Curve const* curve)
 
 }  // namespace
 
-int KFSp_MeasureArc(CRV_Curve const* curve, double accuracy, KFSp_ArcTable& table)
+int CRVp_MeasureArc(CRV_Curve const* curve, double accuracy, CRVp_ArcTable& table)
 {
-    if (const int code = KFSp_CheckPath(curve)) return code;
-    if (!KFSp_AllFinite(curve)) return CRV_Err_NotFinite;
+    if (const int code = CRVp_CheckPath(curve)) return code;
+    if (!CRVp_AllFinite(curve)) return CRV_Err_NotFinite;
 
     const double scale = ScaleFor(curve);
     if (curve->dimension <= 2)
         Measure<2>(curve, accuracy, scale, table);
     else
         Measure<4>(curve, accuracy, scale, table);
-    return KFSp_IsFinite(table.length) ? 0 : CRV_Err_NotFinite;
+    return CRVp_IsFinite(table.length) ? 0 : CRV_Err_NotFinite;
 }

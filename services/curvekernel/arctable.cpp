@@ -12,10 +12,10 @@
 namespace {
 
 // Makes a list of the table's pieces. On failure nothing is left.
-int MakeList(KFSp_ArcTable const& table, SEQ_Head**& made)
+int MakeList(CRVp_ArcTable const& table, SEQ_Head**& made)
 {
     SEQ_Head** list = nullptr;
-    if (const int code = SEQ_New(0, sizeof(KFSp_ArcPiece), 4, 1, &list)) return code;
+    if (const int code = SEQ_New(0, sizeof(CRVp_ArcPiece), 4, 1, &list)) return code;
     int code = SEQ_ReserveSpace(table.count, list);
     if (code == 0) code = SEQ_SetNumItems(table.count, list, 0);
     void* items = nullptr;
@@ -24,7 +24,7 @@ int MakeList(KFSp_ArcTable const& table, SEQ_Head**& made)
         SEQ_Dispose(list, 0);
         return code;
     }
-    std::memcpy(items, table.pieces, static_cast<std::size_t>(table.count) * sizeof(KFSp_ArcPiece));
+    std::memcpy(items, table.pieces, static_cast<std::size_t>(table.count) * sizeof(CRVp_ArcPiece));
     made = list;
     return 0;
 }
@@ -38,8 +38,8 @@ int CRV_BuildArcSpline(CRV_Curve const* curve, SEQ_Head*** remapTable, double* a
     *remapTable = nullptr;
     *arcLength = 0.0;
 
-    KFSp_ArcTable table;
-    int code = KFSp_MeasureArc(curve, accuracy, table);
+    CRVp_ArcTable table;
+    int code = CRVp_MeasureArc(curve, accuracy, table);
     if (code == 0) code = MakeList(table, *remapTable);
     if (code == 0) *arcLength = table.length;
     return code;
@@ -48,17 +48,17 @@ int CRV_BuildArcSpline(CRV_Curve const* curve, SEQ_Head*** remapTable, double* a
 int CRV_TFromSSpline(CRV_Curve const* curve, SEQ_Head*** remapTable, double* t, double s, double one)
 {
     if (!remapTable || !t) return CRV_Err_NullArgument;
-    if (s != s || !KFSp_IsFinite(one)) return CRV_Err_NotFinite;
+    if (s != s || !CRVp_IsFinite(one)) return CRV_Err_NotFinite;
 
     if (*remapTable) {
         void const* pieces = nullptr;
         if (const int code = SEQ_GetConstAddress(*remapTable, 0, &pieces)) return code;
-        *t = one * KFSp_TAtDistance(static_cast<KFSp_ArcPiece const*>(pieces), (**remapTable)->count, s);
+        *t = one * CRVp_TAtDistance(static_cast<CRVp_ArcPiece const*>(pieces), (**remapTable)->count, s);
         return 0;
     }
 
-    KFSp_ArcTable table;
-    if (const int code = KFSp_MeasureArc(curve, 0.0, table)) return code;
-    *t = one * KFSp_TAtDistance(table.pieces, table.count, s);
+    CRVp_ArcTable table;
+    if (const int code = CRVp_MeasureArc(curve, 0.0, table)) return code;
+    *t = one * CRVp_TAtDistance(table.pieces, table.count, s);
     return 0;
 }

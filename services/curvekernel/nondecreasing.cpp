@@ -1,8 +1,8 @@
 // The treatment that keeps a curve from running backwards.
 //
-// With the handles' heights as shares of the rise, A = (y1 - y0) / (y3 - y0) and D = (y3 - y2) / (y3 - y0), the slope by
-// t is A (1-t)^2 + 2 (1 - A - D) t (1-t) + D t^2, up to a factor. It is nowhere negative exactly if A and D aren't and
-// A + D - 1 <= sqrt(A D): the unit square, and the part of an ellipse around it that touches the axes at 4/3.
+// With the handles' heights as shares of the rise, A = (y1 - y0) / (y3 - y0) and D = (y3 - y2) / (y3 - y0), the slope
+// by t is A (1-t)^2 + 2 (1 - A - D) t (1-t) + D t^2, up to a factor. It is nowhere negative exactly if A and D aren't
+// and A + D - 1 <= sqrt(A D): the unit square, and the part of an ellipse around it that touches the axes at 4/3.
 
 #include "services/curvekernel/curve_private.h"
 
@@ -34,7 +34,7 @@ double LargestBeside(double d)
 double Share(Handle const& handle)
 {
     const double rise = handle.opposite[1] - handle.own[1];
-    if (KFSp_IsFinite(rise)) return (handle.point[1] - handle.own[1]) / rise;
+    if (CRVp_IsFinite(rise)) return (handle.point[1] - handle.own[1]) / rise;
     const double origin = 0.25 * handle.own[1];
     return (0.25 * handle.point[1] - origin) / (0.25 * handle.opposite[1] - origin);
 }
@@ -47,7 +47,7 @@ void Flatten(Handle const& handle)
 // Takes the handle back along its own direction to `share` of the rise; 1 is the opposite value to the bit.
 void Shorten(Handle const& handle, double share)
 {
-    handle.point[0] = KFSp_Between(handle.own[0], handle.point[0], share / Share(handle));
+    handle.point[0] = CRVp_Between(handle.own[0], handle.point[0], share / Share(handle));
     handle.point[1] = (1.0 - share) * handle.own[1] + share * handle.opposite[1];
 }
 
@@ -106,13 +106,13 @@ bool MoveHandles(CRV_Curve* curve)
 
 int CRV_CurveSetNonDecreasing(CRV_Curve* curve, unsigned char* changed)
 {
-    if (const int code = KFSp_CheckGraph(curve)) return code;
+    if (const int code = CRVp_CheckGraph(curve)) return code;
     const double y0 = curve->p0[1];
     const double y1 = curve->p1[1];
     const double y2 = curve->p2[1];
     const double y3 = curve->p3[1];
     if (IsInside(y0, y1, y2, y3) || IsInside(y3, y2, y1, y0)) return 0;
-    if (!KFSp_AllFinite(curve)) return CRV_Err_NotFinite;
+    if (!CRVp_AllFinite(curve)) return CRV_Err_NotFinite;
     if (MoveHandles(curve) && changed) *changed = 1;
     return 0;
 }

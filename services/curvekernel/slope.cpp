@@ -32,7 +32,7 @@ struct Derivatives {
         first = 3.0 * (rest * rest * out + 2.0 * rest * t * across + t * t * in);
         second = 6.0 * (rest * (across - out) + t * (in - across));
         third = 6.0 * ((in - across) - (across - out));
-        extent = KFSp_Max(std::fabs(out), KFSp_Max(std::fabs(across), std::fabs(in)));
+        extent = CRVp_Max(std::fabs(out), CRVp_Max(std::fabs(across), std::fabs(in)));
     }
 };
 
@@ -75,9 +75,9 @@ double Slope(Place const& place)
 template <class Answer>
 int AtPlaceOf(CRV_Curve const* curve, double* result, double x, Answer&& answer)
 {
-    if (const int code = KFSp_CheckGraph(curve)) return code;
+    if (const int code = CRVp_CheckGraph(curve)) return code;
     if (!result) return CRV_Err_NullArgument;
-    if (!KFSp_AllFinite(curve) || x != x) return CRV_Err_NotFinite;
+    if (!CRVp_AllFinite(curve) || x != x) return CRV_Err_NotFinite;
 
     const double x0 = curve->p0[0];
     const double x1 = curve->p1[0];
@@ -87,7 +87,7 @@ int AtPlaceOf(CRV_Curve const* curve, double* result, double x, Answer&& answer)
         *result = 0.0;
         return 0;
     }
-    const double t = KFSp_Reach(x0, x1, x2, x3, x);
+    const double t = CRVp_Reach(x0, x1, x2, x3, x);
     const double vertical = kVertical * (kScale * x3 - kScale * x0);
     const double smallest = std::numeric_limits<double>::min();
     const Place place{t,

@@ -52,7 +52,7 @@ Bernstein SlopeExcess(CRV_Curve const* curve, double m)
     double const* points[] = {curve->p0, curve->p1, curve->p2, curve->p3};
     double largest = 0.0;
     for (double const* point : points)
-        largest = KFSp_Max(largest, kScale * std::fabs(point[1]) + kScale * std::fabs(m) * std::fabs(point[0]));
+        largest = CRVp_Max(largest, kScale * std::fabs(point[1]) + kScale * std::fabs(m) * std::fabs(point[0]));
     const double rounding = 4.0 * std::numeric_limits<double>::epsilon() * largest;
 
     Bernstein excess{{}, 2};
@@ -81,7 +81,7 @@ int RootsInUnit(Bernstein const& polynomial, double roots[2])
 
     double found[2];
     int count = 0;
-    const double largest = KFSp_Max(std::fabs(a), KFSp_Max(std::fabs(b), std::fabs(c)));
+    const double largest = CRVp_Max(std::fabs(a), CRVp_Max(std::fabs(b), std::fabs(c)));
     a /= largest;
     b /= largest;
     c /= largest;
@@ -123,8 +123,8 @@ bool HasSlopeAt(CRV_Curve const* curve, double t, bool atCusp)
     const double slope = 3.0 * (rest * rest * out + 2.0 * rest * t * across + t * t * in);
     if (!atCusp && !(std::fabs(slope) > kVertical * std::fabs(kScale * x3 - kScale * x0))) return false;
     double turns[2];
-    if (KFSp_TurningPoints(x0, x1, x2, x3, turns) == 0) return true;
-    const double reached = KFSp_Reach(x0, x1, x2, x3, KFSp_Blend(x0, x1, x2, x3, t));
+    if (CRVp_TurningPoints(x0, x1, x2, x3, turns) == 0) return true;
+    const double reached = CRVp_Reach(x0, x1, x2, x3, CRVp_Blend(x0, x1, x2, x3, t));
     return std::fabs(reached - t) <= kSameParameter;
 }
 
@@ -133,9 +133,9 @@ bool HasSlopeAt(CRV_Curve const* curve, double t, bool atCusp)
 int CRV_EvaluateXFromYPrime(CRV_Curve const* curve, int* count, double* xs, double yPrime)
 {
     if (count) *count = 0;
-    if (const int code = KFSp_CheckGraph(curve)) return code;
+    if (const int code = CRVp_CheckGraph(curve)) return code;
     if (!count || !xs) return CRV_Err_NullArgument;
-    if (!KFSp_AllFinite(curve) || !KFSp_IsFinite(yPrime)) return CRV_Err_NotFinite;
+    if (!CRVp_AllFinite(curve) || !CRVp_IsFinite(yPrime)) return CRV_Err_NotFinite;
     if (curve->p0[0] == curve->p3[0]) return 0;
 
     Bernstein excess = SlopeExcess(curve, yPrime);
@@ -154,8 +154,8 @@ int CRV_EvaluateXFromYPrime(CRV_Curve const* curve, int* count, double* xs, doub
     for (int i = 0; i < found; ++i) {
         const bool atCusp = (startIsCusp && roots[i] == 0.0) || (endIsCusp && roots[i] == 1.0);
         if (!HasSlopeAt(curve, roots[i], atCusp)) continue;
-        const double x = KFSp_LimitToHull(curve->p0[0], curve->p1[0], curve->p2[0], curve->p3[0],
-                                          KFSp_Blend(curve->p0[0], curve->p1[0], curve->p2[0], curve->p3[0], roots[i]));
+        const double x = CRVp_LimitToHull(curve->p0[0], curve->p1[0], curve->p2[0], curve->p3[0],
+                                          CRVp_Blend(curve->p0[0], curve->p1[0], curve->p2[0], curve->p3[0], roots[i]));
         if (kept == 1 && x == xs[0]) continue;
         xs[kept++] = x;
     }

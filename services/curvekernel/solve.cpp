@@ -46,22 +46,22 @@ int UnitTurningPoints(double a, double b, double turns[2])
 bool SteepRoot(double a, double b, double u, double& root)
 {
     const bool turned = 8.0 * u > 1.0 + 3.0 * (a + b);
-    const KFSp_UnitCubic cubic =
-        turned ? KFSp_UnitCubic::FromHandles(1.0 - b, 1.0 - a) : KFSp_UnitCubic::FromHandles(a, b);
+    const CRVp_UnitCubic cubic =
+        turned ? CRVp_UnitCubic::FromHandles(1.0 - b, 1.0 - a) : CRVp_UnitCubic::FromHandles(a, b);
     const double target = turned ? 1.0 - u : u;
 
     // 0.3 t^2 stands for t^3: the choice that fails least often over random handles.
     const double discriminant = cubic.a1 * cubic.a1 + 4.0 * (cubic.a2 + 0.3 * cubic.a3) * target;
     const double start = 2.0 * target / (cubic.a1 + (discriminant > 0.0 ? std::sqrt(discriminant) : 0.0));
-    const double t = KFSp_HalleySteps(cubic, target, start);
+    const double t = CRVp_HalleySteps(cubic, target, start);
     root = turned ? 1.0 - t : t;
-    return KFSp_IsRoot(cubic, target, t);
+    return CRVp_IsRoot(cubic, target, t);
 }
 
 // The root of cubic(t) = u between low, where it is below u, and high, where it isn't; it grows in between.
 // Newton steps, bisection where a step leaves the bracket or doesn't halve the one before. The bracket test is closed:
 // at convergence the step lands on an end of the bracket, and bisecting from there would start all over.
-double BracketedRoot(KFSp_UnitCubic const& cubic, double u, double low, double high)
+double BracketedRoot(CRVp_UnitCubic const& cubic, double u, double low, double high)
 {
     // Bisection alone halves 1 down to the smallest number in this many steps.
     constexpr int kMostSteps = 1100;
@@ -90,7 +90,7 @@ double BracketedRoot(KFSp_UnitCubic const& cubic, double u, double low, double h
 
 }  // namespace
 
-int KFSp_TurningPoints(double c0, double c1, double c2, double c3, double turns[2])
+int CRVp_TurningPoints(double c0, double c1, double c2, double c3, double turns[2])
 {
     const double span = 0.25 * c3 - 0.25 * c0;
     if (span == 0.0) {
@@ -106,9 +106,9 @@ int KFSp_TurningPoints(double c0, double c1, double c2, double c3, double turns[
                              Limited((0.25 * c2 - 0.25 * c0) / span, kFarthestHandle), turns);
 }
 
-double KFSp_ReachSlow(double c0, double c1, double c2, double c3, double v)
+double CRVp_ReachSlow(double c0, double c1, double c2, double c3, double v)
 {
-    const bool finite = KFSp_IsFinite(c0) && KFSp_IsFinite(c1) && KFSp_IsFinite(c2) && KFSp_IsFinite(c3);
+    const bool finite = CRVp_IsFinite(c0) && CRVp_IsFinite(c1) && CRVp_IsFinite(c2) && CRVp_IsFinite(c3);
     if (!finite || v != v) return std::numeric_limits<double>::quiet_NaN();
 
     // Outside the ends, and the coordinate without extent.
@@ -120,7 +120,7 @@ double KFSp_ReachSlow(double c0, double c1, double c2, double c3, double v)
         if (v <= c3) return 1.0;
     }
 
-    const double extent = KFSp_Max(std::fabs(c0), std::fabs(c3));
+    const double extent = CRVp_Max(std::fabs(c0), std::fabs(c3));
     const double scale = extent > kHuge ? 0.25 : extent < kTiny ? 0x1p120 : 1.0;
     const double origin = scale * c0;
     const double span = scale * c3 - origin;
@@ -132,7 +132,7 @@ double KFSp_ReachSlow(double c0, double c1, double c2, double c3, double v)
     double root = 0.0;
     if (ordered && SteepRoot(a, b, u, root)) return root;
 
-    const KFSp_UnitCubic cubic = KFSp_UnitCubic::FromHandles(a, b);
+    const CRVp_UnitCubic cubic = CRVp_UnitCubic::FromHandles(a, b);
     double low = 0.0;
     double high = 1.0;
     double turns[2];

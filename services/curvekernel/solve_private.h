@@ -3,15 +3,15 @@
 // One coordinate of a cubic, c0 to c3, is asked for the smallest t in 0 to 1 at which it reaches v on its way from c0
 // to c3. The common case is inline: both handles end between c0 and c3, so the coordinate grows with t. Three Halley
 // steps from t = u, the linear answer, arrive for nineteen questions of twenty; what they reach is checked, and
-// whatever fails the check, and every other shape, goes to KFSp_ReachSlow.
+// whatever fails the check, and every other shape, goes to CRVp_ReachSlow.
 #pragma once
 
 // The power form of a cubic with value 0 at t = 0 and 1 at t = 1: ((a3 t + a2) t + a1) t.
-struct KFSp_UnitCubic {
+struct CRVp_UnitCubic {
     double a3, a2, a1;
 
     // From the two handles' places a and b on the way from 0 to 1.
-    static KFSp_UnitCubic FromHandles(double a, double b)
+    static CRVp_UnitCubic FromHandles(double a, double b)
     {
         const double apart = b - a;
         return {1.0 - 3.0 * apart, 3.0 * (apart - a), 3.0 * a};
@@ -21,7 +21,7 @@ struct KFSp_UnitCubic {
 };
 
 // Three Halley steps towards cubic(t) = u.
-inline double KFSp_HalleySteps(KFSp_UnitCubic const& cubic, double u, double t)
+inline double CRVp_HalleySteps(CRVp_UnitCubic const& cubic, double u, double t)
 {
     for (int step = 0; step < 3; ++step) {
         const double at = cubic.a3 * t;
@@ -35,7 +35,7 @@ inline double KFSp_HalleySteps(KFSp_UnitCubic const& cubic, double u, double t)
 
 // Whether the steps have arrived. The bound is on t, not on the residual alone: on a plateau of the coordinate every t
 // has a small residual. False for NaN.
-inline bool KFSp_IsRoot(KFSp_UnitCubic const& cubic, double u, double t)
+inline bool CRVp_IsRoot(CRVp_UnitCubic const& cubic, double u, double t)
 {
     const double residual = cubic.Value(t) - u;
     const double allowed = 4e-14 * cubic.Slope(t);
@@ -43,15 +43,15 @@ inline bool KFSp_IsRoot(KFSp_UnitCubic const& cubic, double u, double t)
 }
 
 // Any shape, any scale, slowly: by bracket and Newton steps. NaN if an argument is NaN or a coordinate infinite.
-double KFSp_ReachSlow(double c0, double c1, double c2, double c3, double v);
+double CRVp_ReachSlow(double c0, double c1, double c2, double c3, double v);
 
 // The parameters in the open interval 0 to 1 at which the coordinate turns back, ascending. Answers how many, 0 to 2.
 // The curve must not be constant in this coordinate and its coordinates finite.
-int KFSp_TurningPoints(double c0, double c1, double c2, double c3, double turns[2]);
+int CRVp_TurningPoints(double c0, double c1, double c2, double c3, double turns[2]);
 
 // The coordinate at t, 0 to 1, without the limit to the hull: exact at both ends, never more than rounding outside.
 // The weights are formed first, so that no product is larger than its coordinate.
-inline double KFSp_Blend(double c0, double c1, double c2, double c3, double t)
+inline double CRVp_Blend(double c0, double c1, double c2, double c3, double t)
 {
     const double s = 1.0 - t;
     const double ss = s * s;
@@ -59,43 +59,43 @@ inline double KFSp_Blend(double c0, double c1, double c2, double c3, double t)
     return (ss * s * c0 + 3.0 * ss * t * c1) + (3.0 * s * tt * c2 + tt * t * c3);
 }
 
-inline double KFSp_Min(double a, double b)
+inline double CRVp_Min(double a, double b)
 {
     return b < a ? b : a;
 }
-inline double KFSp_Max(double a, double b)
+inline double CRVp_Max(double a, double b)
 {
     return a < b ? b : a;
 }
 
 // Rounding may carry a blend an ulp past its control coordinates; a held coordinate must come back as it is.
-inline double KFSp_LimitToHull(double c0, double c1, double c2, double c3, double value)
+inline double CRVp_LimitToHull(double c0, double c1, double c2, double c3, double value)
 {
-    const double low = KFSp_Min(KFSp_Min(c0, c1), KFSp_Min(c2, c3));
-    const double high = KFSp_Max(KFSp_Max(c0, c1), KFSp_Max(c2, c3));
-    return KFSp_Max(low, KFSp_Min(high, value));
+    const double low = CRVp_Min(CRVp_Min(c0, c1), CRVp_Min(c2, c3));
+    const double high = CRVp_Max(CRVp_Max(c0, c1), CRVp_Max(c2, c3));
+    return CRVp_Max(low, CRVp_Min(high, value));
 }
 
 // False for NaN and the infinities.
-inline bool KFSp_IsFinite(double value)
+inline bool CRVp_IsFinite(double value)
 {
     return value - value == 0.0;
 }
 
-inline double KFSp_Reach(double c0, double c1, double c2, double c3, double v)
+inline double CRVp_Reach(double c0, double c1, double c2, double c3, double v)
 {
     const bool ordered = (v > c0) & (v < c3) & (c1 >= c0) & (c1 <= c3) & (c2 >= c0) & (c2 <= c3);
-    if (!ordered) return KFSp_ReachSlow(c0, c1, c2, c3, v);
+    if (!ordered) return CRVp_ReachSlow(c0, c1, c2, c3, v);
 
     const double inverse = 1.0 / (c3 - c0);
     const double u = (v - c0) * inverse;
-    const KFSp_UnitCubic cubic = KFSp_UnitCubic::FromHandles((c1 - c0) * inverse, (c2 - c0) * inverse);
+    const CRVp_UnitCubic cubic = CRVp_UnitCubic::FromHandles((c1 - c0) * inverse, (c2 - c0) * inverse);
 
     // Both influences one third, up to the rounding of the handles: the coordinate is linear in t.
     const double bend = (cubic.a3 < 0.0 ? -cubic.a3 : cubic.a3) + (cubic.a2 < 0.0 ? -cubic.a2 : cubic.a2);
     if (bend <= 4e-15) return u;
 
-    const double t = KFSp_HalleySteps(cubic, u, u);
-    if (KFSp_IsRoot(cubic, u, t)) return t;
-    return KFSp_ReachSlow(c0, c1, c2, c3, v);
+    const double t = CRVp_HalleySteps(cubic, u, u);
+    if (CRVp_IsRoot(cubic, u, t)) return t;
+    return CRVp_ReachSlow(c0, c1, c2, c3, v);
 }

@@ -4,21 +4,21 @@
 
 int CRV_SubdivideCurve(CRV_Curve const* curve, double* rows, double t)
 {
-    if (const int code = KFSp_CheckPath(curve)) return code;
+    if (const int code = CRVp_CheckPath(curve)) return code;
     if (!rows) return CRV_Err_NullArgument;
-    const double at = KFSp_LimitToUnit(t);
-    if (at != at || !KFSp_AllFinite(curve)) return CRV_Err_NotFinite;
+    const double at = CRVp_LimitToUnit(t);
+    if (at != at || !CRVp_AllFinite(curve)) return CRV_Err_NotFinite;
 
     const int dimension = curve->dimension;
     for (int i = 0; i < dimension; ++i) {
-        const double leftOuter = KFSp_Between(curve->p0[i], curve->p1[i], at);
-        const double middle = KFSp_Between(curve->p1[i], curve->p2[i], at);
-        const double rightOuter = KFSp_Between(curve->p2[i], curve->p3[i], at);
-        const double leftInner = KFSp_Between(leftOuter, middle, at);
-        const double rightInner = KFSp_Between(middle, rightOuter, at);
+        const double leftOuter = CRVp_Between(curve->p0[i], curve->p1[i], at);
+        const double middle = CRVp_Between(curve->p1[i], curve->p2[i], at);
+        const double rightOuter = CRVp_Between(curve->p2[i], curve->p3[i], at);
+        const double leftInner = CRVp_Between(leftOuter, middle, at);
+        const double rightInner = CRVp_Between(middle, rightOuter, at);
         rows[i] = leftOuter;
         rows[dimension + i] = leftInner;
-        rows[2 * dimension + i] = KFSp_Between(leftInner, rightInner, at);
+        rows[2 * dimension + i] = CRVp_Between(leftInner, rightInner, at);
         rows[3 * dimension + i] = rightInner;
         rows[4 * dimension + i] = rightOuter;
     }

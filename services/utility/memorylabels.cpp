@@ -10,7 +10,7 @@ namespace {
 constexpr std::size_t TableSize = 1024;
 std::atomic<Q_MemoryLabel*> table[TableSize];
 
-Q_MemoryLabel overflow(0, "other labels");
+constinit Q_MemoryLabel overflow(0, "other labels");
 
 bool IsEntryOf(Q_MemoryLabel const& entry, std::uint64_t hash, char const* label) noexcept
 {

@@ -8,7 +8,7 @@
 // What is live under one label. Entries are made on first use and stay until the process ends.
 class Q_MemoryLabel {
 public:
-    Q_MemoryLabel(std::uint64_t hash, char const* text) noexcept : hash_(hash), text_(text) {}
+    constexpr Q_MemoryLabel(std::uint64_t hash, char const* text) noexcept : hash_(hash), text_(text) {}
 
     void Add(std::size_t size) noexcept { Change(static_cast<long long>(size), 1); }
     void Remove(std::size_t size) noexcept { Change(-static_cast<long long>(size), -1); }

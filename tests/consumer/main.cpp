@@ -1,16 +1,16 @@
-#include "frame/services/time.h"
-#include "tree/matchname.h"
+#include <kfs.h>
 
 #include <cstdio>
 #include <cstring>
 
-// Both libraries, through their headers and at run time: a name goes into the pool and comes back, and a time is converted.
+// Both libraries, through their headers and at run time: the library starts, a name comes back, a time is converted.
 int main()
 {
+    if (KFS_Birth() != 0 || !Get_VX_StreamFactory()) return 1;
     KFS_MatchName const name("consumer position", false);
     int frames = 0;
     bool const right = std::strcmp(reinterpret_cast<char const*>(name.GetName()), "consumer position") == 0 &&
                        T_ShortConvTime(3, 2, 24, &frames) == 0 && frames == 36;
     std::puts(right ? "the installed library answers" : "the installed library answers wrongly");
-    return right ? 0 : 1;
+    return KFS_Death() == 0 && right ? 0 : 1;
 }

@@ -18,7 +18,7 @@ constexpr int H = KFS_Interp_Hold;
 
 struct Vectors {
     char const* why;
-    Vec prev, cur, next;    // empty: not given
+    Vec prev, cur, next;  // empty: not given
     Vec out;
     Vec in;
 };
@@ -48,14 +48,18 @@ TEST_F(AutoTangentsTest, SpatialTangentsFollowTheChord)
         SCOPED_TRACE(c.why);
         Vec in(c.in.size() + 1, 55.0);
         Vec out(c.out.size() + 1, 55.0);
-        EXPECT_EQ(0, KFSp_ComputeDefaultSpTangents(static_cast<short>(c.in.size()), pointer(c.prev), pointer(c.cur), pointer(c.next),
-                                                   in.data(), out.data()));
+        EXPECT_EQ(0, KFSp_ComputeDefaultSpTangents(static_cast<short>(c.in.size()), pointer(c.prev), pointer(c.cur),
+                                                   pointer(c.next), in.data(), out.data()));
         for (std::size_t i = 0; i < c.in.size(); ++i) {
             EXPECT_NEAR(c.in[i], in[i], 1e-12);
             EXPECT_NEAR(c.out[i], out[i], 1e-12);
             // A cleared handle is exactly zero, not a very short one.
-            if (c.in[i] == 0.0) { EXPECT_EQ(0.0, in[i]); }
-            if (c.out[i] == 0.0) { EXPECT_EQ(0.0, out[i]); }
+            if (c.in[i] == 0.0) {
+                EXPECT_EQ(0.0, in[i]);
+            }
+            if (c.out[i] == 0.0) {
+                EXPECT_EQ(0.0, out[i]);
+            }
         }
         EXPECT_EQ(55.0, in.back());
         EXPECT_EQ(55.0, out.back());
@@ -171,9 +175,12 @@ TEST_F(AutoTangentsTest, AnchorsMeasureOverFloatKeys)
     KeyedStream stream(options);
     for (int i = 0; i < 5; ++i) stream.Key(600 * i, {1.0 * i, 0.5 * i * i}, S);
     stream.Settle();
-    for (int i = 0; i < 5; ++i) stream.Record(i)->arcLength = i < 4 ? 3.0 + i : 0.0;      // 3 4 5 6
+    for (int i = 0; i < 5; ++i) stream.Record(i)->arcLength = i < 4 ? 3.0 + i : 0.0;  // 3 4 5 6
     stream.Flag(1, KFS_KeyFlag_Float).Flag(3, KFS_KeyFlag_Float);
-    struct Anchor { int index; double speed; };
+    struct Anchor {
+        int index;
+        double speed;
+    };
     for (Anchor const& anchor : {Anchor{0, 7.0 / 2.0}, Anchor{2, 18.0 / 4.0}, Anchor{4, 11.0 / 2.0}}) {
         KFS_KeyScalar* const key = stream.Record(anchor.index);
         ASSERT_EQ(0, KFSp_SetDefaultKeyframeTangents(stream, key->time, KFSp_Tangents_Temporal, key));
@@ -206,7 +213,8 @@ Path const Paths[] = {
 TEST_F(AutoTangentsTest, AStraightPathStaysStraight)
 {
     for (Path const& c : Paths) {
-        for (char const mode : {KFSp_Tangents_Spatial, static_cast<char>(KFSp_Tangents_Temporal | KFSp_Tangents_Spatial)}) {
+        for (char const mode :
+             {KFSp_Tangents_Spatial, static_cast<char>(KFSp_Tangents_Temporal | KFSp_Tangents_Spatial)}) {
             SCOPED_TRACE(testing::Message() << c.why << ", mode " << static_cast<int>(mode));
             KeyedStream stream = MakeThree(true);
             std::copy_n(c.prevIn.data(), 2, KFSp_GetSpatialRuns(stream.Record(0), 2).inTangent);
@@ -225,7 +233,8 @@ TEST_F(AutoTangentsTest, AStraightPathStaysStraight)
             }
             EXPECT_TRUE(key->spFlags & KFS_KeySpFlag_Continuous);
             EXPECT_EQ(KFS_KeyFlag_TangentsSet, key->flags & KFS_KeyFlag_TangentsSet);
-            EXPECT_EQ((mode & KFSp_Tangents_Temporal) ? 25.0 / 3.0 : -7.0, stream.GetHandle(1).inSpeed) << "only what the mode asks for";
+            EXPECT_EQ((mode & KFSp_Tangents_Temporal) ? 25.0 / 3.0 : -7.0, stream.GetHandle(1).inSpeed)
+                << "only what the mode asks for";
         }
     }
 }
@@ -242,7 +251,7 @@ TEST_F(AutoTangentsTest, ThePathBendsAtFloatKeysToo)
     stream.Record(1)->spFlags = KFS_KeySpFlag_Modifiable;
     KFS_KeyScalar* const key = stream.Record(1);
     ASSERT_EQ(0, KFSp_SetDefaultKeyframeTangents(stream, 600, KFSp_Tangents_Spatial, key));
-    EXPECT_DOUBLE_EQ(12.0 * C, KFSp_GetSpatialRuns(key, 2).outTangent[0]);      // from key 0 to key 2, not to the anchor
+    EXPECT_DOUBLE_EQ(12.0 * C, KFSp_GetSpatialRuns(key, 2).outTangent[0]);  // from key 0 to key 2, not to the anchor
     EXPECT_DOUBLE_EQ(24.0 * C, KFSp_GetSpatialRuns(key, 2).outTangent[1]);
 }
 
@@ -268,7 +277,7 @@ TEST_F(AutoTangentsTest, LeavesCustomValuesAlone)
 {
     KeyedStream stream = MakeThree(false);
     std::vector<unsigned char> const before = stream.Bytes();
-    stream.get()->MarkTemporarilyNonCustom(true);       // the records count as the client's meanwhile
+    stream.get()->MarkTemporarilyNonCustom(true);  // the records count as the client's meanwhile
     EXPECT_EQ(0, KFSp_SetDefaultKeyframeTangents(stream, 600, 3, stream.Record(1)));
     stream.get()->MarkTemporarilyNonCustom(false);
     stream.get()->GetValueDescForModify()->isCustom = 1;
@@ -277,4 +286,4 @@ TEST_F(AutoTangentsTest, LeavesCustomValuesAlone)
     EXPECT_EQ(before, stream.Bytes());
 }
 
-} // namespace
+}  // namespace

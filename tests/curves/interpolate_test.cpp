@@ -106,7 +106,8 @@ TEST_F(InterpolateTest, ValuesAndSpeedsAreThoseOfTheTrueCurve)
                 bool const straight = a->outInterp == KFS_Interp_Linear && b->inInterp == KFS_Interp_Linear;
                 for (int part = 1; part < 8; ++part) {
                     int const time = a->time + (b->time - a->time) * part / 8;
-                    SCOPED_TRACE(testing::Message() << "dimension " << dimension << ", segment " << k << ", part " << part);
+                    SCOPED_TRACE(testing::Message()
+                                 << "dimension " << dimension << ", segment " << k << ", part " << part);
                     std::vector<double> const values = Evaluate(KFSp_Interpolate, stream, time, k);
                     std::vector<double> const speeds = Evaluate(KFSp_InterpDeriv, stream, time, k);
                     for (int i = 0; i < dimension; ++i) {
@@ -114,17 +115,21 @@ TEST_F(InterpolateTest, ValuesAndSpeedsAreThoseOfTheTrueCurve)
                         long double const seconds = (static_cast<long double>(time) - a->time) / scale;
                         auto const index = static_cast<std::size_t>(i);
                         if (straight) {
-                            double const f = static_cast<double>(time - a->time) / static_cast<double>(b->time - a->time);
+                            double const f =
+                                static_cast<double>(time - a->time) / static_cast<double>(b->time - a->time);
                             double const va = KFSp_Numbers(a)[i];
                             EXPECT_EQ(va + (KFSp_Numbers(b)[i] - va) * f, values[index]);
                             EXPECT_EQ(Untouched, speeds[index]) << "a straight segment's speed isn't computed here";
                             continue;
                         }
-                        double const size = 1.0 + std::fabs(static_cast<double>(truth.y[1])) + std::fabs(static_cast<double>(truth.y[2]));
+                        double const size = 1.0 + std::fabs(static_cast<double>(truth.y[1])) +
+                                            std::fabs(static_cast<double>(truth.y[2]));
                         double const slope = static_cast<double>(truth.SlopeAt(seconds));
-                        // The solver may be off by 1e-13 of the segment in x, which counts as much in y as the curve is steep.
+                        // The solver may be off by 1e-13 of the segment in x, which counts as much in y as the curve is
+                        // steep.
                         double const steepness = 1.0 + std::fabs(slope * static_cast<double>(truth.x[3]));
-                        EXPECT_NEAR(static_cast<double>(truth.ValueAt(seconds)), values[index], 1e-11 * (size + steepness));
+                        EXPECT_NEAR(static_cast<double>(truth.ValueAt(seconds)), values[index],
+                                    1e-11 * (size + steepness));
                         EXPECT_NEAR(slope, speeds[index], 1e-7 * (1.0 + std::fabs(slope)) * steepness);
                     }
                 }
@@ -145,18 +150,21 @@ TEST_F(InterpolateTest, AWrongHintChangesNothing)
             if (spatialFlags) stream.Flag(n % 12, KFS_KeyFlag_Float);
             for (Interpolator const interpolator : {&KFSp_Interpolate, &KFSp_InterpDeriv}) {
                 std::vector<double> const expected = Evaluate(interpolator, stream, time, KFS_INVALID_INDEX);
-                for (int hint = -2; hint < 14; ++hint) EXPECT_EQ(expected, Evaluate(interpolator, stream, time, hint)) << time << " " << hint;
+                for (int hint = -2; hint < 14; ++hint)
+                    EXPECT_EQ(expected, Evaluate(interpolator, stream, time, hint)) << time << " " << hint;
                 EXPECT_EQ(expected, Evaluate(interpolator, stream, time, std::numeric_limits<int>::max()));
             }
         }
     }
 }
 
-// A time that stands on a key isn't bracketed by the hint: the answer is that of the search, from the key before to the key after.
+// A time that stands on a key isn't bracketed by the hint: the answer is that of the search, from the key before to the
+// key after.
 TEST_F(InterpolateTest, TheHintBracketsStrictly)
 {
     KeyedStream const stream = MakeKeyed({{0, 0.0}, {100, 7.0}, {400, 40.0}}, KFS_Interp_Linear);
-    for (int const hint : {-1, 0, 1}) EXPECT_EQ(std::vector<double>{10.0}, Evaluate(KFSp_Interpolate, stream, 100, hint)) << hint;
+    for (int const hint : {-1, 0, 1})
+        EXPECT_EQ(std::vector<double>{10.0}, Evaluate(KFSp_Interpolate, stream, 100, hint)) << hint;
 }
 
 TEST_F(InterpolateTest, OtherPairsOfCodesWriteNothing)
@@ -164,11 +172,13 @@ TEST_F(InterpolateTest, OtherPairsOfCodesWriteNothing)
     KeyedStream stream = MakeKeyed({{0, 1.0}, {600, 2.0}}, KFS_Interp_Spline);
     for (int out = -1; out <= 4; ++out) {
         for (int in = -1; in <= 4; ++in) {
-            bool const shaped = (out == KFS_Interp_Linear || out == KFS_Interp_Spline) && (in == KFS_Interp_Linear || in == KFS_Interp_Spline);
+            bool const shaped = (out == KFS_Interp_Linear || out == KFS_Interp_Spline) &&
+                                (in == KFS_Interp_Linear || in == KFS_Interp_Spline);
             bool const straight = out == KFS_Interp_Linear && in == KFS_Interp_Linear;
             stream.Codes(0, KFS_Interp_Linear, out).Codes(1, in, KFS_Interp_Linear);
             EXPECT_EQ(shaped, Evaluate(KFSp_Interpolate, stream, 300, 0)[0] != Untouched) << out << " to " << in;
-            EXPECT_EQ(shaped && !straight, Evaluate(KFSp_InterpDeriv, stream, 300, 0)[0] != Untouched) << out << " to " << in;
+            EXPECT_EQ(shaped && !straight, Evaluate(KFSp_InterpDeriv, stream, 300, 0)[0] != Untouched)
+                << out << " to " << in;
         }
     }
 }
@@ -190,12 +200,12 @@ TEST_F(InterpolateTest, EachComponentHasItsOwnEase)
     KeyedStream stream(options);
     stream.Key(0, {0.0, 0.0}, KFS_Interp_Spline).Key(600, {1.0, 1.0}, KFS_Interp_Spline);
     stream.Settle();
-    stream.SetHandle(0, {0, 0, 0, 0.9}, 0).SetHandle(1, {0, 0.1, 0, 0}, 0);     // starts slowly
-    stream.SetHandle(0, {0, 0, 0, 0.1}, 1).SetHandle(1, {0, 0.9, 0, 0}, 1);     // ends slowly
+    stream.SetHandle(0, {0, 0, 0, 0.9}, 0).SetHandle(1, {0, 0.1, 0, 0}, 0);  // starts slowly
+    stream.SetHandle(0, {0, 0, 0, 0.1}, 1).SetHandle(1, {0, 0.9, 0, 0}, 1);  // ends slowly
     std::vector<double> const middle = Evaluate(KFSp_Interpolate, stream, 300, 0);
     EXPECT_LT(middle[0], 0.3);
     EXPECT_GT(middle[1], 0.7);
-    EXPECT_NEAR(1.0, middle[0] + middle[1], 1e-12);     // each is the other, turned round
+    EXPECT_NEAR(1.0, middle[0] + middle[1], 1e-12);  // each is the other, turned round
 }
 
 TEST_F(InterpolateTest, NonDecreasingStreamsNeverFall)
@@ -206,7 +216,8 @@ TEST_F(InterpolateTest, NonDecreasingStreamsNeverFall)
     int overshooting = 0;
     for (int n = 0; n < 60; ++n) {
         KeyedStream stream = MakeKeyed({{0, 0.0}, {600, 3.0}}, KFS_Interp_Spline);
-        stream.SetHandle(0, {0, 0, speed(random), influence(random)}).SetHandle(1, {speed(random), influence(random), 0, 0});
+        stream.SetHandle(0, {0, 0, speed(random), influence(random)})
+            .SetHandle(1, {speed(random), influence(random), 0, 0});
         double previous = 0.0;
         for (int time = 5; time < 600; time += 5) {
             stream.StreamFlag(KFS_StreamFlag_NonDecreasing, false);
@@ -220,7 +231,7 @@ TEST_F(InterpolateTest, NonDecreasingStreamsNeverFall)
             previous = value;
         }
     }
-    EXPECT_GT(overshooting, 100);   // there was something to treat
+    EXPECT_GT(overshooting, 100);  // there was something to treat
 }
 
 // Straight segments of such a stream may fall: no curve is involved.
@@ -244,7 +255,8 @@ TEST_F(InterpolateTest, TheFirstFailingComponentEndsIt)
         PresetCache(stream);
         EXPECT_EQ(CRV_Err_NotFinite, interpolator(stream, 0, 300, 0));
         EXPECT_NE(Untouched, Cached(stream)[0]);
-        EXPECT_EQ((std::vector<double>{Untouched, Untouched}), (std::vector<double>{Cached(stream)[1], Cached(stream)[2]}));
+        EXPECT_EQ((std::vector<double>{Untouched, Untouched}),
+                  (std::vector<double>{Cached(stream)[1], Cached(stream)[2]}));
     }
 }
 
@@ -267,4 +279,4 @@ TEST_F(InterpolateTest, WithoutComponentsThereIsNothingToDo)
     EXPECT_EQ(0, KFSp_InterpDeriv(stream, 0, 300, 0));
 }
 
-} // namespace
+}  // namespace

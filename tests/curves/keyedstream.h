@@ -18,7 +18,8 @@ struct Handle {
     double outInfluence = 0.0;
 };
 
-// A stream whose derived data is settled, so that a test can write records as it needs them and nothing recomputes them.
+// A stream whose derived data is settled, so that a test can write records as it needs them and nothing recomputes
+// them.
 class KeyedStream : public TestStream {
 public:
     using TestStream::TestStream;
@@ -79,7 +80,8 @@ public:
         KFS_KeyScalar const* const key = Record(index);
         if (get()->IsSpatial()) return {key->inSpeed, key->inInfluence, key->outSpeed, key->outInfluence};
         KFSp_TemporalRuns<double const> const runs = KFSp_GetTemporalRuns(key, get()->GetDimension());
-        return {runs.inSpeed[component], runs.inInfluence[component], runs.outSpeed[component], runs.outInfluence[component]};
+        return {runs.inSpeed[component], runs.inInfluence[component], runs.outSpeed[component],
+                runs.outInfluence[component]};
     }
 
     int Index(KFS_KeyScalar const* key) const
@@ -87,12 +89,13 @@ public:
         for (int i = 0; i < Count(); ++i) {
             if (Record(i) == key) return i;
         }
-        return key ? -2 : -1;   // -1: no key
+        return key ? -2 : -1;  // -1: no key
     }
 };
 
 // A one-dimensional stream with keys (time, value), all sides of one code, settled.
-inline KeyedStream MakeKeyed(std::vector<std::pair<int, double>> const& keys, char interp, StreamOptions const& options = {})
+inline KeyedStream MakeKeyed(std::vector<std::pair<int, double>> const& keys, char interp,
+                             StreamOptions const& options = {})
 {
     KeyedStream stream(options);
     for (auto const& [time, value] : keys) {

@@ -45,13 +45,15 @@ Found FromTime(KeyedStream const& stream, int time, bool allKeys)
     KFS_KeyScalar* at = nullptr;
     KFS_KeyScalar* prev = nullptr;
     KFS_KeyScalar* next = nullptr;
-    EXPECT_EQ(0, KFSp_GetNeighborsFromTime(stream, time, allKeys, &at, &prev, &next, &found.prev, &found.next, &found.at));
+    EXPECT_EQ(0,
+              KFSp_GetNeighborsFromTime(stream, time, allKeys, &at, &prev, &next, &found.prev, &found.next, &found.at));
     // An index is written exactly where a key was found, and names that key.
     EXPECT_EQ(stream.Index(at), found.at == Unwritten ? -1 : found.at);
     EXPECT_EQ(stream.Index(prev), found.prev == Unwritten ? -1 : found.prev);
     EXPECT_EQ(stream.Index(next), found.next == Unwritten ? -1 : found.next);
     KFS_KeyScalar* again[3] = {};
-    EXPECT_EQ(0, KFSp_GetNeighborsFromTime(stream, time, allKeys, &again[0], &again[1], &again[2], nullptr, nullptr, nullptr));
+    EXPECT_EQ(0, KFSp_GetNeighborsFromTime(stream, time, allKeys, &again[0], &again[1], &again[2], nullptr, nullptr,
+                                           nullptr));
     EXPECT_TRUE(again[0] == at && again[1] == prev && again[2] == next);
     return found;
 }
@@ -113,8 +115,8 @@ TEST_F(NeighboursTest, FloatKeysAreNoAnchorsOfAnArcLengthPath)
     }
 }
 
-// Every row of up to five keys, every time on and around them: without arc-length parametrisation, without space, or with all keys asked
-// for, float keys are keys like any other.
+// Every row of up to five keys, every time on and around them: without arc-length parametrisation, without space, or
+// with all keys asked for, float keys are keys like any other.
 TEST_F(NeighboursTest, EverywhereElseAllKeysCount)
 {
     for (int count = 1; count <= 5; ++count) {
@@ -127,7 +129,7 @@ TEST_F(NeighboursTest, EverywhereElseAllKeysCount)
             KeyedStream const arcs = MakeRow(row, true, true);
             for (int time = 5; time <= 10 * count + 5; time += 5) {
                 SCOPED_TRACE(testing::Message() << row << " at " << time);
-                int const below = (time + 9) / 10 - 1;     // keys before the time
+                int const below = (time + 9) / 10 - 1;  // keys before the time
                 bool const onKey = time % 10 == 0;
                 int const after = onKey ? below + 1 : below;
                 Found const expected{onKey ? below : U, below > 0 ? below - 1 : U, after < count ? after : U};
@@ -173,7 +175,8 @@ TEST_F(NeighboursTest, AnIndexFarOutsideIsTheListsError)
         for (int const index : {99, std::numeric_limits<int>::max(), -7, KFS_INVALID_INDEX + 1}) {
             KFS_KeyScalar* prev = nullptr;
             KFS_KeyScalar* next = nullptr;
-            EXPECT_EQ(SEQ_Err_BadIndex, KFSp_GetNeighborsFromIndex(stream, index, 0, &prev, &next, nullptr, nullptr)) << index;
+            EXPECT_EQ(SEQ_Err_BadIndex, KFSp_GetNeighborsFromIndex(stream, index, 0, &prev, &next, nullptr, nullptr))
+                << index;
         }
     }
 }
@@ -181,8 +184,10 @@ TEST_F(NeighboursTest, AnIndexFarOutsideIsTheListsError)
 // ---- curves
 
 struct Points {
-    std::array<double, 8> xy;   // p0, p1, p2, p3
-    explicit Points(KFSp_SegmentCurve const& s) : xy{s.p0[0], s.p0[1], s.p1[0], s.p1[1], s.p2[0], s.p2[1], s.p3[0], s.p3[1]} {}
+    std::array<double, 8> xy;  // p0, p1, p2, p3
+    explicit Points(KFSp_SegmentCurve const& s)
+        : xy{s.p0[0], s.p0[1], s.p1[0], s.p1[1], s.p2[0], s.p2[1], s.p3[0], s.p3[1]}
+    {}
 };
 
 struct PairOfCodes {
@@ -191,8 +196,8 @@ struct PairOfCodes {
     std::array<double, 8> xy;
 };
 
-// Two seconds from value 10 to value 20, beginning at second 3; out handle 3 a second and a quarter long, in handle -1 a second and half.
-// A chord handle is 0.16666666667 of (2, 10).
+// Two seconds from value 10 to value 20, beginning at second 3; out handle 3 a second and a quarter long, in handle -1
+// a second and half. A chord handle is 0.16666666667 of (2, 10).
 PairOfCodes const Codes[] = {
     {KFS_Interp_Linear, KFS_Interp_Linear, {0, 10, 0.33333333334, 11.6666666667, 1.66666666666, 18.3333333333, 2, 20}},
     {KFS_Interp_Linear, KFS_Interp_Spline, {0, 10, 0.33333333334, 11.6666666667, 1, 21, 2, 20}},
@@ -213,11 +218,17 @@ TEST_F(NeighboursTest, FillsTheSegmentOfEveryPairOfCodes)
     for (PairOfCodes const& pair : Codes) {
         SCOPED_TRACE(testing::Message() << pair.out << " to " << pair.in);
         KeyedStream const stream = MakeSegment(pair.out, pair.in);
-        struct Way { int keyIndex; int time; bool relative; };
-        for (Way const way : {Way{0, 0, true}, Way{KFS_INVALID_INDEX, 2400, true}, Way{0, 0, false}, Way{KFS_INVALID_INDEX, 1801, false}}) {
+        struct Way {
+            int keyIndex;
+            int time;
+            bool relative;
+        };
+        for (Way const way : {Way{0, 0, true}, Way{KFS_INVALID_INDEX, 2400, true}, Way{0, 0, false},
+                              Way{KFS_INVALID_INDEX, 1801, false}}) {
             KFSp_SegmentCurve segment(2);
             unsigned char isHold = 9;
-            ASSERT_EQ(0, KFSp_ConstructCurve(stream, way.keyIndex, way.time, 0, way.relative, 0, &isHold, &segment.curve));
+            ASSERT_EQ(0,
+                      KFSp_ConstructCurve(stream, way.keyIndex, way.time, 0, way.relative, 0, &isHold, &segment.curve));
             EXPECT_EQ(0, isHold);
             Points const points(segment);
             for (std::size_t i = 0; i < 8; ++i) {
@@ -238,7 +249,8 @@ TEST_F(NeighboursTest, AHoldOnEitherSideBuildsNothing)
         unsigned char isHold = 0;
         EXPECT_EQ(0, KFSp_ConstructCurve(stream, 0, 0, 0, 0, 0, &isHold, &segment.curve));
         EXPECT_EQ(1, isHold);
-        for (double const coordinate : {segment.p0[0], segment.p1[1], segment.p2[0], segment.p3[1]}) EXPECT_EQ(-55.0, coordinate);
+        for (double const coordinate : {segment.p0[0], segment.p1[1], segment.p2[0], segment.p3[1]})
+            EXPECT_EQ(-55.0, coordinate);
     }
 }
 
@@ -246,12 +258,21 @@ TEST_F(NeighboursTest, TimesOutsideTheKeysAreReported)
 {
     KeyedStream const stream = MakeKeyed({{10, 1}, {20, 2}}, KFS_Interp_Linear);
     KeyedStream const lone = MakeKeyed({{10, 1}}, KFS_Interp_Linear);
-    struct Outside { KFS_Stream const* stream; int keyIndex; int time; };
-    for (Outside const& ask : {Outside{stream, KFS_INVALID_INDEX, 5}, {stream, KFS_INVALID_INDEX, 25}, {stream, 1, 0},
-                               {stream, KFS_INVALID_INDEX, 20}, {lone, 0, 0}, {lone, KFS_INVALID_INDEX, 10}}) {
+    struct Outside {
+        KFS_Stream const* stream;
+        int keyIndex;
+        int time;
+    };
+    for (Outside const& ask : {Outside{stream, KFS_INVALID_INDEX, 5},
+                               {stream, KFS_INVALID_INDEX, 25},
+                               {stream, 1, 0},
+                               {stream, KFS_INVALID_INDEX, 20},
+                               {lone, 0, 0},
+                               {lone, KFS_INVALID_INDEX, 10}}) {
         KFSp_SegmentCurve segment(2);
         unsigned char isHold = 1;
-        EXPECT_EQ(KFS_Err_TimeOutsideKeys, KFSp_ConstructCurve(ask.stream, ask.keyIndex, ask.time, 0, 0, 0, &isHold, &segment.curve));
+        EXPECT_EQ(KFS_Err_TimeOutsideKeys,
+                  KFSp_ConstructCurve(ask.stream, ask.keyIndex, ask.time, 0, 0, 0, &isHold, &segment.curve));
         EXPECT_REPORT(reports, 100, "time is before first keyframe or after last");
         EXPECT_EQ(0, isHold);
     }
@@ -265,14 +286,15 @@ TEST_F(NeighboursTest, TimesOutsideTheKeysAreReported)
     EXPECT_EQ(0, stream.Pins());
 }
 
-// A curve from 20 down to 10 and one that overshoots: only segments with a spline side are treated, and only on such streams.
+// A curve from 20 down to 10 and one that overshoots: only segments with a spline side are treated, and only on such
+// streams.
 TEST_F(NeighboursTest, OnlySplineSidesAreMadeNonDecreasing)
 {
     for (PairOfCodes const& pair : Codes) {
         for (bool const nonDecreasing : {false, true}) {
             SCOPED_TRACE(testing::Message() << pair.out << " to " << pair.in << ", " << nonDecreasing);
             KeyedStream stream = MakeSegment(pair.out, pair.in);
-            stream.SetHandle(0, {0, 0, -6, 0.5}).SetHandle(1, {-6, 0.5, 0, 0});      // leaves and arrives falling
+            stream.SetHandle(0, {0, 0, -6, 0.5}).SetHandle(1, {-6, 0.5, 0, 0});  // leaves and arrives falling
             KFSp_SegmentCurve before(2);
             unsigned char isHold = 0;
             ASSERT_EQ(0, KFSp_ConstructCurve(stream, 0, 0, 0, 1, 0, &isHold, &before.curve));
@@ -321,7 +343,8 @@ TEST_F(NeighboursTest, APathRunsThroughFloatKeysAndTheSpeedGraphDoesNot)
     }
 }
 
-// Only x counts where a caller asks for the component before the first; nothing outside the record is read for a component past the last.
+// Only x counts where a caller asks for the component before the first; nothing outside the record is read for a
+// component past the last.
 TEST_F(NeighboursTest, ComponentsOutsideTheValueLeaveTheTimesRight)
 {
     KeyedStream const stream = MakeSegment(KFS_Interp_Spline, KFS_Interp_Linear);
@@ -334,4 +357,4 @@ TEST_F(NeighboursTest, ComponentsOutsideTheValueLeaveTheTimesRight)
     }
 }
 
-} // namespace
+}  // namespace

@@ -15,7 +15,9 @@ constexpr StreamOptions Spatial2D{.dimension = 2, .spatial = true};
 
 void FillCurvedPath(TestStream& stream)
 {
-    stream.Key(0, {0.0, 0.0}, KFS_Interp_Linear).Key(100, {10.0, 40.0}, KFS_Interp_Linear).Key(200, {50.0, 0.0}, KFS_Interp_Linear);
+    stream.Key(0, {0.0, 0.0}, KFS_Interp_Linear)
+        .Key(100, {10.0, 40.0}, KFS_Interp_Linear)
+        .Key(200, {50.0, 0.0}, KFS_Interp_Linear);
 }
 
 std::vector<double> Samples(TestStream const& stream)
@@ -82,7 +84,8 @@ TEST_F(Attributes, MergingLeavesBothStreamsAlone)
 TEST_F(Attributes, ASpatialSettingIsPermittedByTheTemporalMask)
 {
     for (unsigned mask = 0; mask < 16; ++mask) {
-        const TestStream stream({.dimension = 2, .spatial = true, .interpMask = static_cast<unsigned short>(mask), .spInterpMask = 0});
+        const TestStream stream(
+            {.dimension = 2, .spatial = true, .interpMask = static_cast<unsigned short>(mask), .spInterpMask = 0});
         for (unsigned code = 0; code < 20; ++code) {
             SCOPED_TRACE(testing::Message() << "mask " << mask << " code " << code);
             ASSERT_EQ(0, KFS_SetStreamSpIMask(stream, code % 2 ? 0 : 0xFFFF)) << "which has no say";
@@ -93,7 +96,8 @@ TEST_F(Attributes, ASpatialSettingIsPermittedByTheTemporalMask)
             EXPECT_EQ(permitted ? setting : before, stream->GetSpInterp());
             if (!permitted) {
                 EXPECT_REPORT(reports, 15,
-                              "spatial interpolation method not allowed for this stream (" + std::to_string(code) + ").");
+                              "spatial interpolation method not allowed for this stream (" + std::to_string(code) +
+                                  ").");
             }
         }
         EXPECT_EQ(7431, KFSp_CanDoSpInterp(stream, 0xFFFF));
@@ -123,7 +127,8 @@ TEST_F(Attributes, DimensionsShareTheFourComponentsOfTheMultiplier)
     const double first[6] = {2.0, 3.0, 4.0, 5.0, 6.0, 7.0};
     double old[7] = {77.0, 77.0, 77.0, 77.0, 77.0, 77.0, 77.0};
     ASSERT_EQ(0, KFS_SetStreamMultiplier(six, first, old));
-    EXPECT_EQ((std::vector{1.0, 1.0, 1.0, 1.0, 2.0, 3.0, 77.0}), std::vector(old, old + 7)) << "old and new go component by component";
+    EXPECT_EQ((std::vector{1.0, 1.0, 1.0, 1.0, 2.0, 3.0, 77.0}), std::vector(old, old + 7))
+        << "old and new go component by component";
     double now[6];
     ASSERT_EQ(0, KFS_GetStreamMultiplier(six, now));
     EXPECT_EQ((std::vector{6.0, 7.0, 4.0, 5.0, 6.0, 7.0}), std::vector(now, now + 6));
@@ -161,7 +166,8 @@ TEST_F(Attributes, AReadAfterAChangeIsThatOfAStreamThatAlwaysWasSo)
     const Row rows[] = {
         {"multiplier", [&](KFS_Stream* stream) { return KFS_SetStreamMultiplier(stream, multiplier, nullptr); }},
         {"arc length off", [](KFS_Stream* stream) { return KFS_SetStreamSParametrize(stream, 0); }},
-        {"another scale", [](KFS_Stream* stream) {
+        {"another scale",
+         [](KFS_Stream* stream) {
              const int code = KFS_RescaleStream(stream, 1200);
              return code ? code : KFS_RescaleStream(stream, 600);
          }},
@@ -175,7 +181,7 @@ TEST_F(Attributes, AReadAfterAChangeIsThatOfAStreamThatAlwaysWasSo)
         FillCurvedPath(fresh);
         const std::vector<double> truth = Samples(fresh);
         static_cast<void>(Samples(changed));
-        for (int time = 5; time <= 195; time += 95) {       // reads that leave a computed value behind
+        for (int time = 5; time <= 195; time += 95) {  // reads that leave a computed value behind
             const std::vector<double> before = changed.At(time);
             ASSERT_EQ(0, row.change(changed));
             EXPECT_EQ(fresh.At(time), changed.At(time)) << time;
@@ -186,9 +192,9 @@ TEST_F(Attributes, AReadAfterAChangeIsThatOfAStreamThatAlwaysWasSo)
 
 TEST_F(Attributes, AChangedParametrizationMarksAllKeysAndAlwaysNotifies)
 {
+    HeardRoot root;
     TestStream stream(Spatial2D);
     FillCurvedPath(stream);
-    HeardRoot root;
     root.Store(stream);
     ValueListener listener;
     ASSERT_EQ(0, stream->UpdateStream());
@@ -232,9 +238,9 @@ TEST_F(Attributes, ALongStreamIsMarkedFromEndToEnd)
 
 TEST_F(Attributes, AListenersExceptionBecomesTheResult)
 {
+    HeardRoot root;
     TestStream stream(Spatial2D);
     FillCurvedPath(stream);
-    HeardRoot root;
     root.Store(stream);
     const double multiplier[2] = {2.0, 3.0};
     {
@@ -294,4 +300,4 @@ TEST_F(Attributes, TheKeyListFollowsTheClientsFunctions)
     EXPECT_EQ(1, disposals);
 }
 
-} // namespace
+}  // namespace

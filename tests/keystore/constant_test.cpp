@@ -59,6 +59,28 @@ TEST_F(Constants, KeysGoAndTheLastReadValueStays)
     }
 }
 
+// A value that was read at a key comes with that key's tangents in space, which mean nothing among other neighbours.
+TEST_F(Constants, AKeptValueGetsTangentsForItsNewNeighbours)
+{
+    TestStream stream({.dimension = 2, .spatial = true});
+    stream.Key(0, {0.0, 0.0}, KFS_Interp_Spline).Key(100, {10.0, 20.0}, KFS_Interp_Spline);
+    stream.Key(200, {0.0, 40.0}, KFS_Interp_Spline);
+    ASSERT_EQ(0, stream->UpdateStream());
+    KFSp_Numbers(stream.Record(1))[4] = 7.0;  // out of the key along x
+    ASSERT_EQ((std::vector{10.0, 20.0}), stream.At(100));
+    ASSERT_NE(0, stream->GetCache()->flags & KFS_KeyFlag_TangentsSet);
+    ASSERT_EQ(0, stream->SetConstant(1, 0));
+    ASSERT_EQ(0, stream->SetConstant(0, 1));
+    TestStream fresh({.dimension = 2, .spatial = true});
+    fresh.Key(100, {10.0, 20.0}, KFS_Interp_Spline);
+    for (TestStream* const either : {&stream, &fresh}) {
+        either->Key(0, {90.0, 0.0}, KFS_Interp_Spline).Key(300, {-90.0, -5.0}, KFS_Interp_Spline);
+    }
+    ASSERT_EQ(0, stream->UpdateStream());
+    ASSERT_EQ(0, fresh->UpdateStream());
+    EXPECT_EQ(fresh.Numbers(1), stream.Numbers(1));
+}
+
 TEST_F(Constants, WithoutAReadThereIsNoValueLeft)
 {
     TestStream stream;
@@ -71,9 +93,9 @@ TEST_F(Constants, WithoutAReadThereIsNoValueLeft)
 
 TEST_F(Constants, OnlyAChangeIsHeard)
 {
+    HeardRoot root;
     TestStream stream;
     stream.Key(0, {1.0});
-    HeardRoot root;
     root.Store(stream);
     ValueListener listener;
     EXPECT_EQ(0, stream->SetConstant(1, 0));
@@ -87,13 +109,15 @@ TEST_F(Constants, OnlyAChangeIsHeard)
 
 TEST_F(Constants, AFailureIsTheResultAndIsHeardAllTheSame)
 {
+    HeardRoot root;
     KFS_ValueDesc desc{1, 8, 42, [](KFS_Stream const*, long, int, int) { return 0; }};
     KFS_Stream stream(1, 600, 0, 0, KFS_InterpMask_Hold, 0, desc, nullptr, nullptr, false);
     const long value = 5;
     ASSERT_EQ(0, KFS_InsertKey(&stream, nullptr, 0, &value, KFS_Interp_Hold, KFS_Interp_Hold));
     stream.SetDisposeItemFunc([](KFS_Stream const*, long, short, void*) { return 4711; });
-    ASSERT_EQ(0, SEQ_SetFuncs(stream.GetKeys(), 3, std::array{SEQ_Funcs{nullptr, [](void*, SEQ_Head**, void*) { return 4711; }, nullptr}}.data()));
-    HeardRoot root;
+    ASSERT_EQ(
+        0, SEQ_SetFuncs(stream.GetKeys(), 3,
+                        std::array{SEQ_Funcs{nullptr, [](void*, SEQ_Head**, void*) { return 4711; }, nullptr}}.data()));
     root.Store(&stream);
     ValueListener listener;
     EXPECT_EQ(4711, stream.SetConstant(1, 0));
@@ -113,10 +137,11 @@ TEST_F(Constants, WhatShouldNotBeAnimatedIsReportedAndAnimated)
     TestStream canonical({.noKeys = true});
     canonical->SetCanonical(true);
     EXPECT_EQ(0, canonical->SetConstant(0, 0));
-    EXPECT_EQ(reports.Take(), (std::vector<Reported>{{0x1d000a, 8, "attempt to animate the canonical instance stream", 0}}));
+    EXPECT_EQ(reports.Take(),
+              (std::vector<Reported>{{0x1d000a, 8, "attempt to animate the canonical instance stream", 0}}));
     EXPECT_TRUE(canonical->HasKeys());
     EXPECT_EQ(0, canonical->SetConstant(1, 0));
     EXPECT_NO_REPORT(reports);
 }
 
-} // namespace
+}  // namespace

@@ -1,5 +1,6 @@
 #include "keystore/evaluate.h"
 
+#include "frame/errors.h"
 #include "keystore/attributes.h"
 #include "keystore/lookup.h"
 #include "overrides/parambag.h"
@@ -105,7 +106,7 @@ TEST_F(Evaluate, TheStagesGoInTheirOrder)
         {"no value here: the keys answer",
          [&] {
              engine->canRun = true;
-             engine->expression = [](KFS_Stream const*, int, double*) { return KFS_Err_ExprNoValue; };
+             engine->expression = [](KFS_Stream const*, int, double*) -> int { return KFS_Err_ExprNoValue; };
          },
          0, 0, 2.0, 1},
         {"any other error is the result", [&] { engine->expression = [](KFS_Stream const*, int, double*) { return 99; }; }, 0, 99, -1.0, 9},
@@ -360,9 +361,10 @@ TEST_F(Evaluate, ForcedValuesStandInTheCache)
     EXPECT_EQ(20, stream->GetCache()->time);
     EXPECT_EQ(before, Q_MemoryLive(nullptr));
     const TestStream empty;
+    const Q_MemoryCount withEmpty = Q_MemoryLive(nullptr);
     EXPECT_THROW(empty->ForceInterpolateAtTime({0, 600}), int);
-    reports.Take();
-    EXPECT_EQ(before, Q_MemoryLive(nullptr));
+    EXPECT_REPORT(reports, 36, "attempt to get a value from a time stream with no key values.");
+    EXPECT_EQ(withEmpty, Q_MemoryLive(nullptr));
 }
 
 TEST_F(Evaluate, AVectorGoesIntoAValueBuffer)

@@ -51,10 +51,26 @@ TEST_F(KeyWalk, WalksTheKeysOfARangeOfTimes)
         std::vector<int> times;
     };
     const Row rows[] = {
-        {Null, Null, {10, 20, 30}}, {Null, 20, {10, 20}},   {20, Null, {20, 30}},   {10, 30, {10, 20, 30}}, {30, 10, {30, 20, 10}},
-        {15, 25, {20}},             {25, 15, {20}},         {11, 19, {}},           {19, 11, {}},           {20, 20, {20}},
-        {5, 99, {10, 20, 30}},      {99, 5, {30, 20, 10}},  {31, 99, {}},           {99, 31, {}},           {-5, 9, {}},
-        {9, -5, {}},                {Null, 9, {}},          {31, Null, {}},         {30, 30, {30}},         {30, 15, {30, 20}},
+        {Null, Null, {10, 20, 30}},
+        {Null, 20, {10, 20}},
+        {20, Null, {20, 30}},
+        {10, 30, {10, 20, 30}},
+        {30, 10, {30, 20, 10}},
+        {15, 25, {20}},
+        {25, 15, {20}},
+        {11, 19, {}},
+        {19, 11, {}},
+        {20, 20, {20}},
+        {5, 99, {10, 20, 30}},
+        {99, 5, {30, 20, 10}},
+        {31, 99, {}},
+        {99, 31, {}},
+        {-5, 9, {}},
+        {9, -5, {}},
+        {Null, 9, {}},
+        {31, Null, {}},
+        {30, 30, {30}},
+        {30, 15, {30, 20}},
     };
     for (const Row& row : rows) {
         for (const unsigned finer : {1u, 5u}) {
@@ -63,8 +79,8 @@ TEST_F(KeyWalk, WalksTheKeysOfARangeOfTimes)
             const T_Time last{row.last, 600};
             Visitor visitor;
             T_Time lastTime{77, 77};
-            EXPECT_EQ(0, KFS_ForRange(stream, row.first == Null ? nullptr : &first, row.last == Null ? nullptr : &last, visitor.Word(),
-                                      Visitor::Visit, &lastTime));
+            EXPECT_EQ(0, KFS_ForRange(stream, row.first == Null ? nullptr : &first, row.last == Null ? nullptr : &last,
+                                      visitor.Word(), Visitor::Visit, &lastTime));
             EXPECT_EQ(row.times, visitor.times);
             EXPECT_EQ(row.times.empty() ? None : row.times.back(), lastTime.value);
             EXPECT_EQ(600u, lastTime.scale);
@@ -113,11 +129,8 @@ TEST_F(KeyWalk, WalksTheKeysOfARangeOfIndices)
         int lastIndex;
     };
     const Row rows[] = {
-        {0, 2, 0, {10, 20, 30}, 2},
-        {2, 0, 0, {30, 20, 10}, 0},
-        {1, 1, 0, {20}, 1},
-        {0, 3, SEQ_Err_BadIndex, {}, None},
-        {-1, 1, SEQ_Err_BadIndex, {}, None},
+        {0, 2, 0, {10, 20, 30}, 2},         {2, 0, 0, {30, 20, 10}, 0},          {1, 1, 0, {20}, 1},
+        {0, 3, SEQ_Err_BadIndex, {}, None}, {-1, 1, SEQ_Err_BadIndex, {}, None},
     };
     for (const Row& row : rows) {
         SCOPED_TRACE(testing::Message() << row.first << " to " << row.last);
@@ -202,4 +215,4 @@ TEST_F(KeyWalk, TheStreamIsUpToDateWhenTheWalkBegins)
     EXPECT_EQ(TestStream::NotStale, stream.Stale());
 }
 
-} // namespace
+}  // namespace

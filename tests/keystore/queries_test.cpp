@@ -92,14 +92,16 @@ TEST_F(Queries, SameHoldSameValue)
         int a, b;
         bool same;
     };
-    const Row rows[] = {{10, 19, true}, {19, 20, false}, {5, 10, true}, {-99, 5, true}, {30, 999, true}, {5, 25, false}, {20, 20, true}};
+    const Row rows[] = {{10, 19, true},  {19, 20, false}, {5, 10, true}, {-99, 5, true},
+                        {30, 999, true}, {5, 25, false},  {20, 20, true}};
     TestStream curve;
     curve.Key(10, {1.0}).Key(20, {1.0});
     for (const Row& row : rows) {
         SCOPED_TRACE(testing::Message() << row.a << " and " << row.b);
         const T_Time finer{row.b * 3, 1800};
         EXPECT_EQ(row.same, hold->SameValueAtTimes(hold.Time(row.a), finer, nullptr));
-        EXPECT_EQ(row.a == row.b, curve->SameValueAtTimes(curve.Time(row.a), finer, nullptr)) << "a curve isn't looked at";
+        EXPECT_EQ(row.a == row.b, curve->SameValueAtTimes(curve.Time(row.a), finer, nullptr))
+            << "a curve isn't looked at";
     }
     hold->GetExprInfoForModify().SetExpression(Text("time"));
     EXPECT_FALSE(hold->SameValueAtTimes(hold.Time(10), hold.Time(19), nullptr)) << "an expression may answer anything";
@@ -108,7 +110,8 @@ TEST_F(Queries, SameHoldSameValue)
     constant.Key(0, {1.0});
     EXPECT_TRUE(constant->SameValueAtTimes(constant.Time(-5), constant.Time(5), nullptr));
     const TestStream empty({.interpMask = KFS_InterpMask_Hold});
-    EXPECT_EQ(7427, KFSp_Boundary([&] { static_cast<void>(empty->SameValueAtTimes(empty.Time(1), empty.Time(2), nullptr)); }));
+    EXPECT_EQ(7427, KFSp_Boundary(
+                        [&] { static_cast<void>(empty->SameValueAtTimes(empty.Time(1), empty.Time(2), nullptr)); }));
     EXPECT_EQ(1u, reports.Take().size());
 }
 
@@ -134,7 +137,8 @@ TEST_F(Queries, ASetValueFindsAKeyAtItsTime)
 // Remembers what it was asked to evaluate.
 class EvaluatingRoot : public HeardRoot {
 public:
-    int EvaluateExpression(KFS_Stream const* stream, T_Time const* time, double* values, void**, KFS_ParamBag const*) override
+    int EvaluateExpression(KFS_Stream const* stream, T_Time const* time, double* values, void**,
+                           KFS_ParamBag const*) override
     {
         asked = stream;
         values[0] = time->value;
@@ -145,12 +149,12 @@ public:
 
 TEST_F(Queries, AnExpressionIsEvaluatedAtTheRoot)
 {
+    EvaluatingRoot root;
+    HeardRoot middle;
     const TestStream stream;
     const T_Time at = stream.Time(7);
     double value = 0.0;
     EXPECT_EQ(1, stream->EvaluateExpression(&at, &value, nullptr, nullptr)) << "no root, no value";
-    HeardRoot middle;
-    EvaluatingRoot root;
     middle.SetParent(&root);
     middle.Store(stream);
     EXPECT_EQ(4711, stream->EvaluateExpression(&at, &value, nullptr, nullptr));
@@ -162,10 +166,11 @@ TEST_F(Queries, AnExpressionIsEvaluatedAtTheRoot)
 class LimitedStream : public KFS_Stream {
 public:
     LimitedStream(short dimension, bool hasMin, bool hasMax)
-        : KFS_Stream(dimension, 600, 0, 0, KFS_InterpMask_All, 0, {0, 0, KFS_Type_Double, nullptr}, nullptr, nullptr, false),
-          hasMin_(hasMin), hasMax_(hasMax)
-    {
-    }
+        : KFS_Stream(dimension, 600, 0, 0, KFS_InterpMask_All, 0, {0, 0, KFS_Type_Double, nullptr}, nullptr, nullptr,
+                     false),
+          hasMin_(hasMin),
+          hasMax_(hasMax)
+    {}
     bool HasMinValue() const override { return hasMin_; }
     bool HasMaxValue() const override { return hasMax_; }
 
@@ -179,23 +184,12 @@ FX_ParamDef MakeDef(int kind)
     FX_ParamDef def{};
     def.paramType = kind;
     switch (kind) {
-    case FX_Param_INT_SLIDER:
-        def.value.intSlider = {-5, 6, -2, 3, 0};
-        break;
-    case FX_Param_FIXED_SLIDER:
-        def.value.fixedSlider = {-98304, 98304, -65536, 32768, 0, 2, 0};
-        break;
-    case FX_Param_FIXED_ANGLE:
-        def.value.fixedAngle = {0, -65536, 131072};
-        break;
-    case FX_Param_CHOICE:
-        def.value.choice = {5, 1, nullptr};
-        break;
-    case FX_Param_FLOAT_SLIDER:
-        def.value.floatSlider = {3, 0, -0.5f, 8.25f, 0.0f, 1.0f, 0.0f, 0};
-        break;
-    default:
-        break;
+    case FX_Param_INT_SLIDER: def.value.intSlider = {-5, 6, -2, 3, 0}; break;
+    case FX_Param_FIXED_SLIDER: def.value.fixedSlider = {-98304, 98304, -65536, 32768, 0, 2, 0}; break;
+    case FX_Param_FIXED_ANGLE: def.value.fixedAngle = {0, -65536, 131072}; break;
+    case FX_Param_CHOICE: def.value.choice = {5, 1, nullptr}; break;
+    case FX_Param_FLOAT_SLIDER: def.value.floatSlider = {3, 0, -0.5f, 8.25f, 0.0f, 1.0f, 0.0f, 0}; break;
+    default: break;
     }
     return def;
 }
@@ -208,14 +202,10 @@ TEST_F(Queries, LimitsComeFromTheParameterRecord)
         int precision;
     };
     const Row rows[] = {
-        {FX_Param_INT_SLIDER, -5.0, 6.0, -2.0, 3.0, 0},
-        {FX_Param_FIXED_SLIDER, -1.5, 1.5, -1.0, 0.5, 2},
-        {FX_Param_FIXED_ANGLE, -1.0, 2.0, -1.0, 2.0, 0},
-        {FX_Param_BOOL, 0.0, 1.0, 0.0, 1.0, 0},
-        {FX_Param_CHOICE, 1.0, 5.0, 1.0, 5.0, 0},
-        {FX_Param_FLOAT_SLIDER, -0.5, 8.25, 0.0, 1.0, 3},
-        {FX_Param_COLOR, -1e9, 1e9, -1e9, 1e9, 0},
-        {FX_Param_GROUP, -1e9, 1e9, -1e9, 1e9, 0},
+        {FX_Param_INT_SLIDER, -5.0, 6.0, -2.0, 3.0, 0},  {FX_Param_FIXED_SLIDER, -1.5, 1.5, -1.0, 0.5, 2},
+        {FX_Param_FIXED_ANGLE, -1.0, 2.0, -1.0, 2.0, 0}, {FX_Param_BOOL, 0.0, 1.0, 0.0, 1.0, 0},
+        {FX_Param_CHOICE, 1.0, 5.0, 1.0, 5.0, 0},        {FX_Param_FLOAT_SLIDER, -0.5, 8.25, 0.0, 1.0, 3},
+        {FX_Param_COLOR, -1e9, 1e9, -1e9, 1e9, 0},       {FX_Param_GROUP, -1e9, 1e9, -1e9, 1e9, 0},
         {FX_Param_NotFilledIn, -1e9, 1e9, -1e9, 1e9, 0},
     };
     LimitedStream limited(1, true, true);
@@ -227,7 +217,8 @@ TEST_F(Queries, LimitsComeFromTheParameterRecord)
         EXPECT_EQ(row.uiMin, limited.GetUIMinValue());
         EXPECT_EQ(row.uiMax, limited.GetUIMaxValue());
         EXPECT_EQ(row.precision, limited.GetPrecision());
-        const bool isSlider = row.kind == FX_Param_INT_SLIDER || row.kind == FX_Param_FIXED_SLIDER || row.kind == FX_Param_FLOAT_SLIDER;
+        const bool isSlider =
+            row.kind == FX_Param_INT_SLIDER || row.kind == FX_Param_FIXED_SLIDER || row.kind == FX_Param_FLOAT_SLIDER;
         limited.SetUIMinValue(-4.0);
         limited.SetUIMaxValue(2.0);
         EXPECT_EQ(isSlider ? -4.0 : row.uiMin, limited.GetUIMinValue());
@@ -257,7 +248,8 @@ TEST_F(Queries, ALegalValueLiesWithinTheLimitsThatThereAre)
             LimitedStream stream(5, hasMin, hasMax);
             stream.SetParamDef(MakeDef(FX_Param_FLOAT_SLIDER));
             const std::vector<double> values{-7.0, 2.0, 8.25, 99.0, infinity};
-            const std::vector<double> legal{hasMin ? -0.5 : -7.0, 2.0, 8.25, hasMax ? 8.25 : 99.0, hasMax ? 8.25 : infinity};
+            const std::vector<double> legal{hasMin ? -0.5 : -7.0, 2.0, 8.25, hasMax ? 8.25 : 99.0,
+                                            hasMax ? 8.25 : infinity};
             std::vector<double> result = values;
             stream.LegalizeValue(result.data());
             EXPECT_EQ(legal, result);
@@ -283,7 +275,7 @@ TEST_F(Queries, UnitsAndComponentsHaveNames)
     struct Row {
         int kind;
         short dimension;
-        unsigned short displayFlags;    // of the float slider's place in the record
+        unsigned short displayFlags;  // of the float slider's place in the record
         char const* units;
         std::vector<char const*> components;
     };
@@ -324,7 +316,8 @@ TEST_F(Queries, AFixedSlidersMinimumReadsAsUnits)
         unsigned short displayFlags;
         char const* units;
     };
-    for (const Row& row : {Row{0, 0, ""}, Row{0, 1, "percent"}, Row{3, 0, "percent"}, Row{4, 0, "pixels"}, Row{2, 4, ""}, Row{-2, 0, "pixels"}}) {
+    for (const Row& row : {Row{0, 0, ""}, Row{0, 1, "percent"}, Row{3, 0, "percent"}, Row{4, 0, "pixels"},
+                           Row{2, 4, ""}, Row{-2, 0, "pixels"}}) {
         const TestStream stream;
         FX_ParamDef def{};
         def.paramType = FX_Param_FIXED_SLIDER;
@@ -336,4 +329,4 @@ TEST_F(Queries, AFixedSlidersMinimumReadsAsUnits)
     }
 }
 
-} // namespace
+}  // namespace

@@ -63,7 +63,8 @@ TEST_F(Rescale, OfTwoKeysOnATickTheNearerStays)
     }
 }
 
-// Against the ticks worked out key by key in exact arithmetic: every tick that a key comes to holds one key in the end, the nearest.
+// Against the ticks worked out key by key in exact arithmetic: every tick that a key comes to holds one key in the end,
+// the nearest.
 TEST_F(Rescale, EveryTickKeepsOneOfItsKeys)
 {
     std::mt19937 random(28);
@@ -77,10 +78,11 @@ TEST_F(Rescale, EveryTickKeepsOneOfItsKeys)
         }
         const auto stream = WithKeys(times, static_cast<unsigned>(from));
         ASSERT_EQ(0, KFS_RescaleStream(*stream, static_cast<unsigned>(to)));
-        std::map<int, std::vector<int>> met;    // by tick, the keys
+        std::map<int, std::vector<int>> met;  // by tick, the keys
         for (std::size_t i = 0; i < times.size(); ++i) {
             const std::int64_t doubled = 2 * times[i] * to;
-            const std::int64_t rounded = doubled >= 0 ? (doubled + from) / (2 * from) : -((-doubled + from) / (2 * from));
+            const std::int64_t rounded =
+                doubled >= 0 ? (doubled + from) / (2 * from) : -((-doubled + from) / (2 * from));
             met[static_cast<int>(rounded)].push_back(static_cast<int>(i));
         }
         ASSERT_EQ(met.size(), static_cast<std::size_t>(stream->Count()));
@@ -90,7 +92,8 @@ TEST_F(Rescale, EveryTickKeepsOneOfItsKeys)
             SCOPED_TRACE(testing::Message() << "round " << round << ", " << from << " to " << to << ", tick " << tick);
             EXPECT_EQ(tick, stream->Record(position)->time);
             const auto far = [&](int key) { return std::abs(times[static_cast<std::size_t>(key)] * to - tick * from); };
-            const int nearest = *std::min_element(keys.begin(), keys.end(), [&](int a, int b) { return far(a) < far(b); });
+            const int nearest =
+                *std::min_element(keys.begin(), keys.end(), [&](int a, int b) { return far(a) < far(b); });
             EXPECT_EQ(nearest, survivors[static_cast<std::size_t>(position)]) << "a tie goes to the earlier";
             // And look-ups know of it.
             int index = 77;
@@ -157,4 +160,4 @@ TEST_F(Rescale, ADamagedStreamIsRefused)
     EXPECT_TRUE(damaged.Untouched());
 }
 
-} // namespace
+}  // namespace

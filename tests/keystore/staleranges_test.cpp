@@ -106,19 +106,17 @@ TEST_F(StaleRanges, MarksAddUp)
 TEST_F(StaleRanges, ARangeOnASpatialStreamDoesNotEndOnAFloatKey)
 {
     struct Row {
-        char const* floats;     // by key, 'f' floats
+        char const* floats;  // by key, 'f' floats
         int index;
         short count;
         Range range;
     };
     const Row rows[] = {
-        {"..f...", 3, 1, {1, 3}},       // 2 floats: back to 1
-        {"..ff..", 3, 1, {1, 4}},       // both ends
-        {".ffff.", 3, 1, {0, 5}},
-        {"ffffff", 3, 1, {0, 5}},       // the ends of the list stop it
-        {"....ff", 4, 1, {3, 5}},
-        {"..f...", 2, 0, {None, None}}, // nothing is marked, nothing is widened
-        {".f..f.", 3, 1, {2, 3}},       // outside of the range
+        {"..f...", 3, 1, {1, 3}},                                  // 2 floats: back to 1
+        {"..ff..", 3, 1, {1, 4}},                                  // both ends
+        {".ffff.", 3, 1, {0, 5}}, {"ffffff", 3, 1, {0, 5}},        // the ends of the list stop it
+        {"....ff", 4, 1, {3, 5}}, {"..f...", 2, 0, {None, None}},  // nothing is marked, nothing is widened
+        {".f..f.", 3, 1, {2, 3}},                                  // outside of the range
     };
     for (const Row& row : rows) {
         SCOPED_TRACE(row.floats);
@@ -144,7 +142,8 @@ TEST_F(StaleRanges, WithoutKeysNothingIsStale)
     const TestStream empty;
     TestStream constant({.noKeys = true});
     constant.Key(0, {1.0});
-    for (TestStream const* const stream : {static_cast<TestStream const*>(&empty), static_cast<TestStream const*>(&constant)}) {
+    for (TestStream const* const stream :
+         {static_cast<TestStream const*>(&empty), static_cast<TestStream const*>(&constant)}) {
         int* const range = (*stream)->GetInvalidKeyIndexForModify();
         int* const arcRange = (*stream)->GetArcInvalidKeyIndexForModify();
         range[0] = range[1] = arcRange[0] = arcRange[1] = 3;
@@ -169,4 +168,4 @@ TEST_F(StaleRanges, ARenderMarksItsOwnKeys)
     EXPECT_EQ(TestStream::NotStale, stream->ArcStale());
 }
 
-} // namespace
+}  // namespace

@@ -7,7 +7,7 @@
 #include <functional>
 #include <utility>
 
-// A root whose streams are heard. It holds leaves without owning them and keeps them at the scale they have.
+// A root whose streams are heard. It keeps leaves at the scale they have and doesn't own them; they must be gone first.
 class HeardRoot : public KFS_StreamGroup {
 public:
     HeardRoot() : KFS_StreamGroup(nullptr, nullptr, false) {}
@@ -24,7 +24,10 @@ public:
     KFS_StreamBase* CloneStream(KFS_CloneStreamParams const&) const override { return nullptr; }
     bool IsAnimated(bool) const override { return false; }
     bool AffectsRendering(KFS_RenderOptionsBase const&) const override { return true; }
-    hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const&, GetRenderGuidFilter*) const override { return {}; }
+    hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const&, GetRenderGuidFilter*) const override
+    {
+        return {};
+    }
 
 private:
     unsigned int timeScale_ = 600;
@@ -33,7 +36,10 @@ private:
 // Counts the changes of value that it hears while it lives, and may do something about them.
 class ValueListener : public KFS_StreamListener {
 public:
-    explicit ValueListener(std::function<void()> reaction = {}) : reaction_(std::move(reaction)) { KFS_RegisterMainListener(this); }
+    explicit ValueListener(std::function<void()> reaction = {}) : reaction_(std::move(reaction))
+    {
+        KFS_RegisterMainListener(this);
+    }
     ~ValueListener() override { KFS_UnregisterMainListener(this); }
     // Since the last call.
     int Take() { return std::exchange(count_, 0); }

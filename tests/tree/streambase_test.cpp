@@ -4,6 +4,7 @@
 #include "tree/listener.h"
 #include "tree/streamgroup.h"
 
+#include <functional>
 #include <stdexcept>
 
 namespace {
@@ -53,6 +54,15 @@ private:
     unsigned int timeScale_;
 };
 
+class ProjectRoot : public Group {
+public:
+    explicit ProjectRoot(KFS_Project* project) : project_(project) {}
+    KFS_Project* GetProject() const override { return project_; }
+
+private:
+    KFS_Project* project_;
+};
+
 class HeardRoot : public Group {
 public:
     int ProbeListenerState() override { return ++probes, KFS_ListenerState_Heard; }
@@ -74,13 +84,21 @@ public:
     void StreamSwapped(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int) override {}
     void StreamsAboutToBeReordered(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int, unsigned int) override {}
     void StreamsReordered(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int, unsigned int) override {}
-    void StreamDestroyed(KFS_StreamBase const*) override { heard_.push_back("destroyed"); }
+    void StreamDestroyed(KFS_StreamBase const*) override
+    {
+        heard_.push_back("destroyed");
+        if (failure) {
+            failure();
+        }
+    }
     void StreamValueChanged(KFS_Stream*) override { heard_.push_back("value"); }
     void StreamFlagsChanged(KFS_StreamBase*, unsigned int oldFlags, unsigned int newFlags) override
     {
         heard_.push_back("flags " + std::to_string(oldFlags) + " to " + std::to_string(newFlags));
     }
     void StreamDisplayNameChanged(KFS_StreamBase*) override { heard_.push_back("name"); }
+
+    std::function<void()> failure;  // throws from StreamDestroyed
 
 private:
     std::vector<std::string> heard_;
@@ -166,6 +184,22 @@ TEST_F(StreamBase, WalksUpToTheRoot)
     EXPECT_TRUE(leaf->IsHiddenByAncestor());
 }
 
+TEST_F(StreamBase, ARealStreamHasItsRootsProjectAndACanonicalOneTheCurrent)
+{
+    kfshost::Project other;
+    ProjectRoot root(&other);
+    Group middle;
+    const TestStream leaf;
+    root.Store(&middle);
+    middle.Store(leaf);
+    KFS_Stream const* const constLeaf = leaf;
+    EXPECT_EQ(&other, KFS_GetProject(leaf, false));
+    EXPECT_EQ(&other, KFS_GetConstProject(constLeaf, true));
+    leaf->SetCanonical(true);
+    EXPECT_EQ(&session.GetProject(), KFS_GetProject(leaf, false));
+    EXPECT_EQ(&session.GetProject(), KFS_GetConstProject(constLeaf, true));
+}
+
 TEST_F(StreamBase, AnArrivingTreeTakesTheScaleOfItsPlace)
 {
     Group root(30), arriving;
@@ -245,6 +279,48 @@ TEST_F(StreamBase, ListenersHearOnlyTreesThatAskToBeHeard)
         EXPECT_EQ(Heard{}, listener.Take());
     }
     EXPECT_EQ(Heard{"destroyed"}, listener.Take());
+}
+
+TEST_F(StreamBase, ComparedNamesAreAChangeOfFlagsAndFilledInOnesNoNews)
+{
+    Listener listener;
+    HeardRoot root;
+    const TestStream leaf;
+    root.Store(leaf);
+    leaf->SetMatchName(KFS_MatchName("blur", true));
+    leaf->pSetDisplayName(Text("blur"));
+    EXPECT_EQ(Heard{}, listener.Take());
+    EXPECT_TRUE(leaf->IsMatchNameSameAsDisplayName());
+    EXPECT_EQ((Heard{"flags 1 to 524289", "flags 524289 to 786433"}), listener.Take()) << "the answer first, then that it holds";
+    EXPECT_TRUE(leaf->IsMatchNameSameAsDisplayName());
+    leaf->pSetDisplayName(Text("Blur"));
+    EXPECT_EQ(Heard{}, listener.Take());
+    EXPECT_EQ(0x80001u, leaf->GetStreamBaseFlags()) << "the answer stands, but no longer holds";
+    EXPECT_FALSE(leaf->IsMatchNameSameAsDisplayName());
+}
+
+TEST_F(StreamBase, AListenersFailureDoesntKeepAStreamAlive)
+{
+    Listener listener;
+    HeardRoot root;
+    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    for (const bool isInt : {true, false}) {
+        listener.failure = [isInt] {
+            if (isInt) throw int{77};
+            throw std::runtime_error("the panel is gone");
+        };
+        {
+            const TestStream leaf;
+            root.Store(leaf);
+        }
+        EXPECT_EQ(Heard{"destroyed"}, listener.Take());
+        const std::vector<Reported> seen = reports.Take();
+        ASSERT_EQ(isInt ? 0u : 1u, seen.size());
+        if (!isInt) {
+            EXPECT_EQ("the panel is gone", seen[0].text);
+        }
+    }
+    EXPECT_EQ(before, Q_MemoryLive(nullptr));
 }
 
 TEST_F(StreamBase, SilenceCostsNoAllocation)

@@ -1,0 +1,351 @@
+#include "keystore/items.h"
+
+#include "frame/boundary_private.h"
+#include "keystore/attributes.h"
+#include "keystore/items_private.h"
+#include "tests/support/ownedvalues.h"
+#include "tests/support/streams.h"
+
+#include <cmath>
+#include <cstdint>
+#include <limits>
+#include <random>
+
+namespace {
+
+class Items : public StreamTest {};
+
+TEST_F(Items, DataSizeFollowsTheDescription)
+{
+    struct Row {
+        bool custom;
+        unsigned char spatial;
+        short dimension;
+        int size;
+    };
+    Row const rows[] = {{false, 1, 2, 48}, {false, 0, 2, 80}, {false, 1, 3, 72}, {false, 0, 1, 40},
+                        {false, 0, 0, 0},  {true, 1, 3, 13},  {true, 0, 1, 13}};
+    for (Row const& row : rows) {
+        KFS_ValueDesc desc;
+        desc.isCustom = row.custom ? 1 : 0;
+        desc.itemSize = 13;
+        EXPECT_EQ(row.size, KFS_GetKeyScalarDataSize(&desc, row.spatial, row.dimension));
+    }
+}
+
+// Element bits that a number becomes, and the number that those bits give back.
+struct Conversion {
+    signed char type;
+    double number;
+    std::uint64_t bits;
+    double back;
+};
+
+constexpr double Infinity = std::numeric_limits<double>::infinity();
+
+const Conversion Conversions[] = {
+    {KFS_Type_S8, -1.0, 0xFF, -1.0},
+    {KFS_Type_S8, 200.0, 200, -56.0},  // wraps
+    {KFS_Type_U8, 300.0, 44, 44.0},    // wraps
+    {KFS_Type_U8, -1.0, 255, 255.0},
+    {KFS_Type_U8, 2.4, 2, 2.0},
+    {KFS_Type_U8, 2.6, 3, 3.0},
+    {KFS_Type_S16, -32769.0, 0x7FFF, 32767.0},
+    {KFS_Type_U16, 65537.0, 1, 1.0},
+    {KFS_Type_S32, -2147483648.0, 0x80000000U, -2147483648.0},
+    {KFS_Type_S32, 2147483648.0, 0x80000000U, -2147483648.0},
+    {KFS_Type_U32, 4294967295.0, 0xFFFFFFFFU, 4294967295.0},
+    {KFS_Type_U32, 4294967297.0, 1, 1.0},
+    {KFS_Type_Fixed, 1.5, 98304, 1.5},
+    {KFS_Type_Fixed, -1.5, 0xFFFE8000U, -1.5},
+    {KFS_Type_Fixed, 0.0, 0, 0.0},
+    {KFS_Type_Fixed, -0.0, 0, 0.0},
+    {KFS_Type_Fixed, 0.5 / 65536, 1, 1.0 / 65536},  // a half goes away from zero
+    {KFS_Type_Fixed, -0.5 / 65536, 0xFFFFFFFFU, -1.0 / 65536},
+    {KFS_Type_Fixed, 0.49 / 65536, 0, 0.0},
+    {KFS_Type_Fixed, 32768.0, 0x80000000U, -32768.0},  // wraps
+    {KFS_Type_Fixed, std::nan(""), 0, 0.0},
+    {KFS_Type_UFixed, 40000.25, 2621456384U, 40000.25},
+    {KFS_Type_UFixed, -1.0, 0xFFFF0000U, 65535.0},
+    {KFS_Type_UFixed, 65537.0, 65536, 1.0},
+    {KFS_Type_UFixed, Infinity, 0xFFFFFFFFU, 4294967295.0 / 65536},
+    {KFS_Type_UFixed, -Infinity, 0, 0.0},
+    {KFS_Type_Float, 0.1, 0x3DCCCCCDU, static_cast<double>(0.1F)},
+    {KFS_Type_Double, 0.1, 0x3FB999999999999AU, 0.1},
+};
+constexpr std::size_t Sizes[] = {1, 1, 2, 2, 4, 4, 4, 4, 4, 8};
+
+TEST_F(Items, ConversionTakesTheNearestElementAndNeverClamps)
+{
+    for (Conversion const& row : Conversions) {
+        SCOPED_TRACE(testing::Message() << "type " << int(row.type) << " of " << row.number);
+        std::size_t const size = Sizes[static_cast<std::size_t>(row.type)];
+        TestStream const stream({.dimension = 2, .type = row.type});
+        double const numbers[2] = {row.number, row.number};
+        // At an odd address: a caller's elements lie where they lie.
+        unsigned char bytes[40];
+        std::memset(bytes, 0xAA, sizeof bytes);
+        ASSERT_EQ(0, KFSp_ConvertItemFromFloat(stream, 0, KFS_Item_KeyValue, numbers, bytes + 1));
+        unsigned char expected[40];
+        std::memset(expected, 0xAA, sizeof expected);
+        std::memcpy(expected + 1, &row.bits, size);
+        std::memcpy(expected + 1 + size, &row.bits, size);
+        EXPECT_EQ(0, std::memcmp(expected, bytes, sizeof bytes));
+
+        unsigned char exported[40];
+        std::memset(exported, 0xAA, sizeof exported);
+        EXPECT_EQ(0, KFS_ConvertItemFromFloat(2, static_cast<char>(row.type), numbers, exported + 1));
+        EXPECT_EQ(0, std::memcmp(expected, exported, sizeof exported)) << "both doors convert alike";
+
+        double back[3] = {7.0, 7.0, 7.0};
+        ASSERT_EQ(0, KFSp_ConvertItemToFloat(stream, 0, KFS_Item_KeyValue, bytes + 1, back));
+        EXPECT_EQ(row.back, back[0]);
+        EXPECT_EQ(row.back, back[1]);
+        EXPECT_EQ(7.0, back[2]);
+    }
+}
+
+TEST_F(Items, ElementsThatAreRepresentableComeBackAsTheyWere)
+{
+    std::mt19937 random(20);
+    std::uniform_int_distribution<std::uint32_t> word;
+    for (signed char type = KFS_Type_S8; type < KFS_Type_Float; ++type) {
+        std::size_t const size = Sizes[static_cast<std::size_t>(type)];
+        TestStream const stream({.dimension = 4, .type = type});
+        for (int round = 0; round < 200; ++round) {
+            std::uint32_t const words[4] = {word(random), word(random), word(random), word(random)};
+            double numbers[4];
+            unsigned char back[16];
+            ASSERT_EQ(0, KFSp_ConvertItemToFloat(stream, 0, KFS_Item_CacheValue, words, numbers));
+            ASSERT_EQ(0, KFSp_ConvertItemFromFloat(stream, 0, KFS_Item_CacheValue, numbers, back));
+            ASSERT_EQ(0, std::memcmp(words, back, 4 * size)) << "type " << int(type);
+            // In place too, where the doubles shrink under the conversion.
+            ASSERT_EQ(0, KFS_ConvertItemFromFloat(4, static_cast<char>(type), numbers, numbers));
+            ASSERT_EQ(0, std::memcmp(words, numbers, 4 * size)) << "type " << int(type);
+        }
+    }
+}
+
+TEST_F(Items, TheKindSaysHowManyElementsMove)
+{
+    struct Row {
+        short kind;
+        int plain;
+        int spatial;
+        int passingForPlain;
+    };
+    Row const rows[] = {{KFS_Item_CacheWhole, 10, 6, 2}, {KFS_Item_CacheValue, 2, 2, 2}, {KFS_Item_KeyWhole, 10, 6, 2},
+                        {KFS_Item_KeyValue, 2, 2, 2},    {KFS_Item_Component, 1, 1, 1},  {77, 0, 0, 0}};
+    TestStream const plain({.dimension = 2});
+    TestStream const spatial({.dimension = 2, .spatial = true});
+    TestStream custom({.dimension = 2});
+    custom->MarkTemporarilyNonCustom(true);
+    KFS_CopyItemFunc const functions[] = {KFSp_ConvertItemToFloat, KFSp_ConvertItemFromFloat, KFSp_FakeCopyItemFunc,
+                                          KFSp_FakeCopyItemFuncNoLimits};
+    for (Row const& row : rows) {
+        for (KFS_CopyItemFunc const function : functions) {
+            double const from[12] = {1, 2, 3, 4, 5, 6, 7, 8, 9, 10, 11, 12};
+            auto const moved = [&](KFS_Stream const* stream) {
+                double to[12] = {};
+                EXPECT_EQ(0, function(stream, 0, row.kind, from, to));
+                int count = 0;
+                while (count < 12 && to[count] == from[count]) {
+                    ++count;
+                }
+                for (int i = count; i < 12; ++i) {
+                    EXPECT_EQ(0.0, to[i]);
+                }
+                return count;
+            };
+            EXPECT_EQ(row.plain, moved(plain)) << "kind " << row.kind;
+            EXPECT_EQ(row.spatial, moved(spatial)) << "kind " << row.kind;
+            EXPECT_EQ(row.passingForPlain, moved(custom)) << "kind " << row.kind;
+        }
+    }
+    custom->MarkTemporarilyNonCustom(false);
+}
+
+TEST_F(Items, CustomValuesAreMovedWholeAndNeverConverted)
+{
+    OwnedValues::Reset();
+    auto const stream = OwnedValues::MakeStream(false);
+    unsigned char const from[8] = {1, 2, 3, 4, 5, 6, 7, 8};
+    for (short const kind : {0, 1, 2, 3, 4}) {
+        unsigned char to[8] = {};
+        EXPECT_EQ(0, KFSp_FakeCopyItemFunc(stream.get(), 0, kind, from, to));
+        unsigned char const expected[8] = {1, 2, 3, 4, 0, 0, 0, 0};
+        EXPECT_EQ(0, std::memcmp(expected, to, sizeof to)) << "itemSize bytes, whatever the kind";
+        EXPECT_EQ(7441, KFSp_ConvertItemToFloat(stream.get(), 0, kind, from, to));
+        EXPECT_REPORT(reports, 81, "can#{rsquo}t convert to custom value");
+        EXPECT_EQ(7441, KFSp_ConvertItemFromFloat(stream.get(), 0, kind, from, to));
+        EXPECT_REPORT(reports, 80, "can#{rsquo}t convert from custom value");
+        EXPECT_EQ(0, std::memcmp(expected, to, sizeof to));
+    }
+}
+
+// A stream with limits that can refuse.
+class LimitedStream : public KFS_Stream {
+public:
+    explicit LimitedStream(KFS_ValueDesc const& desc)
+        : KFS_Stream(1, 600, 0, 0, KFS_InterpMask_All, 0, desc, nullptr, nullptr, false)
+    {}
+    bool IsFloatBased() const override { return true; }
+    void LegalizeValue(double* values) const override
+    {
+        if (values[0] < 0.0) throw 4711;
+        if (values[0] > 1000.0) throw std::runtime_error("too much");
+        values[0] = std::min(values[0], 100.0);
+    }
+};
+
+TEST_F(Items, CopyingForcesValuesIntoTheLimits)
+{
+    KFS_ValueDesc desc;
+    desc.dataType = KFS_Type_Double;
+    LimitedStream const stream(desc);
+    struct Row {
+        KFS_CopyItemFunc function;
+        short kind;
+        double from;
+        double to;
+        int code;
+    };
+    Row const rows[] = {
+        {KFSp_FakeCopyItemFunc, KFS_Item_KeyValue, 120.0, 100.0, 0},
+        {KFSp_FakeCopyItemFunc, KFS_Item_Component, 120.0, 120.0, 0},
+        {KFSp_FakeCopyItemFunc, KFS_Item_KeyValue, -1.0, -1.0, 4711},
+        {KFSp_FakeCopyItemFuncNoLimits, KFS_Item_KeyValue, 120.0, 120.0, 0},
+        {KFSp_ConvertItemToFloat, KFS_Item_KeyValue, 120.0, 120.0, 0},
+    };
+    for (Row const& row : rows) {
+        double to = 0.0;
+        EXPECT_EQ(row.code, row.function(&stream, 0, row.kind, &row.from, &to));
+        EXPECT_EQ(row.to, to);
+    }
+    double const tooMuch = 2000.0;
+    double to = 0.0;
+    EXPECT_EQ(Q_Err_Exception, KFSp_FakeCopyItemFunc(&stream, 0, KFS_Item_KeyValue, &tooMuch, &to));
+    EXPECT_EQ(1U, reports.Take().size());
+}
+
+TEST_F(Items, TheListFollowsTheStreamsFunctions)
+{
+    OwnedValues::Reset();
+    auto const stream = OwnedValues::MakeStream(false);
+    EXPECT_EQ(0, KFSp_SetKeyFuncs(stream.get())) << "nothing to tell without a list";
+    ASSERT_EQ(0, KFSp_CreateKeyList(stream.get()));
+    SEQ_Head** const list = stream->GetKeys();
+    ASSERT_EQ(0, KFSp_CreateKeyList(stream.get()));
+    EXPECT_EQ(list, stream->GetKeys()) << "made once";
+    EXPECT_EQ(stream.get(), (*list)->refcon);
+
+    struct Row {
+        KFS_CopyItemFunc copy;
+        KFS_DisposeItemFunc dispose;
+    };
+    for (Row const& row : {Row{OwnedValues::Copy, nullptr}, Row{nullptr, OwnedValues::Dispose}, Row{nullptr, nullptr},
+                           Row{OwnedValues::Copy, OwnedValues::Dispose}}) {
+        (*list)->refcon = nullptr;
+        ASSERT_EQ(0, KFS_SetCustomFuncs(stream.get(), row.copy, row.dispose));
+        EXPECT_EQ(row.copy ? KFSp_CopyKeyItemFunc : nullptr, (*list)->copy);
+        EXPECT_EQ(row.dispose ? KFSp_DisposeKeyItemFunc : nullptr, (*list)->dispose);
+        EXPECT_EQ(KFSp_SortKeyItemFunc, (*list)->sort);
+        EXPECT_EQ(stream.get(), (*list)->refcon);
+    }
+}
+
+TEST_F(Items, KeysSortByWrappedDifference)
+{
+    struct Row {
+        int a, b, order;
+    };
+    for (Row const& row : {Row{1, 2, -1}, Row{2, 1, 1}, Row{5, 5, 0}, Row{-3, 4, -7},
+                           Row{std::numeric_limits<int>::max(), -1, std::numeric_limits<int>::min()}}) {
+        KFS_KeyScalar a{};
+        KFS_KeyScalar b{};
+        a.time = row.a;
+        b.time = row.b;
+        EXPECT_EQ(row.order, KFSp_SortKeyItemFunc(nullptr, nullptr, &a, &b));
+        EXPECT_EQ(row.order, KFSp_SortKeyItemDiskFunc(nullptr, nullptr, &a, &b));
+    }
+}
+
+SEQ_Head** MakeTable()
+{
+    SEQ_Head** table = nullptr;
+    EXPECT_EQ(0, SEQ_New(0, 8, 4, 1, &table));
+    return table;
+}
+
+TEST_F(Items, ACopiedKeyOwnsItsValueAndNoArcTable)
+{
+    OwnedValues::Reset();
+    {
+        auto const stream = OwnedValues::MakeStream(false, true);
+        OwnedValues::Ticket const mine = OwnedValues::Make(5.0);
+        T_Time const at{30, 600};
+        ASSERT_EQ(0, KFS_InsertKey(stream.get(), &at, 0, &mine, KFS_Interp_Linear, KFS_Interp_Hold));
+        EXPECT_EQ(2, OwnedValues::Live()) << "the key's own and mine";
+        void* item = nullptr;
+        ASSERT_EQ(0, SEQ_GetAddress(stream->GetKeys(), 0, 0, &item));
+        auto* const key = static_cast<KFS_KeyScalar*>(item);
+        key->spFlags = 3;
+        key->arcLength = 12.5;
+        key->remapTable = MakeTable();
+
+        SEQ_Head** copies = nullptr;
+        ASSERT_EQ(0, SEQ_Duplicate(stream->GetKeys(), 0, &copies));
+        EXPECT_EQ(3, OwnedValues::Live());
+        void const* copied = nullptr;
+        ASSERT_EQ(0, SEQ_GetConstAddress(copies, 0, &copied));
+        auto const* const copy = static_cast<KFS_KeyScalar const*>(copied);
+        EXPECT_EQ(nullptr, copy->remapTable);
+        EXPECT_NE(nullptr, key->remapTable);
+        EXPECT_EQ(30, copy->time);
+        EXPECT_EQ(KFS_Interp_Hold, copy->outInterp);
+        EXPECT_EQ(3U, copy->spFlags);
+        EXPECT_EQ(12.5, copy->arcLength);
+        EXPECT_EQ(0, SEQ_Dispose(copies, 0));
+        EXPECT_EQ(2, OwnedValues::Live());
+        OwnedValues::Free(mine);
+    }
+    EXPECT_EQ(0, OwnedValues::Live()) << "the stream's end frees the rest";
+}
+
+TEST_F(Items, DisposingArcTablesLeavesKeysAndMarksTheirArcs)
+{
+    TestStream stream({.dimension = 2, .spatial = true});
+    stream.Key(0, {0, 0}).Key(100, {10, 0}).Key(200, {10, 10});
+    ASSERT_EQ(0, stream->UpdateStream());
+    int const tables = [&] {
+        int count = 0;
+        for (int i = 0; i < 3; ++i) {
+            if (!stream.Record(i)->remapTable) {
+                stream.Record(i)->remapTable = MakeTable();
+            }
+            ++count;
+        }
+        return count;
+    }();
+    EXPECT_EQ(3, tables);
+    EXPECT_EQ(TestStream::NotStale, stream.ArcStale());
+    ASSERT_EQ(0, KFS_DisposeRemapTables(stream));
+    for (int i = 0; i < 3; ++i) {
+        EXPECT_EQ(nullptr, stream.Record(i)->remapTable);
+    }
+    EXPECT_EQ((std::array<int, 2>{0, 2}), stream.ArcStale());
+    EXPECT_EQ(0, stream.Pins());
+
+    TestStream plain;
+    plain.Key(0, {1}).Key(100, {2});
+    ASSERT_EQ(0, plain->UpdateStream());
+    EXPECT_EQ(0, KFS_DisposeRemapTables(plain));
+    EXPECT_EQ(TestStream::NotStale, plain.ArcStale()) << "nothing to do on a stream without a path";
+
+    DamagedStream damaged;
+    EXPECT_EQ(2, KFS_DisposeRemapTables(damaged.get()));
+    EXPECT_EQ(reports.Take(), std::vector<Reported>{DamagedReport(89, "dispose")});
+    EXPECT_TRUE(damaged.Untouched());
+}
+
+}  // namespace
