@@ -90,6 +90,7 @@ struct Fixture {
 
 Fixture const& Get(int keys, short dimension, char interp)
 {
+    Library();      // outlives the streams
     static std::map<std::tuple<int, short, char>, std::unique_ptr<Fixture>> made;
     std::unique_ptr<Fixture>& fixture = made[{keys, dimension, interp}];
     if (!fixture) {

@@ -10,7 +10,6 @@
 #include <CLI/CLI.hpp>
 
 #include <cstdio>
-#include <map>
 #include <new>
 #include <string>
 
@@ -49,6 +48,11 @@ void AddInfo(CLI::App& app, InfoOptions& options)
     command->callback([&options] { RunInfo(options); });
 }
 
+Format FormatNamed(std::string const& name)
+{
+    return name == "csv" ? Format::Csv : name == "json" ? Format::Json : Format::Table;
+}
+
 void AddEval(CLI::App& app, EvalOptions& options)
 {
     CLI::App* const command = app.add_subcommand("eval", "Print values at regular times");
@@ -61,10 +65,11 @@ void AddEval(CLI::App& app, EvalOptions& options)
     command->add_option("--fps", options.fps, "samples a second, like 24 or 30000/1001")
         ->type_name("RATE")
         ->capture_default_str();
-    static std::map<std::string, Format> const formats{
-        {"table", Format::Table}, {"csv", Format::Csv}, {"json", Format::Json}};
-    command->add_option("--format", options.format, "table, csv or json (default: table)")
-        ->transform(CLI::CheckedTransformer(formats))
+    command
+        ->add_option_function<std::string>(
+            "--format", [&options](std::string const& name) { options.format = FormatNamed(name); },
+            "how to print (default: table)")
+        ->check(CLI::IsMember({"table", "csv", "json"}))
         ->type_name("FORMAT");
     command->footer(
         "Numbers are printed with as many digits as it takes to read the same number back. In tables times are exact\n"

@@ -3,8 +3,8 @@
 #include "frame/report_private.h"
 #include "keystore/keylist_private.h"
 
-// The length of the path from key `first` to key `last` of the list, summed in the order of the keys. It is also the sum
-// so far when a key can't be read, whose code is the result.
+// The length of the path from key `first` to key `last` of the list, summed in the order of the keys. When a key can't
+// be read its code is the result, and `length` the sum so far.
 inline int KFSp_SumArcs(KFS_StreamKeyData const* data, int first, int last, double* length)
 {
     *length = 0.0;

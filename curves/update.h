@@ -22,7 +22,7 @@ KFS_API int KFS_ForceUpdateStream(KFS_Stream const* stream);
 //           3, 5  the in side of the key at the time: temporal and spatial
 //           4, 6  its out side: temporal and spatial
 //           any other reaches nowhere
-//   time    in, any scale; null is value 0. One that can't be expressed in the stream's scale is taken by its bare value.
+//   time    in, any scale; null is value 0. One that doesn't fit the stream's scale is taken by its bare value.
 //   from    out, not null; in the stream's scale
 //   to      out, not null; in the stream's scale
 //

@@ -1,6 +1,7 @@
 #include "keystore/cache_private.h"
 
 #include "curves/interpolate_private.h"
+#include "curves/update_private.h"
 #include "frame/boundary_private.h"
 #include "frame/report_private.h"
 #include "frame/services/memory.h"
@@ -16,17 +17,14 @@ namespace {
 
 constexpr int CacheMemoryId = 0x1D0003;
 
-bool NothingIsStale(KFS_StreamKeyData const* data)
-{
-    return data->invalidKeyIndex[0] == KFS_INVALID_INDEX && data->invalidKeyIndex[1] == KFS_INVALID_INDEX &&
-           data->arcInvalidKeyIndex[0] == KFS_INVALID_INDEX && data->arcInvalidKeyIndex[1] == KFS_INVALID_INDEX;
-}
-
-// The whole key into the cache record, which never takes a share in its arc table.
+// The whole key into the cache record, which never takes a share in its arc table. A copy that fails has written the head: the record is
+// empty then, since its value is nobody's.
 int CopyKeyToCache(KFS_StreamKeyData const* data, int index)
 {
     int const code = SEQ_GetItemCopy(data->keys, 0, index, data->cache);
-    if (code == 0 && KFSp_HasSpatialBlock(data->cache)) {
+    if (code != 0) {
+        data->cache->time = KFS_INVALID_INDEX;
+    } else if (KFSp_HasSpatialBlock(data->cache)) {
         data->cache->remapTable = nullptr;
     }
     return code;
@@ -109,6 +107,7 @@ KFS_KeyScalar* KFS_Stream::AllocateCacheImpl() const
 void KFS_Stream::AllocateCache()
 {
     KFS_KeyScalar* const cache = AllocateCacheImpl();
+    FreeCache();
     keyData_.cache = cache;
 }
 
@@ -200,7 +199,7 @@ void KFSp_UpdateCacheToTime(KFS_Stream const* stream, KFS_StreamKeyData const* d
     bool const stands = !value || (cache->time == time && !KFSp_CacheIsEmpty(cache));
     if (!stands) {
         KFSp_ThrowIf(KFSp_ClearCacheRecord(stream, cache));
-        bool mayBeStale = !NothingIsStale(data);
+        bool mayBeStale = KFSp_IsStale(data);
         if (mayBeStale && found) {
             KFS_KeyScalar const* key = nullptr;
             KFSp_ThrowIf(KFSp_GetConstKey(data, index, &key));

@@ -13,7 +13,9 @@
 #include "keystore/valuedata_private.h"
 #include "overrides/parambag.h"
 
+#include <algorithm>
 #include <cstring>
+#include <new>
 
 namespace {
 
@@ -93,7 +95,8 @@ bool ReadExpression(KFS_ExpState* state, KFS_Stream const* stream, int time, int
     KFS_ParamBag resolved;
     state->ResolveExprTarget(&target, &targetTime, bag, &resolved);
     KFS_ParamBag const* const inForce = resolved.GetOverrideCount() == 0 ? bag : &resolved;
-    if (!state->GetExprContext(target)->CanEvaluate()) {
+    boost::shared_ptr<KFS_ExprContext> const context = state->GetExprContext(target);
+    if (!context || !context->CanEvaluate()) {
         return false;
     }
     *code = KFSp_Boundary([&] { Form::EvalExpr(state, target, targetTime, flags, value, inForce); });
@@ -124,6 +127,16 @@ Q_RenderContext const* FindRenderContext(KFS_Stream const* stream)
     }
     KFS_Project const* const project = KFS_GetConstProject(stream, true);
     return project ? project->GetRenderContext(true) : nullptr;
+}
+
+// The double form doesn't know of projects: a thread without a current render context is a mistake, which the service reports.
+Q_RenderContext const* NeedRenderContext()
+{
+    Q_RenderContext const* const current = Q_RenderContext::PeekCurrent();
+    if (!current) [[unlikely]] {
+        static_cast<void>(Q_RenderContext::GetCurrent(false));
+    }
+    return current;
 }
 
 // The stages that both forms share, up to the keys; `readKeys` takes the state that says how to read them.
@@ -237,7 +250,7 @@ int KFS_GetValueFPlus(KFS_Stream const* stream, T_Time const* time, int flags, d
         return KFSp_RefuseCustomValue(KFSp_Op_GetFloat, KFSp_Row_ComputeFloatValues);
     }
     return KFSp_Boundary([&] {
-        return ReadStaged<DoubleForm>(stream, Q_RenderContext::PeekCurrent(), at, flags, value, atKey, bag,
+        return ReadStaged<DoubleForm>(stream, NeedRenderContext(), at, flags, value, atKey, bag,
                                       [&](KFS_ExpState* state) {
                                           state->EvalNoExprValueF(stream, at, flags, value, atKey, bag);
                                       });
@@ -329,13 +342,18 @@ void KFS_PostCacheVector4Value(KFS_Stream const* stream, int, M_Vector4T<double>
 
 namespace {
 
-// A buffer for one external value, aligned to 16, that shows in the memory count.
+// A buffer for one value, aligned to 16, that shows in the memory count. It takes an external value, and also the doubles that separated
+// dimensions answer. Throws the int 4.
 class ScratchValue {
 public:
     explicit ScratchValue(KFS_Stream const* stream)
-        : size_(static_cast<std::size_t>(stream->GetDimension()) * stream->GetValueDesc()->itemSize),
-          buffer_(::operator new(size_, Alignment))
+        : size_(static_cast<std::size_t>(stream->GetDimension()) *
+                std::max<std::size_t>(stream->GetValueDesc()->itemSize, sizeof(double))),
+          buffer_(::operator new(size_, Alignment, std::nothrow))
     {
+        if (!buffer_) {
+            throw int{KFS_Err_OutOfMemory};
+        }
         Q_AccountAllocationEx(size_, 1);
     }
     ~ScratchValue()

@@ -70,6 +70,13 @@ void DisposeKeys(SEQ_Head** keys)
 // By KFS_Type.
 constexpr std::array<unsigned short, 10> ElementSizes{1, 1, 2, 2, 4, 4, 4, 4, 4, 8};
 
+// The stream, before anything else of it is read. Throws 2.
+KFS_Stream const& Undamaged(KFS_Stream const& source)
+{
+    KFSp_ThrowIf(KFSp_CheckStream(KFSp_Op_StreamCopy, &source, KFSp_Row_Duplicate));
+    return source;
+}
+
 int SetCustomDescription(KFS_Stream* stream, KFS_ValueDesc const& desc)
 {
     if (!KFSp_KeyItemFits(desc, stream->IsSpatial(), stream->GetDimension())) {
@@ -134,10 +141,14 @@ KFS_StreamKeyData::KFS_StreamKeyData(KFS_StreamKeyData const& source, KFS_Stream
         DisposeKeys(keys);
         throw;
     }
+    valueOwner_ = stream->GetDisposeItemFunc() ? stream : nullptr;
 }
 
 KFS_StreamKeyData::~KFS_StreamKeyData()
 {
+    if (valueOwner_) {
+        static_cast<void>(KFSp_ClearCacheRecord(valueOwner_, cache));
+    }
     DisposeKeys(keys);
     Q_FreePtr(cache);
 }
@@ -172,15 +183,14 @@ KFS_Stream::KFS_Stream(short dimension, unsigned int timeScale, unsigned char no
 }
 
 KFS_Stream::KFS_Stream(KFS_Stream const& source, KFS_CloneStreamParams const& params)
-    : KFS_StreamBase(source), stamp_(KFS_StreamDeadStamp), dimension_(source.dimension_), kfsFlags_(source.kfsFlags_),
-      spInterp_(source.spInterp_), spInterpMask_(source.spInterpMask_), interpMask_(source.interpMask_),
-      timeScale_(source.timeScale_), accuracy_(source.accuracy_), multiplier_(source.multiplier_), valueDesc_(source.valueDesc_),
-      interpFunc_(source.interpFunc_), copyItemFunc_(source.copyItemFunc_), disposeItemFunc_(source.disposeItemFunc_),
+    : KFS_StreamBase(Undamaged(source)), stamp_(KFS_StreamValidStamp), dimension_(source.dimension_),
+      kfsFlags_(source.kfsFlags_), spInterp_(source.spInterp_), spInterpMask_(source.spInterpMask_),
+      interpMask_(source.interpMask_), timeScale_(source.timeScale_), accuracy_(source.accuracy_),
+      multiplier_(source.multiplier_), valueDesc_(source.valueDesc_), interpFunc_(source.interpFunc_),
+      copyItemFunc_(source.copyItemFunc_), disposeItemFunc_(source.disposeItemFunc_),
       temporarilyNonCustom_(source.temporarilyNonCustom_)
 {
-    KFSp_ThrowIf(KFSp_CheckStream(KFSp_Op_StreamCopy, &source, KFSp_Row_Duplicate));
-    stamp_ = KFS_StreamValidStamp;
-    KFSp_ThrowIf(KFSp_Boundary([&] {
+    int const code = KFSp_Boundary([&] {
         keyData_.cache = source.CloneCache(source.GetCache());
         if (params.cloneKeys && source.keyData_.keys) {
             CopyKeysFrom(source);
@@ -188,19 +198,30 @@ KFS_Stream::KFS_Stream(KFS_Stream const& source, KFS_CloneStreamParams const& pa
         if (params.cloneExpression && source.HasExpression()) {
             CopyExpressionFrom(source);
         }
-    }));
+    });
+    if (code != 0) {
+        if (keyData_.cache) {
+            KFSp_ClearCacheRecord(this, keyData_.cache);
+        }
+        throw int{code};
+    }
 }
 
+// Everything goes into the clone's own key data, whatever context the thread is in.
 void KFS_Stream::CopyKeysFrom(KFS_Stream const& source)
 {
     KFSp_ThrowIf(SEQ_Duplicate(source.GetKeys(), 0, &keyData_.keys));
-    if (source.IsSpatial()) {
+    if (IsSpatial()) {
         KFSp_ThrowIf(SEQ_ForEach(keyData_.keys, 0, KFSp_KeyClearRemap, 0));
     }
     KFSp_ThrowIf(SEQ_SetRefcon(this, keyData_.keys));
-    auto const count = static_cast<short>(GetKeyCount());
-    KFSp_ThrowIf(SetInvalid(-1, count));
-    KFSp_ThrowIf(SetArcInvalid(-1, count));
+    int const count = (*keyData_.keys)->count;
+    if (HasKeys() && count > 0) {
+        for (int* const stale : {keyData_.invalidKeyIndex, keyData_.arcInvalidKeyIndex}) {
+            stale[0] = 0;
+            stale[1] = count - 1;
+        }
+    }
 }
 
 void KFS_Stream::CopyExpressionFrom(KFS_Stream const& source)
@@ -212,13 +233,16 @@ void KFS_Stream::CopyExpressionFrom(KFS_Stream const& source)
     }
 }
 
-// The stream's own key data throughout, whatever context the thread is in.
+// The stream's own key data throughout, whatever context the thread is in. The client's dispose function still finds a whole stream.
 KFS_Stream::~KFS_Stream()
 {
-    if (KFSp_CheckStream(KFSp_Op_StreamDestroy, this, KFSp_Row_Dispose) == 0 && keyData_.cache) {
-        KFSp_ClearCacheRecord(this, keyData_.cache);
+    static_cast<void>(KFSp_CheckStream(KFSp_Op_StreamDestroy, this, KFSp_Row_Dispose));
+    if (keyData_.cache) {
+        static_cast<void>(KFSp_ClearCacheRecord(this, keyData_.cache));
     }
+    DisposeKeys(std::exchange(keyData_.keys, nullptr));
     exprInfo_.clear();
+    FreeCache();
     // Volatile, because what is written to a dying object counts as never read, and checks of the stamp are to read it.
     *const_cast<unsigned short volatile*>(&stamp_) = KFS_StreamDeadStamp;
 }
@@ -226,6 +250,16 @@ KFS_Stream::~KFS_Stream()
 KFS_StreamBase* KFS_Stream::CloneStream(KFS_CloneStreamParams const& params) const
 {
     return new KFS_Stream(*this, params);
+}
+
+KFS_Stream* KFS_Stream::CloneLeaf(KFS_CloneStreamParams const& params) const
+{
+    return CloneStream(params)->GetAsLeaf();
+}
+
+KFS_Stream* KFS_Stream::CloneLeafNoKeysOrExpr() const
+{
+    return CloneLeaf(KFS_CloneStreamParams{false, false});
 }
 
 bool KFS_Stream::IsLeaf() const

@@ -43,6 +43,11 @@ struct KFS_API KFS_StreamKeyData {
     ~KFS_StreamKeyData();
     KFS_StreamKeyData(KFS_StreamKeyData const&) = delete;
     KFS_StreamKeyData& operator=(KFS_StreamKeyData const&) = delete;
+
+private:
+    // In a copy: the stream whose dispose function gives back what the cache record holds. Null where nothing has to be given back, so
+    // that the copy of a plain stream may outlive the stream.
+    KFS_Stream const* valueOwner_ = nullptr;
 };
 
 // The leaf of a stream tree: one animatable property. It holds a single value (KFS_StreamFlag_NoKeys, the value lives in the cache
@@ -65,6 +70,12 @@ public:
     ~KFS_Stream() override;
 
     KFS_StreamBase* CloneStream(KFS_CloneStreamParams const& params) const override;
+    // The clone as a leaf; without keys and expression it holds the value of the cache record. The caller owns it.
+    KFS_Stream* CloneLeaf(KFS_CloneStreamParams const& params) const;
+    KFS_Stream* CloneLeafNoKeysOrExpr() const;
+    // Exchanges the content of two leaves, names and flags included, while each keeps its place: parent, factory, client pointer, and the
+    // permitted temporal interpolations. Listeners hear of this one only. Throws the list service's code, with the content exchanged.
+    void swap(KFS_Stream& other);
     bool IsModified() const override;
     // Keys, or an expression (`evenIfDisabled`: any text; else one that is active). A stream with separated dimensions asks its followers.
     bool IsAnimated(bool evenIfDisabled) const override;

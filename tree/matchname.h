@@ -5,6 +5,9 @@
 
 #include <string>
 
+struct CKF_ChunkInfo;
+struct CKF_File;
+
 // The stable, language-independent name of a kind of stream or of a place in a group, carried as the 16-byte hash of its text.
 // Copying, comparing and IsValid touch nothing but those bytes; making a name from a text interns the text in a process-wide pool
 // that maps the hash back to it. The pool only grows, exists before KFS_Birth and after KFS_Death, and may be used from any thread.
@@ -36,7 +39,15 @@ public:
 
     bool IsValid() const { return !(guid_ == hearth::utility::Guid()); }
 
-    // Whether this is the name that ends a group's children in a file.
+    // The text as an atom "kfmn" of 40 bytes, padded with NULs; the hash isn't stored. Both throw the chunk service's code.
+    //
+    // Read interns what it reads, whether or not this process has ever heard of it. Write needs a name whose text the pool knows, or one
+    // that isn't set, which is the name of the empty text; it throws the int 3 on any other.
+    void Read(CKF_File* file, CKF_ChunkInfo const* parent);
+    void Write(CKF_File* file) const;
+
+    // The name that ends a group's children in a file.
+    static void WriteEndOfGroupMarker(CKF_File* file);
     bool IsEndOfGroupMarker() const;
 
     void DebugLog(char const*) const {}

@@ -4,6 +4,7 @@
 #include "keystore/attributes.h"
 #include "keystore/stream.h"
 #include "tree/listener_private.h"
+#include "tree/streambase_private.h"
 #include "tree/streamgroup.h"
 
 #include <exception>
@@ -57,6 +58,11 @@ int KFS_StreamBase::Death()
     KFSp_DestroyMainListenerManager();
     delete std::exchange(S_KFS_EndOfIDPathSentinelMatchName, nullptr);
     return 0;
+}
+
+KFS_MatchName const& KFSp_GetEndOfIDPathSentinelMatchName()
+{
+    return *S_KFS_EndOfIDPathSentinelMatchName;
 }
 
 KFS_StreamBase::KFS_StreamBase(KFS_MatchName const* name, KFS_StreamFactory* factory, bool canonical)

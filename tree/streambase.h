@@ -7,10 +7,12 @@
 #include "frame/services/threads.h"
 #include "tree/matchname.h"
 #include "tree/paramdef.h"
+#include "tree/streampath.h"
 
 #include <boost/any.hpp>
 
 #include <set>
+#include <vector>
 
 class GetRenderGuidFilter;
 class KFS_ClientRefCon;
@@ -56,6 +58,12 @@ enum KFS_ListenerState : int {
     KFS_ListenerState_Silent = 2,
 };
 
+// What identifies a stream among all streams of an application, in a form that survives outside the process.
+struct KFS_API KFS_StreamCapsuleData {
+    KFS_StreamIDPath path;  // from the stream's root; empty on a canonical instance
+    u16str id;              // the root's identifier followed by the path as JSON; a canonical instance's match name
+};
+
 // Any node of a stream tree: a leaf (KFS_Stream) or an interior node (KFS_StreamGroup). It knows its name, its flags, its parent and
 // its factory; it doesn't own its children, and its destructor doesn't detach it from its parent.
 //
@@ -64,7 +72,7 @@ enum KFS_ListenerState : int {
 // The virtual operations' order is part of the binary interface: hosts derive from this class.
 //
 // Threads: structure and flags change on one thread at a time, by contract with the host. The getters that fill a value on demand
-// (display name, 16-bit match name) are safe under concurrent readers.
+// (display name, 16-bit match name, capsule data, host value) are safe under concurrent readers.
 class KFS_API KFS_StreamBase : public Q_MemTrackedObject {
 public:
     virtual ~KFS_StreamBase();
@@ -153,6 +161,21 @@ public:
     bool IsHiddenByAncestor() const;
     bool IsNotAnimated(bool evenIfDisabled) const { return !IsAnimated(evenIfDisabled); }
 
+    // The path to this node, and in `root` its topmost ancestor, the node itself if it has no parent; null if that is a leaf. Slow,
+    // because an indexed group searches for each child. `root` and `path` must not be null.
+    void SlowGetPathFromRootToMe(KFS_StreamGroup** root, KFS_StreamIDPath* path);
+    void SlowGetPathFromRootToMe(KFS_StreamGroup const** root, KFS_StreamIDPath* path) const;
+    // Of the place that the node has when first asked: the answer is kept and doesn't follow the node through the tree.
+    KFS_StreamCapsuleData const& GetStreamCapsuleData() const;
+
+    // These ask the factory.
+    KFS_StreamBase* CreateStream(KFS_MatchName const& name, bool constant, unsigned int timeScale, bool reportIfUnknown,
+                                 bool canonical);
+    KFS_StreamBase* GetCanonicalStream(KFS_MatchName const& name) const;
+    void RegisterObsoleteStreamParent(KFS_MatchName const& obsoleteName, KFS_MatchName const& parentName);
+    // For this stream, as it was read from an old project.
+    bool GatherObsoleteReplacementStreams(std::vector<KFS_Stream*>& replacements);
+
     FX_ParamDef& GetParamDef();
     FX_ParamDef const& GetParamDef() const;
     void SetParamDef(FX_ParamDef const& def);
@@ -225,8 +248,10 @@ private:
     mutable u16str displayName_;
     mutable u16str matchName16_;
     mutable KFS_ClientRefCon* refCon_ = nullptr;
+    mutable KFS_StreamCapsuleData capsuleData_;
     mutable boost::any smDataPath_;
-    mutable hearth::threads::RecursiveMutex lock_{nullptr};     // guards displayName_, matchName16_ and smDataPath_
+    // Guards displayName_, matchName16_, capsuleData_ and smDataPath_. Whoever holds it may take an ancestor's or the factory's.
+    mutable hearth::threads::RecursiveMutex lock_{nullptr};
 };
 
 // Holds a stream independent, or not, for a scope.

@@ -16,6 +16,8 @@
 
 #include "frame/services/export.h"
 
+struct CKF_File;
+
 // What callers may touch of a list. Everything behind `count` belongs to the service.
 struct SEQ_Head {
     void* reserved;  // not used by the service
@@ -165,3 +167,15 @@ KFS_SERVICE_API int SEQ_Compact(SEQ_Head** list);
 
 // Sets the count. New items are zero; items beyond the count are disposed, last first, down to one that refuses.
 KFS_SERVICE_API int SEQ_SetNumItems(int count, SEQ_Head** list, long reserved);
+
+// ---- files
+
+// Writes the list into a chunk file at its present place, as one atom "seql": item size, count, and the items' bytes as
+// they are, one behind the other. Swapping is the caller's. Result: 0 or the chunk file's code.
+KFS_SERVICE_API int SEQ_Write(SEQ_Head const* const* list, CKF_File* file);
+
+// Reads the next "seql" of the innermost open list into a new list without item functions. The chunk must hold exactly
+// the items that it claims, which is checked before anything is allocated; SEQ_Err_BadChunk, and the file has then
+// failed with that code. On failure `list` is untouched.
+inline constexpr int SEQ_Err_BadChunk = 0x1507;
+KFS_SERVICE_API int SEQ_Read(CKF_File* file, SEQ_Head*** list);

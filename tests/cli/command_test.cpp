@@ -250,6 +250,12 @@ TEST(Kfs, BadTimesAreOneLineAndCodeTwo)
     ExpectFailure(RunKfs({"eval", Sample(), "--fps", "1000000"}), "--fps: asks for more than 1000000 times");
 }
 
+TEST(Kfs, AnUnknownFormatIsAnsweredWithThoseThatExist)
+{
+    EXPECT_EQ("--format: xml not in {table,csv,json}\nRun with --help for more information.\n",
+              RunKfs({"eval", Sample(), "--format", "xml"}).errors);
+}
+
 // Mistakes on the command line itself.
 TEST(Kfs, UsageErrorsPointToTheHelp)
 {

@@ -3,6 +3,7 @@
 #include "curves/floatkeys.h"
 #include "curves/spatial_private.h"
 #include "frame/errors.h"
+#include "frame/services/memory.h"
 #include "keystore/items.h"
 #include "tests/curves/pathstream.h"
 
@@ -159,6 +160,17 @@ TEST_F(InterpolateSpatial, AnswersTheSameWhateverTheHint)
             EXPECT_EQ(expected, Interpolate(stream, time, hint)) << "at " << time << " with hint " << hint;
         }
     }
+}
+
+TEST_F(InterpolateSpatial, NeedsNoMemory)
+{
+    std::mt19937 random(6);
+    PathStream stream = RandomPath(random, 3, 5, KFS_Interp_Spline);
+    stream.At(50);
+    Q_FailAllocation(1);
+    for (int time = 3; time < 2400; time += 41) stream.At(time);
+    EXPECT_FALSE(Q_FailAllocationFired());
+    Q_FailAllocation(0);
 }
 
 TEST_F(InterpolateSpatial, StaysOnTheFirstAnchorOfAHold)

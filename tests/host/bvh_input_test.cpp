@@ -161,7 +161,7 @@ TEST_F(BvhInput, SurvivesAnything)
     std::string const good = Good;
     std::uniform_int_distribution<std::size_t> place(0, good.size() - 1);
     std::uniform_int_distribution<int> byte(0, 255);
-    for (int round = 0; round < 600; ++round) {
+    for (int round = 0; round < 300; ++round) {
         std::string text = good;
         for (int change = 0; change <= round % 3; ++change) {
             text[place(random)] = static_cast<char>(byte(random));

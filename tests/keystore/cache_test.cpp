@@ -3,6 +3,7 @@
 #include "keystore/attributes.h"
 #include "keystore/cachestate.h"
 #include "keystore/lookup.h"
+#include "tests/support/ownedvalues.h"
 #include "tests/support/streams.h"
 
 #include <cstdlib>
@@ -168,8 +169,9 @@ struct Owned {
         ++live;
         return 0;
     }
-    static int Dispose(KFS_Stream const*, long, short, void* block)
+    static int Dispose(KFS_Stream const* stream, long, short, void* block)
     {
+        EXPECT_EQ(KFS_StreamValidStamp, stream->GetStamp()) << "a stream that dies is whole until its values are given back";
         int* held = nullptr;
         std::memcpy(&held, block, sizeof held);
         std::free(held);
@@ -207,6 +209,32 @@ TEST_F(Cache, CustomValuesAreNeverShared)
         ASSERT_EQ(0, KFS_DisposeValue(&stream, &out));
     }
     EXPECT_EQ(0, Owned::live);
+}
+
+TEST_F(Cache, AKeyThatCannotBeCopiedLeavesItEmpty)
+{
+    OwnedValues::Reset();
+    {
+        const std::unique_ptr<KFS_Stream> stream = OwnedValues::MakeStream(false);
+        for (const int time : {0, 100}) {
+            const T_Time at{time, 600};
+            const OwnedValues::Ticket ticket = OwnedValues::Make(time);
+            ASSERT_EQ(0, KFS_InsertKey(stream.get(), &at, 1, &ticket, KFS_Interp_Linear, KFS_Interp_Linear));
+            OwnedValues::Free(ticket);
+        }
+        OwnedValues::Ticket out{};
+        const T_Time atKey{100, 600}, before{-5, 600};
+        OwnedValues::copyCode = 77;
+        for (T_Time const* const at : {&atKey, &before}) {
+            EXPECT_EQ(77, KFS_GetValue(stream.get(), at, 0, &out, nullptr, nullptr));
+            EXPECT_TRUE(KFSp_CacheIsEmpty(stream->GetCache())) << "its value would be disposed though nobody made it";
+        }
+        OwnedValues::copyCode = 0;
+        ASSERT_EQ(0, KFS_GetValue(stream.get(), &atKey, 0, &out, nullptr, nullptr));
+        EXPECT_EQ(100.0, OwnedValues::Value(out));
+        OwnedValues::Free(out);
+    }
+    EXPECT_EQ(0, OwnedValues::Live());
 }
 
 // ---- renders on temporary clone contexts

@@ -21,6 +21,7 @@ class Engine : public KFS_ExpState {
 public:
     std::function<int(KFS_Stream const*, int, double*)> expression;
     KFS_Stream const* target = nullptr;
+    bool hasContext = true;
     bool canRun = true;
     int asked = 0;
 
@@ -58,7 +59,7 @@ public:
             bool CanEvaluate() const override { return can_; }
             bool can_;
         };
-        return boost::shared_ptr<KFS_ExprContext>(new Context(canRun));
+        return boost::shared_ptr<KFS_ExprContext>(hasContext ? new Context(canRun) : nullptr);
     }
 
 private:
@@ -103,9 +104,10 @@ TEST_F(Evaluate, TheStagesGoInTheirOrder)
         {"the host's flags don't", [] {}, 0xF0, 0, 1100.0, 0},
         {"switched off", [&] { info.SetFlags(KFS_ExprFlag_Disabled); }, 0, 0, 2.0, 1},
         {"the engine can't run now", [&] { info.SetFlags(0), engine->canRun = false; }, 0, 0, 2.0, 1},
+        {"there is no context to run it in", [&] { engine->hasContext = false; }, 0, 0, 2.0, 1},
         {"no value here: the keys answer",
          [&] {
-             engine->canRun = true;
+             engine->hasContext = engine->canRun = true;
              engine->expression = [](KFS_Stream const*, int, double*) -> int { return KFS_Err_ExprNoValue; };
          },
          0, 0, 2.0, 1},
@@ -249,9 +251,17 @@ TEST_F(Evaluate, WithoutAStateThatSaysHowThereIsACodeAndNoCrash)
     stream.Key(0, {1.0});
     const T_Time at{0, 600};
     double value = -1.0;
-    const Q_ScSetCurrentRenderContext bare(Q_RenderContext::MakeNewContext(false));
+    {
+        const Q_ScSetCurrentRenderContext bare(Q_RenderContext::MakeNewContext(false));
+        EXPECT_EQ(3, KFS_GetValueFPlus(stream, &at, 0, &value, nullptr, nullptr));
+        EXPECT_EQ((std::vector<Reported>{{0x1D0071, 8, "", 3}}), reports.Take());
+    }
+    const Q_ScSetCurrentRenderContext none(nullptr);
     EXPECT_EQ(3, KFS_GetValueFPlus(stream, &at, 0, &value, nullptr, nullptr));
-    EXPECT_EQ(3, reports.Take().at(0).code);
+    EXPECT_EQ(2U, reports.Take().size()) << "the missing context is reported by itself";
+    EXPECT_EQ(-1.0, value);
+    EXPECT_EQ(0, KFS_GetValuePlus(stream, &at, 0, &value, nullptr, nullptr, nullptr, 0)) << "the project has a context";
+    EXPECT_EQ(1.0, value);
 }
 
 TEST_F(Evaluate, AnOverridesValueTakesThePlaceOfTheKeys)
@@ -322,7 +332,7 @@ public:
 TEST_F(Evaluate, SeparatedDimensionsAnswerFromTheirFollowers)
 {
     KFS_ValueDesc desc;
-    desc.dataType = KFS_Type_Double;
+    desc.dataType = KFS_Type_U8;
     Leader leader(3, 600, 0, 0, 7, 0, desc, nullptr, nullptr, false);
     TestStream x, y;
     x.Key(0, {10.0}).Key(100, {20.0});
@@ -343,6 +353,7 @@ TEST_F(Evaluate, SeparatedDimensionsAnswerFromTheirFollowers)
     ASSERT_EQ(0, KFS_GetValueFPlus(&leader, &at, 0, separated, &atKey, nullptr));
     EXPECT_EQ((std::vector{15.0, 5.0, -1.0}), std::vector(separated, separated + 3)) << "without a follower a place stays";
     EXPECT_EQ(9, atKey);
+    leader.ForceInterpolateAtTime(at);  // whose buffer has to hold the followers' doubles, and not three bytes
     char** handle = nullptr;
     ASSERT_EQ(0, KFS_GetValuesFPlus(&leader, &at, &at, 2, 0, &handle));
     auto const* const values = reinterpret_cast<double const*>(*handle);
