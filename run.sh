@@ -4,6 +4,7 @@
 
 sample=examples/samples/bouncing_ball.gltf
 drawing=build/bouncing_ball.svg
+motion=build/bouncing_ball_motion.svg
 kfs=build/release/bin/kfs
 
 install_packages
@@ -17,6 +18,8 @@ step "its values"
 "$kfs" eval "$sample" || give_up
 step "its curves"
 "$kfs" plot "$sample" -o "$drawing" || give_up
+step "its motion path"
+"$kfs" plot --motion "$sample" --stream '*/translation' -o "$motion" || give_up
 
 echo
-echo "Built $kfs, read $sample, printed its values and drew its curves to $drawing."
+echo "Built $kfs, read $sample, printed its values and drew its curves to $drawing and its motion path to $motion."

@@ -11,6 +11,7 @@ public:
 
     double Low() const { return low_; }
     double High() const { return high_; }
+    double Step() const { return step_; }
     // The ticks inside the range.
     std::vector<double> Ticks() const;
     // As many places as the step needs, and no "-0".

@@ -25,13 +25,15 @@ struct PlotOptions {
     std::string output;
     std::string fps = "24";
     bool inFrames = false;
+    bool motion = false;  // routes in space in place of value graphs
 };
 
 void RunInfo(InfoOptions const& options);
 void RunEval(EvalOptions const& options);
 void RunPlot(PlotOptions const& options);
+void RunMotionPlot(PlotOptions const& options);
 
-// The scene of a selection's file.
+// The scene of a selection's file, with paths where the selection asks for them.
 kfshost::Scene LoadScene(Selection const& selection);
 
 // "24" or "30000/1001", above 0. Throws UserError.

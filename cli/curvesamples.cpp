@@ -60,13 +60,23 @@ private:
         char inInterp = 0;
         char outInterp = 0;
         ThrowIfFailed(KFS_GetKeyF(&stream_, index, row_.data(), &inInterp, &outInterp));
-        std::vector<double> inX(dimension_), inY(dimension_), outX(dimension_), outY(dimension_);
-        ThrowIfFailed(KFS_GetKeyTangentsF(&stream_, index, inX.data(), inY.data(), outX.data(), outY.data()));
         double const seconds = Seconds(KeyUnits(index));
         for (std::size_t d = 0; d < dimension_; ++d) {
             Point const key{seconds, row_[d]};
             curves_.components[d].keys.push_back(key);
             curves_.components[d].value.push_back(key);
+        }
+        if (!stream_.IsSpatial()) {  // a path's handles belong to the graph of its distance, not to these
+            AddHandles(index, seconds, inInterp, outInterp);
+        }
+    }
+
+    void AddHandles(int index, double seconds, char inInterp, char outInterp)
+    {
+        std::vector<double> inX(dimension_), inY(dimension_), outX(dimension_), outY(dimension_);
+        ThrowIfFailed(KFS_GetKeyTangentsF(&stream_, index, inX.data(), inY.data(), outX.data(), outY.data()));
+        for (std::size_t d = 0; d < dimension_; ++d) {
+            Point const key{seconds, row_[d]};
             if (inInterp == KFS_Interp_Spline && inX[d] < 0.0) {
                 curves_.handles.push_back({d, key, {key.x + inX[d], key.y + inY[d]}});
             }

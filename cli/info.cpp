@@ -1,6 +1,7 @@
 #include "cli/commands.h"
 #include "cli/output.h"
 #include "cli/table.h"
+#include "host/paths.h"
 
 #include <fmt/format.h>
 
@@ -29,6 +30,17 @@ std::string Summary(kfshost::Scene const& scene, std::vector<StreamItem const*> 
     text += fmt::format("\ntimes in 1/{} s: ", scene.timeScale);
     return text + (scene.exactTimes ? "every key time is exactly what the file says\n"
                                     : fmt::format("key times are rounded by up to {:.2g} s\n", scene.worstTimeError));
+}
+
+// What goes on between keys. Of a path the file's word is about its route; its keys tell whether they float.
+std::string Interpolation(StreamItem const& item)
+{
+    std::string const name(NameOf(item.interpolation));
+    if (!item.stream->IsSpatial()) {
+        return name;
+    }
+    std::size_t const floating = kfshost::FloatKeyCount(*item.stream);
+    return name + (floating == 0 ? " path" : fmt::format(" path, {}", Plural(floating, "float key", "float keys")));
 }
 
 std::string Joined(std::vector<std::string> const& names)
@@ -60,8 +72,7 @@ void RunInfo(InfoOptions const& options)
         table.AddRow({item->path, std::string(NameOf(item->kind)), std::to_string(item->stream->GetDimension()),
                       Joined(item->components), std::to_string(keys),
                       keys == 0 ? "-" : TimeText(kfshost::KeyTime(*item->stream, 0)),
-                      keys == 0 ? "-" : TimeText(kfshost::KeyTime(*item->stream, keys - 1)),
-                      std::string(NameOf(item->interpolation))});
+                      keys == 0 ? "-" : TimeText(kfshost::KeyTime(*item->stream, keys - 1)), Interpolation(*item)});
     }
     WriteToStandardOutput(Summary(scene, items) + '\n' + table.ToText());
 }

@@ -39,6 +39,14 @@ void AddSelection(CLI::App& command, Selection& selection)
                     "hold times in this many units a second (default: chosen so that key times are exact)")
         ->check(CLI::PositiveNumber)
         ->type_name("N");
+    command
+        .add_option_function<std::string>(
+            "--as", [&selection](std::string const& name) { selection.asPaths = name == "spatial"; },
+            "spatial: hold positions as paths, with one speed graph each (default: plain)")
+        ->check(CLI::IsMember({"plain", "spatial"}))
+        ->type_name("FORM");
+    command.add_flag("--rove", selection.roving,
+                     "with --as spatial: let all keys but the first and the last float, which smooths the speed");
 }
 
 void AddInfo(CLI::App& app, InfoOptions& options)
@@ -77,16 +85,35 @@ void AddEval(CLI::App& app, EvalOptions& options)
     command->callback([&options] { RunEval(options); });
 }
 
+void RunEitherPlot(PlotOptions& options, bool formGiven)
+{
+    if (!options.motion) {
+        RunPlot(options);
+        return;
+    }
+    if (formGiven && !options.selection.asPaths) {
+        throw UserError("--motion", "draws paths, so it can't go with --as plain");
+    }
+    options.selection.asPaths = true;
+    RunMotionPlot(options);
+}
+
 void AddPlot(CLI::App& app, PlotOptions& options)
 {
-    CLI::App* const command = app.add_subcommand("plot", "Draw value and speed graphs into an SVG file");
+    CLI::App* const command =
+        app.add_subcommand("plot", "Draw value and speed graphs, or motion paths, into an SVG file");
     AddSelection(*command, options.selection);
     command->add_option("-o,--output", options.output, "the drawing; - for the standard output")
         ->required()
         ->type_name("SVG");
+    command->add_flag(
+        "--motion", options.motion,
+        "draw positions as routes in space, with their keys, tangents and a dot a frame, over their speed");
     command->add_flag("--frames", options.inFrames, "label the time axis in frames");
-    command->add_option("--fps", options.fps, "frames a second for --frames")->type_name("RATE")->capture_default_str();
-    command->callback([&options] { RunPlot(options); });
+    command->add_option("--fps", options.fps, "frames a second for --frames and --motion")
+        ->type_name("RATE")
+        ->capture_default_str();
+    command->callback([&options, command] { RunEitherPlot(options, command->count("--as") > 0); });
 }
 
 int Fail(std::string const& message)
@@ -99,8 +126,15 @@ int Fail(std::string const& message)
 
 kfshost::Scene LoadScene(Selection const& selection)
 {
+    if (selection.roving && !selection.asPaths) {
+        throw UserError("--rove", "only paths have keys that can float: add --as spatial");
+    }
     try {
-        return kfshost::ImportFile(selection.file, {selection.timeScale});
+        kfshost::Scene scene = kfshost::ImportFile(selection.file, {selection.timeScale});
+        if (selection.asPaths) {
+            HoldAsPaths(scene, selection);
+        }
+        return scene;
     } catch (kfshost::ImportError const& error) {
         throw UserError(selection.file, error.what());
     }
@@ -118,6 +152,7 @@ try {
                "  kfs info walk.glb\n"
                "  kfs eval walk.glb --stream '*/Hips/*' --fps 30 --format csv\n"
                "  kfs plot walk.glb --stream '*/Hips/translation' -o hips.svg\n"
+               "  kfs plot walk.glb --motion --stream '*/Hips/translation' -o path.svg\n"
                "\n"
                "Errors are one line on the standard error and exit code 2; nothing is written then.");
     InfoOptions info;

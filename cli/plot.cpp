@@ -2,6 +2,7 @@
 #include "cli/commands.h"
 #include "cli/curvesamples.h"
 #include "cli/output.h"
+#include "cli/panel.h"
 #include "cli/usererror.h"
 
 #include <fmt/format.h>
@@ -17,9 +18,8 @@ namespace {
 constexpr std::size_t MostStreams = 6;
 constexpr std::size_t MostLegendLines = 14;
 
-constexpr double Width = 1600.0;
-constexpr double Left = 110.0;
-constexpr double Right = 1360.0;
+constexpr double Left = PanelLeft;
+constexpr double Right = PanelRight;
 constexpr double HeaderHeight = 76.0;
 constexpr double TitleHeight = 40.0;
 constexpr double ValueHeight = 300.0;
@@ -73,78 +73,12 @@ std::string_view ColorOf(StreamItem const& item, std::size_t component)
     return Colors[axis == std::string_view::npos ? component % Colors.size() : axis];
 }
 
-// The time axis of all panels: seconds, or frames.
-struct TimeUnit {
-    std::string name;
-    double perSecond;
-    double leastStep;
-};
-
-TimeUnit UnitOf(PlotOptions const& options)
-{
-    if (!options.inFrames) {
-        return {"seconds", 1.0, 0.0};
-    }
-    auto const fps = ParseFps(options.fps);
-    return {"frames at " + fps.ToString() + " a second", fps.ToDouble(), 1.0};
-}
-
-// One graph: maps what it shows to the drawing.
-class Panel {
-public:
-    Panel(double top, double height, Axis const& time, Axis const& values)
-        : top_(top),
-          height_(height),
-          time_(time),
-          values_(values)
-    {}
-
-    double Bottom() const { return top_ + height_; }
-    double X(double time) const { return Left + (time - time_.Low()) / (time_.High() - time_.Low()) * (Right - Left); }
-    double Y(double value) const
-    {
-        return Bottom() - (value - values_.Low()) / (values_.High() - values_.Low()) * height_;
-    }
-
-    void DrawFrame(Svg& svg, std::string const& caption) const
-    {
-        Pen const grid{"#e4e4e4"};
-        svg.Rectangle({Left, top_}, Right - Left, height_, "#fcfcfc", {"none"});
-        for (double const tick : time_.Ticks()) {
-            svg.Line({X(tick), top_}, {X(tick), Bottom()}, grid);
-        }
-        for (double const tick : values_.Ticks()) {
-            bool const isZero = values_.Label(tick) == values_.Label(0.0);
-            svg.Line({Left, Y(tick)}, {Right, Y(tick)}, isZero ? Pen{"#b4b4b4"} : grid);
-            svg.Text({Left - 10, Y(tick) + 4.5}, values_.Label(tick), {13.0, "#444444", Anchor::End});
-        }
-        svg.Rectangle({Left, top_}, Right - Left, height_, "none", {"#8c8c8c"});
-        svg.Text({Left, top_ - 8}, caption, {13.0, "#666666"});
-    }
-
-    void DrawTimeLabels(Svg& svg, std::string const& unit) const
-    {
-        for (double const tick : time_.Ticks()) {
-            svg.Line({X(tick), Bottom()}, {X(tick), Bottom() + 5}, {"#8c8c8c"});
-            svg.Text({X(tick), Bottom() + 20}, time_.Label(tick), {13.0, "#444444", Anchor::Middle});
-        }
-        svg.Text({(Left + Right) / 2, Bottom() + 40}, unit, {13.0, "#666666", Anchor::Middle});
-    }
-
-private:
-    double top_;
-    double height_;
-    Axis const& time_;
-    Axis const& values_;
-};
-
 class Plot {
 public:
     Plot(PlotOptions const& options, kfshost::Scene const& scene, std::vector<StreamItem const*> const& all)
-        : unit_(UnitOf(options)),
+        : unit_(MakeTimeUnit(options)),
           shown_(all.begin(), all.begin() + static_cast<std::ptrdiff_t>(std::min(all.size(), MostStreams))),
-          svg_(Width, HeaderHeight + StreamHeight * static_cast<double>(shown_.size())),
-          time_(TimeAxis())
+          time_(MakeTimeAxis(unit_, shown_))
     {
         DrawHeader(scene.name, all.size());
     }
@@ -156,18 +90,10 @@ public:
             DrawStream(*item, top);
             top += StreamHeight;
         }
-        return svg_.Finish();
+        return svg_.Finish(DrawingWidth, top);
     }
 
 private:
-    Axis TimeAxis() const
-    {
-        auto const span = SpanOf(shown_).value_or(TimeSpan{});
-        Range const keys{span.first.ToDouble() * unit_.perSecond, span.last.ToDouble() * unit_.perSecond};
-        Range const range = WithAir(keys, 0.02, keys.low == keys.high ? unit_.perSecond : 1e-9);
-        return {range.low, range.high, 12, unit_.leastStep};
-    }
-
     void DrawHeader(std::string const& name, std::size_t selected)
     {
         svg_.Text({Left, 38}, name, {22.0, "#111111", Anchor::Start, true});
@@ -187,36 +113,25 @@ private:
 
     void DrawStream(StreamItem const& item, double top)
     {
-        svg_.Text({Left, top + 14}, Shortened(item.path, 110), {15.0, "#111111", Anchor::Start, true});
+        svg_.Text({Left, top + 14}, ShortenedPath(item.path), {15.0, "#111111", Anchor::Start, true});
         double const valueTop = top + TitleHeight;
         double const pointsPerUnit = (Right - Left) / (time_.High() - time_.Low());
         StreamCurves const curves = SampleCurves(item, pointsPerUnit * unit_.perSecond);
         bool const showHandles = PixelsPerKey(curves) >= 14.0;
 
         Axis const values = ValueAxis(curves, showHandles);
-        Panel const valuePanel(valueTop, ValueHeight, time_, values);
-        valuePanel.DrawFrame(svg_, std::string(NameOf(item.kind)) + ", " + std::string(NameOf(item.interpolation)));
+        Panel const valuePanel({Left, valueTop, Right - Left, ValueHeight}, time_, values);
+        valuePanel.DrawFrame(svg_, std::string(NameOf(item.kind)) + ", " + std::string(NameOf(item.interpolation)) +
+                                       (item.stream->IsSpatial() ? " along a path" : ""));
         DrawCurves(valuePanel, item, curves, &ComponentCurve::value);
         DrawKeys(valuePanel, item, curves, showHandles);
         DrawLegend(item, curves, valueTop);
 
         Axis const speeds = SpeedAxis(curves, values);
-        Panel const speedPanel(valuePanel.Bottom() + PanelGap, SpeedHeight, time_, speeds);
+        Panel const speedPanel({Left, valuePanel.Bottom() + PanelGap, Right - Left, SpeedHeight}, time_, speeds);
         speedPanel.DrawFrame(svg_, "speed, units a second");
         DrawCurves(speedPanel, item, curves, &ComponentCurve::speed);
-        speedPanel.DrawTimeLabels(svg_, unit_.name);
-    }
-
-    static std::string Shortened(std::string const& text, std::size_t most)
-    {
-        if (text.size() <= most) {
-            return text;
-        }
-        std::size_t start = text.size() - most;
-        while ((static_cast<unsigned char>(text[start]) & 0xC0) == 0x80) {
-            ++start;
-        }
-        return "..." + text.substr(start);
+        speedPanel.DrawLabelsBelow(svg_, unit_.name);
     }
 
     // How far apart keys are on average.

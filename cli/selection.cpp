@@ -1,6 +1,7 @@
 #include "cli/selection.h"
 
 #include "cli/usererror.h"
+#include "host/paths.h"
 
 #include <fmt/format.h>
 
@@ -11,11 +12,34 @@
 using kfshost::Rational;
 using kfshost::StreamItem;
 
+namespace {
+
+bool Matches(StreamItem const& item, Selection const& selection)
+{
+    return fnmatch(selection.glob.c_str(), item.path.c_str(), 0) == 0;
+}
+
+void HoldAsPath(StreamItem& item, Selection const& selection)
+{
+    if (kfshost::KeyCount(*item.stream) > kfshost::MaxPathKeys) {
+        throw UserError(item.path, fmt::format("has more than {} keys, too many for a path", kfshost::MaxPathKeys));
+    }
+    if (selection.roving && item.interpolation == kfshost::SourceInterpolation::Step) {
+        throw UserError(item.path, "steps from key to key, so there is no way on which keys could rove");
+    }
+    item.stream = kfshost::MakePath(item);
+    if (selection.roving) {
+        kfshost::LetInnerKeysFloat(*item.stream);
+    }
+}
+
+}  // namespace
+
 std::vector<StreamItem const*> SelectStreams(kfshost::Scene const& scene, Selection const& selection)
 {
     std::vector<StreamItem const*> items;
     for (StreamItem const& item : scene.streams) {
-        if (fnmatch(selection.glob.c_str(), item.path.c_str(), 0) == 0) {
+        if (Matches(item, selection)) {
             items.push_back(&item);
         }
     }
@@ -28,6 +52,22 @@ std::vector<StreamItem const*> SelectStreams(kfshost::Scene const& scene, Select
                                     selection.glob, scene.streams.size()));
     }
     return items;
+}
+
+void HoldAsPaths(kfshost::Scene& scene, Selection const& selection)
+{
+    std::size_t const selected = SelectStreams(scene, selection).size();
+    bool any = false;
+    for (StreamItem& item : scene.streams) {
+        if (Matches(item, selection) && kfshost::IsPosition(item)) {
+            HoldAsPath(item, selection);
+            any = true;
+        }
+    }
+    if (!any) {
+        throw UserError(selection.file,
+                        fmt::format("none of the {} chosen streams is a position in 2 or 3 dimensions", selected));
+    }
 }
 
 std::optional<TimeSpan> SpanOf(std::vector<StreamItem const*> const& items)

@@ -11,10 +11,15 @@ struct Selection {
     std::string file;
     std::string glob = "*";
     unsigned int timeScale = 0;
+    bool asPaths = false;  // positions are to be held as spatial streams
+    bool roving = false;   // and their inner keys are to float; only with asPaths
 };
 
 // The streams whose paths the pattern matches, in the scene's order. Throws UserError when there are none.
 std::vector<kfshost::StreamItem const*> SelectStreams(kfshost::Scene const& scene, Selection const& selection);
+
+// Makes paths of those of the selected streams that are positions. Throws UserError when there are none.
+void HoldAsPaths(kfshost::Scene& scene, Selection const& selection);
 
 struct TimeSpan {
     kfshost::Rational first;

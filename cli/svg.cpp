@@ -45,12 +45,12 @@ std::string_view NameOf(Anchor anchor)
 
 }  // namespace
 
-Svg::Svg(double width, double height)
-    : text_(fmt::format("<svg xmlns=\"http://www.w3.org/2000/svg\" viewBox=\"0 0 {0:.0f} {1:.0f}\" width=\"{0:.0f}\" "
-                        "height=\"{1:.0f}\" font-family=\"DejaVu Sans, Helvetica, Arial, sans-serif\">\n",
-                        width, height))
+std::string Svg::Finish(double width, double height) const
 {
-    Rectangle({0, 0}, width, height, "#ffffff", {"none"});
+    return fmt::format("<svg xmlns=\"http://www.w3.org/2000/svg\" viewBox=\"0 0 {0:.0f} {1:.0f}\" width=\"{0:.0f}\" "
+                       "height=\"{1:.0f}\" font-family=\"DejaVu Sans, Helvetica, Arial, sans-serif\">\n"
+                       "<rect width=\"{0:.0f}\" height=\"{1:.0f}\" fill=\"#ffffff\"/>\n{2}</svg>\n",
+                       width, height, text_);
 }
 
 void Svg::Rectangle(Point corner, double width, double height, std::string_view fill, Pen const& border)

@@ -29,8 +29,6 @@ struct Font {
 // An SVG drawing as it grows.
 class Svg {
 public:
-    Svg(double width, double height);
-
     void Rectangle(Point corner, double width, double height, std::string_view fill, Pen const& border);
     void Line(Point from, Point to, Pen const& pen);
     // Nothing for fewer than two points.
@@ -41,7 +39,8 @@ public:
     // The text stands on the line through `at`.
     void Text(Point at, std::string_view text, Font const& font);
 
-    std::string Finish() const { return text_ + "</svg>\n"; }
+    // The whole drawing, on white.
+    std::string Finish(double width, double height) const;
 
 private:
     std::string text_;

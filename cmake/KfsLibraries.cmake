@@ -4,6 +4,7 @@ find_package(Boost 1.74 REQUIRED COMPONENTS thread)
 find_package(PkgConfig REQUIRED)
 pkg_check_modules(KFS_XXHASH REQUIRED IMPORTED_TARGET libxxhash)
 find_package(Threads REQUIRED)
+find_package(nlohmann_json REQUIRED)
 
 # What every shared library here has in common. Calls inside a library don't go through the PLT and can be inlined, and
 # a thread-local is one load: hence the last four. The TLS model costs a few bytes of the loader's static TLS space.
@@ -29,7 +30,9 @@ kfs_shared_library(kfs_services)
 kfs_library_code(kfs_services)
 target_include_directories(kfs_services PUBLIC
     $<BUILD_INTERFACE:${PROJECT_SOURCE_DIR}> $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}/kfs>)
-target_link_libraries(kfs_services PUBLIC Boost::headers PRIVATE PkgConfig::KFS_XXHASH Threads::Threads)
+target_link_libraries(kfs_services
+    PUBLIC Boost::headers
+    PRIVATE PkgConfig::KFS_XXHASH nlohmann_json::nlohmann_json Threads::Threads)
 
 set(KFS_LIBRARY_FOLDERS frame tree keystore curves persist overrides)
 kfs_sources(librarySources ${KFS_LIBRARY_FOLDERS})

@@ -10,8 +10,8 @@ inline constexpr char KFSp_Tangents_Spatial = 2;
 //
 //   time   the key's, in the stream's scale.
 //   key    the record to fill, an item of the list or the cache record of a key that is about to enter the list. Its
-//          codes must be set, and on a spatial stream its spFlags. Written although the stream is const: what is derived
-//          may be repaired by readers.
+//          codes must be set, and on a spatial stream its spFlags. Written although the stream is const: what is
+//          derived may be repaired by readers.
 //
 // Speed is the slope from the key before to the key after; next to one linear side it is the slope of that side, so
 // that the curve leaves the straight part smoothly. Both sides get the same speed and the influence KFSp_OneSixth.

@@ -70,9 +70,9 @@ int FloatRun::BuildGraph()
     return CRV_CurveSetNonDecreasing(&graph_.curve, nullptr);
 }
 
-// The part of the way, in time units from the earlier anchor, cut off towards the earlier time. Keys that all lie on
-// one point have no way.
-long long LinearOffset(double fraction, int from, int to)
+// The time at a part of the way between the anchors, its fraction of a unit cut off towards time 0. Keys that all lie
+// on one point have no way.
+long long LinearTime(double fraction, int from, int to)
 {
     double const exact = static_cast<double>(KFSp_TimeDifference(to, from)) * fraction + static_cast<double>(from);
     if (!(exact >= static_cast<double>(INT_MIN) && exact <= static_cast<double>(INT_MAX))) return from;
@@ -86,7 +86,7 @@ int FloatRun::ProposeTime(double s, long long* time)
     *time = prev_->time;
     if (prev_->outInterp == KFS_Interp_Hold) return 0;
     switch (KFSp_GetSegmentKind(prev_->outInterp, next_->inInterp)) {
-    case KFSp_SegmentKind::Linear: *time = LinearOffset(s / total_, prev_->time, next_->time); return 0;
+    case KFSp_SegmentKind::Linear: *time = LinearTime(s / total_, prev_->time, next_->time); return 0;
     case KFSp_SegmentKind::Curved: break;
     default: return 0;
     }
@@ -111,7 +111,7 @@ int FloatRun::MakeFree(int index, int* time) const
         if (even) {
             twoTriesAgo = *time;
         }
-        *time += found > index ? -1 : 1;
+        *time = KFSp_TimeDifference(*time, found > index ? 1 : -1);
         // Between two taken times it would swing to and fro until the tries, an even number, are used up.
         if (!even && *time == twoTriesAgo) break;
     }

@@ -30,6 +30,7 @@ KFS_API int KFS_SetKeyFloat(KFS_Stream* stream, unsigned char on, int index);
 // Operation 33. Result: 0, or
 //   2                    the stream is damaged
 //   7427 KFS_Err_NoKeys  no key, or a constant without a value
+//   7430 KFS_Err_TimeNotRepresentable  KFS_INVALID_INDEX as the new time, which says that there is no key
 //   the time service's, the list service's, a listener's. A failure while the key is moved leaves it removed.
 // Threads: main thread. Cost: a search, a removal and an insertion, and the float keys around.
 KFS_API int KFS_SetKeyTime(KFS_Stream* stream, int index, T_Time const* newTime, int newTimeValue, int* newIndex,

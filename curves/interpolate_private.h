@@ -18,4 +18,5 @@ int KFSp_Interpolate(KFS_Stream const* stream, long refcon, int time, int keyInd
 int KFSp_InterpDeriv(KFS_Stream const* stream, long refcon, int time, int keyIndex);
 
 // KFSp_Interpolate between two keys at hand, into `result`: what a read calls that has found the keys already.
-int KFSp_InterpolateBetween(KFS_Stream const* stream, KFS_KeyScalar const* a, KFS_KeyScalar const* b, int time, double* result);
+int KFSp_InterpolateBetween(KFS_Stream const* stream, KFS_KeyScalar const* a, KFS_KeyScalar const* b, int time,
+                            double* result);

@@ -3,6 +3,7 @@
 #include "curves/neighbours_private.h"
 #include "curves/segment_private.h"
 #include "curves/tangents.h"
+#include "frame/boundary_private.h"
 #include "frame/report_private.h"
 #include "keystore/cache_private.h"
 #include "keystore/edit_private.h"
@@ -137,17 +138,31 @@ int MakeRoom(Move* move)
     return code;
 }
 
-// Takes the key out into the cache record and puts it back at its new time.
+int Notify(KFS_Stream* stream)
+{
+    return KFSp_Boundary([stream] { stream->NotifyValueChanged(); });
+}
+
+// Takes the key out into the cache record and puts it back at its new time. Removal and insertion are changes of their
+// own to whoever listens. But a listener that reads writes the cache record, in which the key stands in between, so
+// both are told once it is back.
 int Reinsert(Move* move)
 {
-    int const removed = move->stream->RemoveKey(move->index, 1);
+    int const removed = KFSp_TakeKeyOut(move->stream, move->index, true);
     KFS_KeyScalar* const cache = move->data->cache;
     // What the record holds after a failure is the key only if the list has given it up.
     if (!KFSp_CacheIsEmpty(cache)) {
         cache->time = move->target;
     }
     if (removed != 0) return removed;
-    return KFSp_InsertKeyFromCache(1, 1, 1, 1, move->stream, &move->newIndex);
+    KFSp_FirstError error;
+    error.Keep(KFSp_PutKeyFromCache(1, 1, 1, 1, move->stream, &move->newIndex));
+    bool const inserted = error.None();
+    error.Keep(Notify(move->stream));
+    if (inserted && error.None()) {
+        error.Keep(Notify(move->stream));
+    }
+    return error.Code();
 }
 
 int MoveInList(Move* move)
@@ -200,6 +215,9 @@ int KFS_SetKeyTime(KFS_Stream* stream, int index, T_Time const* newTime, int new
         Move move{stream, data, index, newTimeValue};
         if (newTime) {
             if (int const code = KFSp_TimeInStream(stream, newTime, &move.target); code != 0) return code;
+        }
+        if (move.target == KFS_INVALID_INDEX) {  // as a record's time it says that there is no value
+            return KFSp_ReportErr(KFSp_Op_SetKeyTime, KFS_Err_TimeNotRepresentable, KFSp_Row_AlterKey);
         }
         int const code = SetKeyTime(&move);
         if (oldTime) {

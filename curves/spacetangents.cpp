@@ -12,6 +12,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <limits>
 
 namespace {
 
@@ -75,11 +76,17 @@ int RepairTangents(KFS_Stream const* stream, KFS_StreamKeyData const* data, int 
     return index >= stale[0] && index <= stale[1] ? stream->UpdateStream() : 0;
 }
 
+// Any number may come here: a constant's index isn't looked at, and a mark behind the list is none.
+int IndexBehind(int index)
+{
+    return index < std::numeric_limits<int>::max() ? index + 1 : index;
+}
+
 // From now on the arcs around the key are measured anew, and its tangents are the user's.
 void MarkEdited(KFS_Stream* stream, int index, KFSp_FirstError& error)
 {
-    error.Keep(stream->SetArcInvalid(index + 1, 2));
-    error.Keep(stream->SetInvalid(index + 1, 2));
+    error.Keep(stream->SetArcInvalid(IndexBehind(index), 2));
+    error.Keep(stream->SetInvalid(IndexBehind(index), 2));
     error.Keep(KFSp_UnsetKeySpaceFlags(stream, KFS_KeySpFlag_Modifiable, index));
 }
 
@@ -104,6 +111,15 @@ int SetTangents(KFS_Stream* stream, int index, void const* inTangent, void const
         MarkEdited(stream, index, error);
     }
     return error.Code();
+}
+
+int CheckAndSetTangents(KFS_Stream* stream, int index, void const* inTangent, void const* outTangent)
+{
+    if (int const code = KFSp_CheckStream(KFSp_Op_SetKeySpaceTangents, stream, KFSp_Row_AlterKey); code != 0)
+        return code;
+    if (int const code = CheckSpatial(stream, KFSp_Op_SetKeySpaceTangents); code != 0) return code;
+    if (int const code = RefuseCustom(stream, KFSp_Op_SetKeySpaceTangents, KFSp_Row_ConvertTo); code != 0) return code;
+    return SetTangents(stream, index, inTangent, outTangent);
 }
 
 int ChangeSpFlags(KFS_Stream* stream, int index, unsigned int mask, unsigned int values)
@@ -218,7 +234,7 @@ int SetSpFlags(KFS_Stream* stream, int index, unsigned int mask, unsigned int va
     int result = ChangeSpFlags(stream, index, mask, values);
     if (stream->HasNoKeys()) return result;
     if ((mask & KFS_KeySpFlag_Modifiable) != 0 || ((mask & KFS_KeySpFlag_Continuous) != 0 && result == 0)) {
-        result = stream->SetArcInvalid(index + 1, 2);
+        result = stream->SetArcInvalid(IndexBehind(index), 2);
     }
     int const cleared = KFSp_ClearCache(stream);
     return result != 0 ? result : cleared;
@@ -239,30 +255,30 @@ int KFSp_UnsetKeySpaceFlags(KFS_Stream* stream, unsigned int bits, int index)
 int KFS_SetKeySpaceTangents(KFS_Stream* stream, int index, int, void const* inTangent, void const* outTangent)
 {
     return KFSp_Boundary([&] {
-        if (int const code = KFSp_CheckStream(KFSp_Op_SetKeySpaceTangents, stream, KFSp_Row_AlterKey); code != 0)
-            return code;
-        if (int const code = CheckSpatial(stream, KFSp_Op_SetKeySpaceTangents); code != 0) return code;
-        if (int const code = RefuseCustom(stream, KFSp_Op_SetKeySpaceTangents, KFSp_Row_ConvertTo); code != 0)
-            return code;
-        if (int const code = SetTangents(stream, index, inTangent, outTangent); code != 0) return code;
+        if (int const code = CheckAndSetTangents(stream, index, inTangent, outTangent); code != 0) return code;
         stream->NotifyValueChanged();
         return 0;
     });
 }
 
-int KFS_SetKeySpaceTangentsF(KFS_Stream* stream, int index, int unused, double const* inTangent,
-                             double const* outTangent)
+int KFS_SetKeySpaceTangentsF(KFS_Stream* stream, int index, int, double const* inTangent, double const* outTangent)
 {
     return KFSp_Boundary([&] {
         if (int const code = KFSp_CheckStream(KFSp_Op_SetKeySpaceTangentsF, stream, KFSp_Row_AlterKey); code != 0)
             return code;
         KFSp_FirstError error;
-        KFSp_ScDoubleValues doubles(stream, &KFSp_FakeCopyItemFuncNoLimits);
-        error.Keep(doubles.Code());
-        if (error.None()) {
-            error.Keep(KFS_SetKeySpaceTangents(stream, index, unused, inTangent, outTangent));
+        {
+            KFSp_ScDoubleValues doubles(stream, &KFSp_FakeCopyItemFuncNoLimits);
+            error.Keep(doubles.Code());
+            if (error.None()) {
+                error.Keep(CheckAndSetTangents(stream, index, inTangent, outTangent));
+            }
+            error.Keep(doubles.Restore());
         }
-        error.Keep(doubles.Restore());
+        // Listeners hear of it when the stream is itself again.
+        if (error.None()) {
+            stream->NotifyValueChanged();
+        }
         return error.Code();
     });
 }
@@ -277,7 +293,7 @@ int KFS_SetKeySpModifiable(KFS_Stream* stream, unsigned char on, int index)
     return KFSp_Boundary([&] {
         if (on == 0) return StopAutomaticTangents(stream, index);
         if (int const code = KFSp_SetKeySpaceFlags(stream, KFS_KeySpFlag_Modifiable, index); code != 0) return code;
-        return stream->SetArcInvalid(index + 1, 2);
+        return stream->SetArcInvalid(IndexBehind(index), 2);
     });
 }
 

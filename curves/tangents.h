@@ -6,8 +6,8 @@
 //     every stream, KFS_SetKeyTangentsF in 0.0001 to 1 on plain streams and not at all on spatial ones.
 //   - KFS_GetKeyVelocityF and KFS_GetKeyInfluence use the cache record as scratch: the next value read works anew.
 //   - On spatial streams a key has one handle a side, and its speed is distance along the path a second. Only the first
-//     element of the arrays counts there; on other streams they have `dimension` elements. Any pointer may be null unless
-//     said otherwise, which means that this side or this answer isn't wanted.
+//     element of the arrays counts there; on other streams they have `dimension` elements. Any pointer may be null
+//     unless said otherwise, which means that this side or this answer isn't wanted.
 //
 // A graph tangent is relative to its key: x in seconds, at or below 0 on the in side and at or above 0 on the out side,
 // y in value units. With the duration to the neighbouring key (0 where there is none):

@@ -1,3 +1,4 @@
+#include "curves/arcs_private.h"
 #include "curves/keyhandles_private.h"
 #include "curves/neighbours_private.h"
 #include "curves/tangents.h"
@@ -27,7 +28,7 @@ struct AskedKey {
     int nextIndex = 0;
 
     bool IsFirst() const { return index == 0; }
-    bool IsLast() const { return index + 1 == count; }
+    bool IsLast() const { return index == count - 1; }
     bool IsEnd(KFSp_Side side) const { return side == KFSp_Side::In ? IsFirst() : IsLast(); }
     signed char Interp(KFSp_Side side) const { return side == KFSp_Side::In ? key->inInterp : key->outInterp; }
 
@@ -48,17 +49,6 @@ int FindKey(AskedKey* asked)
                                       &asked->nextIndex);
 }
 
-int SumArcs(KFS_StreamKeyData const* data, int first, int last, double* distance)
-{
-    *distance = 0.0;
-    for (int i = first; i < last; ++i) {
-        KFS_KeyScalar const* key = nullptr;
-        if (int const code = KFSp_GetConstKey(data, i, &key)) return code;
-        *distance += key->arcLength;
-    }
-    return 0;
-}
-
 // The speed of a straight run between anchors: up to the key, from it on, or, for a float key, through it.
 int GetRunSpeed(AskedKey const& asked, KFSp_Side side, double* speed)
 {
@@ -68,8 +58,8 @@ int GetRunSpeed(AskedKey const& asked, KFSp_Side side, double* speed)
     KFS_KeyScalar const* const from = fromPrev ? asked.prev : asked.key;
     KFS_KeyScalar const* const to = toNext ? asked.next : asked.key;
     double distance = 0.0;
-    if (int const code = SumArcs(asked.data, fromPrev ? asked.prevIndex : asked.index,
-                                 toNext ? asked.nextIndex : asked.index, &distance)) {
+    if (int const code = KFSp_SumArcs(asked.data, fromPrev ? asked.prevIndex : asked.index,
+                                      toNext ? asked.nextIndex : asked.index, &distance)) {
         return code;
     }
     double const duration = KFSp_Seconds(to->time, from->time, asked.stream->GetTimeScale());
@@ -92,7 +82,7 @@ int GetSpatialSpeed(AskedKey const& asked, KFSp_Side side, bool zeroAtEnds, doub
         return 0;
     }
     bool const hasRun =
-        side == KFSp_Side::In ? asked.prev && asked.index > 0 : asked.next && asked.index + 1 < asked.count;
+        side == KFSp_Side::In ? asked.prev && asked.index > 0 : asked.next && asked.index < asked.count - 1;
     if (interp == KFS_Interp_Linear && hasRun) return GetRunSpeed(asked, side, speed);
     *answered = false;
     return 0;
@@ -201,19 +191,26 @@ int SetSpeeds(KFS_Stream* stream, int index, void const* in, void const* out)
     return error.Code();
 }
 
+int CheckVelocityAccess(KFS_Stream const* stream)
+{
+    return KFSp_CheckHandleAccess(stream, {KFSp_Op_SetKeyVelocity, KFSp_Row_AlterKey},
+                                  {KFSp_Op_SetKeyVelocity, KFSp_Row_InquireKey});
+}
+
+int SetVelocity(KFS_Stream* stream, int index, void const* in, void const* out)
+{
+    if (stream->HasNoKeys()) return 0;
+    KFSp_SettleAutomaticKey(stream, index);
+    return SetSpeeds(stream, index, in, out);
+}
+
 }  // namespace
 
 int KFS_SetKeyVelocity(KFS_Stream* stream, int index, void const* inVelocity, void const* outVelocity)
 {
-    if (int const code = KFSp_CheckHandleAccess(stream, {KFSp_Op_SetKeyVelocity, KFSp_Row_AlterKey},
-                                                {KFSp_Op_SetKeyVelocity, KFSp_Row_InquireKey})) {
-        return code;
-    }
+    if (int const code = CheckVelocityAccess(stream)) return code;
     KFSp_FirstError error;
-    if (stream->HasKeys()) {
-        KFSp_SettleAutomaticKey(stream, index);
-        error.Keep(SetSpeeds(stream, index, inVelocity, outVelocity));
-    }
+    error.Keep(SetVelocity(stream, index, inVelocity, outVelocity));
     return KFSp_FinishHandleEdit(stream, error);
 }
 
@@ -221,13 +218,17 @@ int KFS_SetKeyVelocityF(KFS_Stream* stream, int index, double const* inVelocity,
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_SetKeyVelocityF, stream, KFSp_Row_AlterKey)) return code;
     KFSp_FirstError error;
+    if (int const code = CheckVelocityAccess(stream)) return code;
     // A cached custom value must be disposed while the stream still says what it is.
     if (stream->HasKeys()) error.Keep(KFSp_ClearCache(stream));
-    KFSp_ScDoubleValues doubles(stream, KFSp_FakeCopyItemFuncNoLimits);
-    error.Keep(doubles.Code());
-    if (error.None()) error.Keep(KFS_SetKeyVelocity(stream, index, inVelocity, outVelocity));
-    error.Keep(doubles.Restore());
-    return error.Code();
+    {
+        KFSp_ScDoubleValues doubles(stream, KFSp_FakeCopyItemFuncNoLimits);
+        error.Keep(doubles.Code());
+        if (error.None()) error.Keep(SetVelocity(stream, index, inVelocity, outVelocity));
+        error.Keep(doubles.Restore());
+    }
+    // Listeners hear of it when the stream is itself again.
+    return KFSp_FinishHandleEdit(stream, error);
 }
 
 int KFS_GetKeyVelocityF(KFS_Stream const* stream, int index, unsigned char zeroAtEnds, double* inVelocity,

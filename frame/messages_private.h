@@ -35,6 +35,7 @@ enum KFSp_Row : short {
     KFSp_Row_SetCustomFuncs = 39,
     KFSp_Row_IterateOver = 40,
     KFSp_Row_BadFileInfo = 42,
+    KFSp_Row_UnrecognizedChunk = 44,
     KFSp_Row_InterpolationArray = 49,
     KFSp_Row_NotSpatial = 54,
     KFSp_Row_SpatialTangents = 55,

@@ -1,22 +1,29 @@
 #include "host/streambuilder.h"
 
+#include "curves/spacetangents.h"
 #include "curves/tangents.h"
 #include "frame/frame.h"
 #include "host/storeerror.h"
+#include "keystore/attributes.h"
 #include "keystore/edit.h"
+
+#include <cmath>
 
 namespace kfshost {
 
 namespace {
 
-std::unique_ptr<KFS_Stream> MakeStream(int dimension, unsigned int timeScale, std::string const& name)
+// A path bends where its tangents say so, and is measured by distance: both need the automatic spatial setting.
+std::unique_ptr<KFS_Stream> MakeStream(int dimension, unsigned int timeScale, std::string const& name, StreamForm form)
 {
+    bool const isPath = form == StreamForm::Path;
+    unsigned short const spInterpMask = isPath ? KFS_InterpMask_Negative : 0;
     KFS_ValueDesc description;
     description.dataType = KFS_Type_Double;
     try {
         KFS_MatchName const matchName(name.c_str(), false);
-        return std::make_unique<KFS_Stream>(static_cast<short>(dimension), timeScale, false, false, KFS_InterpMask_All,
-                                            0, description, &matchName, Get_VX_StreamFactory(), false);
+        return std::make_unique<KFS_Stream>(static_cast<short>(dimension), timeScale, false, isPath, KFS_InterpMask_All,
+                                            spInterpMask, description, &matchName, Get_VX_StreamFactory(), false);
     } catch (int code) {
         throw StoreError(code);
     }
@@ -24,8 +31,8 @@ std::unique_ptr<KFS_Stream> MakeStream(int dimension, unsigned int timeScale, st
 
 }  // namespace
 
-StreamBuilder::StreamBuilder(int dimension, unsigned int timeScale, std::string const& name)
-    : stream_(MakeStream(dimension, timeScale, name))
+StreamBuilder::StreamBuilder(int dimension, unsigned int timeScale, std::string const& name, StreamForm form)
+    : stream_(MakeStream(dimension, timeScale, name, form))
 {}
 
 // The value is in the external form, which is doubles here as well: KFS_InsertKey saves the detour of its double form.
@@ -39,6 +46,18 @@ void StreamBuilder::SetHandles(int index, KeyHandles const& handles)
 {
     ThrowIfFailed(KFS_SetKeyVelocityF(stream_.get(), index, handles.inSpeed, handles.outSpeed));
     ThrowIfFailed(KFS_SetKeyInfluence(stream_.get(), index, handles.inInfluence, handles.outInfluence));
+}
+
+void StreamBuilder::SetPathTangents(int index, double const* in, double const* out)
+{
+    ThrowIfFailed(KFS_SetKeySpaceTangentsF(stream_.get(), index, -1, in, out));
+}
+
+// The stream holds the square of what it is told, and measures paths to that square.
+void StreamBuilder::SetPathAccuracy(double distance)
+{
+    double const root = std::sqrt(distance);
+    ThrowIfFailed(KFS_SetStreamAccuracy(stream_.get(), &root, nullptr));
 }
 
 }  // namespace kfshost

@@ -17,8 +17,8 @@ namespace {
 
 constexpr int CacheMemoryId = 0x1D0003;
 
-// The whole key into the cache record, which never takes a share in its arc table. A copy that fails has written the head: the record is
-// empty then, since its value is nobody's.
+// The whole key into the cache record, which never takes a share in its arc table. A copy that fails has written the
+// head: the record is empty then, since its value is nobody's.
 int CopyKeyToCache(KFS_StreamKeyData const* data, int index)
 {
     int const code = SEQ_GetItemCopy(data->keys, 0, index, data->cache);
@@ -30,8 +30,8 @@ int CopyKeyToCache(KFS_StreamKeyData const* data, int index)
     return code;
 }
 
-int InterpolateToCache(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int keyIndex, KFS_InterpFunc* interpFunc,
-                       long refcon)
+int InterpolateToCache(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int keyIndex,
+                       KFS_InterpFunc* interpFunc, long refcon)
 {
     KFS_InterpFunc const func = interpFunc ? *interpFunc : stream->GetInterpFunc();
     if (!func) {
@@ -42,10 +42,10 @@ int InterpolateToCache(KFS_Stream const* stream, KFS_StreamKeyData const* data, 
     return code;
 }
 
-// The value between, before or after keys. `next` is the index of the first key after the time. Only a function that may call the list
-// again while it holds a key runs under a pin.
-int FillBetweenKeys(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int next, KFS_InterpFunc* interpFunc,
-                    long refcon)
+// The value between, before or after keys. `next` is the index of the first key after the time. Only a function that
+// may call the list again while it holds a key runs under a pin.
+int FillBetweenKeys(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int next,
+                    KFS_InterpFunc* interpFunc, long refcon)
 {
     if (next == 0) {
         return CopyKeyToCache(data, 0);
@@ -85,7 +85,7 @@ int FillBetweenKeys(KFS_Stream const* stream, KFS_StreamKeyData const* data, int
     return error.Code();
 }
 
-} // namespace
+}  // namespace
 
 int KFS_Stream::GetCacheSize() const
 {
@@ -126,7 +126,8 @@ KFS_KeyScalar* KFS_Stream::CloneCache(KFS_KeyScalar const* source) const
     }
     if (!KFSp_CacheIsEmpty(source) && copyItemFunc_) {
         int const code = KFSp_Boundary([&] {
-            return copyItemFunc_(this, GetItemRefcon(), KFS_Item_CacheWhole, KFSp_ValueData(source), KFSp_ValueData(clone));
+            return copyItemFunc_(this, GetItemRefcon(), KFS_Item_CacheWhole, KFSp_ValueData(source),
+                                 KFSp_ValueData(clone));
         });
         if (code != 0) {
             Q_FreePtr(clone);
@@ -174,8 +175,8 @@ int KFSp_SetupCache(KFS_Stream const* stream, int time, void const* value, char 
     return copy(stream, 0, kind, value, KFSp_ValueData(cache));
 }
 
-void KFSp_UpdateStreamCacheToTime(KFS_Stream const* stream, int time, unsigned char keyOnly, void* value, unsigned char* atKey,
-                                  KFS_InterpFunc* interpFunc, long refcon)
+void KFSp_UpdateStreamCacheToTime(KFS_Stream const* stream, int time, unsigned char keyOnly, void* value,
+                                  unsigned char* atKey, KFS_InterpFunc* interpFunc, long refcon)
 {
     KFSp_UpdateCacheToTime(stream, stream->GetKeyData(), time, keyOnly, value, atKey, interpFunc, refcon);
 }
@@ -185,7 +186,7 @@ void KFSp_UpdateCacheToTime(KFS_Stream const* stream, KFS_StreamKeyData const* d
 {
     KFS_KeyScalar* const cache = data->cache;
     if (stream->HasNoKeys()) {
-        if (time != KFS_INVALID_INDEX) {    // which would say that the constant has no value
+        if (time != KFS_INVALID_INDEX) {  // which would say that the constant has no value
             cache->time = time;
         }
         if (atKey) {
@@ -207,7 +208,7 @@ void KFSp_UpdateCacheToTime(KFS_Stream const* stream, KFS_StreamKeyData const* d
         }
         if (mayBeStale) {
             KFSp_ThrowIf(stream->UpdateStream());
-            KFSp_ThrowIf(KFSp_SearchKeys(data, time, &found, &index));      // float keys may have moved
+            KFSp_ThrowIf(KFSp_SearchKeys(data, time, &found, &index));  // float keys may have moved
         }
         if (found) {
             KFSp_ThrowIf(CopyKeyToCache(data, index));

@@ -8,8 +8,9 @@
 
 #include <map>
 
-// The private copies of a render on a temporary clone context: for each stream that it reads, the key data as it stood at the first
-// read. The host puts one into each such context, and makes the first reads (or all of them) while nobody edits the streams.
+// The private copies of a render on a temporary clone context: for each stream that it reads, the key data as it stood
+// at the first read. The host puts one into each such context, and makes the first reads (or all of them) while nobody
+// edits the streams.
 // Threads: reached by the thread of one context at a time.
 class KFS_API KFS_StreamCacheState : public Q_RenderState {
 public:

@@ -4,6 +4,7 @@
 #include "keystore/cache_private.h"
 #include "keystore/edit_private.h"
 #include "keystore/items.h"
+#include "keystore/savedrecords_private.h"
 #include "keystore/stream.h"
 #include "keystore/valuedata_private.h"
 
@@ -24,23 +25,6 @@ void Verify(KFS_Stream const* stream)
     }
 }
 
-int MakeKeyed(KFS_Stream* stream, bool keepValue)
-{
-    Verify(stream);
-    stream->SetKFSFlags(stream->GetKFSFlags() & ~KFS_StreamFlag_NoKeys);
-    if (!keepValue) {
-        return KFSp_ClearCache(stream);
-    }
-    KFS_KeyScalar* const cache = stream->GetCache();
-    if (KFSp_CacheIsEmpty(cache)) {
-        return 0;
-    }
-    if (stream->IsSpatial()) {
-        cache->flags &= ~KFS_KeyFlag_TangentsSet;
-    }
-    return KFSp_InsertKeyFromCache(0, 1, 0, 1, stream, nullptr);
-}
-
 int DisposeList(KFS_Stream* stream)
 {
     int code = KFS_DisposeRemapTables(stream);
@@ -53,6 +37,45 @@ int DisposeList(KFS_Stream* stream)
         code = SEQ_Dispose(keys, 0);
     }
     return code;
+}
+
+// The list gets a copy, and the value is given back once the copy is in. Until then it can return.
+int MakeFirstKey(KFS_Stream* stream)
+{
+    bool const hadList = stream->GetKeys() != nullptr;
+    KFSp_SavedCache const value(stream);
+    KFSp_FirstError error;
+    error.Keep(value.Code());
+    if (error.None()) {
+        KFS_KeyScalar* const cache = stream->GetCache();
+        if (stream->IsSpatial()) {
+            cache->flags &= ~KFS_KeyFlag_TangentsSet;
+        }
+        error.Keep(KFSp_PutKeyFromCache(0, 1, 0, 0, stream, nullptr));
+        if (!error.None()) {
+            value.Restore();
+        }
+    }
+    if (!error.None()) {
+        if (!hadList && stream->GetKeys()) {
+            static_cast<void>(DisposeList(stream));
+        }
+        stream->SetKFSFlags(stream->GetKFSFlags() | KFS_StreamFlag_NoKeys);
+        return error.Code();
+    }
+    error.Keep(KFSp_ClearCacheRecord(stream, value.get()));
+    error.Keep(KFSp_Boundary([stream] { stream->NotifyValueChanged(); }));
+    return error.Code();
+}
+
+int MakeKeyed(KFS_Stream* stream, bool keepValue)
+{
+    Verify(stream);
+    stream->SetKFSFlags(stream->GetKFSFlags() & ~KFS_StreamFlag_NoKeys);
+    if (!keepValue) {
+        return KFSp_ClearCache(stream);
+    }
+    return KFSp_CacheIsEmpty(stream->GetCache()) ? 0 : MakeFirstKey(stream);
 }
 
 int MakeConstant(KFS_Stream* stream)

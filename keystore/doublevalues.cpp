@@ -1,5 +1,8 @@
 #include "keystore/edit_private.h"
 
+#include "frame/boundary_private.h"
+#include "keystore/items_private.h"
+
 #include <utility>
 
 namespace {
@@ -15,12 +18,16 @@ KFS_ValueDesc const& DoubleDescription()
 KFSp_ScDoubleValues::KFSp_ScDoubleValues(KFS_Stream* stream, KFS_CopyItemFunc copy)
     : stream_(stream),
       copy_(stream->GetCopyItemFunc()),
+      dispose_(stream->GetDisposeItemFunc()),
       interp_(stream->GetInterpFunc()),
       saved_(*stream->GetValueDesc()),
       wasNonCustom_(stream->IsTemporarilyNonCustom())
 {
     stream->SetCopyItemFunc(copy);
     code_ = KFS_SetValueDescription(stream, &DoubleDescription(), nullptr);
+    if (code_ == 0) {
+        code_ = KFSp_SetKeyFuncs(stream);
+    }
 }
 
 KFSp_ScDoubleValues::~KFSp_ScDoubleValues()
@@ -34,10 +41,13 @@ int KFSp_ScDoubleValues::Restore()
     if (!stream) {
         return 0;
     }
-    int const code = KFS_SetValueDescription(stream, &saved_, nullptr);
+    KFSp_FirstError error;
+    error.Keep(KFS_SetValueDescription(stream, &saved_, nullptr));
     *stream->GetValueDescForModify() = saved_;
     stream->MarkTemporarilyNonCustom(wasNonCustom_);
     stream->SetInterpFunc(interp_);
     stream->SetCopyItemFunc(copy_);
-    return code;
+    stream->SetDisposeItemFunc(dispose_);
+    error.Keep(KFSp_SetKeyFuncs(stream));  // also of a list that was made meanwhile
+    return error.Code();
 }

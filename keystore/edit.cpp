@@ -221,30 +221,6 @@ int InsertKey(KFS_Stream* stream, T_Time const* time, bool replace, void const* 
                                : InsertIntoKeys(stream, at, replace, value, inInterp, outInterp);
 }
 
-int RemoveKey(KFS_Stream* stream, int index, void* value)
-{
-    KFS_StreamKeyData const* const data = stream->GetKeyData();
-    if (KFSp_HasNoValue(stream, data)) {
-        return KFSp_ReportErr(KFSp_Op_RemoveKey, KFS_Err_NoKeys, KFSp_Row_RemoveKey);
-    }
-    KFSp_FirstError error;
-    if (stream->HasKeys()) {
-        error.Keep(KFSp_ClearCache(stream));
-        error.Keep(stream->RemoveKey(index, value != nullptr));
-    }
-    if (value && !KFSp_CacheIsEmpty(data->cache)) {
-        KFS_CopyItemFunc const own = stream->GetCopyItemFunc();
-        KFS_CopyItemFunc const standIn = stream->IsCustom() ? KFSp_FakeCopyItemFunc : KFSp_ConvertItemFromFloat;
-        KFS_CopyItemFunc const copy = own ? own : standIn;
-        // The key is gone already, so there is nothing to be done about a failure.
-        static_cast<void>(KFSp_Boundary([&] {
-            return copy(stream, stream->GetItemRefcon(), KFS_Item_KeyValue, KFSp_ValueData(data->cache), value);
-        }));
-    }
-    error.Keep(KFSp_ClearCache(stream));
-    return error.None() && stream->HasNoKeys() ? Notify(stream) : error.Code();
-}
-
 // Whether a record can hold `dimension` doubles as its value. What a custom value owns must not be left beside them.
 bool TakesDoubles(KFS_Stream const* stream)
 {
@@ -311,6 +287,68 @@ int DisposeRemapTable(SEQ_Head** keys, int index)
 
 }  // namespace
 
+int KFSp_TakeKeyOut(KFS_Stream* stream, int index, bool keepInCache)
+{
+    KFS_StreamKeyData* const data = stream->GetKeyDataForModify();
+    if (!data->keys) {
+        return KFS_Err_NoKeys;
+    }
+    if (index < 0 || index >= KFSp_ItemCount(data)) {
+        return KFSp_RemoveKeyItem(data, index, nullptr);  // the list's own answer
+    }
+    KFSp_FirstError error;
+    if (stream->IsSpatial()) {
+        error.Keep(DisposeRemapTable(data->keys, index));
+    }
+    if (keepInCache && error.None()) {
+        error.Keep(KFSp_ClearCache(stream));
+    }
+    if (error.None()) {
+        error.Keep(KFSp_RemoveKeyItem(data, index, keepInCache ? data->cache : nullptr));
+    }
+    error.Keep(stream->SetInvalid(index, 1));
+    if (stream->IsSpatial()) {
+        static_cast<void>(stream->SetArcInvalid(index + 2, 4));
+    }
+    int const keyCount = KFSp_KeyCount(stream, data);
+    PullIn(data->invalidKeyIndex, keyCount);
+    PullIn(data->arcInvalidKeyIndex, keyCount);
+    return error.Code();
+}
+
+namespace {
+
+// The removed key is handed out of the cache record, which a listener may write by reading; so they are told last.
+int RemoveKey(KFS_Stream* stream, int index, void* value)
+{
+    KFS_StreamKeyData const* const data = stream->GetKeyData();
+    if (KFSp_HasNoValue(stream, data)) {
+        return KFSp_ReportErr(KFSp_Op_RemoveKey, KFS_Err_NoKeys, KFSp_Row_RemoveKey);
+    }
+    KFSp_FirstError error;
+    if (stream->HasKeys()) {
+        error.Keep(KFSp_ClearCache(stream));
+        if (error.None()) {
+            error.Keep(KFSp_TakeKeyOut(stream, index, value != nullptr));
+        }
+    }
+    bool const removed = error.None();
+    if (value && !KFSp_CacheIsEmpty(data->cache)) {
+        // The key is gone already, so there is nothing to be done about a failure.
+        static_cast<void>(KFSp_Boundary([&] {
+            return KFSp_OutwardFunc(stream)(stream, stream->GetItemRefcon(), KFS_Item_KeyValue,
+                                            KFSp_ValueData(data->cache), value);
+        }));
+    }
+    error.Keep(KFSp_ClearCache(stream));
+    if (removed) {
+        error.Keep(Notify(stream));
+    }
+    return error.Code();
+}
+
+}  // namespace
+
 int KFS_InsertKey(KFS_Stream* stream, T_Time const* time, unsigned char replace, void const* value, char inInterp,
                   char outInterp)
 {
@@ -358,32 +396,6 @@ int KFS_RemoveKey(KFS_Stream* stream, int index, void* value)
 
 int KFS_Stream::RemoveKey(int index, unsigned char keepInCache)
 {
-    KFS_StreamKeyData* const data = GetKeyDataForModify();
-    if (!data->keys) {
-        return KFS_Err_NoKeys;
-    }
-    if (index < 0 || index >= KFSp_ItemCount(data)) {
-        return KFSp_RemoveKeyItem(data, index, nullptr);  // the list's own answer
-    }
-    KFSp_FirstError error;
-    if (IsSpatial()) {
-        error.Keep(DisposeRemapTable(data->keys, index));
-    }
-    if (keepInCache && error.None()) {
-        error.Keep(KFSp_ClearCache(this));
-    }
-    if (error.None()) {
-        error.Keep(KFSp_RemoveKeyItem(data, index, keepInCache ? data->cache : nullptr));
-    }
-    error.Keep(SetInvalid(index, 1));
-    if (IsSpatial()) {
-        static_cast<void>(SetArcInvalid(index + 2, 4));
-    }
-    int const keyCount = KFSp_KeyCount(this, data);
-    PullIn(data->invalidKeyIndex, keyCount);
-    PullIn(data->arcInvalidKeyIndex, keyCount);
-    if (error.None()) {
-        error.Keep(KFSp_Boundary([this] { NotifyValueChanged(); }));
-    }
-    return error.Code();
+    int const code = KFSp_TakeKeyOut(this, index, keepInCache != 0);
+    return code != 0 ? code : Notify(this);
 }

@@ -21,6 +21,10 @@ int KFSp_InsertKeyFromCache(unsigned char overwrite, unsigned char valueGiven, u
 int KFSp_PutKeyFromCache(unsigned char overwrite, unsigned char valueGiven, unsigned char tangentsGiven,
                          unsigned char clearCache, KFS_Stream* stream, int* index);
 
+// Takes a key out of the list, into the cache record with `keepInCache`. This is KFS_Stream::RemoveKey without the
+// notification.
+int KFSp_TakeKeyOut(KFS_Stream* stream, int index, bool keepInCache);
+
 // KFS_ChooseInterps, with the key flags and the spatial flags that the new key ought to take. `spFlags` is left alone
 // where no key with a spatial block was looked at.
 int KFSp_ChooseInterpsAndFlags(KFS_Stream* stream, T_Time const* time, char* inInterp, char* outInterp,
@@ -35,8 +39,8 @@ int KFSp_SetKeySpatialState(SEQ_Head** list, long on, int index, void* key);
 int KFSp_KeyClearRemap(SEQ_Head** list, long, int index, void* key);
 
 // Gives a stream the description of plain doubles, and a copy function that suits it, for a while: the functions that
-// take values in external form then take doubles. Restore() ends it and answers the code of restoring; the destructor
-// restores too.
+// take values in external form then take doubles. The key list calls the copy function too, whoever made the list, and
+// is rid of it afterwards. Restore() ends it and answers the code of restoring; the destructor restores too.
 class KFSp_ScDoubleValues {
 public:
     KFSp_ScDoubleValues(KFS_Stream* stream, KFS_CopyItemFunc copy);
@@ -51,6 +55,7 @@ public:
 private:
     KFS_Stream* stream_;
     KFS_CopyItemFunc copy_;
+    KFS_DisposeItemFunc dispose_;
     KFS_InterpFunc interp_;
     KFS_ValueDesc saved_;
     bool wasNonCustom_;

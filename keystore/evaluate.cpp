@@ -22,7 +22,8 @@ namespace {
 // What the two forms of a read do differently.
 struct ExternalForm {
     using Value = void;
-    static void EvalExpr(KFS_ExpState* state, KFS_Stream const* stream, int time, int flags, void* value, KFS_ParamBag const* bag)
+    static void EvalExpr(KFS_ExpState* state, KFS_Stream const* stream, int time, int flags, void* value,
+                         KFS_ParamBag const* bag)
     {
         state->EvalExprValue(stream, time, flags, value, bag);
     }
@@ -129,7 +130,8 @@ Q_RenderContext const* FindRenderContext(KFS_Stream const* stream)
     return project ? project->GetRenderContext(true) : nullptr;
 }
 
-// The double form doesn't know of projects: a thread without a current render context is a mistake, which the service reports.
+// The double form doesn't know of projects: a thread without a current render context is a mistake, which the service
+// reports.
 Q_RenderContext const* NeedRenderContext()
 {
     Q_RenderContext const* const current = Q_RenderContext::PeekCurrent();
@@ -141,8 +143,8 @@ Q_RenderContext const* NeedRenderContext()
 
 // The stages that both forms share, up to the keys; `readKeys` takes the state that says how to read them.
 template <class Form, class ReadKeys>
-int ReadStaged(KFS_Stream const* stream, Q_RenderContext const* context, int time, int flags, typename Form::Value* value,
-               unsigned char* atKey, KFS_ParamBag const* bag, ReadKeys&& readKeys)
+int ReadStaged(KFS_Stream const* stream, Q_RenderContext const* context, int time, int flags,
+               typename Form::Value* value, unsigned char* atKey, KFS_ParamBag const* bag, ReadKeys&& readKeys)
 {
     if (AnswersFromFollowers(stream, value)) [[unlikely]] {
         return ReadFollowers(stream, time, flags, static_cast<double*>(value), bag);
@@ -161,9 +163,10 @@ int ReadStaged(KFS_Stream const* stream, Q_RenderContext const* context, int tim
     return 0;
 }
 
-// What both ends of a read do before the value is copied out: refuse, and bring the cache to the time. Whether there is a value to copy.
-bool BringCache(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, unsigned char keyOnly, void const* value,
-                unsigned char* atKey, KFS_InterpFunc* interpFunc, long refcon)
+// What both ends of a read do before the value is copied out: refuse, and bring the cache to the time. Whether there is
+// a value to copy.
+bool BringCache(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, unsigned char keyOnly,
+                void const* value, unsigned char* atKey, KFS_InterpFunc* interpFunc, long refcon)
 {
     if (KFSp_HasNoValue(stream, data)) [[unlikely]] {
         throw KFSp_ReportErr(KFSp_Op_GetValueNoExpr, KFS_Err_NoKeys, KFSp_Row_GetValue);
@@ -192,7 +195,8 @@ int ReadSamples(KFS_Stream const* stream, T_Time time, T_Time const* step, int c
         for (int d = 0; separated && d < dimension && error.None(); ++d) {
             values[d] = 0.0;
             if (static_cast<std::size_t>(d) < followers.size()) {
-                error.Keep(KFS_GetValueFPlus(followers[static_cast<std::size_t>(d)], &time, flags, values + d, nullptr, nullptr));
+                error.Keep(KFS_GetValueFPlus(followers[static_cast<std::size_t>(d)], &time, flags, values + d, nullptr,
+                                             nullptr));
             }
         }
         if (error.None() && sample + 1 < count) {
@@ -205,7 +209,7 @@ int ReadSamples(KFS_Stream const* stream, T_Time time, T_Time const* step, int c
     return 0;
 }
 
-} // namespace
+}  // namespace
 
 int KFS_GetValue(KFS_Stream const* stream, T_Time const* time, unsigned char, void* value, unsigned char* atKey,
                  KFS_ParamBag const* bag)
@@ -224,9 +228,10 @@ int KFS_GetValuePlus(KFS_Stream const* stream, T_Time const* time, int flags, vo
         return code;
     }
     return KFSp_Boundary([&] {
-        return ReadStaged<ExternalForm>(stream, FindRenderContext(stream), at, flags, value, atKey, bag, [&](KFS_ExpState* state) {
-            state->EvalNoExprValue(stream, at, flags, value, atKey, bag, interpFunc, refcon);
-        });
+        return ReadStaged<ExternalForm>(
+            stream, FindRenderContext(stream), at, flags, value, atKey, bag, [&](KFS_ExpState* state) {
+                state->EvalNoExprValue(stream, at, flags, value, atKey, bag, interpFunc, refcon);
+            });
     });
 }
 
@@ -250,10 +255,9 @@ int KFS_GetValueFPlus(KFS_Stream const* stream, T_Time const* time, int flags, d
         return KFSp_RefuseCustomValue(KFSp_Op_GetFloat, KFSp_Row_ComputeFloatValues);
     }
     return KFSp_Boundary([&] {
-        return ReadStaged<DoubleForm>(stream, NeedRenderContext(), at, flags, value, atKey, bag,
-                                      [&](KFS_ExpState* state) {
-                                          state->EvalNoExprValueF(stream, at, flags, value, atKey, bag);
-                                      });
+        return ReadStaged<DoubleForm>(
+            stream, NeedRenderContext(), at, flags, value, atKey, bag,
+            [&](KFS_ExpState* state) { state->EvalNoExprValueF(stream, at, flags, value, atKey, bag); });
     });
 }
 
@@ -285,7 +289,7 @@ void KFS_GetValueFNoExpr(KFS_Stream const* stream, int time, unsigned char keyOn
         return;
     }
     void const* const from = source ? source : KFSp_ValueData(data->cache);
-    if (stream->GetDimension() == 1 && !stream->IsFloatBased()) {   // the common read, without a call for eight bytes
+    if (stream->GetDimension() == 1 && !stream->IsFloatBased()) {  // the common read, without a call for eight bytes
         std::memcpy(value, from, sizeof *value);
         return;
     }
@@ -302,9 +306,11 @@ int KFS_GetValuesFPlus(KFS_Stream const* stream, T_Time const* start, T_Time con
         return KFSp_RefuseCustomValue(KFSp_Op_GetValuesFRefusal, KFSp_Row_ComputeFloatValues);
     }
     if (!values) {
-        return Qp_ReportLegacyErrString(KFSp_ReportId(KFSp_Op_GetValuesFHandle), KFSp_Severity, KFS_Err_LegacyMismatch, nullptr);
+        return Qp_ReportLegacyErrString(KFSp_ReportId(KFSp_Op_GetValuesFHandle), KFSp_Severity, KFS_Err_LegacyMismatch,
+                                        nullptr);
     }
-    std::size_t const number = count > 0 ? static_cast<std::size_t>(count) * static_cast<std::size_t>(stream->GetDimension()) : 0;
+    std::size_t const number =
+        count > 0 ? static_cast<std::size_t>(count) * static_cast<std::size_t>(stream->GetDimension()) : 0;
     char** const handle = Q_AllocateHandleClear(KFSp_ReportId(KFSp_Op_GetValuesFHandle),
                                                 KFSp_MessageText(KFSp_Row_InterpolationArray), number * sizeof(double));
     if (!handle) {
@@ -327,10 +333,12 @@ int KFS_DisposeValue(KFS_Stream const* stream, void* value)
         return code;
     }
     KFS_DisposeItemFunc const dispose = stream->GetDisposeItemFunc();
-    return dispose ? KFSp_Boundary([&] { return dispose(stream, stream->GetItemRefcon(), KFS_Item_KeyValue, value); }) : 0;
+    return dispose ? KFSp_Boundary([&] { return dispose(stream, stream->GetItemRefcon(), KFS_Item_KeyValue, value); })
+                   : 0;
 }
 
-void KFS_PostCacheVector4Value(KFS_Stream const* stream, int, M_Vector4T<double> const& vector, void* pointerValue, void* value)
+void KFS_PostCacheVector4Value(KFS_Stream const* stream, int, M_Vector4T<double> const& vector, void* pointerValue,
+                               void* value)
 {
     if (pointerValue) {
         std::memcpy(value, &pointerValue, sizeof pointerValue);
@@ -342,8 +350,8 @@ void KFS_PostCacheVector4Value(KFS_Stream const* stream, int, M_Vector4T<double>
 
 namespace {
 
-// A buffer for one value, aligned to 16, that shows in the memory count. It takes an external value, and also the doubles that separated
-// dimensions answer. Throws the int 4.
+// A buffer for one value, aligned to 16, that shows in the memory count. It takes an external value, and also the
+// doubles that separated dimensions answer. Throws the int 4.
 class ScratchValue {
 public:
     explicit ScratchValue(KFS_Stream const* stream)
@@ -374,18 +382,23 @@ private:
 void ReadForSideEffect(KFS_Stream const* stream, T_Time const& time)
 {
     ScratchValue const scratch(stream);
-    KFSp_ThrowIf(KFS_GetValuePlus(stream, &time, KFS_EvalFlag_NoExpression, scratch.get(), nullptr, nullptr, nullptr, 0));
+    KFSp_ThrowIf(
+        KFS_GetValuePlus(stream, &time, KFS_EvalFlag_NoExpression, scratch.get(), nullptr, nullptr, nullptr, 0));
     KFSp_ThrowIf(KFS_DisposeValue(stream, scratch.get()));
 }
 
-} // namespace
+}  // namespace
 
 void KFS_Stream::ValidateCacheAtTime(T_Time const& time)
 {
     if (HasKeys()) {
         ReadForSideEffect(this, time);
-    } else {
-        KFSp_ThrowIf(T_ShortConvTime(time.value, time.scale, timeScale_, &GetCache()->time));
+        return;
+    }
+    int at = 0;
+    KFSp_ThrowIf(KFSp_TimeInStream(this, &time, &at));
+    if (at != KFS_INVALID_INDEX) {  // which would say that the constant has no value
+        GetCache()->time = at;
     }
 }
 

@@ -1,5 +1,6 @@
 #include "curves/autotangents_private.h"
 #include "curves/subdivide_private.h"
+#include "curves/update_private.h"
 #include "frame/report_private.h"
 #include "keystore/cache_private.h"
 #include "keystore/edit_private.h"
@@ -32,11 +33,6 @@ struct Insertion {
     bool HasOpenSide() const { return key->inInterp == KFS_Interp_None || key->outInterp == KFS_Interp_None; }
 };
 
-bool NothingIsStale(KFS_StreamKeyData const* data)
-{
-    return data->invalidKeyIndex[0] == KFS_INVALID_INDEX && data->arcInvalidKeyIndex[0] == KFS_INVALID_INDEX;
-}
-
 int CopyItem(Insertion const& insertion, short kind, void const* source, void* destination)
 {
     KFS_Stream const* const stream = insertion.stream;
@@ -51,9 +47,11 @@ int BringUpToDate(Insertion const& insertion)
 {
     bool const readsDerived = !insertion.valueGiven || (insertion.stream->IsSpatial() && !insertion.tangentsGiven &&
                                                         (insertion.HasSplineSide() || insertion.HasOpenSide()));
-    if (!readsDerived || insertion.IsCustom() || KFSp_ItemCount(insertion.data) == 0 ||
-        NothingIsStale(insertion.data)) {
+    if (!readsDerived || KFSp_ItemCount(insertion.data) == 0 || !KFSp_IsStale(insertion.data)) {
         return 0;
+    }
+    if (insertion.IsCustom()) {  // no key floats there, so the record isn't written
+        return insertion.stream->IsSpatial() ? insertion.stream->UpdateStream() : 0;
     }
     KFSp_SavedCache const record(insertion.stream);
     if (record.Code() != 0) {
@@ -144,8 +142,12 @@ int FillInValueAndTangents(Insertion& insertion, char mode)
         return 0;
     }
     if (!insertion.valueGiven) {
-        return insertion.IsCustom() ? EvaluateCustomValue(insertion)
-                                    : KFSp_SubdivideSpline(insertion.stream, insertion.key->time, mode, insertion.key);
+        if (!insertion.IsCustom()) {
+            return KFSp_SubdivideSpline(insertion.stream, insertion.key->time, mode, insertion.key);
+        }
+        if (int const code = EvaluateCustomValue(insertion)) {
+            return code;
+        }
     }
     return mode != 0 ? KFSp_SetDefaultKeyframeTangents(insertion.stream, insertion.key->time, mode, insertion.key) : 0;
 }

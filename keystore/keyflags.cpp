@@ -132,7 +132,9 @@ int SetKeyFlags(KFS_Stream* stream, int index, FlagChange const& change)
     }
     KFSp_FirstError error;
     error.Keep(KFSp_ClearCache(stream));
-    error.Keep(ChangeKey(stream, data, index, change));
+    if (error.None()) {
+        error.Keep(ChangeKey(stream, data, index, change));
+    }
     // Scratch of the work above owns nothing, so it isn't disposed.
     data->cache->time = KFS_INVALID_INDEX;
     return error.Code();

@@ -1,5 +1,9 @@
 #include "keystore/keylist_private.h"
 
+#include "keystore/valuedata_private.h"
+
+#include <utility>
+
 namespace {
 
 // Only `time` of a probe is ever compared.
@@ -25,6 +29,15 @@ void KeepMarked(int* range, int inserted)
     if (range[1] != KFS_INVALID_INDEX && range[1] >= inserted) {
         ++range[1];
     }
+}
+
+int DisposeRemapTable(SEQ_Head**, long, int, void* item)
+{
+    auto* const key = static_cast<KFS_KeyScalar*>(item);
+    if (!KFSp_HasSpatialBlock(key) || !key->remapTable) {
+        return 0;
+    }
+    return SEQ_Dispose(std::exchange(key->remapTable, nullptr), 0);
 }
 
 } // namespace
@@ -85,5 +98,13 @@ void KFSp_RetimeKey(KFS_StreamKeyData* data, int index, KFS_KeyScalar* key, int 
     key->time = time;
     if (data->times.Mirrors((*data->keys)->count)) {
         data->times.Retimed(index, time);
+    }
+}
+
+void KFSp_DisposeKeyList(SEQ_Head** keys)
+{
+    if (keys) {
+        static_cast<void>(SEQ_ForEach(keys, 0, DisposeRemapTable, 0));
+        static_cast<void>(SEQ_Dispose(keys, 0));
     }
 }

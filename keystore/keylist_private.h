@@ -77,3 +77,6 @@ int KFSp_RemoveKeyItem(KFS_StreamKeyData* data, int index, KFS_KeyScalar* record
 int KFSp_ReplaceKeyItem(KFS_StreamKeyData* data, KFS_KeyScalar const* record, int index);
 // Writes the time of the key at `index`, which `key` points to. The caller keeps the list sorted.
 void KFSp_RetimeKey(KFS_StreamKeyData* data, int index, KFS_KeyScalar* key, int time);
+
+// Disposes a list of keys with the arc tables that they own; null is fine. There is nobody to tell of a failure.
+void KFSp_DisposeKeyList(SEQ_Head** keys);

@@ -56,8 +56,8 @@ void KFS_KeyTimes::Retimed(int index, int time) noexcept
     }
 }
 
-// By the difference with wrap-around, as the list sorts. The sign of the difference is turned into a step or none, because a branch on it
-// would be mispredicted every other time.
+// By the difference with wrap-around, as the list sorts. The sign of the difference is turned into a step or none,
+// because a branch on it would be mispredicted every other time.
 int KFS_KeyTimes::LowerBound(int time) const noexcept
 {
     auto const isBefore = [time](int other) {

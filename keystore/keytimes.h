@@ -6,9 +6,10 @@
 
 #include <vector>
 
-// The times of a key list's records, packed side by side so that a search touches a few cache lines instead of one a record. It mirrors
-// the list: whoever inserts, removes or retimes a key tells it, and an index that can't follow is dropped and built anew by the next
-// search. It never decides a result: without memory for it searches go through the list itself.
+// The times of a key list's records, packed side by side so that a search touches a few cache lines instead of one a
+// record. It mirrors the list: whoever inserts, removes or retimes a key tells it, and an index that can't follow is
+// dropped and built anew by the next search. It never decides a result: without memory for it searches go through the
+// list itself.
 //
 // Threads: belongs to one key data, and is built by reads.
 class KFS_API KFS_KeyTimes {

@@ -47,14 +47,6 @@ int GetRecordAndCodes(KFS_Stream const* stream, int index, char* inInterp, char*
     return code;
 }
 
-KFS_CopyItemFunc ReadingFunc(KFS_Stream const* stream)
-{
-    if (stream->GetCopyItemFunc()) {
-        return stream->GetCopyItemFunc();
-    }
-    return stream->IsCustom() ? KFSp_FakeCopyItemFunc : KFSp_ConvertItemFromFloat;
-}
-
 }  // namespace
 
 int KFS_GetKeyFlags(KFS_Stream const* stream, int index, unsigned short* flags)
@@ -85,7 +77,7 @@ int KFS_GetKey(KFS_Stream const* stream, int index, void* value, char* inInterp,
             return code;
         }
         short const kind = stream->HasNoKeys() ? KFS_Item_CacheValue : KFS_Item_KeyValue;
-        return ReadingFunc(stream)(stream, stream->GetItemRefcon(), kind, KFSp_ValueData(record), value);
+        return KFSp_OutwardFunc(stream)(stream, stream->GetItemRefcon(), kind, KFSp_ValueData(record), value);
     });
 }
 

@@ -217,7 +217,11 @@ int TimeToIndex(KFS_Stream const* stream, T_Time const* time, int* index)
     // An update asks for float keys that are in the way, and those are to be found where they stand.
     if (!found || !IsFloatKey(data, position)) {
         if (int const code = UpdateForLookup(stream)) {
-            return code;
+            // The key that stands there is no less an answer.
+            if (found) {
+                *index = position;
+            }
+            return found ? 0 : code;
         }
         if (int const code = KFSp_SearchKeys(data, at, &found, &position)) {
             return code;

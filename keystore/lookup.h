@@ -43,7 +43,7 @@ KFS_API int KFS_FindNearestKeyTime(KFS_Stream const* stream, T_Time const* time,
 // an update pass no second one is started.
 //
 // Operation 24. KFS_Err_Constant: a constant stream. KFS_Err_NoKeys: no key. Both reported. An error of the update is
-// returned.
+// returned if no key stood at the time before it; otherwise that key is the answer.
 KFS_API int KFS_TimeToIndex(KFS_Stream const* stream, T_Time const* time, int* index);
 
 // The key at or before a time. `found` tells whether it stands exactly there. No index where the time lies before the

@@ -11,5 +11,6 @@ struct KFSp_RenderStates {
     KFS_StreamCacheState* cacheState = nullptr;
 };
 
-// Looked up once a thread and context, and again when the context's states have changed. Valid until the next call on this thread.
+// Looked up once a thread and context, and again when the context's states have changed. Valid until the next call on
+// this thread.
 KFSp_RenderStates const& KFSp_GetRenderStates(Q_RenderContext const* context);

@@ -73,6 +73,19 @@ int RetimeKeys(KFS_Stream* stream, KFS_StreamKeyData* data, unsigned int newScal
     return 0;
 }
 
+// While some times are in the old scale and some in the new, no speed can be worked out of them. Listeners that are told
+// of a removal may read.
+class ScNoUpdates {
+public:
+    explicit ScNoUpdates(KFS_Stream* stream) : stream_(stream) { stream_->SetDisabledUpdateStream(true); }
+    ~ScNoUpdates() { stream_->SetDisabledUpdateStream(false); }
+    ScNoUpdates(ScNoUpdates const&) = delete;
+    ScNoUpdates& operator=(ScNoUpdates const&) = delete;
+
+private:
+    KFS_Stream* stream_;
+};
+
 int RescaleKeys(KFS_Stream* stream, unsigned int newScale)
 {
     KFS_StreamKeyData* const data = stream->GetKeyDataForModify();
@@ -83,9 +96,11 @@ int RescaleKeys(KFS_Stream* stream, unsigned int newScale)
     {
         KFSp_ScPin const pin(data->keys, error);
         if (error.None()) {
+            ScNoUpdates const noUpdates(stream);
             error.Keep(RetimeKeys(stream, data, newScale));
         }
     }
+    error.Keep(KFSp_ClearCache(stream));  // of what was read meanwhile
     if (error.None()) {
         error.Keep(SEQ_Compact(data->keys));
     }

@@ -52,21 +52,6 @@ int DuplicateRemapTables(SEQ_Head const* const* source, SEQ_Head** copy)
     return error.Code();
 }
 
-int DisposeRemapTable(SEQ_Head**, long, int, void* item)
-{
-    auto* const key = static_cast<KFS_KeyScalar*>(item);
-    return RemapTableOf(key) ? SEQ_Dispose(std::exchange(key->remapTable, nullptr), 0) : 0;
-}
-
-// The list with the arc tables that its keys own; null is fine. There is nobody to tell of a failure.
-void DisposeKeys(SEQ_Head** keys)
-{
-    if (keys) {
-        static_cast<void>(SEQ_ForEach(keys, 0, DisposeRemapTable, 0));
-        static_cast<void>(SEQ_Dispose(keys, 0));
-    }
-}
-
 // By KFS_Type.
 constexpr std::array<unsigned short, 10> ElementSizes{1, 1, 2, 2, 4, 4, 4, 4, 4, 8};
 
@@ -138,7 +123,7 @@ KFS_StreamKeyData::KFS_StreamKeyData(KFS_StreamKeyData const& source, KFS_Stream
         KFSp_ThrowIf(error.Code());
         cache = stream->CloneCache(source.cache);
     } catch (...) {
-        DisposeKeys(keys);
+        KFSp_DisposeKeyList(keys);
         throw;
     }
     valueOwner_ = stream->GetDisposeItemFunc() ? stream : nullptr;
@@ -149,7 +134,7 @@ KFS_StreamKeyData::~KFS_StreamKeyData()
     if (valueOwner_) {
         static_cast<void>(KFSp_ClearCacheRecord(valueOwner_, cache));
     }
-    DisposeKeys(keys);
+    KFSp_DisposeKeyList(keys);
     Q_FreePtr(cache);
 }
 
@@ -233,14 +218,15 @@ void KFS_Stream::CopyExpressionFrom(KFS_Stream const& source)
     }
 }
 
-// The stream's own key data throughout, whatever context the thread is in. The client's dispose function still finds a whole stream.
+// The stream's own key data throughout, whatever context the thread is in. The client's dispose function still finds a
+// whole stream.
 KFS_Stream::~KFS_Stream()
 {
     static_cast<void>(KFSp_CheckStream(KFSp_Op_StreamDestroy, this, KFSp_Row_Dispose));
     if (keyData_.cache) {
         static_cast<void>(KFSp_ClearCacheRecord(this, keyData_.cache));
     }
-    DisposeKeys(std::exchange(keyData_.keys, nullptr));
+    KFSp_DisposeKeyList(std::exchange(keyData_.keys, nullptr));
     exprInfo_.clear();
     FreeCache();
     // Volatile, because what is written to a dying object counts as never read, and checks of the stamp are to read it.

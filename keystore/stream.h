@@ -45,8 +45,8 @@ struct KFS_API KFS_StreamKeyData {
     KFS_StreamKeyData& operator=(KFS_StreamKeyData const&) = delete;
 
 private:
-    // In a copy: the stream whose dispose function gives back what the cache record holds. Null where nothing has to be given back, so
-    // that the copy of a plain stream may outlive the stream.
+    // In a copy: the stream whose dispose function gives back what the cache record holds. Null where nothing has to be
+    // given back, so that the copy of a plain stream may outlive the stream.
     KFS_Stream const* valueOwner_ = nullptr;
 };
 
@@ -88,6 +88,15 @@ public:
     bool AffectsRendering(KFS_RenderOptionsBase const& options) const override;
     hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const& options, GetRenderGuidFilter* filter) const override;
     void GetExpressionDependencyIds(std::set<int>& ids) const override;
+    // The stream as one "LIST" of type "kfbs", to be read back by a stream of the same class. Both throw an int: the chunk service's or
+    // the list service's code, or one that has been reported.
+    //
+    // Read takes the list that the caller has entered; null stands for the next one at the file's place. It replaces what the stream had.
+    // A failed Read leaves a whole stream with some of the file's content. A stream of exactly this class takes its dimension and value
+    // description from the file; one of a derived class keeps its own, and refuses another dimension with KFS_Err_BadFileInfo.
+    void Read(CKF_File* file, CKF_ChunkInfo const* chunk) override;
+    bool ShouldWriteForVersion(CKF_File const* file) const override;
+    void Write(CKF_File* file) const override;
 
     virtual bool CanHaveExpression() const;
     virtual bool CanBeAnimated() const;
@@ -255,6 +264,8 @@ public:
     int RemoveKey(int index, unsigned char keepInCache);
     // Moves the stream between one value and keys. With `keepValue` a constant's value becomes the first key.
     int SetConstant(unsigned char constant, unsigned char keepValue);
+    // Makes a stream with keys that can't be animated a constant, with its value at time 0. Throws an int.
+    void SetConstantIfNotAnimatable();
 
     void NotifyValueChanged();
 

@@ -8,9 +8,10 @@
 struct CKF_ChunkInfo;
 struct CKF_File;
 
-// The stable, language-independent name of a kind of stream or of a place in a group, carried as the 16-byte hash of its text.
-// Copying, comparing and IsValid touch nothing but those bytes; making a name from a text interns the text in a process-wide pool
-// that maps the hash back to it. The pool only grows, exists before KFS_Birth and after KFS_Death, and may be used from any thread.
+// The stable, language-independent name of a kind of stream or of a place in a group, carried as the 16-byte hash of
+// its text. Copying, comparing and IsValid touch nothing but those bytes; making a name from a text interns the text in
+// a process-wide pool that maps the hash back to it. The pool only grows, exists before KFS_Birth and after KFS_Death,
+// and may be used from any thread.
 class KFS_API KFS_MatchName {
 public:
     // A name that isn't set.
@@ -34,15 +35,17 @@ public:
     void SetGuid(hearth::utility::Guid const& guid) { guid_ = guid; }
     hearth::utility::Guid const& GetGuid() const { return guid_; }
 
-    // The pool's text (at most 39 bytes of it are kept), valid for the life of the process; null if no text made this hash.
+    // The pool's text (at most 39 bytes of it are kept), valid for the life of the process; null if no text made this
+    // hash.
     unsigned char const* GetName() const;
 
     bool IsValid() const { return !(guid_ == hearth::utility::Guid()); }
 
-    // The text as an atom "kfmn" of 40 bytes, padded with NULs; the hash isn't stored. Both throw the chunk service's code.
+    // The text as an atom "kfmn" of 40 bytes, padded with NULs; the hash isn't stored. Both throw the chunk service's
+    // code.
     //
-    // Read interns what it reads, whether or not this process has ever heard of it. Write needs a name whose text the pool knows, or one
-    // that isn't set, which is the name of the empty text; it throws the int 3 on any other.
+    // Read interns what it reads, whether or not this process has ever heard of it. Write needs a name whose text the
+    // pool knows, or one that isn't set, which is the name of the empty text; it throws the int 3 on any other.
     void Read(CKF_File* file, CKF_ChunkInfo const* parent);
     void Write(CKF_File* file) const;
 

@@ -3,6 +3,7 @@
 #include "frame/boundary_private.h"
 #include "keystore/attributes.h"
 #include "keystore/stream.h"
+#include "tree/factory.h"
 #include "tree/listener_private.h"
 #include "tree/streambase_private.h"
 #include "tree/streamgroup.h"
@@ -18,26 +19,11 @@ namespace {
 // Ends a run of paths in a file.
 constexpr char const* EndOfPathText = "ZQVM End of path sentinel";
 
-void RescaleLeaf(KFS_StreamBase* leaf, unsigned int scale)
-{
-    KFSp_ThrowIf(KFS_RescaleStream(leaf->GetAsLeaf(), scale));
-}
-
-// Each real leaf below a group that has just found its place, in child order, depth first. Canonical leaves stay at their own scale.
-void RescaleNewlyInstalled(KFS_StreamGroup* installed, unsigned int scale)
-{
-    for (unsigned int i = 0; i < installed->GetNumStreams(); ++i) {
-        KFS_StreamBase* const child = installed->GetEditableStreamNullOK(i);
-        if (!child) {
-            continue;
-        }
-        if (child->IsLeaf()) {
-            RescaleLeaf(child, scale);
-        } else if (KFS_StreamGroup* const below = child->GetAsGroup()) {
-            RescaleNewlyInstalled(below, scale);
-        }
-    }
-}
+// Takes a leaf that has just found its place to the scale there.
+struct KFSp_RescaleNewlyInstalledStream {
+    unsigned int scale;
+    void operator()(KFS_Stream* leaf) const { KFSp_ThrowIf(KFS_RescaleStream(leaf, scale)); }
+};
 
 } // namespace
 
@@ -257,14 +243,10 @@ bool KFS_StreamBase::CanDisplayPostExpressionValue() const
     return false;
 }
 
-void KFS_StreamBase::Read(CKF_File*, CKF_ChunkInfo const*) {}
-
 bool KFS_StreamBase::ShouldWriteForVersion(CKF_File const*) const
 {
     return true;
 }
-
-void KFS_StreamBase::Write(CKF_File*) const {}
 
 void KFS_StreamBase::MakeIndependent(bool independent)
 {
@@ -356,12 +338,13 @@ void KFS_StreamBase::SetParent(KFS_StreamGroup* group)
     if (!group) {
         return;
     }
-    KFS_StreamGroup::NotifyParentsStreamStored(group, this);
-    unsigned int const scale = group->GetPreferredTimeScale();
-    if (IsLeaf()) {
-        RescaleLeaf(this, scale);
+    group->NotifyParentsStreamStored(this);
+    // Canonical leaves below stay at their own scale.
+    KFSp_RescaleNewlyInstalledStream const rescale{group->GetPreferredTimeScale()};
+    if (KFS_Stream* const leaf = GetAsLeaf()) {
+        rescale(leaf);
     } else if (KFS_StreamGroup* const self = GetAsGroup()) {
-        RescaleNewlyInstalled(self, scale);
+        self->ForEachNonCanonicalLeafStream(rescale, nullptr);
     }
 }
 
@@ -414,6 +397,27 @@ bool KFS_StreamBase::IsHiddenByAncestor() const
     return false;
 }
 
+KFS_StreamBase* KFS_StreamBase::CreateStream(KFS_MatchName const& name, bool constant, unsigned int timeScale,
+                                             bool reportIfUnknown, bool canonical)
+{
+    return factory_->CreateStream(name, constant, timeScale, reportIfUnknown, canonical);
+}
+
+KFS_StreamBase* KFS_StreamBase::GetCanonicalStream(KFS_MatchName const& name) const
+{
+    return factory_->GetCanonicalStream(name);
+}
+
+void KFS_StreamBase::RegisterObsoleteStreamParent(KFS_MatchName const& obsoleteName, KFS_MatchName const& parentName)
+{
+    factory_->RegisterObsoleteStreamParent(obsoleteName, parentName);
+}
+
+bool KFS_StreamBase::GatherObsoleteReplacementStreams(std::vector<KFS_Stream*>& replacements)
+{
+    return factory_->GatherObsoleteReplacementStreams(this, replacements);
+}
+
 FX_ParamDef& KFS_StreamBase::GetParamDef()
 {
     if (paramDef_.paramType == FX_Param_NotFilledIn) {
@@ -445,6 +449,11 @@ void KFS_StreamBase::DeepCopyParamDef(FX_ParamDef const& def) const
 boost::any KFS_StreamBase::GetSMDataPath() const
 {
     ScRecursiveLock const guard(lock_);
+    if (smDataPath_.empty() && !IsCanonical() && factory_) {
+        if (KFS_StreamBase const* const canonical = GetCanonicalStream(matchName_)) {
+            smDataPath_ = canonical->GetSMDataPath();
+        }
+    }
     return smDataPath_;
 }
 

@@ -168,7 +168,7 @@ public:
     // Of the place that the node has when first asked: the answer is kept and doesn't follow the node through the tree.
     KFS_StreamCapsuleData const& GetStreamCapsuleData() const;
 
-    // These ask the factory.
+    // These ask the factory, without which a node can't answer them.
     KFS_StreamBase* CreateStream(KFS_MatchName const& name, bool constant, unsigned int timeScale, bool reportIfUnknown,
                                  bool canonical);
     KFS_StreamBase* GetCanonicalStream(KFS_MatchName const& name) const;
@@ -236,6 +236,8 @@ protected:
     KFS_StreamBase(KFS_StreamBase const& source);
 
 private:
+    friend class KFS_StreamGroup;   // gives a clone's children their parent
+
     bool HasFlag(KFS_BaseFlag flag) const { return (flags_ & flag) != 0; }
     void SetFlag(KFS_BaseFlag flag, bool on) { SetStreamBaseFlags(on ? flag : 0U, flag); }
 

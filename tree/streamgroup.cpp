@@ -2,6 +2,41 @@
 
 #include "frame/services/scoped.h"
 #include "frame/statics_private.h"
+#include "tree/factory.h"
+#include "tree/verify_private.h"
+
+#include <boost/make_shared.hpp>
+
+#include <algorithm>
+#include <utility>
+
+namespace {
+
+KFS_CanonicalLayout::const_iterator FindInLayout(KFS_CanonicalLayout const& layout, KFS_MatchName const& name)
+{
+    return std::find_if(layout.begin(), layout.end(),
+                        [&name](KFS_StreamBase const* child) { return child->GetMatchName() == name; });
+}
+
+// Walks down `path` with `step`, which gives a group's child for an identifier.
+template <class Base, class Group, class Step>
+Base* Walk(Group* group, KFS_StreamIDPath const& path, Step const& step)
+{
+    Base* found = group;
+    for (KFS_StreamID const& id : path.GetPathConst()) {
+        Group* const current = found->GetAsGroup();
+        if (!current) {
+            KFSp_FailVerification("expected group");
+        }
+        found = step(current, id);
+        if (!found) {
+            return nullptr;
+        }
+    }
+    return found;
+}
+
+}  // namespace
 
 KFS_StreamGroup::KFS_StreamGroup(KFS_MatchName const* name, KFS_StreamFactory* factory, bool canonical)
     : KFS_StreamBase(name, factory, canonical)
@@ -9,13 +44,42 @@ KFS_StreamGroup::KFS_StreamGroup(KFS_MatchName const* name, KFS_StreamFactory* f
     FX_ParamDef def{};
     def.paramType = FX_Param_GROUP;
     SetParamDef(def);
+    if (name) {
+        canonicalLayout_ = GetCanonicalLayout(*name);
+    }
 }
 
 KFS_StreamGroup::KFS_StreamGroup(KFS_StreamGroup const& source) = default;
 
+bool KFS_StreamGroup::IsModified() const
+{
+    for (unsigned int i = 0; i < GetNumStreams(); ++i) {
+        if (GetStream(i)->IsModified()) {
+            return true;
+        }
+    }
+    return false;
+}
+
+bool KFS_StreamGroup::IsAnimated(bool evenIfDisabled) const
+{
+    for (unsigned int i = 0; i < GetNumStreams(); ++i) {
+        if (GetStream(i)->IsAnimated(evenIfDisabled)) {
+            return true;
+        }
+    }
+    return false;
+}
+
 bool KFS_StreamGroup::IsGroup() const
 {
     return true;
+}
+
+bool KFS_StreamGroup::IsLoading() const
+{
+    KFS_StreamGroup const* const root = GetRoot();
+    return root && root->IsLoading();
 }
 
 KFS_StreamGroup* KFS_StreamGroup::GetAsGroup()
@@ -28,7 +92,44 @@ KFS_StreamGroup const* KFS_StreamGroup::GetAsGroup() const
     return this;
 }
 
+bool KFS_StreamGroup::AffectsRendering(KFS_RenderOptionsBase const&) const
+{
+    return true;
+}
+
+void KFS_StreamGroup::MakeIndependent(bool independent)
+{
+    if (IsIndependent() == independent) {
+        return;
+    }
+    for (unsigned int i = 0; i < GetNumStreams(); ++i) {
+        if (!GetStream(i)->IsCanonical()) {
+            GetEditableStream(i)->MakeIndependent(independent);
+        }
+    }
+    SetStreamBaseFlags(independent ? KFS_BaseFlag_Independent : 0U, KFS_BaseFlag_Independent);
+}
+
+void KFS_StreamGroup::SetupCanonicalLayout()
+{
+    auto const layout = boost::make_shared<KFS_CanonicalLayout>();
+    FillCanonicalLayout(layout.get());
+    canonicalLayout_ = layout;
+}
+
+void KFS_StreamGroup::UpgradeChildStream(KFS_StreamBase*) {}
+
+bool KFS_StreamGroup::CanStore(KFS_MatchName const& name) const
+{
+    return canonicalLayout_ && FindInLayout(*canonicalLayout_, name) != canonicalLayout_->end();
+}
+
 void KFS_StreamGroup::NotifyStreamStored(KFS_StreamGroup*, KFS_StreamBase*) {}
+
+bool KFS_StreamGroup::CouldGoMissing() const
+{
+    return false;
+}
 
 unsigned int KFS_StreamGroup::GetPreferredTimeScale() const
 {
@@ -40,7 +141,49 @@ int KFS_StreamGroup::EvaluateExpression(KFS_Stream const*, T_Time const*, double
     return 1;
 }
 
-void KFS_StreamGroup::NotifyParentsStreamStored(KFS_StreamGroup* group, KFS_StreamBase* stream)
+unsigned int KFS_StreamGroup::GetIndexInUILayout(KFS_MatchName const& name) const
+{
+    if (canonicalLayout_) {
+        auto const found = FindInLayout(*canonicalLayout_, name);
+        if (found != canonicalLayout_->end()) {
+            return static_cast<unsigned int>(found - canonicalLayout_->begin());
+        }
+    }
+    KFSp_FailVerification("match name isn't in UI layout");
+}
+
+boost::shared_ptr<KFS_CanonicalLayout> KFS_StreamGroup::GetCanonicalLayout(KFS_MatchName const& name) const
+{
+    KFS_StreamFactory* const factory = GetFactory();
+    KFS_StreamBase const* const canonical = factory ? factory->GetCanonicalStream(name) : nullptr;
+    KFS_StreamGroup const* const group = canonical ? canonical->GetAsGroup() : nullptr;
+    return group ? group->canonicalLayout_ : boost::shared_ptr<KFS_CanonicalLayout>();
+}
+
+KFS_StreamBase const* KFS_StreamGroup::FindStream(KFS_StreamIDPath const& path) const
+{
+    return Walk<KFS_StreamBase const>(
+        this, path, [](KFS_StreamGroup const* group, KFS_StreamID const& id) { return group->GetStream(id); });
+}
+
+KFS_StreamBase* KFS_StreamGroup::FindEditableStream(KFS_StreamIDPath const& path)
+{
+    return Walk<KFS_StreamBase>(
+        this, path, [](KFS_StreamGroup* group, KFS_StreamID const& id) { return group->GetEditableStream(id); });
+}
+
+KFS_Stream* KFS_StreamGroup::FindEditableLeafStreamNullOK(KFS_StreamIDPath const& path)
+{
+    return const_cast<KFS_Stream*>(std::as_const(*this).FindEditableLeafStreamNullOK(path));
+}
+
+KFS_Stream const* KFS_StreamGroup::FindEditableLeafStreamNullOK(KFS_StreamIDPath const& path) const
+{
+    KFS_StreamBase const* const found = FindStream(path);
+    return found && !found->IsCanonical() ? found->GetAsLeaf() : nullptr;
+}
+
+void KFS_StreamGroup::NotifyParentsStreamStored(KFS_StreamBase* stream)
 {
     boost::thread_specific_ptr<bool>& check = KFSp_GetNotifyParentsCheck();
     if (!check.get()) {
@@ -50,7 +193,7 @@ void KFS_StreamGroup::NotifyParentsStreamStored(KFS_StreamGroup* group, KFS_Stre
         return;
     }
     Q_ScSetReset<bool> const inside(check.get(), true);
-    for (KFS_StreamGroup* ancestor = group; ancestor; ancestor = ancestor->GetParent()) {
-        ancestor->NotifyStreamStored(group, stream);
+    for (KFS_StreamGroup* group = this; group; group = group->GetParent()) {
+        group->NotifyStreamStored(this, stream);
     }
 }

@@ -8,7 +8,7 @@ namespace {
 constexpr int ListType = CKF_Id("kfsi");
 constexpr int IndexId = CKF_Id("kfix");
 
-} // namespace
+}  // namespace
 
 void KFS_StreamID::Read(CKF_File* file, CKF_ChunkInfo const* parent)
 {

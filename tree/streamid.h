@@ -19,13 +19,14 @@ public:
     unsigned int GetIndex() const { return index_; }
     KFS_MatchName const& GetMatchName() const { return matchName_; }
 
-    // A list "kfsi". Both throw the chunk service's code; a failed Read leaves the identifier as it was. Write needs a name whose text
-    // the pool knows.
+    // A list "kfsi". Both throw the chunk service's code; a failed Read leaves the identifier as it was. Write needs a
+    // name whose text the pool knows.
     void Read(CKF_File* file, CKF_ChunkInfo const* parent);
     void Write(CKF_File* file) const;
 
-    // By index where both have one, whatever their names; else by name where both names are set. Identifiers without such a common
-    // field are unequal, an empty one even to itself: these aren't an equivalence, and identifiers are no keys of a map or a set.
+    // By index where both have one, whatever their names; else by name where both names are set. Identifiers without
+    // such a common field are unequal, an empty one even to itself: these aren't an equivalence, and identifiers are no
+    // keys of a map or a set.
     friend bool operator==(KFS_StreamID const& a, KFS_StreamID const& b)
     {
         return a.index_ != NoIndex && b.index_ != NoIndex ? a.index_ == b.index_

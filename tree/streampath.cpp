@@ -10,7 +10,7 @@ namespace {
 // Begins the bytes of a path's identity, so that no other kind of thing has the same.
 constexpr std::string_view UIDSeed = "KFS_StreamIDPath::MakeUID";
 
-} // namespace
+}  // namespace
 
 KFS_StreamIDPath::KFS_StreamIDPath(KFS_StreamID const& head) : components_{head} {}
 
@@ -18,8 +18,7 @@ KFS_StreamIDPath::KFS_StreamIDPath(KFS_StreamID const& head, KFS_StreamID const&
 
 KFS_StreamIDPath::KFS_StreamIDPath(KFS_StreamID const& head, KFS_StreamID const& second, KFS_StreamID const& third)
     : components_{head, second, third}
-{
-}
+{}
 
 KFS_StreamIDPath::KFS_StreamIDPath(KFS_StreamIDPath const& parent, KFS_StreamID const& tail)
 {
@@ -111,8 +110,9 @@ bool operator<(KFS_StreamIDPath const& a, KFS_StreamIDPath const& b)
 
 bool KFS_StreamIDPath::IsEqualByMatchName(KFS_StreamIDPath const& other) const
 {
-    return std::equal(components_.begin(), components_.end(), other.components_.begin(), other.components_.end(),
-                      [](KFS_StreamID const& a, KFS_StreamID const& b) { return a.GetMatchName() == b.GetMatchName(); });
+    return std::equal(
+        components_.begin(), components_.end(), other.components_.begin(), other.components_.end(),
+        [](KFS_StreamID const& a, KFS_StreamID const& b) { return a.GetMatchName() == b.GetMatchName(); });
 }
 
 bool KFS_StreamIDPath::IsPrefixOf(KFS_StreamIDPath const& other) const
@@ -143,9 +143,9 @@ hearth::utility::Guid KFS_StreamIDPath::MakeUID() const
     UpdateHashState(state, UIDSeed.data(), UIDSeed.size());
     for (KFS_StreamID const& id : components_) {
         unsigned int const index = id.GetIndex();
-        unsigned char const indexBytes[4] = {
-            static_cast<unsigned char>(index), static_cast<unsigned char>(index >> 8),
-            static_cast<unsigned char>(index >> 16), static_cast<unsigned char>(index >> 24)};
+        unsigned char const indexBytes[4] = {static_cast<unsigned char>(index), static_cast<unsigned char>(index >> 8),
+                                             static_cast<unsigned char>(index >> 16),
+                                             static_cast<unsigned char>(index >> 24)};
         UpdateHashState(state, indexBytes, sizeof indexBytes);
         unsigned char nameBytes[16];
         GuidToBytes(id.GetMatchName().GetGuid(), nameBytes);

@@ -7,8 +7,8 @@
 
 #include <vector>
 
-// The way from a root group down to a stream: the head names a child of the root, the tail the stream itself. The empty path means the
-// root. A path holds no pointer, so it outlives the tree and can be saved.
+// The way from a root group down to a stream: the head names a child of the root, the tail the stream itself. The empty
+// path means the root. A path holds no pointer, so it outlives the tree and can be saved.
 //
 // Threads: a plain value.
 class KFS_API KFS_StreamIDPath {
@@ -64,26 +64,28 @@ public:
     bool IsPrefixOf(KFS_StreamIDPath const& other) const;
     // `where`, which may be null, gets the first component of that name from the head, or 0xFFFFFFFF.
     bool FindFirstInstanceOfMatchName(KFS_MatchName const& name, unsigned int* where) const;
-    // Whether the component at `level`, counted from 1 at the head, has that name; false on a shorter path. Level 0 is reported and
-    // throws the int 3.
+    // Whether the component at `level`, counted from 1 at the head, has that name; false on a shorter path. Level 0 is
+    // reported and throws the int 3.
     bool HasTargetParent(KFS_MatchName const& name, unsigned int level) const;
 
-    // The same on every machine and in every version. It covers both fields of each component, so paths that compare equal by index
-    // alone may differ in it.
+    // The same on every machine and in every version. It covers both fields of each component, so paths that compare
+    // equal by index alone may differ in it.
     hearth::utility::Guid MakeUID() const;
 
     // A path once stored a type number; it no longer does.
     bool StoresStrmType() const { return false; }
     unsigned int GetStrmType() const { return 0xFFFFFFFF; }
 
-    // An object with one entry a component, in order: {"0": {"index": 3, "matchName": "..."}, ...}. An index that isn't there is
-    // 4294967295. The keys have equal width, so that they sort in the order of the components. The pool must know each component's text.
+    // An object with one entry a component, in order: {"0": {"index": 3, "matchName": "..."}, ...}. An index that isn't
+    // there is 4294967295. The keys have equal width, so that they sort in the order of the components. The pool must
+    // know each component's text.
     u16str GetAs_JSON() const;
-    // Appends what the text holds, in its order. Throws the int of a text that is no such object, with the path as it was.
+    // Appends what the text holds, in its order. Throws the int of a text that is no such object, with the path as it
+    // was.
     void SetFrom_JSON(u16str const& text);
 
-    // A list "kfsp". Both throw the chunk service's code; what a failed Read had read stays in the path. A path of an old file that holds
-    // a type number goes to the application's oldPathFixupFunc.
+    // A list "kfsp". Both throw the chunk service's code; what a failed Read had read stays in the path. A path of an
+    // old file that holds a type number goes to the application's oldPathFixupFunc.
     void Read(CKF_File* file, CKF_ChunkInfo const* parent);
     void Write(CKF_File* file) const;
 
@@ -97,5 +99,6 @@ private:
     std::vector<KFS_StreamID> components_;  // head first
 };
 
-// `path` down to its last component of that name: the path of the nearest ancestor-or-self with it. Empty if there is none.
+// `path` down to its last component of that name: the path of the nearest ancestor-or-self with it. Empty if there is
+// none.
 KFS_API KFS_StreamIDPath KFS_FindFromReverse(KFS_MatchName const& name, KFS_StreamIDPath const& path);

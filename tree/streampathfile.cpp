@@ -12,7 +12,7 @@ constexpr int LengthId = CKF_Id("kfpl");
 
 constexpr int NoOldType = -1;
 
-} // namespace
+}  // namespace
 
 void KFS_StreamIDPath::Read(CKF_File* file, CKF_ChunkInfo const* parent)
 {

@@ -42,7 +42,7 @@ private:
     KFS_StreamIDPath* path_;
 };
 
-} // namespace
+}  // namespace
 
 u16str KFS_StreamIDPath::GetAs_JSON() const
 {

@@ -12,9 +12,10 @@
 #include <variant>
 
 // What the operations below throw, as an int.
-inline constexpr int Q_Err_BadJson = 0x1703;    // not JSON, deeper than Q_MaxJsonDepth, or a number that isn't a whole one of 64 bits
-inline constexpr int Q_Err_NotANumber = 0x1704; // a value that was asked for a number and has none
-inline constexpr int Q_Err_NoChild = 0x1705;    // a tree without that child
+inline constexpr int Q_Err_BadJson =
+    0x1703;  // not JSON, deeper than Q_MaxJsonDepth, or a number that isn't a whole one of 64 bits
+inline constexpr int Q_Err_NotANumber = 0x1704;  // a value that was asked for a number and has none
+inline constexpr int Q_Err_NoChild = 0x1705;     // a tree without that child
 
 inline constexpr int Q_MaxJsonDepth = 128;
 

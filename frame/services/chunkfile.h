@@ -9,8 +9,8 @@
 //          bad byte on. Only the answer that a chunk isn't there, CKF_Err_NoSuchChunk, is no failure. What the service
 //          throws is such a code, as an int.
 // Hostile  Nothing of a file is trusted. A length is held against what its parent has left before anything is
-// files    allocated or read, lists nest at most CKF_MaxDepth deep, and no sequence of operations costs more than the
-//          file's size for each one that finds something.
+// files    allocated or read, lists nest at most CKF_MaxDepth deep, and a search that found nothing isn't made again, so
+//          that reading costs time in proportion to the file whatever stands in it.
 // Threads  One file is used by one thread at a time. No lock.
 #pragma once
 
@@ -37,16 +37,17 @@ inline constexpr int CKF_Utf16Id = CKF_Id("Utf8");  // the chunk of CKF_WriteUTF
 inline constexpr int CKF_MaxDepth = 128;  // lists inside lists; the writer refuses what no reader would take
 
 // Codes of this service; 4, out of memory, is common to all services.
-inline constexpr int CKF_Err_NoSuchChunk = 0x1901;   // not there; the position is what it was
-inline constexpr int CKF_Err_BadArgument = 0x1902;   // a null address, a negative size, an id that isn't an atom's
-inline constexpr int CKF_Err_NotOpen = 0x1903;       // the file isn't open for this direction
-inline constexpr int CKF_Err_NotAChunkFile = 0x1904; // the outer form or its version record is missing or another's
-inline constexpr int CKF_Err_Corrupt = 0x1905;       // a chunk doesn't fit its parent, or the form doesn't fit the file
-inline constexpr int CKF_Err_TooDeep = 0x1906;       // more than CKF_MaxDepth lists inside each other
-inline constexpr int CKF_Err_TooBig = 0x1907;        // the file would pass 4 GiB, or the limit that the host set
-inline constexpr int CKF_Err_Unbalanced = 0x1908;    // a chunk that isn't the innermost open one, or is still open at Commit
-inline constexpr int CKF_Err_PastEnd = 0x1909;       // more bytes asked for than the chunk has left
-inline constexpr int CKF_Err_Io = 0x190A;            // the operating system refused; the error text says why
+inline constexpr int CKF_Err_NoSuchChunk = 0x1901;    // not there; the position is what it was
+inline constexpr int CKF_Err_BadArgument = 0x1902;    // a null address, a negative size, an id that isn't an atom's
+inline constexpr int CKF_Err_NotOpen = 0x1903;        // the file isn't open for this direction
+inline constexpr int CKF_Err_NotAChunkFile = 0x1904;  // the outer form or its version record is missing or another's
+inline constexpr int CKF_Err_Corrupt = 0x1905;  // a chunk doesn't fit its parent, or the form doesn't fit the file
+inline constexpr int CKF_Err_TooDeep = 0x1906;  // more than CKF_MaxDepth lists inside each other
+inline constexpr int CKF_Err_TooBig = 0x1907;   // the file would pass 4 GiB, or the limit that the host set
+inline constexpr int CKF_Err_Unbalanced =
+    0x1908;                                     // a chunk that isn't the innermost open one, or is still open at Commit
+inline constexpr int CKF_Err_PastEnd = 0x1909;  // more bytes asked for than the chunk has left
+inline constexpr int CKF_Err_Io = 0x190A;       // the operating system refused; the error text says why
 
 // ---- versions
 
@@ -91,7 +92,7 @@ enum class CKF_IoCall {
 class CKF_IoHook {
 public:
     virtual ~CKF_IoHook() = default;
-    virtual int Before(CKF_IoCall call, std::size_t bytes) = 0;
+    virtual int Before(CKF_IoCall call, std::size_t bytes) noexcept = 0;
 };
 
 // A project file. Open it, hand it to the library, and read LastError() or the result of Commit().
@@ -274,9 +275,9 @@ KFS_SERVICE_API bool CKF_Version_Gen7_PreUnicode(CKF_File const* file);
 // One chunk as it stands in the bytes. The outer form is the first, at depth 0.
 struct CKF_RawChunk {
     int id;
-    int listType;                         // of a list and of the outer form; else 0
-    std::uint64_t offset;                 // of its header
-    std::uint32_t claimedSize;            // as its header says, without the list type
+    int listType;               // of a list and of the outer form; else 0
+    std::uint64_t offset;       // of its header
+    std::uint32_t claimedSize;  // as its header says, without the list type
     int depth;
     std::span<unsigned char const> data;  // what is really there, behind the list type; never beyond the parent
     char const* problem;                  // null, or what is wrong with it; valid for ever

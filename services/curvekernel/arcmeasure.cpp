@@ -269,7 +269,10 @@ private:
         if (unscale == 1.0) return;
         for (int i = 0; i < table_.count; ++i) {
             table_.pieces[i].start *= unscale;
-            table_.pieces[i].rate /= unscale;
+            // A path as short as the smallest numbers wants more than the largest; infinity would be a NaN at s = 0.
+            constexpr double largest = std::numeric_limits<double>::max();
+            const double rate = table_.pieces[i].rate / unscale;
+            table_.pieces[i].rate = CRVp_Max(-largest, CRVp_Min(largest, rate));
         }
         table_.length *= unscale;
     }

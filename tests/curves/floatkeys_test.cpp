@@ -5,6 +5,7 @@
 #include "frame/errors.h"
 #include "keystore/lookup.h"
 #include "tests/curves/pathstream.h"
+#include "tests/support/listening.h"
 
 #include <random>
 
@@ -266,6 +267,34 @@ TEST_F(SetKeyTime, KeepsTheHandlesOfAPlainKey)
     EXPECT_EQ(handle.outSpeed, after.outSpeed);
 }
 
+TEST_F(SetKeyTime, MovesTheKeyPastListenersThatRead)
+{
+    HeardRoot root;
+    KeyedStream stream = MakeKeyed({{0, 1}, {100, 5}, {200, 2}}, KFS_Interp_Spline);
+    Handle const handle{1.5, 0.25, -2.5, 0.75};
+    stream.SetHandle(1, handle);
+    root.Store(stream);
+    {
+        ValueListener listener([&] { stream.At(20); });
+        ASSERT_EQ(0, KFS_SetKeyTime(stream, 1, nullptr, 150, nullptr, nullptr));
+        EXPECT_EQ(3, listener.Take());  // it left, it came, it has moved
+    }
+    EXPECT_EQ((std::vector<int>{0, 150, 200}), stream.Times());
+    EXPECT_EQ((std::vector<double>{5, handle.inSpeed, handle.inInfluence, handle.outSpeed, handle.outInfluence}),
+              stream.Numbers(1));
+    EXPECT_EQ(5.0, stream.At1(150));
+
+    // One that objects can't keep the key from arriving.
+    int newIndex = 0;
+    {
+        ValueListener listener([] { throw 4711; });
+        EXPECT_EQ(4711, KFS_SetKeyTime(stream, 1, nullptr, 250, &newIndex, nullptr));
+    }
+    EXPECT_EQ((std::vector<int>{0, 200, 250}), stream.Times());
+    EXPECT_EQ(2, newIndex);
+    stream->SetParent(nullptr);
+}
+
 TEST_F(SetKeyTime, ResetsTheInfluenceBesideTheEnds)
 {
     for (short const dimension : {1, 6}) {
@@ -295,6 +324,8 @@ TEST_F(SetKeyTime, OfAConstantIsWhereItsValueStands)
     ASSERT_EQ(0, KFS_SetKeyTime(stream, 12, nullptr, 90, nullptr, &old));
     EXPECT_EQ(40, old.value);
     EXPECT_EQ(90, stream->GetCache()->time);
+    EXPECT_EQ(KFS_Err_TimeNotRepresentable, KFS_SetKeyTime(stream, 0, nullptr, KFS_INVALID_INDEX, nullptr, nullptr));
+    EXPECT_EQ(1U, reports.Take().size());
     EXPECT_EQ(3.5, stream.At1(0));
 }
 

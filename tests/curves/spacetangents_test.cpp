@@ -117,7 +117,7 @@ TEST_F(SpaceTangents, OfAConstantAreThoseOfItsValue)
     TestStream stream(options);
     stream.Key(0, {3, 4});
     double const given[2] = {1, 2};
-    ASSERT_EQ(0, KFS_SetKeySpaceTangentsF(stream, 99, 0, nullptr, given));
+    ASSERT_EQ(0, KFS_SetKeySpaceTangentsF(stream, std::numeric_limits<int>::max(), 0, nullptr, given));
     double out[2];
     ASSERT_EQ(0, KFS_GetKeySpaceTangentsF(stream, -5, 0, nullptr, out));
     EXPECT_EQ(1.0, out[0]);

@@ -1,5 +1,6 @@
 #include "curves/tangents.h"
 
+#include "curves/spacetangents.h"
 #include "curves/update.h"
 #include "tests/curves/threekeys.h"
 #include "tree/listener.h"
@@ -372,6 +373,31 @@ TEST_F(TangentsTest, SettersTellOnceAndOnlyOnSuccess)
         EXPECT_EQ(8, stream.GetValueDesc()->itemSize);
         EXPECT_EQ(nullptr, stream.GetCopyItemFunc());
     }
+}
+
+// A listener that reads in the stream's own type would get doubles otherwise, for which it has no room.
+TEST_F(TangentsTest, ListenersHearOfDoublesWhenTheStreamIsItselfAgain)
+{
+    KFS_ValueDesc desc;
+    desc.dataType = KFS_Type_Float;
+    HeardStream stream(2, 600, 0, 1, KFS_InterpMask_All, KFS_InterpMask_Negative, desc, nullptr, nullptr, false);
+    double const value[2] = {1.0, 2.0};
+    for (int const at : {0, 600}) {
+        T_Time const time{at, 600};
+        ASSERT_EQ(0, KFS_InsertKeyF(&stream, &time, 1, value, S, S));
+    }
+    Ear ear;
+    ear.answer = [&] {
+        EXPECT_EQ(KFS_Type_Float, stream.GetValueDesc()->dataType);
+        EXPECT_EQ(nullptr, stream.GetCopyItemFunc());
+        float read[3] = {0.0F, 0.0F, -1.0F};
+        T_Time const time{300, 600};
+        EXPECT_EQ(0, KFS_GetValuePlus(&stream, &time, 0, read, nullptr, nullptr, nullptr, 0));
+        EXPECT_EQ(-1.0F, read[2]);
+    };
+    EXPECT_EQ(0, KFS_SetKeyVelocityF(&stream, 1, value, nullptr));
+    EXPECT_EQ(0, KFS_SetKeySpaceTangentsF(&stream, 1, 0, value, nullptr));
+    EXPECT_EQ(2, ear.heard);
 }
 
 }  // namespace

@@ -90,6 +90,8 @@ TEST_F(Cache, AConstantFollowsTheAskedTime)
     // The sentinel isn't a time: it would say that the constant has no value.
     KFSp_UpdateStreamCacheToTime(stream, KFS_INVALID_INDEX, 0, &atKey, nullptr, nullptr, 0);
     EXPECT_FALSE(stream->HasNoValue());
+    stream->ValidateCacheAtTime({KFS_INVALID_INDEX, 600});
+    EXPECT_FALSE(stream->HasNoValue());
 }
 
 TEST_F(Cache, KeysOnlyLeavesItEmptyBetweenKeys)

@@ -1,6 +1,7 @@
 #include "keystore/stream.h"
 
 #include "tests/support/listening.h"
+#include "tests/support/ownedvalues.h"
 #include "tests/support/streams.h"
 
 namespace {
@@ -125,6 +126,50 @@ TEST_F(Constants, AFailureIsTheResultAndIsHeardAllTheSame)
     EXPECT_EQ(nullptr, stream.GetKeys()) << "a list whose disposal failed is gone all the same";
     EXPECT_TRUE(stream.HasKeys());
     stream.SetDisposeItemFunc(nullptr);
+}
+
+// A value that can't become a key is still there.
+TEST_F(Constants, AFailureOnTheWayToKeysLeavesTheConstant)
+{
+    for (const short dimension : {1, 40}) {  // the wide record needs room to be put aside
+        const auto make = [dimension] {
+            auto stream = std::make_unique<TestStream>(StreamOptions{.dimension = dimension, .noKeys = true});
+            stream->Key(70, std::vector<double>(40, 4.0));
+            return stream;
+        };
+        int failures = 0;
+        const auto check = [&](TestStream const& stream, int code, Q_MemoryCount const& before) {
+            EXPECT_EQ(4.0, stream.At1(0));
+            if (code != 0) {  // the packed times are done without
+                EXPECT_TRUE(stream->HasNoKeys());
+                EXPECT_EQ(nullptr, stream->GetKeys());
+                EXPECT_EQ(before.blocks, Q_MemoryLive(nullptr).blocks);
+                ++failures;
+            }
+        };
+        FailEveryAllocation(
+            make, [](TestStream& stream) { return stream->SetConstant(0, 1); }, check);
+        EXPECT_LE(2, failures);
+    }
+    OwnedValues::Reset();
+    {
+        const auto stream = OwnedValues::MakeStream(true);
+        const OwnedValues::Ticket mine = OwnedValues::Make(5.0);
+        ASSERT_EQ(0, KFS_InsertKey(stream.get(), nullptr, 0, &mine, KFS_Interp_Hold, KFS_Interp_Hold));
+        OwnedValues::Free(mine);
+        OwnedValues::copyCode = 9001;
+        EXPECT_EQ(9001, stream->SetConstant(0, 1));
+        OwnedValues::copyCode = 0;
+        EXPECT_TRUE(stream->HasNoKeys());
+        EXPECT_EQ(1, OwnedValues::Live());
+        EXPECT_EQ(0, stream->SetConstant(0, 1));
+        EXPECT_EQ(1, OwnedValues::Live());
+        OwnedValues::Ticket out{};
+        ASSERT_EQ(0, KFS_RemoveKey(stream.get(), 0, &out));
+        EXPECT_EQ(5.0, OwnedValues::Value(out));
+        OwnedValues::Free(out);
+    }
+    EXPECT_EQ(0, OwnedValues::Live());
 }
 
 TEST_F(Constants, WhatShouldNotBeAnimatedIsReportedAndAnimated)

@@ -5,7 +5,6 @@
 #include "keystore/attributes.h"
 #include "keystore/edit_private.h"
 #include "tests/support/listening.h"
-#include "tests/support/ownedvalues.h"
 #include "tests/support/streams.h"
 
 #include <cmath>
@@ -557,109 +556,18 @@ TEST_F(Edit, ARemovedKeyIsHandedOut)
     EXPECT_EQ(7427, never->RemoveKey(0, 0));
 }
 
-// ---- custom values
-
-TEST_F(Edit, CustomValuesAreCopiedInAndGivenBack)
+TEST_F(Edit, AListenerReadsThePresentCurveAndSpoilsNoRemovedValue)
 {
-    for (bool const noKeys : {false, true}) {
-        OwnedValues::Reset();
-        {
-            auto const stream = OwnedValues::MakeStream(noKeys);
-            T_Time const at{10, 600};
-            OwnedValues::Ticket const mine = OwnedValues::Make(5.0);
-            OwnedValues::Ticket const other = OwnedValues::Make(6.0);
-            ASSERT_EQ(0, KFS_InsertKey(stream.get(), &at, 0, &mine, Hold, Hold));
-            EXPECT_EQ(3, OwnedValues::Live());
-            ASSERT_EQ(0, KFS_InsertKey(stream.get(), &at, 1, &other, None, None));
-            EXPECT_EQ(3, OwnedValues::Live()) << "the replaced value was given back";
-            ASSERT_EQ(0, KFS_SetKey(stream.get(), 0, &mine, None, None));
-            EXPECT_EQ(3, OwnedValues::Live());
-            ASSERT_EQ(0, KFS_InsertKey(stream.get(), &at, 1, nullptr, None, None));
-            EXPECT_EQ(3, OwnedValues::Live());
-            T_Time const later{500, 600};
-            ASSERT_EQ(0, KFS_InsertKey(stream.get(), &later, 1, nullptr, None, None));
-            EXPECT_EQ(noKeys ? 3 : 4, OwnedValues::Live()) << "a key takes the value that is there";
-            OwnedValues::Ticket out{};
-            ASSERT_EQ(0, KFS_RemoveKey(stream.get(), 0, &out));
-            EXPECT_EQ(5.0, OwnedValues::Value(out));
-            OwnedValues::Free(out);
-            OwnedValues::Free(mine);
-            OwnedValues::Free(other);
-        }
-        EXPECT_EQ(0, OwnedValues::Live());
-    }
-}
-
-TEST_F(Edit, AFailingItemFunctionLeavesTheKeyAsItWas)
-{
-    struct Row {
-        char const* why;
-        int copyCode, disposeCode, code;
-    };
-    for (Row const& row : {Row{"copy", 9001, 0, 9001}, Row{"dispose", 0, 9002, 9002}}) {
-        for (bool const noKeys : {false, true}) {
-            SCOPED_TRACE(testing::Message() << row.why << (noKeys ? ", constant" : ", keys"));
-            OwnedValues::Reset();
-            auto stream = OwnedValues::MakeStream(noKeys);
-            T_Time const at{10, 600};
-            T_Time const later{20, 600};
-            OwnedValues::Ticket const mine = OwnedValues::Make(5.0);
-            ASSERT_EQ(0, KFS_InsertKey(stream.get(), &at, 0, &mine, Hold, Hold));
-            OwnedValues::copyCode = row.copyCode;
-            OwnedValues::disposeCode = row.disposeCode;
-            EXPECT_EQ(row.code, KFS_SetKey(stream.get(), 0, &mine, None, None));
-            if (row.copyCode != 0) {
-                EXPECT_EQ(row.code, KFS_InsertKey(stream.get(), &later, 1, &mine, Hold, Hold));
-            }
-            OwnedValues::copyCode = 0;
-            OwnedValues::disposeCode = 0;
-            EXPECT_EQ(noKeys ? 0 : 1, noKeys ? 0 : (*stream->GetKeys())->count);
-            OwnedValues::Ticket out{};
-            ASSERT_EQ(0, KFS_RemoveKey(stream.get(), 0, &out));
-            EXPECT_EQ(5.0, OwnedValues::Value(out));
-            OwnedValues::Free(out);
-            OwnedValues::Free(mine);
-            stream.reset();
-            EXPECT_EQ(row.disposeCode != 0 ? 1 : 0, OwnedValues::Live()) << "but for what could not be given back";
-        }
-    }
-}
-
-TEST_F(Edit, DoublesGoIntoACustomStreamThatHasRoom)
-{
-    struct Row {
-        unsigned short itemSize;
-        bool fits;
-    };
-    for (Row const& row : {Row{8, true}, Row{24, true}, Row{7, false}, Row{1, false}}) {
-        for (bool const noKeys : {false, true}) {
-            SCOPED_TRACE(testing::Message() << row.itemSize << (noKeys ? ", constant" : ", keys"));
-            KFS_ValueDesc desc;
-            desc.isCustom = 1;
-            desc.itemSize = row.itemSize;
-            desc.dataType = 4711;
-            desc.interpFunc = OwnedValues::Interpolate;
-            KFS_Stream stream(1, 600, noKeys, 0, KFS_InterpMask_All, 0, desc, nullptr, nullptr, false);
-            T_Time const at{10, 600};
-            double const value = 2.5;
-            int const code = row.fits ? 0 : 7441;
-            EXPECT_EQ(code, KFS_InsertKeyF(&stream, &at, 0, &value, Spline, Spline));
-            EXPECT_EQ(code, KFS_InsertKeyF(&stream, &at, 1, &value, None, None));
-            if (row.fits) {
-                double out[3] = {};
-                ASSERT_EQ(0, KFS_RemoveKey(&stream, 0, out));
-                EXPECT_EQ(2.5, out[0]);
-            } else {
-                EXPECT_EQ(reports.Take(),
-                          (std::vector<Reported>(2, KfsReport(81, "can#{rsquo}t convert to custom value"))));
-            }
-            EXPECT_EQ(1, stream.GetValueDesc()->isCustom);
-            EXPECT_EQ(row.itemSize, stream.GetValueDesc()->itemSize);
-            EXPECT_EQ(4711, stream.GetValueDesc()->dataType);
-            EXPECT_EQ(OwnedValues::Interpolate, stream.GetInterpFunc());
-            EXPECT_FALSE(stream.IsTemporarilyNonCustom());
-        }
-    }
+    TestStream stream;
+    stream.Key(0, {10}).Key(100, {99}).Key(200, {30});
+    HeardRoot root;
+    root.Store(stream);
+    std::vector<double> read;
+    ValueListener listener([&] { read = {stream.At1(100), stream.At1(50)}; });
+    double value = 0.0;
+    ASSERT_EQ(0, KFS_RemoveKey(stream, 1, &value));
+    EXPECT_EQ(99.0, value);
+    EXPECT_EQ((std::vector<double>{20, 15}), read);
 }
 
 // ---- notifications

@@ -4,8 +4,8 @@
 #include "keystore/attributes.h"
 #include "keystore/lookup.h"
 #include "overrides/parambag.h"
+#include "tests/support/baregroup.h"
 #include "tests/support/streams.h"
-#include "tree/streamgroup.h"
 
 #include <stdexcept>
 
@@ -317,18 +317,6 @@ public:
     std::vector<KFS_Stream const*> followers;
 };
 
-class Root : public KFS_StreamGroup {
-public:
-    Root() : KFS_StreamGroup(nullptr, nullptr, false) {}
-    unsigned int GetNumStreams() const override { return 0; }
-    KFS_StreamBase const* GetStream(unsigned int) const override { return nullptr; }
-    KFS_StreamBase* GetEditableStreamNullOK(unsigned int) override { return nullptr; }
-    KFS_StreamBase* CloneStream(KFS_CloneStreamParams const&) const override { return nullptr; }
-    bool IsAnimated(bool) const override { return false; }
-    bool AffectsRendering(KFS_RenderOptionsBase const&) const override { return true; }
-    hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const&, GetRenderGuidFilter*) const override { return {}; }
-};
-
 TEST_F(Evaluate, SeparatedDimensionsAnswerFromTheirFollowers)
 {
     KFS_ValueDesc desc;
@@ -346,7 +334,7 @@ TEST_F(Evaluate, SeparatedDimensionsAnswerFromTheirFollowers)
     unsigned char atKey = 9;
     ASSERT_EQ(0, KFS_GetValueFPlus(&leader, &at, 0, value, &atKey, nullptr));
     EXPECT_EQ(1.0, value[0]) << "without a parent it reads its own keys";
-    Root root;
+    BareGroup root;
     leader.SetParent(&root);
     double separated[3] = {-1.0, -1.0, -1.0};
     atKey = 9;

@@ -1,6 +1,8 @@
 #include "keystore/attributes.h"
 
+#include "curves/update.h"
 #include "keystore/lookup.h"
+#include "tests/support/listening.h"
 #include "tests/support/streams.h"
 
 #include <algorithm>
@@ -117,6 +119,37 @@ TEST_F(Rescale, ValuesStayWhereTheyAreInSeconds)
     for (int i = 0; i <= 20; ++i) {
         EXPECT_DOUBLE_EQ(before[static_cast<std::size_t>(i)], stream.At1(120 * i));
     }
+}
+
+// Told of a removal it finds some times in the one scale and some in the other; what it makes of them doesn't last.
+TEST_F(Rescale, AListenerMayReadMeanwhile)
+{
+    const auto make = [] {
+        auto stream = std::make_unique<TestStream>();
+        for (const int time : {0, 300, 310, 600, 910, 1200}) {
+            stream->Key(time, {time % 7 * 3.0}, KFS_Interp_Spline);
+        }
+        for (int i = 0; i < stream->Count(); ++i) {
+            stream->Record(i)->flags |= KFS_KeyFlag_Modifiable;
+        }
+        EXPECT_EQ(0, KFS_ForceUpdateStream(*stream));
+        return stream;
+    };
+    const auto alone = make();
+    ASSERT_EQ(0, KFS_RescaleStream(*alone, 20));
+    const auto heard = make();
+    HeardRoot root;
+    root.Store(*heard);
+    {
+        ValueListener listener([&] { heard->At1(13); });
+        ASSERT_EQ(0, KFS_RescaleStream(*heard, 20));
+        EXPECT_EQ(1, listener.Take());
+    }
+    ASSERT_EQ(5, heard->Count());
+    EXPECT_EQ(alone->At1(13), heard->At1(13));
+    ASSERT_EQ(0, (*alone)->UpdateStream());
+    ASSERT_EQ(0, (*heard)->UpdateStream());
+    EXPECT_EQ(alone->Bytes(), heard->Bytes());
 }
 
 TEST_F(Rescale, AStreamWithoutKeysOnlyTakesTheScale)

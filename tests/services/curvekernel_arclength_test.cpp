@@ -278,6 +278,24 @@ TEST(CurveKernelArc, AnyFiniteCurveHasATableWithoutNaN)
     }
 }
 
+TEST(CurveKernelArc, PathsNearTheSmallestNumbersHaveATableWithoutNaN)
+{
+    for (const Named& exhibit : kMuseum) {
+        SCOPED_TRACE(exhibit.name);
+        for (const int power : {-1030, -1045, -1070}) {
+            Curve curve = exhibit.curve;
+            for (auto& point : curve.p)
+                for (double& c : point) c = std::ldexp(c, power);
+            Table table(curve, 1e-4);
+            ASSERT_EQ(0, table.code) << power;
+            for (const double share : {0.0, 0.5, 1.0}) {
+                const double t = table.T(share * table.length);
+                EXPECT_TRUE(t >= 0 && t <= 1) << power << ' ' << t;
+            }
+        }
+    }
+}
+
 TEST(CurveKernelArc, ScaleDoesntMatter)
 {
     const Curve plain = kMuseum[6].curve;

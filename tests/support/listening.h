@@ -1,33 +1,22 @@
 #pragma once
 
 #include "keystore/stream.h"
+#include "tests/support/baregroup.h"
 #include "tree/listener.h"
-#include "tree/streamgroup.h"
 
 #include <functional>
 #include <utility>
 
 // A root whose streams are heard. It keeps leaves at the scale they have and doesn't own them; they must be gone first.
-class HeardRoot : public KFS_StreamGroup {
+class HeardRoot : public BareGroup {
 public:
-    HeardRoot() : KFS_StreamGroup(nullptr, nullptr, false) {}
     void Store(KFS_Stream* leaf)
     {
         timeScale_ = leaf->GetTimeScale();
         leaf->SetParent(this);
     }
     int ProbeListenerState() override { return KFS_ListenerState_Heard; }
-    unsigned int GetNumStreams() const override { return 0; }
-    KFS_StreamBase const* GetStream(unsigned int) const override { return nullptr; }
-    KFS_StreamBase* GetEditableStreamNullOK(unsigned int) override { return nullptr; }
     unsigned int GetPreferredTimeScale() const override { return timeScale_; }
-    KFS_StreamBase* CloneStream(KFS_CloneStreamParams const&) const override { return nullptr; }
-    bool IsAnimated(bool) const override { return false; }
-    bool AffectsRendering(KFS_RenderOptionsBase const&) const override { return true; }
-    hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const&, GetRenderGuidFilter*) const override
-    {
-        return {};
-    }
 
 private:
     unsigned int timeScale_ = 600;

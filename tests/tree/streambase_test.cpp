@@ -1,8 +1,8 @@
 #include "tree/streambase.h"
 
+#include "tests/support/baregroup.h"
 #include "tests/support/streams.h"
 #include "tree/listener.h"
-#include "tree/streamgroup.h"
 
 #include <functional>
 #include <stdexcept>
@@ -15,9 +15,9 @@ u16str Text(char const* text)
 }
 
 // A group that holds children without owning them, so that a test can build any tree.
-class Group : public KFS_StreamGroup {
+class Group : public BareGroup {
 public:
-    explicit Group(unsigned int timeScale = 0) : KFS_StreamGroup(nullptr, nullptr, false), timeScale_(timeScale) {}
+    explicit Group(unsigned int timeScale = 0) : timeScale_(timeScale) {}
     void Store(KFS_StreamBase* child)
     {
         children_.push_back(child);
@@ -25,10 +25,6 @@ public:
     }
     unsigned int GetNumStreams() const override { return static_cast<unsigned int>(children_.size()); }
     KFS_StreamBase const* GetStream(unsigned int index) const override { return children_[index]; }
-    KFS_StreamBase* GetEditableStreamNullOK(unsigned int index) override
-    {
-        return children_[index]->IsCanonical() ? nullptr : children_[index];
-    }
     unsigned int GetPreferredTimeScale() const override
     {
         return timeScale_ ? timeScale_ : KFS_StreamGroup::GetPreferredTimeScale();
@@ -41,10 +37,6 @@ public:
             Store(child);
         }
     }
-    KFS_StreamBase* CloneStream(KFS_CloneStreamParams const&) const override { return nullptr; }
-    bool IsAnimated(bool) const override { return false; }
-    bool AffectsRendering(KFS_RenderOptionsBase const&) const override { return true; }
-    hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const&, GetRenderGuidFilter*) const override { return {}; }
 
     std::vector<std::pair<KFS_StreamGroup*, KFS_StreamBase*>> stored;
     KFS_StreamBase* alsoStore = nullptr;

@@ -1,0 +1,55 @@
+#pragma once
+
+#include "cli/axis.h"
+#include "cli/commands.h"
+#include "cli/svg.h"
+
+#include <string>
+
+// The frame that all drawings share: graphs between the two, labels to their left, legends to their right.
+inline constexpr double DrawingWidth = 1600.0;
+inline constexpr double PanelLeft = 110.0;
+inline constexpr double PanelRight = 1360.0;
+
+// A time axis in seconds, or in frames.
+struct TimeUnit {
+    std::string name;
+    double perSecond;
+    double leastStep;
+};
+// Throws UserError.
+TimeUnit MakeTimeUnit(PlotOptions const& options);
+// The time axis for the keys of some streams.
+Axis MakeTimeAxis(TimeUnit const& unit, std::vector<kfshost::StreamItem const*> const& items);
+
+// The end of a path that is too long for a title.
+std::string ShortenedPath(std::string const& path);
+
+struct PanelBox {
+    double left;
+    double top;
+    double width;
+    double height;
+};
+
+// One graph: maps what it shows to the drawing. The axes must outlive it.
+class Panel {
+public:
+    // `downward`: numbers grow towards the bottom.
+    Panel(PanelBox const& box, Axis const& horizontal, Axis const& vertical, bool downward = false);
+
+    PanelBox const& Box() const { return box_; }
+    double Bottom() const { return box_.top + box_.height; }
+    double X(double number) const;
+    double Y(double number) const;
+
+    // The ground with its grid, the numbers at its left, and a caption above.
+    void DrawFrame(Svg& svg, std::string const& caption) const;
+    void DrawLabelsBelow(Svg& svg, std::string const& unit) const;
+
+private:
+    PanelBox box_;
+    Axis const& horizontal_;
+    Axis const& vertical_;
+    bool downward_;
+};

@@ -1,0 +1,18 @@
+#pragma once
+
+#include "frame/export.h"
+#include "frame/services/strings.h"
+
+class KFS_Stream;
+
+// The expression of a stream. None of these checks the stream's stamp. Edits belong to the main thread, and listeners
+// hear of a change of value, also if nothing is different.
+
+// Sets the text, empty for none, and returns the old one. The error is forgotten; keys and flags stay.
+KFS_API u16str KFS_SetStreamExpression(KFS_Stream* stream, u16str const& text);
+KFS_API u16str KFS_GetStreamExpression(KFS_Stream const* stream);
+
+// Takes the bits of `mask` from `value`. If KFS_ExprFlag_Disabled is among them the error is forgotten, so that
+// switching an expression on or off gives it a fresh try. 0, or the code of an exception on the way.
+KFS_API int KFS_SetStreamExprFlags(KFS_Stream* stream, unsigned int mask, unsigned int value);
+KFS_API unsigned int KFS_GetStreamExprFlags(KFS_Stream const* stream);

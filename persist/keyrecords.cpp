@@ -1,0 +1,218 @@
+#include "persist/keyrecords_private.h"
+
+#include "frame/boundary_private.h"
+#include "frame/report_private.h"
+#include "frame/services/byteorder.h"
+#include "frame/services/reports.h"
+#include "keystore/items_private.h"
+#include "keystore/keylist_private.h"
+#include "keystore/pins_private.h"
+
+#include <algorithm>
+#include <cstring>
+#include <vector>
+
+namespace {
+
+constexpr int ReadKeysReportId = 0x1D0077;
+constexpr int MissingDataCode = 21;
+
+constexpr char const* TooSmallText = "$$$/VX/KFS/ReadKeyframes/BadOnDiskItemSize="
+                                     "The project file is corrupt. Stored keyframes are missing data.";
+constexpr char const* TooBigText =
+    "$$$/VX/KFS/ReadKeyframes/KeyframeSizeMismatchError=The project file is corrupt. Stored keyframes do not match the "
+    "property type. Attempting to read the keyframes by truncating the values.";
+
+// The sizes of one stream's records.
+struct Layout {
+    explicit Layout(KFS_Stream const* stream)
+        : diskHead(stream->IsSpatial() ? KFSp_DiskSpatialHeadSize : KFSp_DiskHeadSize),
+          memoryHead(stream->IsSpatial() ? KFS_KeySpatialHeadSize : KFS_KeyHeadSize),
+          data(KFS_GetKeyScalarDataSize(stream->GetValueDesc(), stream->IsSpatial(), stream->GetDimension()))
+    {}
+    int DiskSize() const { return diskHead + data; }
+
+    int diskHead;
+    int memoryHead;
+    int data;
+};
+
+void SwapData(KFS_Stream const* stream, void* data)
+{
+    if (stream->IsCustom()) {
+        return;
+    }
+    int const size = Layout(stream).data;
+    auto* const bytes = static_cast<unsigned char*>(data);
+    for (int offset = 0; offset + 8 <= size; offset += 8) {
+        Q_FpLongSwap(reinterpret_cast<double*>(bytes + offset));
+    }
+}
+
+// The first 8 bytes are the same in both layouts; then the fields that only differ in where they stand. `From` and `To`
+// are one record type each.
+template <class From, class To>
+void CopyHead(bool spatial, From const* from, To* to)
+{
+    std::memcpy(static_cast<void*>(to), from, KFS_KeyHeadSize);
+    if (spatial) {
+        to->spFlags = from->spFlags;
+        to->arcLength = from->arcLength;
+        to->inSpeed = from->inSpeed;
+        to->inInfluence = from->inInfluence;
+        to->outSpeed = from->outSpeed;
+        to->outInfluence = from->outInfluence;
+    }
+}
+
+void ToDiskRecord(KFS_Stream const* stream, Layout const& layout, void const* key, void* record)
+{
+    std::memset(record, 0, static_cast<std::size_t>(layout.DiskSize()));
+    CopyHead(stream->IsSpatial(), static_cast<KFS_KeyScalar const*>(key), static_cast<KFS_KeyScalarDisk*>(record));
+    std::memcpy(static_cast<char*>(record) + layout.diskHead, static_cast<char const*>(key) + layout.memoryHead,
+                static_cast<std::size_t>(layout.data));
+    KFSp_ThrowIf(KFSp_KeyScalarDiskSwap(stream, static_cast<KFS_KeyScalarDisk*>(record)));
+}
+
+// `record` is swapped, and holds `recordSize` bytes, at least the head; `key` is zero throughout.
+void FromDiskRecord(KFS_Stream const* stream, Layout const& layout, void const* record, int recordSize, void* key,
+                    int keySize)
+{
+    auto* const memory = static_cast<KFS_KeyScalar*>(key);
+    CopyHead(stream->IsSpatial(), static_cast<KFS_KeyScalarDisk const*>(record), memory);
+    int const dataSize = std::min(recordSize - layout.diskHead, keySize - layout.memoryHead);
+    std::memcpy(static_cast<char*>(key) + layout.memoryHead, static_cast<char const*>(record) + layout.diskHead,
+                static_cast<std::size_t>(dataSize));
+    // The layout is the stream's, whatever a file's flag says: were it believed, numbers would pass for an arc table.
+    memory->flags = static_cast<unsigned short>((memory->flags & ~KFS_KeyFlag_SpatialBlock) |
+                                                (stream->IsSpatial() ? KFS_KeyFlag_SpatialBlock : 0));
+}
+
+// A new key list of the stream, with `count` zeroed items, in the place of the one that it may have had.
+SEQ_Head** MakeKeyList(KFS_Stream* stream, int count)
+{
+    KFSp_DropKeyList(stream);
+    KFSp_ThrowIf(KFSp_CreateKeyList(stream));
+    SEQ_Head** const keys = stream->GetKeys();
+    KFSp_ThrowIf(SEQ_SetNumItems(count, keys, 0));
+    return keys;
+}
+
+void CheckDiskSize(KFS_Stream const* stream, Layout const& layout, SEQ_Head const* list)
+{
+    if (!stream->IsCustomValuePointer() && layout.DiskSize() > list->itemSize) {
+        Q_ReportError(ReadKeysReportId, Q_SeverityWarning, Q_ZStringToUTF16String(TooSmallText));
+        throw int{MissingDataCode};
+    }
+}
+
+void ReportIfTooBig(SEQ_Head const* list, SEQ_Head const* keys)
+{
+    if (list->itemSize > keys->itemSize) {
+        Q_ReportError(ReadKeysReportId, Q_SeverityError, Q_ZStringToUTF16String(TooBigText));
+    }
+}
+
+}  // namespace
+
+void KFSp_DropKeyList(KFS_Stream* stream)
+{
+    SEQ_Head** const keys = stream->GetKeys();
+    stream->SetKeys(nullptr);
+    KFSp_DisposeKeyList(keys);
+    for (int* const stale : {stream->GetInvalidKeyIndexForModify(), stream->GetArcInvalidKeyIndexForModify()}) {
+        stale[0] = KFS_INVALID_INDEX;
+        stale[1] = KFS_INVALID_INDEX;
+    }
+}
+
+int KFSp_CreateKeyDiskList(KFS_Stream* stream, SEQ_Head**& list)
+{
+    list = nullptr;
+    SEQ_Head** made = nullptr;
+    if (int const code = SEQ_New(0, static_cast<short>(Layout(stream).DiskSize()), 4, 1, &made)) {
+        return code;
+    }
+    SEQ_Funcs const funcs{nullptr, nullptr, KFSp_SortKeyItemDiskFunc};
+    KFSp_FirstError error;
+    error.Keep(SEQ_SetRefcon(stream, made));
+    error.Keep(SEQ_SetFuncs(made, 3, &funcs));
+    if (error.None()) {
+        list = made;
+    } else {
+        static_cast<void>(SEQ_Dispose(made, 0));
+    }
+    return error.Code();
+}
+
+void KFSp_ConvertToKeyDiskList(KFS_Stream const* stream, SEQ_Head** list)
+{
+    SEQ_Head const* const* const keys = stream->GetKeys();
+    if (!keys) {
+        return;
+    }
+    Layout const layout(stream);
+    int const count = (*keys)->count;
+    KFSp_ThrowIf(SEQ_SetNumItems(count, list, 0));
+    KFSp_FirstError error;
+    KFSp_ScPin const pin(list, error);
+    KFSp_ThrowIf(error.Code());
+    for (int i = 0; i < count; ++i) {
+        void* record = nullptr;
+        void const* key = nullptr;
+        KFSp_ThrowIf(SEQ_GetAddress(list, i, 0, &record));
+        KFSp_ThrowIf(SEQ_GetConstAddress(keys, i, &key));
+        ToDiskRecord(stream, layout, key, record);
+    }
+}
+
+void KFSp_ConvertFromKeyDiskList(KFS_Stream* stream, SEQ_Head** list)
+{
+    Layout const layout(stream);
+    int const count = (*list)->count;
+    int const diskSize = (*list)->itemSize;
+    CheckDiskSize(stream, layout, *list);
+    SEQ_Head** const keys = MakeKeyList(stream, count);
+    KFSp_FirstError error;
+    KFSp_ScPin const diskPin(list, error);
+    KFSp_ScPin const pin(keys, error);
+    KFSp_ThrowIf(error.Code());
+    ReportIfTooBig(*list, *keys);
+    // A record that is shorter than the stream's own, which the check lets pass for pointers, counts as ending in
+    // zeros.
+    int const recordSize = std::max(diskSize, layout.DiskSize());
+    std::vector<double> scratch((static_cast<std::size_t>(recordSize) + 7) / 8);
+    auto* const bytes = reinterpret_cast<char*>(scratch.data());
+    for (int i = 0; i < count; ++i) {
+        void const* record = nullptr;
+        void* key = nullptr;
+        KFSp_ThrowIf(SEQ_GetConstAddress(list, i, &record));
+        KFSp_ThrowIf(SEQ_GetAddress(keys, i, 0, &key));
+        std::memcpy(bytes, record, static_cast<std::size_t>(diskSize));
+        std::memset(bytes + diskSize, 0, static_cast<std::size_t>(recordSize - diskSize));
+        KFSp_ThrowIf(KFSp_KeyScalarDiskSwap(stream, reinterpret_cast<KFS_KeyScalarDisk*>(bytes)));
+        FromDiskRecord(stream, layout, bytes, recordSize, key, (*keys)->itemSize);
+    }
+    stream->SetKeys(keys);
+}
+
+int KFSp_KeyScalarDiskSwap(KFS_Stream const* stream, KFS_KeyScalarDisk* record)
+{
+    record->time = static_cast<int>(Q_LongSwap(static_cast<unsigned int>(record->time)));
+    record->flags = Q_ShortSwap(record->flags);
+    if (stream->IsSpatial()) {
+        record->spFlags = Q_LongSwap(record->spFlags);
+        for (double* const number :
+             {&record->arcLength, &record->inSpeed, &record->inInfluence, &record->outSpeed, &record->outInfluence}) {
+            Q_FpLongSwap(number);
+        }
+    }
+    SwapData(stream, reinterpret_cast<char*>(record) + Layout(stream).diskHead);
+    return 0;
+}
+
+int KFSp_KeyScalarDataSwap(KFS_Stream const* stream, KFS_KeyScalar* record)
+{
+    SwapData(stream, reinterpret_cast<char*>(record) + Layout(stream).memoryHead);
+    return 0;
+}

@@ -1,0 +1,76 @@
+#include "frame/boundary_private.h"
+#include "frame/services/chunkfile.h"
+#include "keystore/stream.h"
+#include "tree/factory.h"
+#include "tree/paramstreams.h"
+#include "tree/streamgroup.h"
+
+// A group in a file:
+//
+//   LIST kfgp
+//     kfsb, kfsn         what every node has
+//     kfmn  LIST         of each child that is written: its match name, and then the child
+//     kfmn               the end marker
+//
+// A reader's group is built with canonical children, so those that a reader has anyway aren't written.
+
+namespace {
+
+bool IsSlider(KFS_StreamBase const* node)
+{
+    int const kind = node->GetParamDef().paramType;
+    return kind == FX_Param_INT_SLIDER || kind == FX_Param_FIXED_SLIDER || kind == FX_Param_FLOAT_SLIDER;
+}
+
+// A NaN is unlike everything.
+bool HasSameRange(KFS_Stream const* a, KFS_Stream const* b)
+{
+    return a->GetUIMinValue() == b->GetUIMinValue() && a->GetUIMaxValue() == b->GetUIMaxValue();
+}
+
+// What is said of a stream beside its value.
+bool IsDescribedLike(KFS_StreamBase const* child, KFS_StreamBase const* canonical)
+{
+    KFS_Stream const* const leaf = child->GetAsLeaf();
+    KFS_Stream const* const canonicalLeaf = canonical->GetAsLeaf();
+    if (leaf && IsSlider(child) && (!canonicalLeaf || !HasSameRange(leaf, canonicalLeaf))) {
+        return false;
+    }
+    if (((child->GetStreamBaseFlags() ^ canonical->GetStreamBaseFlags()) &
+         ~static_cast<unsigned int>(KFS_BaseFlag_Canonical)) != 0) {
+        return false;
+    }
+    return child->GetDisplayName() == canonical->GetDisplayName() &&
+           FX_ParamDef_GetName(&child->GetParamDef()) == FX_ParamDef_GetName(&canonical->GetParamDef());
+}
+
+bool IsWritten(KFS_StreamGroup const* group, KFS_StreamBase const* child, CKF_File const* file)
+{
+    if (child->IsCanonical() || !child->ShouldWriteForVersion(file)) {
+        return false;
+    }
+    if (group->IsIndexedGroup() || child->IsNamedGroup() || child->IsModified() ||
+        dynamic_cast<KFS_ParamLayerStream const*>(child) || child->GetParamDef().paramType == FX_Param_ALWAYS_SAVED) {
+        return true;
+    }
+    KFS_StreamBase const* const canonical = child->GetCanonicalStream(child->GetMatchName());
+    return !canonical || !IsDescribedLike(child, canonical);
+}
+
+}  // namespace
+
+void KFS_StreamGroup::Write(CKF_File* file) const
+{
+    CKF_ChunkInfo chunk{};
+    KFSp_ThrowIf(CKF_BeginChunkWrite(file, CKF_ListId, 0, CKF_Id("kfgp"), &chunk));
+    KFS_StreamBase::Write(file);
+    for (unsigned int i = 0; i < GetNumStreams(); ++i) {
+        KFS_StreamBase const* const child = GetStream(i);
+        if (IsWritten(this, child, file)) {
+            child->GetMatchNameOverrideForSave(file).Write(file);
+            child->Write(file);
+        }
+    }
+    KFS_MatchName::WriteEndOfGroupMarker(file);
+    KFSp_ThrowIf(CKF_EndChunkWrite(file, &chunk));
+}

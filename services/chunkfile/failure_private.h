@@ -1,0 +1,27 @@
+#pragma once
+
+#include <cstdint>
+
+// The first failure of a file, kept without memory of its own.
+class CKFp_Failure {
+public:
+    int Code() const noexcept { return code_; }
+    char const* Text() const noexcept { return text_; }
+    std::uint64_t Offset() const noexcept { return offset_; }
+
+    // Takes a failure unless there is one already, and returns the one that counts.
+    [[gnu::format(printf, 4, 5)]] int Set(int code, std::uint64_t offset, char const* format, ...) noexcept;
+    // The same for an errno value: "can't <what> "<path>": <the system's text>".
+    int SetIo(int error, std::uint64_t offset, char const* what, char const* path) noexcept;
+
+private:
+    int code_ = 0;
+    std::uint64_t offset_ = 0;
+    char text_[512] = "";
+};
+
+// An id in quotes for a message; what isn't printable is given as "?".
+struct CKFp_IdText {
+    explicit CKFp_IdText(int id) noexcept;
+    char text[5];
+};

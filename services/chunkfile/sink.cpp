@@ -1,0 +1,34 @@
+#include "services/chunkfile/sink_private.h"
+
+#include <cstring>
+
+int CKFp_Sink::Append(void const* bytes, std::size_t size)
+{
+    if (const int error = Refused(CKF_IoCall::Append, size)) return failure_.SetIo(error, size_, "write", Name());
+    if (const int code = DoAppend(bytes, size)) return code;
+    size_ += size;
+    return 0;
+}
+
+int CKFp_MemorySink::DoAppend(void const* bytes, std::size_t size)
+{
+    unsigned char const* const first = static_cast<unsigned char const*>(bytes);
+    try {
+        bytes_.insert(bytes_.end(), first, first + size);
+        return 0;
+    } catch (std::exception const&) {
+        return Failure().Set(Q_Err_OutOfMemory, Size(), "not enough memory for the project");
+    }
+}
+
+int CKFp_MemorySink::Patch(std::uint64_t offset, void const* bytes, std::size_t size)
+{
+    std::memcpy(bytes_.data() + offset, bytes, size);
+    return 0;
+}
+
+int CKFp_MemorySink::Commit()
+{
+    committed_ = std::move(bytes_);
+    return 0;
+}

@@ -1,0 +1,84 @@
+#include "services/chunkfile/writer_private.h"
+
+int CKFp_Writer::CheckRoom(std::uint64_t size)
+{
+    const std::uint64_t present = sink_->Size();
+    if (present > maxSize_ || size > maxSize_ - present)
+        return failure_.Set(CKF_Err_TooBig, present, "the project doesn't fit into a file of %u bytes", maxSize_);
+    return 0;
+}
+
+int CKFp_Writer::Start()
+{
+    unsigned char prelude[CKFp_PreludeSize] = {};
+    CKFp_Put32(prelude, static_cast<std::uint32_t>(CKFp_FormId));
+    CKFp_Put32(prelude + CKFp_HeaderSize, static_cast<std::uint32_t>(CKFp_FormType));
+    CKFp_Put32(prelude + CKFp_ListHeaderSize, static_cast<std::uint32_t>(CKFp_VersionId));
+    CKFp_Put32(prelude + CKFp_ListHeaderSize + CKFp_LengthOffset, CKFp_VersionSize);
+    if (const int code = CheckRoom(sizeof prelude)) return code;
+    return Append(prelude, sizeof prelude);
+}
+
+int CKFp_Writer::Commit(std::int32_t major, std::int32_t minor, std::int32_t encoding)
+{
+    if (open_ > 0) return failure_.Set(CKF_Err_Unbalanced, sink_->Size(), "%d lists were not closed", open_);
+    if (const int code = PatchLength(CKFp_ListHeaderSize)) return code;
+    unsigned char version[CKFp_VersionSize];
+    CKFp_Put32(version, static_cast<std::uint32_t>(major));
+    CKFp_Put32(version + 4, static_cast<std::uint32_t>(minor));
+    CKFp_Put32(version + 8, static_cast<std::uint32_t>(encoding));
+    if (const int code = sink_->Patch(CKFp_VersionOffset, version, sizeof version)) return code;
+    return sink_->Commit();
+}
+
+int CKFp_Writer::BeginAtom(int id, std::uint64_t size)
+{
+    if (id == 0 || id == CKF_ListId || id == CKFp_FormId)
+        return failure_.Set(CKF_Err_BadArgument, sink_->Size(), "\"%s\" can't be the id of an atom",
+                            CKFp_IdText(id).text);
+    if (const int code = CheckRoom(CKFp_HeaderSize + size + (size & 1))) return code;
+    unsigned char header[CKFp_HeaderSize];
+    CKFp_Put32(header, static_cast<std::uint32_t>(id));
+    CKFp_Put32(header + CKFp_LengthOffset, static_cast<std::uint32_t>(size));
+    return Append(header, sizeof header);
+}
+
+int CKFp_Writer::EndAtom(std::uint64_t size)
+{
+    constexpr unsigned char padding = 0;
+    return Append(&padding, size & 1);
+}
+
+int CKFp_Writer::BeginList(int listType, CKF_ChunkInfo* chunk)
+{
+    if (listType == 0) return failure_.Set(CKF_Err_BadArgument, sink_->Size(), "a list without a type");
+    if (open_ == CKF_MaxDepth)
+        return failure_.Set(CKF_Err_TooDeep, sink_->Size(), "the project nests more than %d lists", CKF_MaxDepth);
+    if (const int code = CheckRoom(CKFp_ListHeaderSize)) return code;
+    unsigned char header[CKFp_ListHeaderSize] = {};
+    CKFp_Put32(header, static_cast<std::uint32_t>(CKF_ListId));
+    CKFp_Put32(header + CKFp_HeaderSize, static_cast<std::uint32_t>(listType));
+    if (const int code = Append(header, sizeof header)) return code;
+    const std::uint32_t data = static_cast<std::uint32_t>(sink_->Size());
+    data_[static_cast<std::size_t>(open_++)] = data;
+    *chunk = {data, CKF_ListId, 0, listType, open_};
+    return 0;
+}
+
+// The length of a list counts its type, which stands in front of the data.
+int CKFp_Writer::PatchLength(std::uint64_t data)
+{
+    unsigned char length[4];
+    CKFp_Put32(length, static_cast<std::uint32_t>(sink_->Size() - data + 4));
+    return sink_->Patch(data - CKFp_ListHeaderSize + CKFp_LengthOffset, length, sizeof length);
+}
+
+int CKFp_Writer::EndList(CKF_ChunkInfo* chunk)
+{
+    if (open_ == 0 || chunk->depth != open_ || chunk->offset != data_[static_cast<std::size_t>(open_ - 1)])
+        return failure_.Set(CKF_Err_Unbalanced, sink_->Size(), "a list is closed that isn't the innermost open one");
+    if (const int code = PatchLength(chunk->offset)) return code;
+    --open_;
+    chunk->size = static_cast<std::uint32_t>(sink_->Size() - chunk->offset);
+    return 0;
+}

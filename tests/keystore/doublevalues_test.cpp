@@ -1,0 +1,95 @@
+#include "keystore/edit.h"
+
+#include "tests/support/ownedvalues.h"
+#include "tests/support/streams.h"
+
+#include <algorithm>
+
+// What the forms that take doubles do to a stream of another kind, and leave of it.
+
+namespace {
+
+constexpr char None = KFS_Interp_None;
+constexpr char Linear = KFS_Interp_Linear;
+constexpr char Spline = KFS_Interp_Spline;
+
+class DoubleValues : public StreamTest {};
+
+// Doubles are limited in all forms that take them, external values in none, whoever has made the list.
+class LimitedStream : public KFS_Stream {
+public:
+    explicit LimitedStream(KFS_ValueDesc const& desc)
+        : KFS_Stream(1, 600, 0, 0, KFS_InterpMask_All, 0, desc, nullptr, nullptr, false)
+    {}
+    bool IsFloatBased() const override { return true; }
+    void LegalizeValue(double* values) const override { *values = std::min(*values, 10.0); }
+};
+
+TEST_F(DoubleValues, ADoubleFormLeavesNothingBehindInTheList)
+{
+    KFS_ValueDesc desc;
+    desc.dataType = KFS_Type_Double;
+    double const value = 50.0;
+    T_Time const times[] = {{0, 600}, {10, 600}, {20, 600}, {30, 600}};
+    for (bool const doublesFirst : {false, true}) {
+        SCOPED_TRACE(doublesFirst ? "a list that a double form has made" : "a list that an external form has made");
+        LimitedStream stream(desc);
+        auto const insert = [&](int i, bool doubles) {
+            return doubles ? KFS_InsertKeyF(&stream, &times[i], 0, &value, Linear, Linear)
+                           : KFS_InsertKey(&stream, &times[i], 0, &value, Linear, Linear);
+        };
+        auto const stored = [&](int index) {
+            void const* item = nullptr;
+            EXPECT_EQ(0, SEQ_GetConstAddress(stream.GetKeys(), index, &item));
+            return *KFSp_Numbers(static_cast<KFS_KeyScalar const*>(item));
+        };
+        for (int i = 0; i < 4; ++i) {
+            bool const doubles = (i % 2 == 0) == doublesFirst;
+            ASSERT_EQ(0, insert(i, doubles));
+            EXPECT_EQ(doubles ? 10.0 : 50.0, stored(i));
+            ASSERT_EQ(0, KFS_SetKey(&stream, i, &value, None, None));
+            EXPECT_EQ(50.0, stored(i));
+            ASSERT_EQ(0, KFS_SetKeyF(&stream, i, &value, None, None));
+            EXPECT_EQ(10.0, stored(i));
+        }
+    }
+}
+
+TEST_F(DoubleValues, DoublesGoIntoACustomStreamThatHasRoom)
+{
+    struct Row {
+        unsigned short itemSize;
+        bool fits;
+    };
+    for (Row const& row : {Row{8, true}, Row{24, true}, Row{7, false}, Row{1, false}}) {
+        for (bool const noKeys : {false, true}) {
+            SCOPED_TRACE(testing::Message() << row.itemSize << (noKeys ? ", constant" : ", keys"));
+            KFS_ValueDesc desc;
+            desc.isCustom = 1;
+            desc.itemSize = row.itemSize;
+            desc.dataType = 4711;
+            desc.interpFunc = OwnedValues::Interpolate;
+            KFS_Stream stream(1, 600, noKeys, 0, KFS_InterpMask_All, 0, desc, nullptr, nullptr, false);
+            T_Time const at{10, 600};
+            double const value = 2.5;
+            int const code = row.fits ? 0 : 7441;
+            EXPECT_EQ(code, KFS_InsertKeyF(&stream, &at, 0, &value, Spline, Spline));
+            EXPECT_EQ(code, KFS_InsertKeyF(&stream, &at, 1, &value, None, None));
+            if (row.fits) {
+                double out[3] = {};
+                ASSERT_EQ(0, KFS_RemoveKey(&stream, 0, out));
+                EXPECT_EQ(2.5, out[0]);
+            } else {
+                EXPECT_EQ(reports.Take(),
+                          (std::vector<Reported>(2, KfsReport(81, "can#{rsquo}t convert to custom value"))));
+            }
+            EXPECT_EQ(1, stream.GetValueDesc()->isCustom);
+            EXPECT_EQ(row.itemSize, stream.GetValueDesc()->itemSize);
+            EXPECT_EQ(4711, stream.GetValueDesc()->dataType);
+            EXPECT_EQ(OwnedValues::Interpolate, stream.GetInterpFunc());
+            EXPECT_FALSE(stream.IsTemporarilyNonCustom());
+        }
+    }
+}
+
+}  // namespace

@@ -1,0 +1,495 @@
+#include "tree/streamgroup.h"
+
+#include "tests/persist/leaffile.h"
+#include "tests/support/groups.h"
+#include "tests/support/notifications.h"
+#include "tree/paramstreams.h"
+
+#include <limits>
+#include <utility>
+
+namespace {
+
+using Lines = std::vector<std::string>;
+
+std::string MatchName(std::string name)
+{
+    name.resize(40);
+    return Atom("kfmn", name);
+}
+std::string const End = MatchName("ZQVM Group End");
+std::string const Marker = "-_0_/-";
+
+std::string BaseNamed(std::string const& name, unsigned flags = KFS_BaseFlag_Active)
+{
+    return Atom("kfsb", Long(flags)) + Atom("kfsn", name);
+}
+
+std::string Group(std::string const& name, std::string const& children)
+{
+    return List("kfgp", BaseNamed(name) + children + End);
+}
+
+std::string OneLeaf(std::string const& name, double value, int dimension = 1)
+{
+    std::vector<double> numbers(static_cast<std::size_t>(dimension) * 5, 0.0);
+    std::fill_n(numbers.begin(), dimension, value);
+    return List("kfbs",
+                BaseNamed(name) + Atom("kfb4", LeafRecord().Dimension(dimension)) + Atom("cdat", Doubles(numbers)));
+}
+
+// The match names in a file, indented by how deep they stand, a group's end left out.
+Lines NamesIn(MemoryFile const& file)
+{
+    Lines names;
+    CKF_ChunkWalk walk(file.Bytes());
+    CKF_RawChunk chunk;
+    while (walk.Next(&chunk)) {
+        if (Long(static_cast<std::uint32_t>(chunk.id)) == "kfmn") {
+            EXPECT_EQ(40u, chunk.data.size());
+            std::string const name = reinterpret_cast<char const*>(chunk.data.data());
+            if (name != "ZQVM Group End") {
+                names.push_back(std::string(static_cast<std::size_t>(chunk.depth - 2), ' ') + name);
+            }
+        }
+    }
+    return names;
+}
+
+MemoryFile WrittenGroup(KFS_StreamGroup const* group, int major = 95)
+{
+    return MemoryFile([=](CKF_File* file) {
+        file->SetVersion(major, 0);
+        EXPECT_EQ(0, KFSp_Boundary([&] { group->Write(file); }));
+    });
+}
+
+int ReadGroup(KFS_StreamGroup* group, std::string const& file)
+{
+    CKF_File open;
+    EXPECT_EQ(0, open.Open(Span(file))) << open.LastErrorText();
+    return KFSp_Boundary([&] { group->Read(&open, nullptr); });
+}
+int ReadGroup(KFS_StreamGroup* group, MemoryFile const& file)
+{
+    return ReadGroup(group, std::string(file.Bytes().begin(), file.Bytes().end()));
+}
+
+double ValueOf(KFS_StreamBase const* stream)
+{
+    return dynamic_cast<TestLeaf const*>(stream)->ValueAt(0);
+}
+
+void SetValue(KFS_StreamBase* stream, double value)
+{
+    KFS_Stream* const leaf = stream->GetAsLeaf();
+    std::vector<double> const values(static_cast<std::size_t>(leaf->GetDimension()), value);
+    T_Time const at{0, leaf->GetTimeScale()};
+    EXPECT_EQ(0, KFS_InsertKeyF(leaf, &at, 1, values.data(), 0, 0));
+}
+
+class Tree : public SceneTest {
+protected:
+    static std::unique_ptr<KFS_IndexedStreamGroup> MakeLayers()
+    {
+        return std::unique_ptr<KFS_IndexedStreamGroup>(TestKinds::Make("layers").release()->GetAsIndexedGroup());
+    }
+    static KFS_StreamBase* Append(KFS_IndexedStreamGroup* group, char const* kind)
+    {
+        Q_ScAutoPtr<KFS_StreamBase> stream = TestKinds::Make(kind);
+        KFS_StreamBase* const child = stream.get();
+        group->AppendStream(&stream);
+        return child;
+    }
+};
+
+TEST_F(Tree, AnUntouchedGroupCostsItsSubgroups)
+{
+    auto const node = MakeNode();
+    EXPECT_EQ((Lines{"transform"}), NamesIn(WrittenGroup(node.get())));
+    MemoryFile const layers = WrittenGroup(MakeLayers().get());
+    EXPECT_EQ((Lines{"LIST kfgp", "  kfsb 00000001", "  kfsn " + MemoryFile::Hex(Span("layers")),
+                     "  kfmn " + MemoryFile::Hex(Span(MatchName("ZQVM Group End").substr(8)))}),
+              layers.Lines());
+}
+
+struct Edit {
+    char const* what;
+    std::function<void(KFS_StreamBase*)> make;
+    bool isWritten;
+};
+
+// What is to be known of a leaf that isn't canonical any more is in the file; a leaf that equals its canonical one
+// isn't.
+TEST_F(Tree, LeavesThatDifferAreWritten)
+{
+    auto const setParam = [](KFS_StreamBase* leaf, auto change) {
+        FX_ParamDef def{};
+        def.paramType = FX_Param_NotFilledIn;
+        change(def);
+        leaf->SetParamDef(def);
+    };
+    std::vector<Edit> const edits{
+        {"nothing", [](KFS_StreamBase*) {}, false},
+        {"value", [](KFS_StreamBase* leaf) { SetValue(leaf, 1.0); }, true},
+        {"the default again", [](KFS_StreamBase* leaf) { SetValue(leaf, 1.0), SetValue(leaf, 100.0); }, false},
+        {"keys", [](KFS_StreamBase* leaf) { EXPECT_EQ(0, leaf->GetAsLeaf()->SetConstant(0, 1)); }, true},
+        {"flags", [](KFS_StreamBase* leaf) { leaf->SetHidden(true); }, true},
+        {"a flag that isn't saved", [](KFS_StreamBase* leaf) { leaf->SetElided(true); }, true},
+        {"name", [](KFS_StreamBase* leaf) { leaf->SetDisplayName(Text("Fade")); }, true},
+        {"always saved",
+         [&](KFS_StreamBase* leaf) { setParam(leaf, [](FX_ParamDef& def) { def.paramType = FX_Param_ALWAYS_SAVED; }); },
+         true},
+        {"parameter's name",
+         [&](KFS_StreamBase* leaf) {
+             setParam(leaf, [](FX_ParamDef& def) { def.paramType = FX_Param_COLOR, def.name[0] = 'p'; });
+         },
+         true},
+        {"range",
+         [&](KFS_StreamBase* leaf) {
+             setParam(leaf, [](FX_ParamDef& def) {
+                 def.paramType = FX_Param_FLOAT_SLIDER;
+                 def.value.floatSlider.sliderMin = -5;
+             });
+         },
+         true},
+        {"a range of NaN",
+         [&](KFS_StreamBase* leaf) {
+             setParam(leaf, [](FX_ParamDef& def) {
+                 def.paramType = FX_Param_FLOAT_SLIDER;
+                 def.value.floatSlider.sliderMax = std::numeric_limits<float>::quiet_NaN();
+             });
+         },
+         true},
+    };
+    for (Edit const& edit : edits) {
+        SCOPED_TRACE(edit.what);
+        auto const node = MakeNode();
+        edit.make(node->GetEditableStream(Name("opacity")));
+        Lines const expected = edit.isWritten ? Lines{"opacity", "transform"} : Lines{"transform"};
+        EXPECT_EQ(expected, NamesIn(WrittenGroup(node.get())));
+    }
+}
+
+TEST_F(Tree, ChildrenOfIndexedGroupsAreAllWritten)
+{
+    auto const layers = MakeLayers();
+    Append(layers.get(), "opacity");
+    Append(layers.get(), "node");
+    Append(layers.get(), "opacity");
+    EXPECT_EQ((Lines{"opacity", "node", " transform", "opacity"}), NamesIn(WrittenGroup(layers.get())));
+}
+
+TEST_F(Tree, WhatOldFilesDontKnowIsLeftOut)
+{
+    auto const layers = MakeLayers();
+    FX_ParamDef def{};
+    def.paramType = FX_Param_POINT_3D;
+    Append(layers.get(), "opacity")->SetParamDef(def);
+    EXPECT_EQ((Lines{"opacity"}), NamesIn(WrittenGroup(layers.get(), 77)));
+    EXPECT_EQ((Lines{}), NamesIn(WrittenGroup(layers.get(), 76)));
+}
+
+// A layer is in the file whatever it is, and a child may be saved under another name.
+class Matte : public KFS_ParamLayerStream {
+public:
+    using KFS_ParamLayerStream::KFS_ParamLayerStream;
+    bool IsModified() const override { return false; }
+    KFS_MatchName GetMatchNameOverrideForSave(CKF_File const* file) const override
+    {
+        return file->majorVersion < 90 ? Name("old matte") : KFS_ParamLayerStream::GetMatchNameOverrideForSave(file);
+    }
+};
+
+TEST_F(Tree, LayersAreAlwaysWritten)
+{
+    KFS_AppCallbacks callbacks{};
+    callbacks.layerDefaultValueFunc = [](KFS_ParamLayerStream const*) { return 0; };
+    callbacks.layerIndependentFunc = [](KFS_ParamLayerStream const*, bool) { return 0L; };
+    KFS_SetCallbacks(callbacks);
+    KFS_ScRegisterStreams batch(Get_VX_StreamFactory());
+    batch.Register(
+        Name("matte"),
+        [](KFS_MatchName const& name, KFS_StreamFactory* factory, bool, unsigned int scale, bool canonical) {
+            return new Matte(scale, 1, &name, factory, canonical);
+        },
+        false);
+    {
+        TestKinds more;
+        more.Named("cut", {Name("opacity"), Name("matte")});
+        Q_ScAutoPtr<KFS_StreamBase> const cut = TestKinds::Make("cut");
+        KFS_StreamGroup* const group = cut->GetAsGroup();
+        EXPECT_EQ((Lines{}), NamesIn(WrittenGroup(group))) << "not while it is shared";
+        group->GetEditableStream(1);
+        EXPECT_EQ((Lines{"matte"}), NamesIn(WrittenGroup(group)));
+        EXPECT_EQ((Lines{"old matte"}), NamesIn(WrittenGroup(group, 89)));
+    }
+    batch.UnregisterAll();
+    KFS_ClearCallbacks();
+}
+
+// A group whose children may be missing from its type one day.
+class OpenGroup : public TestNamedGroup {
+public:
+    using TestNamedGroup::TestNamedGroup;
+    bool CouldGoMissing() const override { return true; }
+};
+
+// The name in the file of a child called `given`, in each kind of place.
+TEST_F(Tree, NamesThatAreWritten)
+{
+    auto const nameIn = [](KFS_StreamBase const* child) { return DataOf("kfsn", Written(child->GetAsLeaf())); };
+    auto const node = MakeNode();
+    KFS_StreamBase* child = node->GetEditableStream(Name("opacity"));
+    child->SetDisplayName(Text("Fade"));
+    EXPECT_EQ(Marker, nameIn(child));
+
+    OpenGroup open(Name("node"), Get_VX_StreamFactory(), false, {});
+    child = open.GetEditableStream(Name("opacity"));
+    EXPECT_EQ("opacity", nameIn(child));
+    child->SetDisplayName(Text("Fade"));
+    EXPECT_EQ("Fade", nameIn(child));
+
+    auto const layers = MakeLayers();
+    child = Append(layers.get(), "opacity");
+    EXPECT_EQ(Marker, nameIn(child)) << "the canonical one's";
+    child->SetDisplayName(Text("Fade"));
+    EXPECT_EQ("Fade", nameIn(child));
+    child->SetMatchName(Name("unheard of"));
+    EXPECT_EQ(Marker, nameIn(child)) << "without a canonical one";
+
+    Q_ScAutoPtr<KFS_StreamBase> const root = TestKinds::Make("opacity");
+    EXPECT_EQ("opacity", nameIn(root.get()));
+    root->SetMatchName(Name("unheard of"));
+    EXPECT_EQ("opacity", nameIn(root.get()));
+}
+
+TEST_F(Tree, NamesThatAreTaken)
+{
+    std::string const leaf = MatchName("opacity") + OneLeaf("Fade", 1.0);
+    std::string const nameless = MatchName("opacity") + OneLeaf(Marker, 1.0);
+    auto const nameAfter = [](KFS_StreamGroup* group, std::string const& children) {
+        EXPECT_EQ(0, ReadGroup(group, Form(Group("Top", children))));
+        KFS_StreamBase const* const child = group->GetStream(0);
+        EXPECT_EQ(1.0, ValueOf(child));
+        return Q_UTF16ToMBString(child->GetDisplayName());
+    };
+    EXPECT_EQ("opacity", nameAfter(MakeNode().get(), leaf));
+    OpenGroup open(Name("node"), Get_VX_StreamFactory(), false, {});
+    EXPECT_EQ("opacity", nameAfter(&open, leaf)) << "it has one already";
+    EXPECT_EQ("Fade", nameAfter(MakeLayers().get(), leaf));
+    EXPECT_EQ("opacity", nameAfter(MakeLayers().get(), nameless));
+    auto const root = MakeLayers();
+    nameAfter(root.get(), leaf);
+    EXPECT_EQ(Text("Top"), root->GetDisplayName());
+}
+
+TEST_F(Tree, ASceneThereAndBack)
+{
+    auto const layers = MakeLayers();
+    auto* const node = static_cast<KFS_NamedStreamGroup*>(Append(layers.get(), "node"));
+    SetValue(node->GetEditableStream(Name("position")), 3.0);
+    node->SetDisplayName(Text("Camera"));
+    node->SetHidden(true);
+    auto* const transform = node->GetEditableStream(Name("transform"))->GetAsNamedGroup();
+    SetValue(transform->GetEditableStream(Name("anchor")), 4.0);
+    auto* const inner = Append(layers.get(), "layers")->GetAsIndexedGroup();
+    SetValue(Append(inner, "opacity"), 50.0);
+    SetValue(Append(layers.get(), "opacity"), 60.0);
+
+    MemoryFile const file = WrittenGroup(layers.get());
+    EXPECT_EQ((Lines{"node", " transform", "  anchor", " position", "layers", " opacity", "opacity"}), NamesIn(file));
+    auto const other = MakeLayers();
+    ASSERT_EQ(0, ReadGroup(other.get(), file));
+    EXPECT_EQ(file.Bytes(), WrittenGroup(other.get()).Bytes());
+    ASSERT_EQ(3u, other->GetNumStreams());
+    EXPECT_TRUE(other->GetStream(0)->IsHidden());
+    EXPECT_EQ(Text("Camera"), other->GetStream(0)->GetDisplayName());
+    KFS_NamedStreamGroup const* const otherNode = other->GetStream(0)->GetAsNamedGroup();
+    EXPECT_EQ(3.0, ValueOf(otherNode->GetStream(Name("position"), true)));
+    EXPECT_EQ(nullptr, otherNode->GetEditableStreamNullOK(Name("rotation"))) << "still shared";
+    EXPECT_EQ(
+        4.0,
+        ValueOf(otherNode->GetStream(Name("transform"), true)->GetAsNamedGroup()->GetStream(Name("anchor"), true)));
+    EXPECT_EQ(50.0, ValueOf(other->GetStream(1)->GetAsGroup()->GetStream(0)));
+    EXPECT_EQ(60.0, ValueOf(other->GetStream(2)));
+    EXPECT_EQ(other.get(), other->GetStream(2)->GetParent());
+}
+
+TEST_F(Tree, UnknownChildren)
+{
+    std::string const file =
+        Form(Group("", MatchName("from elsewhere") + List("kfgp", MatchName("opacity") + OneLeaf("", 9.0) + End) +
+                           Atom("what", "?") + MatchName("opacity") + OneLeaf("", 7.0)));
+    auto const node = MakeNode();
+    ASSERT_EQ(0, ReadGroup(node.get(), file));
+    EXPECT_EQ(7.0, ValueOf(node->GetStream(0)));
+    auto const layers = MakeLayers();
+    EXPECT_EQ(KFS_Err_UnknownStream, ReadGroup(layers.get(), file));
+    EXPECT_EQ(1u, reports.Take().size());
+    EXPECT_EQ(0u, layers->GetNumStreams());
+    // Known, but not here.
+    std::string const misplaced =
+        Form(Group("", MatchName("scale") + OneLeaf("", 1.0, 2) + MatchName("opacity") + OneLeaf("", 7.0)));
+    ASSERT_EQ(0, ReadGroup(node.get(), misplaced));
+    EXPECT_EQ(7.0, ValueOf(node->GetStream(0)));
+    EXPECT_EQ(3, ReadGroup(layers.get(), misplaced));
+    EXPECT_EQ(1u, reports.Take().size());
+}
+
+// A child that its group doesn't have any more is read and handed over.
+class Upgrader : public TestNamedGroup {
+public:
+    using TestNamedGroup::TestNamedGroup;
+    void UpgradeChildStream(KFS_StreamBase* obsolete) override
+    {
+        upgraded.emplace_back(NameOf(obsolete), ValueOf(obsolete));
+        EXPECT_EQ(nullptr, obsolete->GetParent());
+    }
+    std::vector<std::pair<std::string, double>> upgraded;
+};
+
+TEST_F(Tree, ObsoleteChildrenAreHandedOver)
+{
+    Upgrader group(Name("node"), Get_VX_StreamFactory(), false, {});
+    ASSERT_EQ(0, ReadGroup(&group, Form(Group("", MatchName("scale") + OneLeaf("", 8.0, 2) + MatchName("opacity") +
+                                                      OneLeaf("", 7.0)))));
+    EXPECT_EQ((std::vector<std::pair<std::string, double>>{{"scale", 8.0}}), group.upgraded);
+}
+
+TEST_F(Tree, WithoutAGroupNothingChanges)
+{
+    auto const layers = MakeLayers();
+    Append(layers.get(), "opacity");
+    EXPECT_EQ(0, ReadGroup(layers.get(), Form(OneLeaf("", 1.0))));
+    EXPECT_EQ(1u, layers->GetNumStreams());
+    EXPECT_EQ(CKF_Err_NoSuchChunk, ReadGroup(layers.get(), Form(List("kfgp", BaseNamed(Marker))))) << "no end";
+    EXPECT_EQ(CKF_Err_NoSuchChunk, ReadGroup(layers.get(), Form(List("kfgp", End)))) << "no flags";
+    EXPECT_EQ(0, ReadGroup(layers.get(), Form(List("kfgp", Atom("kfsb", Long(1)) + End)))) << "the name may be missing";
+    EXPECT_EQ(Text("layers"), layers->GetDisplayName());
+    EXPECT_EQ(0, ReadGroup(layers.get(), Form(Group("a", "")))) << "a group with nothing in it";
+    EXPECT_EQ(1u, layers->GetNumStreams());
+}
+
+// Bits that say nothing about the project stay what they were.
+TEST_F(Tree, FlagsOfAFile)
+{
+    for (unsigned const before : {0x1u, 0xFFFFFFFBu}) {
+        for (unsigned const stored : {0u, 0xFFFFFFFFu, 0x12345678u}) {
+            auto const layers = MakeLayers();
+            layers->SetStreamBaseFlags(before, 0xFFFFFFFB);
+            ASSERT_EQ(0, ReadGroup(layers.get(), Form(List("kfgp", Atom("kfsb", Long(stored)) + End))));
+            EXPECT_EQ((stored & 0xFFFE2F13) | (before & 0x1D0EC), layers->GetStreamBaseFlags());
+        }
+    }
+}
+
+// Files that are older than the flags, and older than the names.
+TEST_F(Tree, OldFiles)
+{
+    std::string const plain = List("kfgp", End);
+    std::string const full = List("kfgp", BaseNamed("Named", KFS_BaseFlag_Hidden) + End);
+    struct {
+        std::uint32_t major;
+        std::string const& file;
+        bool flags, name;
+    } const cases[] = {
+        {55, plain, false, false}, {55, full, false, false}, {56, full, true, false}, {57, full, true, true}};
+    for (auto const& c : cases) {
+        SCOPED_TRACE(c.major);
+        auto const layers = MakeLayers();
+        ASSERT_EQ(0, ReadGroup(layers.get(), Form(c.file, c.major)));
+        EXPECT_EQ(c.flags, layers->IsHidden());
+        EXPECT_EQ(!c.flags, layers->IsActive());
+        EXPECT_EQ(Text(c.name ? "Named" : "layers"), layers->GetDisplayName());
+    }
+}
+
+class Follower : public KFS_Stream {
+public:
+    Follower() : KFS_Stream(1, 600, 1, 0, KFS_InterpMask_All, 0, Desc(), nullptr, nullptr, false) {}
+    bool IsSeparationFollower() const override { return true; }
+
+private:
+    static KFS_ValueDesc Desc()
+    {
+        KFS_ValueDesc desc;
+        desc.dataType = KFS_Type_Double;
+        return desc;
+    }
+};
+
+TEST_F(Tree, FollowersOfOldFilesAreActive)
+{
+    std::string const leaf =
+        List("kfbs", BaseNamed("", 0) + Atom("kfb4", LeafRecord()) + Atom("cdat", std::string(40, '\0')));
+    for (std::uint32_t const major : {81u, 82u}) {
+        Follower stream;
+        EXPECT_EQ(0, ReadLeaf(&stream, Form(leaf, major)));
+        EXPECT_EQ(major == 81, stream.IsActive());
+        TestStream other;
+        EXPECT_EQ(0, ReadLeaf(other, Form(leaf, major)));
+        EXPECT_FALSE(other->IsActive());
+    }
+}
+
+// The child stands in the tree when it reads, so what it reads is heard.
+TEST_F(Tree, ALoadIsHeard)
+{
+    NotificationRecorder recorder;
+    TestRoot<TestNamedGroup> root("node");
+    recorder.Label(&root, "root");
+    static_cast<void>(recorder.Take());
+    ASSERT_EQ(0, ReadGroup(&root, Form(List("kfgp", BaseNamed("node") + MatchName("opacity") +
+                                                        List("kfbs", BaseNamed(Marker, 3) + Atom("kfb4", LeafRecord()) +
+                                                                         Atom("cdat", std::string(40, '\0'))) +
+                                                        End))));
+    EXPECT_EQ(
+        (Notifications{"name root", "before-swap root opacity 0", "after-swap root opacity 0", "flags opacity 1 3"}),
+        recorder.Take());
+}
+
+TEST_F(Tree, EveryWriteMayFail)
+{
+    auto const layers = MakeLayers();
+    SetValue(static_cast<KFS_NamedStreamGroup*>(Append(layers.get(), "node"))->GetEditableStream(Name("opacity")), 1.0);
+    for (int n = 1;; ++n) {
+        FailNthAppend hook(n);
+        CKF_File file;
+        static_cast<void>(file.CreateInMemory(&hook));  // fails for the first few
+        int const code = KFSp_Boundary([&] { layers->Write(&file); });
+        if (!hook.Fired()) {
+            EXPECT_EQ(0, code);
+            EXPECT_LT(20, n);
+            break;
+        }
+        EXPECT_NE(0, code) << n;
+        EXPECT_NE(0, file.Commit()) << n;
+    }
+}
+
+TEST_F(Tree, BrokenFilesLeaveAWholeTree)
+{
+    auto const layers = MakeLayers();
+    auto* const node = static_cast<KFS_NamedStreamGroup*>(Append(layers.get(), "node"));
+    SetValue(node->GetEditableStream(Name("opacity")), 1.0);
+    SetValue(Append(layers.get(), "opacity"), 2.0);
+    MemoryFile const whole = WrittenGroup(layers.get());
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
+    for (std::size_t size = 32; size < whole.Bytes().size(); ++size) {
+        SCOPED_TRACE(size);
+        {
+            CKF_File file;
+            auto const other = MakeLayers();
+            int const opened = file.Open(std::span(whole.Bytes()).first(size));
+            if (opened == 0) {
+                EXPECT_NE(0, KFSp_Boundary([&] { other->Read(&file, nullptr); }));
+                WrittenGroup(other.get());
+            }
+            static_cast<void>(reports.Take());
+        }
+        ASSERT_EQ(before, Q_MemoryLive(nullptr));
+    }
+}
+
+}  // namespace

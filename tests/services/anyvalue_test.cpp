@@ -1,0 +1,229 @@
+#include "frame/services/anyvalue.h"
+
+#include <gtest/gtest.h>
+
+#include <limits>
+#include <random>
+#include <string>
+#include <vector>
+
+namespace {
+
+u16str U(std::string const& text)
+{
+    return Q_MBToUTF16String(text);
+}
+
+std::string Narrow(u16str const& text)
+{
+    return Q_UTF16ToMBString(text);
+}
+
+std::string Json(Q_AnyTree& tree)
+{
+    return Narrow(Q_AnyTreeWrapper(tree).GetAs_JSON());
+}
+
+template <class Call>
+int Thrown(Call call)
+{
+    try {
+        call();
+        return 0;
+    } catch (int code) {
+        return code;
+    }
+}
+
+TEST(AnyValue, TextAndNumberTurnIntoEachOther)
+{
+    constexpr std::int64_t least = std::numeric_limits<std::int64_t>::min();
+    constexpr std::int64_t most = std::numeric_limits<std::int64_t>::max();
+    for (const std::int64_t number : {std::int64_t{0}, std::int64_t{-1}, std::int64_t{4294967295}, least, most}) {
+        EXPECT_EQ(std::to_string(number), Narrow(Q_Any(number, true).GetAs_Str()));
+        EXPECT_EQ(number, Q_Any(U(std::to_string(number))).GetAs_int());
+    }
+    for (char const* text : {"", " 1", "1 ", "1.5", "+1", "0x10", "-", "9223372036854775808", "one"})
+        EXPECT_EQ(Q_Err_NotANumber, Thrown([&] { Q_Any(U(text)).GetAs_int(); })) << text;
+    EXPECT_EQ(Q_Err_NotANumber, Thrown([&] { Q_Any().GetAs_int(); }));
+    EXPECT_TRUE(Q_Any().GetAs_Str().empty());
+}
+
+TEST(AnyTree, HasExactlyThisText)
+{
+    Q_AnyTree empty;
+    EXPECT_EQ("{}", Json(empty));
+
+    Q_AnyTree root, component;
+    Q_AnyTreeWrapper wrapper(root), part(component);
+    part.put(U("index"), Q_Any(std::int64_t{4294967295}, false));
+    part.put(U("matchName"), Q_Any(U("a \"b\"\\\n\x01/\xC3\xA4")));
+    wrapper.put(U("00"), component);
+    part.put(U("index"), Q_Any(std::int64_t{-3}, false));
+    wrapper.put(U("01"), component);
+    EXPECT_EQ("{\"00\":{\"index\":4294967295,\"matchName\":\"a \\\"b\\\"\\\\\\n\\u0001/\xC3\xA4\"},"
+              "\"01\":{\"index\":-3,\"matchName\":\"a \\\"b\\\"\\\\\\n\\u0001/\xC3\xA4\"}}",
+              Json(root));
+    // A key with a point is one key, and putting it again replaces it in its place.
+    wrapper.put(U("00"), Q_Any(std::int64_t{1}));
+    wrapper.put(U("a.b"), Q_Any());
+    wrapper.put(U("00"), Q_Any(U("again")));
+    EXPECT_EQ(
+        "{\"00\":\"again\",\"01\":{\"index\":-3,\"matchName\":\"a \\\"b\\\"\\\\\\n\\u0001/\xC3\xA4\"},\"a.b\":null}",
+        Json(root));
+    EXPECT_EQ(U("again"), wrapper.get_child_any(U("00")).GetAs_Str());
+    EXPECT_EQ(Q_Err_NoChild, Thrown([&] { wrapper.get_child_any(U("a")); }));
+
+    u16str lone = U("x");
+    lone.push_back(0xD800);
+    Q_AnyTree surrogate;
+    Q_AnyTreeWrapper(surrogate).put(lone, Q_Any(lone));
+    EXPECT_EQ("{\"x\xEF\xBF\xBD\":\"x\xEF\xBF\xBD\"}", Json(surrogate));
+}
+
+struct Parsed {
+    char const* why;
+    std::string text;
+    std::string again;  // what it is written as
+};
+
+TEST(AnyTree, ReadsWhatIsJson)
+{
+    const Parsed rows[] = {
+        {"nothing in it", " { } ", "{}"},
+        {"an empty array is an empty tree", "[]", "{}"},
+        {"blanks", "{ \"a\" :\t1 ,\r\n\"b\":-2}", "{\"a\":1,\"b\":-2}"},
+        {"order is kept, and so are repeated keys", R"({"z":1,"a":2,"z":3})", R"({"z":1,"a":2,"z":3})"},
+        {"escapes", R"({"\u0041\ud83d\ude00\/":"\b\f\n\r\t\"\\"})",
+         "{\"A\xF0\x9F\x98\x80/\":\"\\b\\f\\n\\r\\t\\\"\\\\\"}"},
+        {"arrays", R"([1,"two",[3],{"four":null}])", R"([1,"two",[3],{"four":null}])"},
+        {"words", R"({"t":true,"f":false,"n":null})", R"({"t":1,"f":0,"n":null})"},
+        {"the widest numbers", "[9223372036854775807,-9223372036854775808]",
+         "[9223372036854775807,-9223372036854775808]"},
+        {"a value beside children", R"({"a":{"$value":5,"b":6}})", R"({"a":{"$value":5,"b":6}})"},
+        {"a value beside children without keys", R"({"a":{"$value":5,"":6}})", R"({"a":{"$value":5,"":6}})"},
+        {"the key of a value elsewhere is a key", R"({"a":{"b":6,"$value":5}})", R"({"a":{"b":6,"$value":5}})"},
+        {"and it holds one value only", R"({"a":{"$value":{"b":1},"c":2}})", R"({"a":{"$value":{"b":1},"c":2}})"},
+    };
+    for (Parsed const& row : rows) {
+        SCOPED_TRACE(row.why);
+        Q_AnyTree tree;
+        Q_AnyTreeWrapper(tree).put(U("old"), Q_Any(U("gone")));
+        ASSERT_EQ(0, Thrown([&] { Q_AnyTreeWrapper(tree).SetFrom_JSON_HackRecoverMagicMixed(U(row.text)); }));
+        EXPECT_EQ(row.again, Json(tree));
+    }
+}
+
+TEST(AnyTree, AValueBesideChildrenIsTheNodesOwn)
+{
+    Q_AnyTree tree;
+    Q_AnyTreeWrapper(tree).SetFrom_JSON_HackRecoverMagicMixed(U(R"({"a":{"$value":"mine","b":6}})"));
+    Q_AnyTree const& a = tree.find(U("a"))->second;
+    EXPECT_EQ(U("mine"), a.data().GetAs_Str());
+    EXPECT_EQ(1u, a.size());
+}
+
+TEST(AnyTree, RefusesEverythingElseAndStaysAsItWas)
+{
+    const std::string deepest = std::string(Q_MaxJsonDepth, '[') + std::string(Q_MaxJsonDepth, ']');
+    const std::vector<std::string> bad = {
+        "",
+        " ",
+        "{",
+        "}",
+        "[1,]",
+        "{\"a\"}",
+        "{\"a\":}",
+        "{\"a\":1,}",
+        "{a:1}",
+        "{'a':1}",
+        "{\"a\":1}x",
+        "{}{}",
+        "1",
+        "\"text\"",
+        "null",
+        "[1.5]",
+        "[1e3]",
+        "[1.0]",
+        "[-]",
+        "[01]",
+        "[+1]",
+        "[NaN]",
+        "[9223372036854775808]",
+        "[-9223372036854775809]",
+        "[99999999999999999999999999]",
+        "[\"\\x\"]",
+        "[\"\\u12\"]",
+        "[\"\n\"]",
+        "[\"open",
+        "[tru]",
+        "//c\n[]",
+        "[" + deepest + "]",
+        std::string(1000000, '['),
+        "[" + deepest.substr(1, 200) + ",",
+    };
+    for (std::string const& text : bad) {
+        Q_AnyTree tree;
+        Q_AnyTreeWrapper wrapper(tree);
+        wrapper.put(U("old"), Q_Any(std::int64_t{1}));
+        EXPECT_EQ(Q_Err_BadJson, Thrown([&] { wrapper.SetFrom_JSON_HackRecoverMagicMixed(U(text)); }))
+            << text.substr(0, 60);
+        EXPECT_EQ("{\"old\":1}", Json(tree)) << text.substr(0, 60);
+    }
+    Q_AnyTree tree;
+    EXPECT_EQ(0, Thrown([&] { Q_AnyTreeWrapper(tree).SetFrom_JSON_HackRecoverMagicMixed(U(deepest)); }));
+}
+
+TEST(AnyTree, DepthIsBoundedWhenWritingToo)
+{
+    Q_AnyTree tree;
+    tree.push_back({U("leaf"), Q_AnyTree(Q_Any(std::int64_t{1}))});
+    for (int depth = 1; depth <= Q_MaxJsonDepth; ++depth) {
+        EXPECT_EQ(0, Thrown([&] { Json(tree); })) << depth;
+        Q_AnyTree around;
+        around.push_back({U("in"), tree});
+        tree.swap(around);
+    }
+    EXPECT_EQ(Q_Err_BadJson, Thrown([&] { Json(tree); }));
+}
+
+Q_AnyTree RandomTree(std::mt19937& random, int depth)
+{
+    const auto text = [&] {
+        u16str result;
+        for (unsigned i = random() % 5; i > 0; --i) result.push_back(static_cast<unsigned short>(random() % 0xD800));
+        return result;
+    };
+    Q_AnyTree tree;
+    if (random() % 3 == 0)
+        tree.data() = random() % 2 ? Q_Any(text()) : Q_Any(static_cast<std::int64_t>(random()) - 1000000);
+    for (unsigned i = depth > 0 ? random() % 4 : 0; i > 0; --i) tree.push_back({text(), RandomTree(random, depth - 1)});
+    return tree;
+}
+
+TEST(AnyTree, EveryTreeComesBackFromItsText)
+{
+    std::mt19937 random(42);
+    for (int i = 0; i < 500; ++i) {
+        Q_AnyTree tree = RandomTree(random, 4), back;
+        const u16str text = Q_AnyTreeWrapper(tree).GetAs_JSON();
+        Q_AnyTreeWrapper(back).SetFrom_JSON_HackRecoverMagicMixed(text);
+        EXPECT_TRUE(tree == back) << Narrow(text);
+    }
+}
+
+TEST(AnyTree, TheWalkGoesParentsFirstAndTurnsBackWhereItIsTold)
+{
+    Q_AnyTree tree;
+    Q_AnyTreeWrapper wrapper(tree);
+    wrapper.SetFrom_JSON_HackRecoverMagicMixed(U(R"({"a":{"b":{"c":1}},"d":{"e":2},"f":3})"));
+    std::string seen;
+    wrapper.for_each([&](int depth, u16str const& key, Q_AnyTree const& subTree, Q_Any const& value) {
+        seen += std::to_string(depth) + Narrow(key) + Narrow(value.GetAs_Str()) + "/" + std::to_string(subTree.size()) +
+                " ";
+        return key != U("d");
+    });
+    EXPECT_EQ("1a/1 2b/1 3c1/0 1d/1 1f3/0 ", seen);
+}
+
+}  // namespace

@@ -1,0 +1,101 @@
+// Chunk files made by hand, byte by byte, so that a test doesn't take the writer's word for what a file looks like; and
+// a reader that takes everything there is.
+#pragma once
+
+#include "frame/services/chunkfile.h"
+
+#include <gtest/gtest.h>
+
+#include <cstdint>
+#include <ostream>
+#include <span>
+#include <string>
+
+inline std::string Long(std::uint32_t value)
+{
+    std::string bytes;
+    for (int shift = 24; shift >= 0; shift -= 8) bytes += static_cast<char>(value >> shift);
+    return bytes;
+}
+
+inline std::string Atom(std::string const& id, std::string const& data)
+{
+    return id + Long(static_cast<std::uint32_t>(data.size())) + data + std::string(data.size() & 1, '\0');
+}
+
+inline std::string List(std::string const& type, std::string const& chunks)
+{
+    return "LIST" + Long(static_cast<std::uint32_t>(chunks.size() + 4)) + type + chunks;
+}
+
+inline std::string Form(std::string const& chunks, std::uint32_t major = 95, std::uint32_t minor = 0,
+                        std::uint32_t encoding = 0)
+{
+    const std::string all = "proj" + Atom("vers", Long(major) + Long(minor) + Long(encoding)) + chunks;
+    return "KFSF" + Long(static_cast<std::uint32_t>(all.size())) + all;
+}
+
+inline std::span<unsigned char const> Span(std::string const& bytes)
+{
+    return {reinterpret_cast<unsigned char const*>(bytes.data()), bytes.size()};
+}
+
+inline std::string Bytes(CKF_File const& file)
+{
+    const std::span<unsigned char const> bytes = file.GetBytes();
+    return {bytes.begin(), bytes.end()};
+}
+
+inline u16str Text(char const* ascii)
+{
+    return Q_AsciiToUTF16String(ascii);
+}
+
+// The code that a call throws, or 0.
+template <class Call>
+int Thrown(Call call)
+{
+    try {
+        call();
+        return 0;
+    } catch (int code) {
+        return code;
+    }
+}
+
+// What a file holds from the present position to the end of the open list, in the form "(kfgp kfsb:4 (kfbs ...))".
+inline std::string Outline(CKF_File* file, CKF_ChunkInfo const* parent = nullptr)
+{
+    std::string text;
+    for (;;) {
+        bool found = false;
+        const CKF_ScDescend descent(file, 0, 0, parent, &found);
+        if (!found) return text;
+        CKF_ChunkInfo const* const chunk = descent.GetChunkInfo();
+        const auto spell = [](int id) { return Long(static_cast<std::uint32_t>(id)); };
+        if (!text.empty()) text += ' ';
+        if (chunk->id == CKF_ListId) {
+            const std::string inner = Outline(file, chunk);
+            text += "(" + spell(chunk->listType) + (inner.empty() ? "" : " ") + inner + ")";
+        } else {
+            std::string data(chunk->size, '\0');
+            int size = static_cast<int>(chunk->size);
+            if (const int code = CKF_ReadChunkData(file, &size, data.data())) throw code;
+            text += spell(chunk->id) + ":" + std::to_string(size);
+        }
+    }
+}
+
+// A file with a bit of everything: lists in lists, odd sizes, an empty atom, an empty list, texts, a list of items.
+inline std::string NestedSample()
+{
+    const std::string leaf =
+        List("kfbs", Atom("kfsb", Long(7)) + Atom("kfsn", "odd") + Atom("kfb4", std::string(124, 'b')) +
+                         Atom("seql", Long(3) + Long(2) + "abcdef") + Atom("Utf8", "\xC3\xA4"));
+    const std::string inner =
+        List("kfgp", Atom("kfmn", std::string(40, 'm')) + leaf + Atom("none", "") + List("void", ""));
+    return Form(Atom("odd1", "x") + List("kfgp", Atom("kfsb", Long(0)) + inner + leaf) + Atom("last", "12345"));
+}
+inline char const* const NestedOutline =
+    "odd1:1 (kfgp kfsb:4 (kfgp kfmn:40 (kfbs kfsb:4 kfsn:3 kfb4:124 seql:14 Utf8:2) none:0 (void)) "
+    "(kfbs kfsb:4 kfsn:3 kfb4:124 seql:14 Utf8:2)) last:5";

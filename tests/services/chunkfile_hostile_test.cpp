@@ -1,0 +1,305 @@
+// Files that nobody wrote: cut short, bent, lying and endless.
+#include "tests/services/chunkbytes.h"
+
+#include "frame/services/memory.h"
+#include "frame/services/sequence.h"
+
+#include <chrono>
+#include <random>
+#include <vector>
+
+namespace {
+
+// Reads in the manner of the library: by ids, in fixed order, giving up at the first failure. Returns its code.
+int ReadAsATree(CKF_File* file, CKF_ChunkInfo const* parent)
+{
+    return Thrown([&] {
+        bool found = false;
+        const CKF_ScDescendList group(file, CKF_Id("kfgp"), parent, &found);
+        if (!found) return;
+        for (int i = 0; i < 1000; ++i) {
+            char name[40];
+            if (CKF_ReadAtom(file, CKF_Id("kfmn"), group.GetChunkInfo(), sizeof name, name) != 0) return;
+            const CKF_ScDescendList leaf(file, CKF_Id("kfbs"), group.GetChunkInfo(), &found);
+            if (!found) continue;
+            u16str text;
+            CKF_ReadString(file, leaf.GetChunkInfo(), CKF_Id("kfsn"), &text, {}, 0);
+            char** handle = nullptr;
+            if (CKF_ReadHandle(file, leaf.GetChunkInfo(), CKF_Id("kfb4"), &handle) == 0) Q_FreeHandle(handle);
+            SEQ_Head** list = nullptr;
+            if (SEQ_Read(file, &list) == 0) SEQ_Dispose(list, 0);
+            CKF_ReadUTF16(file, &text, leaf.GetChunkInfo());
+        }
+    });
+}
+
+// Opens and reads these bytes in every way there is. Whatever the bytes are, this must end, and leave nothing.
+void TakeEverything(std::string const& bytes)
+{
+    CKF_File file;
+    const int opened = file.Open(Span(bytes));
+    EXPECT_EQ(opened, file.LastError());
+    std::string outline;
+    const int outlined = Thrown([&] { outline = Outline(&file); });
+    EXPECT_LE(outline.size(), 4 * bytes.size() + 16);
+    if (file.Open(Span(bytes)) == 0) ReadAsATree(&file, nullptr);
+
+    CKF_ChunkWalk walk(Span(bytes));
+    CKF_RawChunk chunk{};
+    std::size_t count = 0;
+    while (walk.Next(&chunk)) {
+        ASSERT_LE(++count, bytes.size()) << "the walk goes in a circle";
+        ASSERT_LE(chunk.offset, bytes.size());
+        if (chunk.data.empty()) continue;
+        ASSERT_GE(chunk.data.data(), Span(bytes).data());
+        ASSERT_LE(chunk.data.data() + chunk.data.size(), Span(bytes).data() + bytes.size());
+    }
+    EXPECT_TRUE(opened != 0 || (outlined == 0) == walk.Sound())
+        << "the walk sees a problem where a reader fails, and only there";
+}
+
+TEST(ChunkFileHostile, EveryTruncationIsRefused)
+{
+    const std::string sample = NestedSample();
+    TakeEverything(sample);
+    for (std::size_t size = 0; size < sample.size(); ++size) {
+        // A block of its own size, so that the sanitizer sees a read behind it.
+        const std::string cut(sample.data(), size);
+        CKF_File file;
+        const int code = file.Open(Span(cut));
+        EXPECT_TRUE(code == CKF_Err_Corrupt || code == CKF_Err_NotAChunkFile) << size << " gives " << code;
+        TakeEverything(cut);
+    }
+    CKF_File file;
+    const std::string longer = sample + '\0';
+    EXPECT_EQ(CKF_Err_Corrupt, file.Open(Span(longer)));
+    EXPECT_EQ(sample.size(), file.LastErrorOffset());
+    TakeEverything(longer);
+}
+
+TEST(ChunkFileHostile, EveryBentByteIsSurvived)
+{
+    const std::string sample = NestedSample();
+    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    for (std::size_t at = 0; at < sample.size(); ++at)
+        for (const int mask : {0x01, 0x80, 0xFF}) {
+            std::string bent = sample;
+            bent[at] = static_cast<char>(bent[at] ^ mask);
+            SCOPED_TRACE(testing::Message() << "byte " << at << " mask " << mask);
+            TakeEverything(bent);
+        }
+    EXPECT_EQ(before, Q_MemoryLive(nullptr));
+}
+
+TEST(ChunkFileHostile, RandomBytesAreSurvived)
+{
+    std::mt19937 random(20);
+    const std::string sample = NestedSample();
+    const std::vector<std::string> words = {"LIST",
+                                            "kfgp",
+                                            "kfbs",
+                                            "KFSF",
+                                            "kfmn",
+                                            "seql",
+                                            "Utf8",
+                                            std::string(4, '\0'),
+                                            "\xFF\xFF\xFF\xFF",
+                                            "\x7F\xFF\xFF\xFF"};
+    for (int round = 0; round < 3000; ++round) {
+        std::string bytes = sample;
+        for (unsigned i = 0; i < 1 + random() % 6; ++i) {
+            const std::string& word = words[random() % words.size()];
+            bytes.replace(8 + random() % (bytes.size() - 16), 4, round % 2 ? word : Long(random() % 64));
+        }
+        TakeEverything(bytes);
+    }
+}
+
+TEST(ChunkFileHostile, ListsNestAsDeepAsTheWriterCanAndNoDeeper)
+{
+    const auto nested = [](int depth) {
+        std::string content = Atom("core", "x");
+        for (int i = 0; i < depth; ++i) content = List("kfgp", content);
+        return Form(content);
+    };
+    const std::string deepest = nested(CKF_MaxDepth);
+    CKF_File file;
+    ASSERT_EQ(0, file.Open(Span(deepest)));
+    EXPECT_EQ(0, Thrown([&] { Outline(&file); }));
+
+    const std::string deeper = nested(CKF_MaxDepth + 1);
+    ASSERT_EQ(0, file.Open(Span(deeper)));
+    EXPECT_EQ(CKF_Err_TooDeep, Thrown([&] { Outline(&file); }));
+
+    // A million lists in each other: no recursion may follow them.
+    constexpr std::size_t lists = 1000000;
+    std::string bottomless;
+    bottomless.reserve(lists * 12);
+    for (std::size_t i = 0; i < lists; ++i)
+        bottomless += "LIST" + Long(static_cast<std::uint32_t>(12 * (lists - i) - 8)) + "kfgp";
+    const std::string bytes = Form(bottomless);
+    ASSERT_EQ(0, file.Open(Span(bytes)));
+    EXPECT_EQ(CKF_Err_TooDeep, Thrown([&] { Outline(&file); }));
+    CKF_ChunkWalk walk{Span(bytes)};
+    CKF_RawChunk chunk{};
+    int deepestSeen = 0;
+    while (walk.Next(&chunk)) deepestSeen = std::max(deepestSeen, chunk.depth);
+    EXPECT_EQ(CKF_MaxDepth + 1, deepestSeen);
+    EXPECT_FALSE(walk.Sound());
+}
+
+TEST(ChunkFileHostile, ManySearchesForWhatIsNotThereCostNoMoreThanOne)
+{
+    // Each name makes a reader look for a group that never comes. Looking through the rest each time would be ten
+    // thousand million steps.
+    constexpr int names = 100000;
+    std::string content;
+    for (int i = 0; i < names; ++i) content += Atom("kfmn", "name");
+    const std::string bytes = Form(List("kfgp", content));
+    CKF_File file;
+    ASSERT_EQ(0, file.Open(Span(bytes)));
+    const CKF_ScDescendList group(&file, CKF_Id("kfgp"), nullptr, nullptr);
+    const auto start = std::chrono::steady_clock::now();
+    int read = 0;
+    char name[40];
+    while (CKF_ReadAtom(&file, CKF_Id("kfmn"), group.GetChunkInfo(), sizeof name, name) == 0) {
+        ++read;
+        bool found = true;
+        const CKF_ScDescendList child(&file, CKF_Id("kfgp"), group.GetChunkInfo(), &found);
+        const CKF_ScDescendList leaf(&file, CKF_Id("kfbs"), group.GetChunkInfo(), &found);
+        EXPECT_FALSE(found);
+    }
+    EXPECT_EQ(names, read);
+    EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(20))
+        << "it takes milliseconds, or minutes";
+}
+
+TEST(ChunkFileHostile, AClaimCostsNoMemory)
+{
+    // Everything here claims two thousand million bytes or items and has eight.
+    const std::string lies[] = {
+        Form("expr" + Long(0x7FFFFFFE) + "12345678"),
+        Form(Atom("seql", Long(1) + Long(0x7FFFFFFF) + "12345678")),
+        Form(Atom("seql", Long(0x7FFF) + Long(0x7FFFFFFF) + "12345678")),
+        Form(Atom("seql", Long(0xFFFFFFFF) + Long(2) + "12345678")),
+        Form(Atom("seql", Long(0) + Long(0) + "12345678")),
+        Form(Atom("seql", Long(8) + Long(0xFFFFFFFF) + "12345678")),
+        Form(Atom("seql", Long(4) + Long(1) + "12345678")),
+        Form(Atom("seql", Long(4) + Long(0x40000002) + "12345678")),
+        Form(Atom("seql", "1234")),
+    };
+    for (std::string const& lie : lies) {
+        CKF_File file;
+        ASSERT_EQ(0, file.Open(Span(lie)));
+        Q_FailAllocation(1);
+        char** handle = nullptr;
+        SEQ_Head** list = nullptr;
+        const int code = lie.find("expr") != std::string::npos ? CKF_ReadHandle(&file, nullptr, CKF_Id("expr"), &handle)
+                                                               : SEQ_Read(&file, &list);
+        const bool fired = Q_FailAllocationFired();
+        Q_FailAllocation(0);
+        EXPECT_FALSE(fired) << "checked before anything is allocated";
+        EXPECT_TRUE(code == CKF_Err_Corrupt || code == SEQ_Err_BadChunk) << code;
+        EXPECT_EQ(code, file.LastError());
+        EXPECT_EQ(nullptr, handle);
+        EXPECT_EQ(nullptr, list);
+    }
+}
+
+TEST(ChunkFileHostile, OpeningIsExactAboutTheOuterForm)
+{
+    const std::string good = Form("");
+    const auto with = [&](std::size_t at, std::string const& bytes) {
+        return std::string(good).replace(at, bytes.size(), bytes);
+    };
+    const struct {
+        char const* why;
+        std::string bytes;
+        int code;
+    } rows[] = {
+        {"nothing", "", CKF_Err_NotAChunkFile},
+        {"another kind of file", "RIFF\0\0\0\4WAVE----------------", CKF_Err_NotAChunkFile},
+        {"another type of form", with(8, "song"), CKF_Err_NotAChunkFile},
+        {"no version record", with(12, "vors"), CKF_Err_NotAChunkFile},
+        {"a version record without an encoding",
+         std::string(good).replace(4, 4, Long(22)).replace(16, 4, Long(8)).substr(0, 30), CKF_Err_NotAChunkFile},
+        {"a form that is too long", with(4, Long(26)), CKF_Err_Corrupt},
+        {"a form that is too short", with(4, Long(22)), CKF_Err_Corrupt},
+        {"only the form", "KFSF" + Long(4) + "proj", CKF_Err_NotAChunkFile},
+    };
+    for (auto const& row : rows) {
+        CKF_File file;
+        EXPECT_EQ(row.code, file.Open(Span(row.bytes))) << row.why;
+        EXPECT_STRNE("", file.LastErrorText()) << row.why;
+        EXPECT_TRUE(file.GetBytes().empty()) << row.why;
+    }
+    // What a later build may add to the version record is stepped over.
+    const std::string longer =
+        "KFSF" + Long(4 + 24 + 10) + "proj" + Atom("vers", Long(95) + Long(0) + Long(0) + "more") + Atom("aaaa", "12");
+    CKF_File file;
+    ASSERT_EQ(0, file.Open(Span(longer)));
+    EXPECT_EQ("aaaa:2", Outline(&file));
+}
+
+// ---- the walk
+
+std::string Walked(std::string const& bytes)
+{
+    std::string text;
+    CKF_ChunkWalk walk(Span(bytes));
+    CKF_RawChunk chunk{};
+    while (walk.Next(&chunk)) {
+        text += std::string(static_cast<std::size_t>(chunk.depth), ' ') +
+                (chunk.id ? Long(static_cast<std::uint32_t>(chunk.id)) : "????") + "@" + std::to_string(chunk.offset) +
+                " " + std::to_string(chunk.data.size()) + "/" + std::to_string(chunk.claimedSize);
+        if (chunk.listType != 0) text += " " + Long(static_cast<std::uint32_t>(chunk.listType));
+        if (chunk.problem) text += std::string(": ") + chunk.problem;
+        text += '\n';
+    }
+    return text;
+}
+
+TEST(ChunkFileWalk, ShowsASoundFileAsItIs)
+{
+    EXPECT_EQ("KFSF@0 64/64 proj\n"
+              " vers@12 12/12\n"
+              " LIST@32 24/24 kfgp\n"
+              "  odd_@44 3/3\n"
+              "  LIST@56 0/0 kfbs\n"
+              " even@68 0/0\n",
+              Walked(Form(List("kfgp", Atom("odd_", "123") + List("kfbs", "")) + Atom("even", ""))));
+}
+
+TEST(ChunkFileWalk, GoesOnBehindWhatIsBroken)
+{
+    // The inner list claims more than the outer one has; what stands behind the outer one is still found.
+    const std::string liar = "LIST" + Long(400) + "kfbs" + Atom("in__", "12");
+    EXPECT_EQ("KFSF@0 66/66 proj\n"
+              " vers@12 12/12\n"
+              " LIST@32 22/22 kfgp\n"
+              "  LIST@44 10/396 kfbs: longer than what contains it\n"
+              "   in__@56 2/2\n"
+              " next@66 4/4\n",
+              Walked(Form(List("kfgp", liar) + Atom("next", "1234"))));
+    // A file that was cut short shows what is left of it.
+    EXPECT_EQ("KFSF@0 40/54 proj: longer than what contains it\n"
+              " vers@12 12/12\n"
+              " LIST@32 8/12 kfgp: longer than what contains it\n"
+              "  next@44 0/4: longer than what contains it\n",
+              Walked(Form(List("kfgp", Atom("next", "1234")) + Atom("lost", "12")).substr(0, 52)));
+    EXPECT_EQ("KFSF@0 4/20 proj: longer than what contains it\n"
+              " ????@12 4/0: too short for the header of a chunk\n",
+              Walked(Form("").substr(0, 16)));
+    EXPECT_EQ("KFSF@0 20/20 proj\n"
+              " vers@12 12/12\n"
+              "????@32 4/0: behind the end of the outer form\n",
+              Walked(Form("") + "tail"));
+    EXPECT_EQ("KFSF@0 52/52 proj\n"
+              " vers@12 12/12\n"
+              " KFSF@32 20/20 proj: an outer form inside the file\n",
+              Walked(Form(Form(""))));
+    EXPECT_EQ("what@0 0/1702258034: not the outer form of a project file\n", Walked("whatever"));
+    EXPECT_EQ("", Walked(""));
+}
+
+}  // namespace

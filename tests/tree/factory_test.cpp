@@ -1,0 +1,402 @@
+#include "tree/factory.h"
+
+#include "frame/errors.h"
+#include "frame/project.h"
+#include "frame/services/debug.h"
+#include "tests/support/groups.h"
+#include "tree/decanonicalize.h"
+
+#include <cstdlib>
+#include <functional>
+
+namespace {
+
+using Names = std::vector<std::string>;
+
+// Collects what goes to the log for its scope.
+class LogRecorder {
+public:
+    LogRecorder()
+        : previous_(Q_SetLogSink([this](int level, char const* tag, char const* topic, char const* text) {
+              lines_.push_back(std::to_string(level) + " " + tag + " " + topic + ": " + text);
+          }))
+    {}
+    ~LogRecorder() { Q_SetLogSink(previous_); }
+    Names Take() { return std::exchange(lines_, {}); }
+
+private:
+    Names lines_;
+    Q_LogSink previous_;
+};
+
+class Factory : public StreamTest {
+protected:
+    KFS_StreamFactory& factory = *Get_VX_StreamFactory();
+    TestKinds kinds;
+};
+
+KFS_FactoryFunc LeafFunc(double value, int* calls = nullptr)
+{
+    return [=](KFS_MatchName const& name, KFS_StreamFactory* factory, bool constant, unsigned int timeScale,
+               bool canonical) {
+        if (calls) ++*calls;
+        EXPECT_TRUE(constant) << "each new stream starts out constant";
+        return new TestLeaf(name, factory, constant, timeScale, canonical, 1, value);
+    };
+}
+
+TEST_F(Factory, TheFirstRegistrationOfANameStands)
+{
+    int first = 0, second = 0;
+    EXPECT_TRUE(factory.RegisterFactoryFunc(Name("blur"), LeafFunc(1.0, &first), false));
+    KFS_StreamBase* const canonical = factory.GetCanonicalStream(Name("blur"));
+    EXPECT_FALSE(factory.RegisterFactoryFunc(Name("blur"), LeafFunc(2.0, &second), false));
+    EXPECT_EQ(0, second);
+    EXPECT_EQ(canonical, factory.GetCanonicalStream(Name("blur")));
+    EXPECT_EQ(canonical, factory.GetCanonicalInstance(Name("blur")));
+    EXPECT_TRUE(canonical->IsCanonical());
+    EXPECT_EQ(nullptr, canonical->GetParent());
+    EXPECT_EQ(600u, canonical->GetAsLeaf()->GetTimeScale());
+    EXPECT_EQ(1.0, static_cast<TestLeaf*>(canonical)->ValueAt(0));
+
+    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    auto* const late = new TestLeaf(Name("blur"), &factory, true, 600, false, 1, 3.0);
+    EXPECT_EQ(canonical, factory.RegisterCanonicalInstance(late));
+    EXPECT_EQ(before, Q_MemoryLive(nullptr)) << "the late one is deleted";
+    EXPECT_EQ(canonical, factory.RegisterCanonicalInstance(canonical)) << "the registered one itself isn't";
+    EXPECT_EQ(1.0, static_cast<TestLeaf*>(canonical)->ValueAt(0));
+    EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("blur")));
+}
+
+TEST_F(Factory, AnUnknownKindIsNothing)
+{
+    LogRecorder log;
+    EXPECT_EQ(nullptr, factory.GetCanonicalInstance(Name("no such")));
+    EXPECT_EQ(nullptr, factory.GetCanonicalStream(Name("no such")));
+    EXPECT_EQ(nullptr, factory.CreateStream(Name("no such"), true, 600, false, false));
+    EXPECT_EQ(KFS_Err_UnknownStream,
+              KFSp_Boundary([&] { factory.CreateStream(Name("no such"), true, 600, true, false); }));
+    EXPECT_EQ((std::vector<Reported>{{0x1D0000, 8, "asked to create unknown property of type #{ldquo}no such#{rdquo}",
+                                      KFS_Err_UnknownStream}}),
+              reports.Take());
+    EXPECT_EQ(Names{}, log.Take());
+    EXPECT_FALSE(factory.UnregisterFactoryFunc_NullOK(Name("no such"), true));
+    EXPECT_EQ(Names{}, log.Take());
+    EXPECT_FALSE(factory.UnregisterFactoryFunc(Name("no such")));
+    EXPECT_EQ(Names{"0 KFS UnregisterFactoryFunc: no such"}, log.Take());
+}
+
+TEST_F(Factory, AKindWhoseFunctionGivesNothingIsUnknownAndDoesntRegister)
+{
+    const KFS_FactoryFunc nothing = [](KFS_MatchName const&, KFS_StreamFactory*, bool, unsigned int, bool) {
+        return nullptr;
+    };
+    EXPECT_EQ(KFS_Err_UnknownStream, KFSp_Boundary([&] { factory.RegisterFactoryFunc(Name("void"), nothing, false); }));
+    EXPECT_EQ(1u, reports.Take().size());
+    EXPECT_EQ(nullptr, factory.GetCanonicalInstance(Name("void")));
+    EXPECT_TRUE(factory.RegisterFactoryFunc(Name("void"), LeafFunc(0.0), false)) << "the name is free again";
+    EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("void")));
+}
+
+TEST_F(Factory, ALeafIsMadeWithItsDefault)
+{
+    kinds.Leaf("blur", 1, 7.0);
+    struct Row {
+        bool constant;
+        unsigned int timeScale;
+    };
+    for (const Row& row : {Row{true, 600}, Row{false, 600}, Row{false, 24}}) {
+        SCOPED_TRACE(testing::Message() << row.constant << " " << row.timeScale);
+        const Q_ScAutoPtr<KFS_StreamBase> made(
+            factory.CreateStream(Name("blur"), row.constant, row.timeScale, true, false));
+        auto const* const leaf = static_cast<TestLeaf*>(made.get());
+        EXPECT_FALSE(leaf->IsCanonical());
+        EXPECT_EQ(&factory, leaf->GetFactory());
+        EXPECT_EQ(row.timeScale, leaf->GetTimeScale());
+        EXPECT_EQ(row.constant, leaf->HasNoKeys());
+        EXPECT_EQ(7.0, leaf->ValueAt(100));
+        EXPECT_EQ(row.constant ? 0 : 1, leaf->GetKeys() ? (*leaf->GetKeys())->count : 0);
+        if (!row.constant) {
+            void const* key = nullptr;
+            ASSERT_EQ(0, SEQ_GetConstAddress(leaf->GetKeys(), 0, &key));
+            EXPECT_EQ(0, static_cast<KFS_KeyScalar const*>(key)->time);
+        }
+    }
+}
+
+TEST_F(Factory, AKindRegisteredAsAnObjectIsClonedFromIt)
+{
+    auto* const object = new TestLeaf(Name("glow"), &factory, true, 600, false, 1, 7.0);
+    object->InsertDefaultKey(T_Time{0, 1});
+    object->SetDisplayName(Q_MBToUTF16String("Glow"));
+    object->SetSMDataPath(std::string("glow data"));
+    EXPECT_EQ(object, factory.RegisterCanonicalInstance(object));
+    EXPECT_TRUE(object->IsCanonical());
+    {
+        const Q_ScAutoPtr<KFS_StreamBase> made(factory.CreateStream(Name("glow"), true, 30, true, false));
+        EXPECT_FALSE(made->IsCanonical());
+        EXPECT_EQ(30u, made->GetAsLeaf()->GetTimeScale());
+        EXPECT_EQ(7.0, static_cast<TestLeaf*>(made.get())->ValueAt(0));
+        EXPECT_EQ(Q_MBToUTF16String("Glow"), made->GetDisplayName());
+        EXPECT_EQ("glow data", boost::any_cast<std::string>(made->GetSMDataPath()));
+        const Q_ScAutoPtr<KFS_StreamBase> keyed(factory.MakeInstanceFromCanonical(Name("glow"), false, 30));
+        EXPECT_TRUE(keyed->GetAsLeaf()->HasKeys());
+    }
+    EXPECT_TRUE(factory.UnregisterCanonicalInstance(object));
+    EXPECT_EQ(nullptr, factory.GetCanonicalInstance(Name("glow")));
+    EXPECT_EQ(nullptr, factory.CreateStream(Name("glow"), true, 600, false, false));
+}
+
+// Its children are registered after it, and it holds its own kind.
+TEST_F(Factory, ADeferredLayoutMayNameWhatComesLaterAndItself)
+{
+    const auto make = [](KFS_MatchName const& name, KFS_StreamFactory* f, bool, unsigned int, bool canonical) {
+        return new TestNamedGroup(name, f, canonical, {Name("late"), Name("nest")});
+    };
+    EXPECT_TRUE(factory.RegisterFactoryFunc(Name("nest"), make, true));
+    EXPECT_TRUE(factory.RegisterFactoryFunc(Name("late"), LeafFunc(0.0), false));
+    factory.SetupCanonicalStream(Name("nest"));
+    {
+        const Q_ScAutoPtr<KFS_StreamBase> made(factory.CreateStream(Name("nest"), true, 600, true, false));
+        KFS_StreamGroup const* level = made->GetAsGroup();
+        for (int depth = 0; depth < 5; ++depth) {
+            ASSERT_EQ(2u, level->GetNumStreams());
+            EXPECT_EQ("late", NameOf(level->GetStream(0)));
+            level = level->GetStream(1)->GetAsGroup();
+        }
+        EXPECT_EQ(factory.GetCanonicalStream(Name("nest")), level);
+    }
+    EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("late"))) << "before the group that names it";
+    EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("nest")));
+}
+
+TEST_F(Factory, UnregisteringDestroysTheCanonicalInstance)
+{
+    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    factory.RegisterFactoryFunc(Name("blur"), LeafFunc(0.0), false);
+    EXPECT_NE(before, Q_MemoryLive(nullptr));
+    EXPECT_TRUE(factory.UnregisterFactoryFunc_NullOK(Name("blur"), false));
+    EXPECT_EQ(before, Q_MemoryLive(nullptr));
+    EXPECT_EQ(nullptr, factory.GetCanonicalStream(Name("blur")));
+}
+
+TEST_F(Factory, ABatchUnregistersBackwardsAndOnlyWhatItRegistered)
+{
+    static Names gone;
+    gone.clear();
+    class Witness : public TestLeaf {
+    public:
+        using TestLeaf::TestLeaf;
+        ~Witness() override { gone.push_back(NameOf(this)); }
+    };
+    const auto make = [](KFS_MatchName const& name, KFS_StreamFactory* f, bool constant, unsigned int timeScale,
+                         bool canonical) { return new Witness(name, f, constant, timeScale, canonical, 1, 5.0); };
+    kinds.Leaf("taken", 1, 0.0);
+    {
+        KFS_ScRegisterStreams batch(&factory);
+        for (char const* const name : {"one", "taken", "two"}) {
+            batch.Register(Name(name), make, false);
+            EXPECT_TRUE(batch.IsRegistered(Name(name)));
+        }
+        EXPECT_FALSE(batch.IsRegistered(Name("three")));
+        {
+            const Q_ScAutoPtr<KFS_StreamBase> made(batch.CreateStream(Name("two")));
+            EXPECT_TRUE(made->GetAsLeaf()->HasKeys());
+        }
+        EXPECT_EQ(Names{"two"}, gone);
+        gone.clear();
+        batch.UnregisterAll();
+        EXPECT_EQ((Names{"two", "one"}), gone);
+        EXPECT_NE(nullptr, factory.GetCanonicalStream(Name("taken")));
+        batch.UnregisterAll();
+        EXPECT_EQ(2u, gone.size()) << "the batch is empty";
+        batch.Register(Name("left"), make, false);
+    }
+    EXPECT_NE(nullptr, factory.GetCanonicalStream(Name("left"))) << "the end of the scope unregisters nothing";
+    EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("left")));
+}
+
+// outer { shared, inner { shared, deep }, own }: which kinds go with which group.
+TEST_F(Factory, DataFileGroupsGoWithTheirChildren)
+{
+    struct Row {
+        const char* why;
+        std::vector<const char*> containers;
+        std::function<void(KFS_StreamFactory&)> act;
+        Names left;
+    };
+    const auto unregisterAll = [](KFS_StreamFactory& f) { f.UnRegisterDataFileContainers(); };
+    const Row rows[] = {
+        {"both, in either order", {"outer", "inner"}, unregisterAll, {}},
+        {"the inner one", {"inner"}, unregisterAll, {"outer", "own"}},
+        {"the outer one, whose subgroup goes as a kind", {"outer"}, unregisterAll, {"deep"}},
+        {"all the way down", {}, [](KFS_StreamFactory& f) { f.UnregisterCanonicalMatchName(Name("outer"), {}); }, {}},
+        {"an unknown one, which stays in the set",
+         {"nobody"},
+         unregisterAll,
+         {"deep", "inner", "outer", "own", "shared"}},
+        {"a leaf", {"own"}, unregisterAll, {"deep", "inner", "outer", "own", "shared"}},
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(row.why);
+        TestKinds local;
+        local.Leaf("shared", 1, 0.0);
+        local.Leaf("deep", 1, 0.0);
+        local.Leaf("own", 1, 0.0);
+        local.Named("inner", {Name("shared"), Name("deep")});
+        local.Named("outer", {Name("shared"), Name("inner"), Name("own")});
+        for (char const* const name : row.containers) {
+            factory.RegisterDataFileContainer(Name(name));
+        }
+        EXPECT_LE(row.containers.size(), factory.GetDataFileMatchNames().size());
+        row.act(factory);
+        Names left;
+        for (char const* const name : {"deep", "inner", "outer", "own", "shared"}) {
+            if (factory.GetCanonicalInstance(Name(name))) {
+                left.push_back(name);
+            }
+        }
+        EXPECT_EQ(row.left, left);
+    }
+}
+
+TEST_F(Factory, DataFileTextStreamsAreASet)
+{
+    EXPECT_FALSE(factory.IsDataFileTextStream(Name("caption")));
+    factory.RegisterDataFileTextStream(Name("caption"));
+    factory.RegisterDataFileTextStream(Name("caption"));
+    EXPECT_TRUE(factory.IsDataFileTextStream(Name("caption")));
+    EXPECT_FALSE(factory.IsDataFileTextStream(Name("title")));
+    factory.UnRegisterDataFileTextStreams();
+    EXPECT_FALSE(factory.IsDataFileTextStream(Name("caption")));
+}
+
+// Replaces an old "amount" by "red" and "blue": the old value goes to both.
+class Tint : public TestNamedGroup {
+public:
+    using TestNamedGroup::TestNamedGroup;
+    void UpgradeChildStream(KFS_StreamBase* obsolete) override
+    {
+        const T_Time zero{0, 600};
+        const double value = static_cast<TestLeaf*>(obsolete)->ValueAt(0);
+        for (char const* const name : {"blue", "red"}) {
+            EXPECT_EQ(0, KFS_InsertKeyF(GetEditableLeafStream(Name(name)), &zero, 1, &value, 0, 0));
+        }
+    }
+};
+
+TEST_F(Factory, AnObsoleteStreamIsReplacedByItsGroupsNewChildren)
+{
+    kinds.Leaf("amount", 1, 0.0);
+    kinds.Leaf("red", 1, 0.0);
+    kinds.Leaf("green", 1, 0.0);
+    kinds.Leaf("blue", 1, 0.0);
+    kinds.Named("part", {Name("green")});
+    const auto make = [](KFS_MatchName const& name, KFS_StreamFactory* f, bool, unsigned int, bool canonical) {
+        return new Tint(name, f, canonical, {Name("red"), Name("part"), Name("green"), Name("blue")});
+    };
+    ASSERT_TRUE(factory.RegisterFactoryFunc(Name("tint"), make, false));
+    factory.GetCanonicalStream(Name("part"))->GetAsNamedGroup()->EnsureUILayoutComplete();
+    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    {
+        TestLeaf old(Name("amount"), &factory, true, 600, false, 1, 42.0);
+        old.InsertDefaultKey(T_Time{0, 1});
+        KFS_Stream* const untouched = &old;
+        std::vector<KFS_Stream*> result{untouched};
+        EXPECT_FALSE(factory.GatherObsoleteReplacementStreams(&old, result));
+        EXPECT_EQ(std::vector<KFS_Stream*>{untouched}, result);
+        factory.RegisterObsoleteStreamParent(Name("amount"), Name("tint"));
+        factory.RegisterObsoleteStreamParent(Name("amount"), Name("part"));  // the first stands
+        EXPECT_TRUE(factory.GatherObsoleteReplacementStreams(&old, result));
+        ASSERT_EQ(2u, result.size()) << "those that the conversion made real, in display order";
+        EXPECT_EQ("red", NameOf(result[0]));
+        EXPECT_EQ("blue", NameOf(result[1]));
+        for (KFS_Stream* const stream : result) {
+            EXPECT_EQ(nullptr, stream->GetParent());
+            EXPECT_EQ(42.0, static_cast<TestLeaf*>(stream)->ValueAt(0));
+            delete stream;
+        }
+        factory.RegisterObsoleteStreamParent(Name("red"), Name("blue"));
+        TestLeaf red(Name("red"), &factory, true, 600, false, 1, 0.0);
+        EXPECT_TRUE(factory.GatherObsoleteReplacementStreams(&red, result));
+        EXPECT_TRUE(result.empty()) << "a leaf replaces nothing";
+    }
+    EXPECT_EQ(before, Q_MemoryLive(nullptr));
+    EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("tint")));
+}
+
+TEST_F(Factory, DecanonicalizingMakesTheWholeTreeReal)
+{
+    const SceneKinds scene;
+    KFS_DecanonicalizeAllChildStreamsDeep(nullptr);
+    const auto countReal = [](KFS_StreamGroup& group) {
+        int real = 0;
+        auto count = [&real](KFS_Stream*) { ++real; };
+        group.ForEachNonCanonicalLeafStream(count, nullptr);
+        return real;
+    };
+    class Owned : public TestRoot<TestNamedGroup> {
+    public:
+        explicit Owned(KFS_Project* project) : TestRoot("node"), project_(project) {}
+        KFS_Project* GetProject() const override { return project_; }
+
+    private:
+        KFS_Project* project_;
+    };
+    Owned root(&session.GetProject());
+    Q_RenderContext* const context = session.GetProject().GetRenderContext(false);
+    auto* const state = dynamic_cast<KFS_RenderState*>(context->PeekState(KFS_RenderState::S_StateName));
+    ASSERT_NE(nullptr, state);
+    {
+        auto const outer = state->SuspendAutoDecanonicalize();
+        {
+            auto const inner = state->SuspendAutoDecanonicalize();
+        }
+        KFS_DecanonicalizeAllChildStreamsDeep(&root);
+        EXPECT_EQ(0, countReal(root)) << "while the project suspends it";
+    }
+    KFS_DecanonicalizeAllChildStreamsDeep(&root);
+    EXPECT_EQ(5, countReal(root));
+    EXPECT_EQ(&root, root.GetStream(0)->GetParent());
+    EXPECT_FALSE(KFS_ShouldAlwaysDecanonicalize()) << "off unless somebody switched it on";
+}
+
+// The switch is read once in a process, so this needs one of its own. Answers 10 for each real leaf of a new node, and
+// 1 if a slot that was made canonical is real again.
+int CountWithTheSwitchOn()
+{
+    hearth::debug::DebugDatabase::Instance().SetEntry("VX.DecanonicalizeImmediatelyR", "1");
+    const SceneKinds scene;
+    const auto made = TestKinds::Make("node");
+    auto* const node = made->GetAsNamedGroup();
+    int answer = 0;
+    auto count = [&answer](KFS_Stream*) { answer += 10; };
+    node->ForEachNonCanonicalLeafStream(count, nullptr);
+    const Q_ScAutoPtr<KFS_StreamBase> left(node->SwapCanonicalForStream(Name("opacity")));
+    KFS_StreamBase const* const now = node->GetEditableStreamNullOK(Name("opacity"));
+    return answer + (left && now && now != left.get() ? 1 : 0);
+}
+
+TEST_F(Factory, TheDevelopmentSwitchMakesEverythingRealAtOnce)
+{
+    testing::GTEST_FLAG(death_test_style) = "threadsafe";
+    EXPECT_EXIT(std::_Exit(CountWithTheSwitchOn()), testing::ExitedWithCode(51), "");
+}
+
+TEST_F(Factory, NoFailedAllocationLeavesAHalfRegisteredKind)
+{
+    struct Nothing {};
+    FailEveryAllocation([] { return std::make_unique<Nothing>(); },
+                        [&](Nothing&) { return factory.RegisterFactoryFunc(Name("blur"), LeafFunc(0.0), false), 0; },
+                        [&](Nothing&, int code, Q_MemoryCount const& before) {
+                            reports.Take();
+                            if (code != 0) {
+                                EXPECT_EQ(before, Q_MemoryLive(nullptr));
+                                EXPECT_EQ(nullptr, factory.GetCanonicalInstance(Name("blur")));
+                            }
+                            factory.UnregisterFactoryFunc_NullOK(Name("blur"), true);
+                        });
+    EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("blur")));
+}
+
+}  // namespace

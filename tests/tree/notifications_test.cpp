@@ -1,0 +1,452 @@
+#include "tests/support/notifications.h"
+
+#include "curves/floatkeys.h"
+#include "curves/spacetangents.h"
+#include "curves/tangents.h"
+#include "keystore/attributes.h"
+#include "keystore/keyflags.h"
+#include "tree/listener_private.h"
+
+#include <algorithm>
+#include <functional>
+#include <thread>
+
+namespace {
+
+class NotificationsTest : public SceneTest {
+protected:
+    // What each record says of the tree at its moment: the children of the group with `watched` among them as *, and
+    // whether the stream has a parent and is independent.
+    static std::string Look(KFS_StreamGroup* group, KFS_StreamBase const* stream)
+    {
+        if (!group) {
+            return {};
+        }
+        std::string text = " [";
+        for (unsigned int i = 0; i < group->GetNumStreams(); ++i) {
+            KFS_StreamBase const* const child = group->GetStream(i);
+            text += child == stream ? '*' : child->IsCanonical() ? 'c' : 'r';
+        }
+        return text + "]" + (stream->GetParent() ? " in" : " out") + (stream->IsIndependent() ? " independent" : "");
+    }
+};
+
+// A list of two opacities, a and b, with x outside; each edit begins anew.
+struct ListScene {
+    explicit ListScene(NotificationRecorder& recorder)
+    {
+        for (auto* const made : {&a, &b, &x}) {
+            *made = TestKinds::Make("opacity");
+        }
+        recorder.Label(a.get(), "a");
+        recorder.Label(b.get(), "b");
+        recorder.Label(x.get(), "x");
+        root.AppendStream(&a);
+        root.AppendStream(&b);
+        recorder.Take();
+    }
+    Q_ScAutoPtr<KFS_StreamBase> a, b, x;
+    TestRoot<TestIndexedGroup> root{"layers"};
+};
+
+TEST_F(NotificationsTest, OfAnIndexedGroupsEdits)
+{
+    struct Row {
+        const char* edit;
+        std::function<void(ListScene&)> act;
+        Notifications heard;
+    };
+    const Row rows[] = {
+        {"insert",
+         [](ListScene& s) { s.root.InsertStream(1, &s.x); },
+         {"before-insert layers x 1 [rr] out", "after-insert layers x 1 [r*r] in"}},
+        {"append",
+         [](ListScene& s) { s.root.AppendStream(&s.x); },
+         {"before-insert layers x 2 [rr] out", "after-insert layers x 2 [rr*] in"}},
+        {"insert an independent one",
+         [](ListScene& s) {
+             s.x->MakeIndependent(true);
+             s.root.InsertStream(0, &s.x);
+         },
+         {"before-insert layers x 0 [rr] out independent", "after-insert layers x 0 [*rr] in independent"}},
+        {"duplicate",
+         [](ListScene& s) { s.root.DuplicateStream(0); },
+         {"before-insert layers opacity 1 [rr] out", "after-insert layers opacity 1 [r*r] in"}},
+        {"swap: both tell of the one that comes",
+         [](ListScene& s) { delete s.root.SwapStream(1, &s.x); },
+         {"before-swap layers x 1 [rr] out", "after-swap layers x 1 [r*] in"}},
+        {"swap an independent one, which is tied in while the second is told",
+         [](ListScene& s) {
+             s.x->MakeIndependent(true);
+             delete s.root.SwapStream(1, &s.x);
+             EXPECT_TRUE(s.root.GetStream(1)->IsIndependent());
+         },
+         {"before-swap layers x 1 [rr] out independent", "flags x 65 1", "after-swap layers x 1 [r*] in",
+          "flags x 1 65"}},
+        {"remove: gone from the list when the second is told",
+         [](ListScene& s) { delete s.root.RemoveStream(0); },
+         {"before-remove layers a 0 [*r] in", "after-remove layers a 0 [r] out"}},
+        {"remove a child: still in the list when the second is told",
+         [](ListScene& s) {
+             const Q_ScAutoPtr<KFS_StreamBase> child(s.root.GetEditableStream(1u));
+             s.root.RemoveChild(child.get());
+         },
+         {"before-remove layers b 1 [r*] in", "after-remove layers b 1 [r*] out"}},
+        {"remove a stranger", [](ListScene& s) { s.root.RemoveChild(s.x.get()); }, {}},
+        {"reorder: the remove and the insert aren't heard",
+         [](ListScene& s) { s.root.ReorderStreams(0, 1); },
+         {"before-reorder layers a 0 1 [*r] in", "after-reorder layers a 0 1 [r*] in"}},
+        {"reorder on the spot",
+         [](ListScene& s) { s.root.ReorderStreams(1, 1); },
+         {"before-reorder layers b 1 1 [r*] in", "after-reorder layers b 1 1 [r*] in"}},
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(row.edit);
+        NotificationRecorder recorder;
+        ListScene scene(recorder);
+        recorder.look = Look;
+        row.act(scene);
+        recorder.look = {};
+        EXPECT_EQ(row.heard, recorder.Take());
+    }
+}
+
+// "opacity" and "rotation" of a node under a heard root. The children are sorted by match name, and removals tell the
+// sorted index.
+TEST_F(NotificationsTest, OfANamedGroupsEdits)
+{
+    std::vector<KFS_MatchName> sorted{Name("opacity"), Name("transform"), Name("position"), Name("rotation")};
+    std::sort(sorted.begin(), sorted.end());
+    const auto sortedIndex = [&](char const* name) {
+        return std::to_string(std::find(sorted.begin(), sorted.end(), Name(name)) - sorted.begin());
+    };
+    struct Row {
+        const char* edit;
+        std::function<void(KFS_NamedStreamGroup&, Q_ScAutoPtr<KFS_StreamBase>&)> act;
+        Notifications heard;
+    };
+    using Node = KFS_NamedStreamGroup;
+    using New = Q_ScAutoPtr<KFS_StreamBase>;
+    const std::string opacityAt = sortedIndex("opacity");
+    // "opacity" is real, at place 0 of [*ccr] or so: c canonical, r real, * the stream of the notification.
+    const Row rows[] = {
+        {"ask for a real one", [](Node& n, New&) { n.GetEditableStream(Name("opacity")); }, {}},
+        {"make one real: the second tells of the canonical one that left",
+         [](Node& n, New&) { n.GetEditableStream(Name("rotation")); },
+         {"before-swap node rotation 3 [rrcc] out", "after-swap node canonical 3 [rrcr] out"}},
+        {"swap: the second tells of the one that left",
+         [](Node& n, New& x) { delete n.SwapStream(&x); },
+         {"before-swap node x 0 [rrcc] out", "after-swap node old 0 [rrcc] out"}},
+        {"swap an independent one",
+         [](Node& n, New& x) {
+             x->MakeIndependent(true);
+             delete n.SwapStream(&x);
+             EXPECT_TRUE(n.GetStream(0)->IsIndependent());
+         },
+         {"before-swap node x 0 [rrcc] out independent", "flags x 65 1", "after-swap node old 0 [rrcc] out",
+          "flags x 1 65"}},
+        {"make it canonical",
+         [](Node& n, New&) { delete n.SwapCanonicalForStream(Name("opacity")); },
+         {"before-swap node opacity 0 [rrcc] out", "after-swap node old 0 [crcc] out"}},
+        {"make a canonical one canonical",
+         [](Node& n, New&) { delete n.SwapCanonicalForStream(Name("position")); },
+         {}},
+        {"remove a child: still there when the second is told",
+         [](Node& n, New&) {
+             const Q_ScAutoPtr<KFS_StreamBase> child(n.GetEditableStream(Name("opacity")));
+             n.RemoveChild(child.get());
+         },
+         {"before-remove node old " + opacityAt + " [*rcc] in", "after-remove node old " + opacityAt + " [*rcc] out"}},
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(row.edit);
+        NotificationRecorder recorder;
+        TestRoot<TestIndexedGroup> root("layers");
+        auto made = TestKinds::Make("node"), x = TestKinds::Make("opacity");
+        auto* const node = made->GetAsNamedGroup();
+        root.AppendStream(&made);
+        recorder.Label(node->GetEditableStream(Name("opacity")), "old");
+        recorder.Label(x.get(), "x");
+        recorder.Label(Canonical("rotation"), "canonical");
+        recorder.Take();
+        recorder.look = Look;
+        row.act(*node, x);
+        recorder.look = {};
+        EXPECT_EQ(row.heard, recorder.Take());
+    }
+}
+
+TEST_F(NotificationsTest, OfAGroupsEnd)
+{
+    NotificationRecorder recorder;
+    TestRoot<TestIndexedGroup> root("layers");
+    auto list = TestKinds::Make("layers"), node = TestKinds::Make("node"), a = TestKinds::Make("opacity"),
+         b = TestKinds::Make("opacity");
+    recorder.Label(list.get(), "list");
+    recorder.Label(a.get(), "a");
+    recorder.Label(b.get(), "b");
+    auto* const group = list->GetAsIndexedGroup();
+    root.AppendStream(&list);
+    group->AppendStream(&a);
+    group->AppendStream(&b);
+    group->AppendStream(&node);
+    auto* const nodeGroup = group->GetEditableStream(2u)->GetAsNamedGroup();
+    KFS_StreamBase* const position = nodeGroup->GetEditableStream(Name("position"));
+    position->ProbeListenerState();
+    group->GetEditableStream(1u)->ProbeListenerState();
+    recorder.Take();
+    delete root.RemoveStream(0);
+    std::vector<KFS_MatchName> sorted{Name("opacity"), Name("transform"), Name("position"), Name("rotation")};
+    std::sort(sorted.begin(), sorted.end());
+    const auto removal = [&](char const* name) {
+        const auto at = std::find(sorted.begin(), sorted.end(), Name(name)) - sorted.begin();
+        const std::string child = std::string(" node ") + name + " " + std::to_string(at);
+        return Notifications{"before-remove" + child, "after-remove" + child};
+    };
+    // From the last child to the first; in the named group in sorted order. Only streams that were heard before tell of
+    // their end.
+    Notifications expected{"before-remove layers list 0", "after-remove layers list 0", "before-remove list node 2",
+                           "after-remove list node 2"};
+    for (KFS_MatchName const& name : sorted) {
+        for (char const* const real : {"transform", "position"}) {
+            if (name == Name(real)) {
+                const Notifications lines = removal(real);
+                expected.insert(expected.end(), lines.begin(), lines.end());
+                if (name == Name("position")) {
+                    expected.push_back("destroyed position");
+                }
+            }
+        }
+    }
+    expected.insert(expected.end(), {"destroyed node", "before-remove list b 1", "after-remove list b 1", "destroyed b",
+                                     "before-remove list a 0", "after-remove list a 0", "destroyed list"});
+    EXPECT_EQ(expected, recorder.Take());
+}
+
+// Every edit of a leaf: heard once, at its end, if it changed the stream, and not at all where it was refused.
+TEST_F(NotificationsTest, OfEditsOfALeaf)
+{
+    struct Row {
+        const char* edit;
+        std::function<int(KFS_Stream*)> act;
+        Notifications heard;
+        bool spatial = false;
+    };
+    static const T_Time at{150, 600}, last{300, 600};
+    static const double value[3] = {7.0, 8.0, 9.0}, half[3] = {0.5, 0.5, 0.5};
+    const Notifications once{"value leaf"};
+    const Row rows[] = {
+        {"insert a key", [](KFS_Stream* s) { return KFS_InsertKeyF(s, &at, 0, value, 0, 0); }, once},
+        {"replace a key", [](KFS_Stream* s) { return KFS_InsertKeyF(s, &last, 1, value, 0, 0); }, {"value leaf"}},
+        {"set a key", [](KFS_Stream* s) { return KFS_SetKeyF(s, 0, value, 0, 0); }, once},
+        {"remove a key", [](KFS_Stream* s) { return KFS_RemoveKey(s, 0, nullptr); }, once},
+        {"move a key: it leaves, it comes, it has moved",
+         [](KFS_Stream* s) { return KFS_SetKeyTime(s, 1, &at, 0, nullptr, nullptr); },
+         {"value leaf", "value leaf", "value leaf"}},
+        {"move an end key, whose free side is reset",
+         [](KFS_Stream* s) { return KFS_SetKeyTime(s, 0, &at, 0, nullptr, nullptr); },
+         {"value leaf", "value leaf", "value leaf", "value leaf"}},
+        {"move a key to where it is", [](KFS_Stream* s) { return KFS_SetKeyTime(s, 1, &last, 0, nullptr, nullptr); },
+         once},
+        {"key flags",
+         [](KFS_Stream* s) { return KFS_SetKeyFlags(s, 0, KFS_KeyFlag_Modifiable, KFS_KeyFlag_Modifiable); }, once},
+        {"velocity", [](KFS_Stream* s) { return KFS_SetKeyVelocityF(s, 0, value, value); }, once},
+        {"influence", [](KFS_Stream* s) { return KFS_SetKeyInfluence(s, 0, half, half); }, once},
+        {"graph tangents", [](KFS_Stream* s) { return KFS_SetKeyTangentsF(s, 0, half, half, half, half, 1.0); }, once},
+        {"multiplier", [](KFS_Stream* s) { return KFS_SetStreamMultiplier(s, value, nullptr); }, once, true},
+        {"multiplier, asked for only",
+         [](KFS_Stream* s) {
+             double old[4];
+             return KFS_SetStreamMultiplier(s, nullptr, old);
+         },
+         {},
+         true},
+        {"to a constant", [](KFS_Stream* s) { return s->SetConstant(1, 0); }, once},
+        {"to keys, which it has", [](KFS_Stream* s) { return s->SetConstant(0, 0); }, {}},
+        {"display name", [](KFS_Stream* s) { return s->SetDisplayName(Q_MBToUTF16String("n")), 0; }, {"name leaf"}},
+        {"display name without telling",
+         [](KFS_Stream* s) { return s->pSetDisplayName(Q_MBToUTF16String("n")), 0; },
+         {}},
+        {"flags", [](KFS_Stream* s) { return s->SetHidden(true), 0; }, {"flags leaf 1 3"}},
+        {"flags that are so already", [](KFS_Stream* s) { return s->SetActive(true), 0; }, {}},
+        {"flags under no mask", [](KFS_Stream* s) { return s->SetStreamBaseFlags(0xFFFFFFFF, 0), 0; }, {}},
+        {"the canonical bit, there and back",
+         [](KFS_Stream* s) { return s->SetCanonical(true), s->SetCanonical(false), 0; },
+         {}},
+        {"space tangents", [](KFS_Stream* s) { return KFS_SetKeySpaceTangentsF(s, 0, 0, value, value); }, once, true},
+        {"s-parametrize", [](KFS_Stream* s) { return KFS_SetStreamSParametrize(s, 1); }, once, true},
+        {"space tangents of what has none",
+         [](KFS_Stream* s) { return KFS_SetKeySpaceTangentsF(s, 0, 0, value, value); },
+         {}},
+        {"a key that isn't there", [](KFS_Stream* s) { return KFS_RemoveKey(s, 9, nullptr); }, {}},
+        {"a key in the way", [](KFS_Stream* s) { return KFS_InsertKeyF(s, &last, 0, value, 0, 0); }, {}},
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(row.edit);
+        NotificationRecorder recorder;
+        TestRoot<TestIndexedGroup> root("layers");
+        StreamOptions options;
+        options.dimension = row.spatial ? 2 : 1;
+        options.spatial = row.spatial;
+        TestStream leaf(options);
+        leaf->SetParent(&root);
+        recorder.Label(leaf, "leaf");
+        for (const int time : {0, 300, 600}) {
+            leaf.Key(time, {time / 100.0, 1.0}, KFS_Interp_Spline);
+        }
+        recorder.Take();
+        const int code = row.act(leaf);
+        EXPECT_EQ(row.heard, recorder.Take()) << "code " << code;
+        const std::vector<Reported> seen = reports.Take();
+        EXPECT_EQ(code == 0, seen.empty() && code == 0) << code;
+        EXPECT_TRUE(code == 0 || row.heard.empty()) << code;
+    }
+}
+
+TEST_F(NotificationsTest, AValueSetByAKeyIsThereWhenItIsTold)
+{
+    NotificationRecorder recorder;
+    TestRoot<TestNamedGroup> root("node");
+    auto* const opacity = static_cast<TestLeaf*>(root.GetEditableLeafStream(Name("opacity")));
+    std::vector<double> seen;
+    recorder.look = [&](KFS_StreamGroup*, KFS_StreamBase const*) {
+        seen.push_back(opacity->ValueAt(0));
+        return std::string();
+    };
+    const T_Time zero{0, 600};
+    const double value = 12.0;
+    ASSERT_EQ(0, KFS_InsertKeyF(opacity, &zero, 1, &value, 0, 0));
+    EXPECT_EQ((std::vector{12.0}), seen);
+    recorder.look = {};
+}
+
+TEST_F(NotificationsTest, OnlyAHeardTreeIsHeard)
+{
+    NotificationRecorder recorder;
+    auto made = TestKinds::Make("node");
+    auto* const node = made->GetAsNamedGroup();
+    node->GetEditableStream(Name("opacity"));
+    EXPECT_EQ(KFS_ListenerState_Unknown, node->GetListenerState()) << "without a root the answer stays open";
+    EXPECT_EQ(Notifications{}, recorder.Take());
+    auto* const canonical = Get_VX_StreamFactory()->GetCanonicalStream(Name("opacity"));
+    canonical->SetHidden(true);
+    canonical->SetHidden(false);
+    EXPECT_EQ(Notifications{}, recorder.Take()) << "a canonical stream is silent";
+    EXPECT_EQ(KFS_ListenerState_Silent, canonical->ProbeListenerState());
+
+    TestRoot<TestIndexedGroup> root("layers");
+    root.AppendStream(&made);
+    recorder.Take();
+    node->GetEditableStream(Name("rotation"));
+    EXPECT_EQ(2u, recorder.Take().size());
+    EXPECT_EQ(KFS_ListenerState_Heard, node->GetListenerState());
+}
+
+TEST_F(NotificationsTest, AThreadPausesForItselfOnly)
+{
+    NotificationRecorder recorder;
+    ListScene scene(recorder);
+    bool was = true, other = false;
+    EXPECT_EQ(0, KFS_PauseMainListener(true, was));
+    EXPECT_FALSE(was);
+    scene.root.ReorderStreams(0, 1);
+    scene.root.AppendStream(&scene.x);
+    EXPECT_EQ(Notifications{}, recorder.Take());
+    std::thread([&] {
+        bool inside = true;
+        EXPECT_EQ(0, KFS_PauseMainListener(false, inside));
+        EXPECT_FALSE(inside) << "a thread begins unpaused";
+        scene.root.ReorderStreams(0, 1);
+    }).join();
+    EXPECT_EQ(2u, recorder.Take().size()) << "that one did hear its edits";
+    EXPECT_EQ(0, KFS_PauseMainListener(was, other));
+    EXPECT_TRUE(other) << "the reorder left the pause that it found";
+    delete scene.root.RemoveStream(2);
+    EXPECT_EQ((Notifications{"before-remove layers x 2", "after-remove layers x 2"}), recorder.Take());
+}
+
+TEST_F(NotificationsTest, AListenerMayKeepToTheMainThread)
+{
+    NotificationRecorder anywhere, mainOnly;
+    mainOnly.mainThreadOnly = true;
+    ListScene scene(anywhere);
+    mainOnly.Take();
+    std::thread([&] { scene.root.ReorderStreams(0, 1); }).join();
+    EXPECT_EQ(2u, anywhere.Take().size());
+    EXPECT_EQ(Notifications{}, mainOnly.Take());
+    scene.root.ReorderStreams(0, 1);
+    EXPECT_EQ(2u, anywhere.Take().size());
+    EXPECT_EQ(2u, mainOnly.Take().size());
+}
+
+TEST_F(NotificationsTest, AListenerIsRegisteredOnce)
+{
+    NotificationRecorder recorder;
+    ListScene scene(recorder);
+    EXPECT_EQ(0, KFS_RegisterMainListener(&recorder));
+    scene.root.SetHidden(true);
+    EXPECT_EQ((Notifications{"flags layers 1 3"}), recorder.Take());
+    EXPECT_EQ(0, KFS_UnregisterMainListener(&recorder));
+    scene.root.SetHidden(false);
+    EXPECT_EQ(Notifications{}, recorder.Take());
+    EXPECT_EQ(0, KFS_UnregisterMainListener(&recorder)) << "an unknown one is passed over";
+}
+
+TEST_F(NotificationsTest, AnEmptyCallIsRefusedAtTheFirstListener)
+{
+    TestRoot<TestIndexedGroup> root("layers");
+    EXPECT_NO_THROW(KFS_NotifyListeners(&root, KFS_Notification())) << "nobody listens";
+    const NotificationRecorder recorder;
+    EXPECT_THROW(KFS_NotifyListeners(&root, KFS_Notification()), boost::bad_function_call);
+}
+
+TEST_F(NotificationsTest, AListenersFailureEndsTheEditAndTheOthersTurn)
+{
+    NotificationRecorder first, second;
+    NotificationRecorder& early = &first < &second ? first : second;
+    NotificationRecorder& late = &first < &second ? second : first;
+    TestRoot<TestNamedGroup> root("node");
+    early.look = [](KFS_StreamGroup*, KFS_StreamBase const*) -> std::string { throw int{77}; };
+    EXPECT_EQ(77, KFSp_Boundary([&] { root.GetEditableStream(Name("opacity")); }));
+    EXPECT_EQ(Notifications{}, late.Take());
+    EXPECT_EQ(Canonical("opacity"), root.GetStream(0)) << "nothing had changed before the first notification";
+    early.look = {};
+}
+
+// What is told, as a call that counts how often it is put into the form that listeners get.
+struct CountedCall {
+    explicit CountedCall(int& copies) : copies_(&copies) {}
+    CountedCall(CountedCall const& other) : copies_(other.copies_) { ++*copies_; }
+    void operator()(KFS_StreamListener*) const {}
+
+private:
+    int* copies_;
+};
+
+TEST_F(NotificationsTest, NothingIsPutTogetherForASilentTree)
+{
+    const NotificationRecorder recorder;
+    TestRoot<TestIndexedGroup> heard("layers");
+    const auto silent = MakeNode();
+    int copies = 0;
+    KFSp_Notify(silent.get(), CountedCall(copies));
+    EXPECT_EQ(0, copies);
+    KFSp_Notify(&heard, CountedCall(copies));
+    EXPECT_NE(0, copies);
+}
+
+TEST_F(NotificationsTest, EditsOfASilentTreeTakeNoMemory)
+{
+    const NotificationRecorder recorder;
+    const auto node = MakeNode();
+    auto* const opacity = node->GetEditableLeafStream(Name("opacity"));
+    Q_FailAllocation(1);
+    opacity->SetHidden(true);
+    opacity->NotifyValueChanged();
+    const Q_ScAutoPtr<KFS_StreamBase> left(node->SwapCanonicalForStream(Name("opacity")));
+    EXPECT_FALSE(Q_FailAllocationFired());
+    Q_FailAllocation(0);
+    EXPECT_EQ(opacity, left.get());
+}
+
+}  // namespace

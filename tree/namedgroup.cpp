@@ -1,0 +1,421 @@
+#include "tree/namedgroup.h"
+
+#include "frame/errors.h"
+#include "frame/statics_private.h"
+#include "keystore/stream.h"
+#include "tree/decanonicalize.h"
+#include "tree/factory.h"
+#include "tree/groupsupport_private.h"
+
+#include <algorithm>
+#include <utility>
+
+using hearth::threads::ScRecursiveLock;
+
+namespace {
+
+// The order of a named group's children.
+struct KFSp_StreamMatchNameCompare {
+    bool operator()(KFS_StreamBase const* a, KFS_StreamBase const* b) const
+    {
+        return a->GetMatchName() < b->GetMatchName();
+    }
+    bool operator()(KFS_StreamBase const* a, KFS_MatchName const& b) const { return a->GetMatchName() < b; }
+    bool operator()(KFS_MatchName const& a, KFS_StreamBase const* b) const { return a < b->GetMatchName(); }
+};
+
+KFS_CloneStreamParams constexpr WholeClone{true, true};
+
+}  // namespace
+
+KFS_NamedStreamGroup::KFS_NamedStreamGroup(KFS_MatchName const* name, KFS_StreamFactory* factory, bool canonical)
+    : KFS_StreamGroup(name, factory, canonical)
+{
+    try {
+        ResetAllStreamsToCanonical(true);
+    } catch (...) {
+        DeleteRealStreams();
+        throw;
+    }
+}
+
+KFS_NamedStreamGroup::KFS_NamedStreamGroup(KFS_NamedStreamGroup const& source, KFS_CloneStreamParams const& params)
+    : KFS_StreamGroup(source)
+{
+    source.EnsureUILayoutComplete();
+    try {
+        AddClonesOf(source.streams_, params);
+    } catch (...) {
+        DeleteRealStreams();
+        throw;
+    }
+    filledFrom_ = source.filledFrom_.load();
+}
+
+KFS_NamedStreamGroup::~KFS_NamedStreamGroup()
+{
+    try {
+        DestroyContents();
+    } catch (...) {
+        // A listener's failure; the children that it kept go now.
+        DeleteRealStreams();
+    }
+}
+
+bool KFS_NamedStreamGroup::IsNamedGroup() const
+{
+    return true;
+}
+
+KFS_NamedStreamGroup const* KFS_NamedStreamGroup::GetAsNamedGroup() const
+{
+    return this;
+}
+
+KFS_NamedStreamGroup* KFS_NamedStreamGroup::GetAsNamedGroup()
+{
+    return this;
+}
+
+// Render identity isn't computed yet.
+hearth::utility::Guid KFS_NamedStreamGroup::GetRenderGuid(KFS_RenderOptionsBase const&, GetRenderGuidFilter*) const
+{
+    return {};
+}
+
+unsigned int KFS_NamedStreamGroup::GetNumStreams() const
+{
+    return IsCanonical() && !IsComplete() ? 0 : static_cast<unsigned int>(streams_.size());
+}
+
+KFS_StreamBase* KFS_NamedStreamGroup::GetEditableStream(unsigned int index)
+{
+    return GetEditableStream(NameAt(index, GetNumStreams()));
+}
+
+KFS_StreamBase const* KFS_NamedStreamGroup::GetStream(unsigned int index) const
+{
+    return GetStream(NameAt(index, GetLayout() ? GetLayout()->size() : 0), true);
+}
+
+KFS_StreamBase* KFS_NamedStreamGroup::GetEditableStreamNullOK(unsigned int index)
+{
+    return const_cast<KFS_StreamBase*>(std::as_const(*this).GetEditableStreamNullOK(index));
+}
+
+KFS_StreamBase const* KFS_NamedStreamGroup::GetEditableStreamNullOK(unsigned int index) const
+{
+    return GetEditableStreamNullOK(NameAt(index, GetLayout() ? GetLayout()->size() : 0));
+}
+
+KFS_StreamBase const* KFS_NamedStreamGroup::GetStream(KFS_StreamID const& id) const
+{
+    if (id.GetIndex() == KFS_StreamID::NoIndex) {
+        return GetStream(id.GetMatchName(), true);
+    }
+    KFS_StreamBase const* const child = GetStream(id.GetIndex());
+    KFSp_ValidateMatchNames(id, child);
+    return child;
+}
+
+KFS_StreamBase* KFS_NamedStreamGroup::GetEditableStream(KFS_StreamID const& id)
+{
+    if (id.GetIndex() == KFS_StreamID::NoIndex) {
+        return GetEditableStream(id.GetMatchName());
+    }
+    KFS_StreamBase* const child = GetEditableStream(id.GetIndex());
+    KFSp_ValidateMatchNames(id, child);
+    return child;
+}
+
+KFS_StreamID KFS_NamedStreamGroup::SlowGetIDOfChild(KFS_StreamBase const* child) const
+{
+    return KFS_StreamID(child->GetMatchName());
+}
+
+bool KFS_NamedStreamGroup::RemoveChild(KFS_StreamBase* child)
+{
+    auto const found = std::find(streams_.begin(), streams_.end(), child);
+    if (found == streams_.end()) {
+        return false;
+    }
+    auto const index = static_cast<unsigned int>(found - streams_.begin());
+    KFSp_NotifyOfChild(&KFS_StreamListener::StreamAboutToBeRemoved, this, child, index);
+    child->SetParent(nullptr);
+    KFSp_NotifyOfChild(&KFS_StreamListener::StreamRemoved, this, child, index);
+    filledFrom_ = nullptr;
+    streams_.erase(streams_.begin() + index);
+    return true;
+}
+
+KFS_StreamBase* KFS_NamedStreamGroup::GetEditableStream(KFS_MatchName const& name)
+{
+    KFS_StreamBase* const child = *LookupStream(name, true);
+    if (!child->IsCanonical()) {
+        return child;
+    }
+    Q_ScAutoPtr<KFS_StreamBase> created(GetFactory()->CreateStream(name, true, 600, true, false));
+    KFS_StreamBase* const stream = created.get();
+    if (!stream) {
+        throw int{KFS_Err_UnknownStream};
+    }
+    SwapStream(&created);
+    if (KFS_Stream* const leaf = stream->GetAsLeaf(); leaf && leaf->NeedsResetAfterStored()) {
+        leaf->InsertDefaultKey(T_Time{0, 1});
+    }
+    return stream;
+}
+
+KFS_StreamBase* KFS_NamedStreamGroup::GetEditableStreamNullOK(KFS_MatchName const& name)
+{
+    return const_cast<KFS_StreamBase*>(std::as_const(*this).GetEditableStreamNullOK(name));
+}
+
+KFS_StreamBase const* KFS_NamedStreamGroup::GetEditableStreamNullOK(KFS_MatchName const& name) const
+{
+    KFS_StreamBase const* const child = *LookupStream(name, true);
+    return child->IsCanonical() ? nullptr : child;
+}
+
+KFS_StreamBase const* KFS_NamedStreamGroup::GetStream(KFS_MatchName const& name, bool mustExist) const
+{
+    auto const found = LookupStream(name, mustExist);
+    return found == streams_.end() ? nullptr : *found;
+}
+
+KFS_Stream* KFS_NamedStreamGroup::GetEditableLeafStream(KFS_MatchName const& name)
+{
+    return GetEditableStream(name)->GetAsLeaf();
+}
+
+KFS_Stream* KFS_NamedStreamGroup::GetEditableLeafStreamNullOK(KFS_MatchName const& name)
+{
+    KFS_StreamBase* const child = GetEditableStreamNullOK(name);
+    return child ? child->GetAsLeaf() : nullptr;
+}
+
+KFS_Stream const* KFS_NamedStreamGroup::GetLeafStream(KFS_MatchName const& name) const
+{
+    return GetStream(name, true)->GetAsLeaf();
+}
+
+KFS_StreamBase* KFS_NamedStreamGroup::SwapStream(Q_ScAutoPtr<KFS_StreamBase>* stream)
+{
+    if (!GetLayout()) {
+        return nullptr;
+    }
+    KFS_StreamBase* const incoming = stream->get();
+    KFS_MatchName const& name = incoming->GetMatchName();
+    if (!CanStore(name)) {
+        KFSp_FailVerification("invalid name for storing in this named group");
+    }
+    auto const slot = LookupStream(name, true);
+    unsigned int const index = GetIndexInUILayout(name);
+    KFSp_NotifyOfChild(&KFS_StreamListener::StreamAboutToBeSwapped, this, incoming, index);
+    KFS_StreamBase* const outgoing = std::exchange(*slot, stream->release());
+    // Whatever throws from here on, the group has the stream that came, and the one that left must not be lost.
+    Q_ScAutoPtr<KFS_StreamBase> leaving(outgoing->IsCanonical() ? nullptr : outgoing);
+    if (!incoming->IsCanonical()) {
+        incoming->SetParent(this);
+    }
+    if (outgoing->GetParent()) {
+        outgoing->SetParent(nullptr);
+    }
+    {
+        KFS_ScSetResetIndependent const tiedIn(incoming, false);
+        KFSp_NotifyOfChild(&KFS_StreamListener::StreamSwapped, this, outgoing, index);
+    }
+    return leaving.release();
+}
+
+KFS_StreamBase* KFS_NamedStreamGroup::SwapCanonicalForStream(KFS_MatchName const& name)
+{
+    if ((*LookupStream(name, true))->IsCanonical()) {
+        return nullptr;
+    }
+    KFS_StreamBase* const canonical = GetFactory()->GetCanonicalStream(name);
+    if (!canonical) {
+        KFSp_FailVerification("unexpected match name searched for in group");
+    }
+    Q_ScAutoPtr<KFS_StreamBase> incoming(canonical);
+    Q_ScAutoPtr<KFS_StreamBase> leaving;
+    try {
+        leaving.reset(SwapStream(&incoming));
+    } catch (...) {
+        static_cast<void>(incoming.release());  // the factory's
+        throw;
+    }
+    if (KFS_ShouldAlwaysDecanonicalize()) {
+        GetEditableStream(name);
+    }
+    return leaving.release();
+}
+
+bool KFS_NamedStreamGroup::IsModifiedByName(KFS_MatchName const& name) const
+{
+    return GetStream(name, true)->IsModified();
+}
+
+bool KFS_NamedStreamGroup::UserCanHideAndShowChildren(KFS_MatchName const&) const
+{
+    return false;
+}
+
+void KFS_NamedStreamGroup::ResetAllStreamsToCanonical(bool force)
+{
+    if (IsCanonical() && !force) {
+        return;
+    }
+    DestroyContents();
+    SetLayout(GetCanonicalLayout(GetMatchName()));
+    FillInStreamsFromCanonicalLayout();
+}
+
+void KFS_NamedStreamGroup::FillInStreamsFromCanonicalLayout()
+{
+    if (!GetLayout()) {
+        return;
+    }
+    DestroyContents();
+    KFS_CanonicalLayout const& layout = *GetLayout();
+    if (IsCanonical()) {
+        for (KFS_StreamBase const* const child : layout) {
+            streams_.push_back(const_cast<KFS_StreamBase*>(child));
+        }
+    } else {
+        AddRealStreams();
+    }
+    std::sort(streams_.begin(), streams_.end(), KFSp_StreamMatchNameCompare());
+    filledFrom_.store(&layout, std::memory_order_release);
+}
+
+// A slot that is a group holds a clone of the canonical group, whose own children are canonical.
+void KFS_NamedStreamGroup::AddRealStreams()
+{
+    streams_.reserve(GetLayout()->size());
+    for (KFS_StreamBase const* const child : *GetLayout()) {
+        if (!child->IsGroup()) {
+            streams_.push_back(const_cast<KFS_StreamBase*>(child));
+            continue;
+        }
+        KFS_StreamBase* const clone = child->CloneStream(WholeClone);
+        clone->SetCanonical(false);
+        streams_.push_back(clone);
+        clone->SetParent(this);
+    }
+}
+
+void KFS_NamedStreamGroup::AddClonesOf(Streams const& source, KFS_CloneStreamParams const& params)
+{
+    streams_.reserve(source.size());
+    for (KFS_StreamBase* const child : source) {
+        if (child->IsCanonical()) {
+            streams_.push_back(child);
+            continue;
+        }
+        streams_.push_back(child->CloneStream(params));
+        pSetParent(streams_.back(), this);
+    }
+}
+
+bool KFS_NamedStreamGroup::IsComplete() const
+{
+    KFS_CanonicalLayout const* const filledFrom = filledFrom_.load(std::memory_order_acquire);
+    return filledFrom && filledFrom == GetLayout().get();
+}
+
+void KFS_NamedStreamGroup::EnsureUILayoutComplete() const
+{
+    if (!IsCanonical() || !GetLayout() || IsComplete()) {
+        return;
+    }
+    ScRecursiveLock const guard(KFSp_GetCanonicalLock());
+    if (!IsComplete()) {
+        const_cast<KFS_NamedStreamGroup*>(this)->FillInStreamsFromCanonicalLayout();
+    }
+}
+
+void KFS_NamedStreamGroup::CopyAcceptableStreams(KFS_NamedStreamGroup const& other)
+{
+    for (KFS_StreamBase const* const child : other.streams_) {
+        if (child->IsCanonical() || Find(child->GetMatchName()) == streams_.end()) {
+            continue;
+        }
+        Q_ScAutoPtr<KFS_StreamBase> clone(child->CloneStream(WholeClone));
+        Q_ScAutoPtr<KFS_StreamBase> const replaced(SwapStream(&clone));
+    }
+}
+
+void KFS_NamedStreamGroup::DestroyContents()
+{
+    filledFrom_ = nullptr;
+    if (IsCanonical()) {
+        streams_.clear();  // all are the factory's, and may be gone before this group
+        return;
+    }
+    for (unsigned int i = 0; i < streams_.size(); ++i) {
+        KFS_StreamBase* const child = streams_[i];
+        if (child->IsCanonical()) {
+            continue;
+        }
+        KFSp_NotifyOfChild(&KFS_StreamListener::StreamAboutToBeRemoved, this, child, i);
+        child->SetParent(nullptr);
+        KFSp_NotifyOfChild(&KFS_StreamListener::StreamRemoved, this, child, i);
+        // A listener of what is still to come may look at this group.
+        streams_[i] = const_cast<KFS_StreamBase*>((*GetLayout())[GetIndexInUILayout(child->GetMatchName())]);
+        delete child;
+    }
+    streams_.clear();
+}
+
+void KFS_NamedStreamGroup::DeleteRealStreams() noexcept
+{
+    if (!IsCanonical()) {
+        for (KFS_StreamBase* const child : streams_) {
+            if (!child->IsCanonical()) {
+                delete child;
+            }
+        }
+    }
+    streams_.clear();
+}
+
+KFS_NamedStreamGroup::Streams::const_iterator KFS_NamedStreamGroup::LookupStream(KFS_MatchName const& name,
+                                                                                 bool mustExist) const
+{
+    EnsureUILayoutComplete();
+    auto const found = Find(name);
+    if (found == streams_.end()) {
+        if (mustExist) {
+            KFSp_FailVerification("unexpected match name searched for in group");
+        }
+        return found;
+    }
+    if ((*found)->IsCanonical()) {
+        if (KFS_NamedStreamGroup const* const group = std::as_const(**found).GetAsNamedGroup()) {
+            group->EnsureUILayoutComplete();
+        }
+    }
+    return found;
+}
+
+// The children of a real group are complete.
+KFS_NamedStreamGroup::Streams::iterator KFS_NamedStreamGroup::LookupStream(KFS_MatchName const& name, bool mustExist)
+{
+    auto const found = std::as_const(*this).LookupStream(name, mustExist);
+    return streams_.begin() + (found - streams_.cbegin());
+}
+
+KFS_NamedStreamGroup::Streams::const_iterator KFS_NamedStreamGroup::Find(KFS_MatchName const& name) const
+{
+    auto const [first, last] = std::equal_range(streams_.begin(), streams_.end(), name, KFSp_StreamMatchNameCompare());
+    return first == last ? streams_.end() : first;
+}
+
+KFS_MatchName const& KFS_NamedStreamGroup::NameAt(unsigned int index, std::size_t count) const
+{
+    if (index >= count) {
+        KFSp_FailVerification("invalid index in named group");
+    }
+    return (*GetLayout())[index]->GetMatchName();
+}
