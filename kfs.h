@@ -33,3 +33,5 @@
 #include "tree/paramstreams.h"
 #include "tree/streambase.h"
 #include "tree/streamgroup.h"
+#include "tree/streamid.h"
+#include "tree/streampath.h"

@@ -1,8 +1,8 @@
 // Inserting keys, and the read that repairs what one edit left stale.
 
+#include "keystore/edit.h"
 #include "frame/services/memory.h"
 #include "host/session.h"
-#include "keystore/edit.h"
 #include "keystore/evaluate.h"
 
 #include <benchmark/benchmark.h>
@@ -18,7 +18,7 @@ constexpr unsigned int Scale = 600;
 
 struct Record {
     int time;
-    double numbers[5];     // 48 bytes in all: the size of a one-dimensional key
+    double numbers[5];  // 48 bytes in all: the size of a one-dimensional key
 };
 
 kfshost::Session& Library()
@@ -59,14 +59,16 @@ std::unique_ptr<KFS_Stream> MakeStream(std::vector<int> const& times, char inter
 
 std::vector<int> TimesFor(benchmark::State const& state)
 {
-    return state.range(1) ? TimesAtRandom(static_cast<int>(state.range(0))) : TimesInOrder(static_cast<int>(state.range(0)));
+    return state.range(1) ? TimesAtRandom(static_cast<int>(state.range(0)))
+                          : TimesInOrder(static_cast<int>(state.range(0)));
 }
 
 // Per key: the whole time over the number of keys stands in `ns_a_key`.
 void PerKey(benchmark::State& state)
 {
-    state.counters["ns_a_key"] = benchmark::Counter(static_cast<double>(state.range(0)) * 1e-9,
-                                                    benchmark::Counter::kIsIterationInvariantRate | benchmark::Counter::kInvert);
+    state.counters["ns_a_key"] =
+        benchmark::Counter(static_cast<double>(state.range(0)) * 1e-9,
+                           benchmark::Counter::kIsIterationInvariantRate | benchmark::Counter::kInvert);
 }
 
 void InsertOurs(benchmark::State& state)
@@ -99,11 +101,17 @@ void InsertYardstick(benchmark::State& state)
     }
     PerKey(state);
 }
-BENCHMARK(InsertOurs)->Name("insert_keys/ours")->ArgNames({"keys", "random"})->ArgsProduct({{1000, 10000, 30000}, {0, 1}});
-BENCHMARK(InsertYardstick)->Name("insert_keys/yardstick")->ArgNames({"keys", "random"})->ArgsProduct({{1000, 10000, 30000}, {0, 1}});
+BENCHMARK(InsertOurs)
+    ->Name("insert_keys/ours")
+    ->ArgNames({"keys", "random"})
+    ->ArgsProduct({{1000, 10000, 30000}, {0, 1}});
+BENCHMARK(InsertYardstick)
+    ->Name("insert_keys/yardstick")
+    ->ArgNames({"keys", "random"})
+    ->ArgsProduct({{1000, 10000, 30000}, {0, 1}});
 
-// One edit in the middle and the read beside it, which repairs the neighbourhood. The yardstick is the same on a stream of ten keys:
-// the cost must not grow with the number of keys.
+// One edit in the middle and the read beside it, which repairs the neighbourhood. The yardstick is the same on a stream
+// of ten keys: the cost must not grow with the number of keys.
 void EditAndRead(benchmark::State& state, int keys)
 {
     std::unique_ptr<KFS_Stream> const stream = MakeStream(TimesInOrder(keys), KFS_Interp_Spline);
@@ -129,4 +137,4 @@ void EditAndReadYardstick(benchmark::State& state)
 BENCHMARK(EditAndReadOurs)->Name("edit_then_read/ours")->Arg(1000)->Arg(10000)->Arg(30000);
 BENCHMARK(EditAndReadYardstick)->Name("edit_then_read/yardstick")->Arg(1000)->Arg(10000)->Arg(30000);
 
-} // namespace
+}  // namespace

@@ -1,10 +1,10 @@
 // Reads of plain streams through the public door, beside a bare search and a bare solve over the same segments.
 
+#include "curves/tangents.h"
 #include "frame/services/curvekernel.h"
 #include "host/session.h"
 #include "keystore/edit.h"
 #include "keystore/evaluate.h"
-#include "curves/tangents.h"
 
 #include <benchmark/benchmark.h>
 
@@ -40,7 +40,8 @@ struct Fixture {
         Library();
         KFS_ValueDesc desc;
         desc.dataType = KFS_Type_Double;
-        stream = std::make_unique<KFS_Stream>(dimension, Scale, 0, 0, KFS_InterpMask_All, 0, desc, nullptr, nullptr, false);
+        stream =
+            std::make_unique<KFS_Stream>(dimension, Scale, 0, 0, KFS_InterpMask_All, 0, desc, nullptr, nullptr, false);
         std::mt19937 random(42);
         std::uniform_real_distribution<double> value(-100.0, 100.0), influence(0.0, 1.0), speed(-300.0, 300.0);
         std::vector<double> v(static_cast<std::size_t>(dimension)), in(v), out(v), inInf(v), outInf(v);
@@ -76,7 +77,8 @@ struct Fixture {
         std::vector<int> asked;
         int const span = (count - 1) * Gap;
         for (int i = 0; i < Asked; ++i) {
-            int const time = order == Order::Random ? static_cast<int>(random() % static_cast<unsigned>(span)) : i * 25 % span;
+            int const time =
+                order == Order::Random ? static_cast<int>(random() % static_cast<unsigned>(span)) : i * 25 % span;
             asked.push_back(time % Gap == 0 ? time + 1 : time);
         }
         return asked;
@@ -90,7 +92,7 @@ struct Fixture {
 
 Fixture const& Get(int keys, short dimension, char interp)
 {
-    Library();      // outlives the streams
+    Library();  // outlives the streams
     static std::map<std::tuple<int, short, char>, std::unique_ptr<Fixture>> made;
     std::unique_ptr<Fixture>& fixture = made[{keys, dimension, interp}];
     if (!fixture) {
@@ -134,7 +136,8 @@ void Bare(benchmark::State& state, Fixture const& fixture, Order order, Solve&& 
         int const time = asked[i++ % Asked];
         int const next = Search(fixture.times, time);
         double value = 0.0;
-        solve(fixture, next - 1, static_cast<double>(time - fixture.times[static_cast<std::size_t>(next - 1)]) / Scale, &value);
+        solve(fixture, next - 1, static_cast<double>(time - fixture.times[static_cast<std::size_t>(next - 1)]) / Scale,
+              &value);
         benchmark::DoNotOptimize(value);
     }
 }
@@ -274,4 +277,4 @@ void ExternalYardstick(benchmark::State& state)
 BENCHMARK(ExternalOurs)->Name("read_external_form/ours");
 BENCHMARK(ExternalYardstick)->Name("read_external_form/yardstick");
 
-} // namespace
+}  // namespace

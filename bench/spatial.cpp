@@ -1,9 +1,10 @@
-// Points that move along paths: reads beside a bare search, speed-graph solve and table lookup; the repair after an edit; a drag.
+// Points that move along paths: reads beside a bare search, speed-graph solve and table lookup; the repair after an
+// edit; a drag.
 
+#include "curves/spacetangents.h"
 #include "frame/services/curvekernel.h"
 #include "frame/services/sequence.h"
 #include "host/session.h"
-#include "curves/spacetangents.h"
 #include "keystore/edit.h"
 #include "keystore/evaluate.h"
 
@@ -32,8 +33,8 @@ std::unique_ptr<KFS_Stream> MakePath(int keys, unsigned int seed)
     Library();
     KFS_ValueDesc desc;
     desc.dataType = KFS_Type_Double;
-    auto stream = std::make_unique<KFS_Stream>(Dimension, Scale, 0, 1, KFS_InterpMask_All, KFS_InterpMask_Negative, desc, nullptr,
-                                               nullptr, false);
+    auto stream = std::make_unique<KFS_Stream>(Dimension, Scale, 0, 1, KFS_InterpMask_All, KFS_InterpMask_Negative,
+                                               desc, nullptr, nullptr, false);
     std::mt19937 random(seed);
     std::uniform_real_distribution<double> step(-50.0, 50.0);
     double point[Dimension] = {};
@@ -116,7 +117,7 @@ struct Fixture {
 
 Fixture& Get(int keys)
 {
-    Library();      // outlives the streams
+    Library();  // outlives the streams
     static std::map<int, std::unique_ptr<Fixture>> made;
     std::unique_ptr<Fixture>& fixture = made[keys];
     if (!fixture) {
@@ -184,8 +185,8 @@ void ReadYardstick(benchmark::State& state)
 BENCHMARK(ReadOurs)->Name("read_path_random/ours")->Arg(8)->Arg(1000)->Arg(30000);
 BENCHMARK(ReadYardstick)->Name("read_path_random/yardstick")->Arg(8)->Arg(1000)->Arg(30000);
 
-// A value moved in the middle and the read beside it, which measures the arcs anew. The yardstick has ten keys: the cost must not grow
-// with their number.
+// A value moved in the middle and the read beside it, which measures the arcs anew. The yardstick has ten keys: the
+// cost must not grow with their number.
 void EditAndRead(benchmark::State& state, int keys)
 {
     std::unique_ptr<KFS_Stream> const stream = MakePath(keys, 3);
@@ -210,8 +211,8 @@ void EditYardstick(benchmark::State& state)
 BENCHMARK(EditOurs)->Name("edit_path_then_read/ours")->Arg(1000)->Arg(30000);
 BENCHMARK(EditYardstick)->Name("edit_path_then_read/yardstick")->Arg(1000)->Arg(30000);
 
-// One step of a drag: a tangent set, and a hundred points read along the two arcs that it bends. A thousand paths at 60 a second leave
-// 16,667 ns a step on one core; `of_a_core` is the share of it that a thousand such paths take.
+// One step of a drag: a tangent set, and a hundred points read along the two arcs that it bends. A thousand paths at 60
+// a second leave 16,667 ns a step on one core; `of_a_core` is the share of it that a thousand such paths take.
 void Drag(benchmark::State& state)
 {
     std::unique_ptr<KFS_Stream> const stream = MakePath(20, 5);
@@ -230,4 +231,4 @@ void Drag(benchmark::State& state)
 }
 BENCHMARK(Drag)->Name("drag_and_read_100/ours");
 
-} // namespace
+}  // namespace

@@ -4,7 +4,8 @@
 
 #include <string>
 
-// The commands of kfs. All of them throw UserError, kfshost::ImportError and kfshost::StoreError, and write nothing then.
+// The commands of kfs. All of them throw UserError, kfshost::ImportError and kfshost::StoreError, and write nothing
+// then.
 
 struct InfoOptions {
     Selection selection;

@@ -115,8 +115,8 @@ private:
         }
     }
 
-    // The speed in the middle of a piece is the slope across it; at the segment's ends that of the outermost pieces stands
-    // for the limit.
+    // The speed in the middle of a piece is the slope across it; at the segment's ends that of the outermost pieces
+    // stands for the limit.
     void AddPieces(int start, int end, std::int64_t pieces)
     {
         std::int64_t const length = std::int64_t{end} - start;

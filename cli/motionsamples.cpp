@@ -115,8 +115,8 @@ private:
         return route;
     }
 
-    // The speed in the middle of a piece is the way across it by its time; the outermost pieces stand for the limits at the
-    // segment's ends.
+    // The speed in the middle of a piece is the way across it by its time; the outermost pieces stand for the limits at
+    // the segment's ends.
     void AddSpeed(std::int64_t pieces)
     {
         unsigned int const scale = stream_.GetTimeScale();

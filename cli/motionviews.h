@@ -43,7 +43,7 @@ struct Extents {
     Place high;
 };
 
-// The view that shows most, or three where the motion makes notable use of all of space: from the front, beside it from the
-// side and below it from above, each the way it is folded over. `top` is where captions begin. Throws UserError for numbers
-// that are too large.
+// The view that shows most, or three where the motion makes notable use of all of space: from the front, beside it from
+// the side and below it from above, each the way it is folded over. `top` is where captions begin. Throws UserError for
+// numbers that are too large.
 MotionLayout LayOutViews(Extents const& extents, double top);

@@ -6,8 +6,8 @@
 #include <type_traits>
 #include <utility>
 
-// The one door between throw and code. Runs the callable; an `int` that it throws is the result, a std::exception goes to
-// Q_TranslateAndReportException, anything else propagates. A callable without a result answers 0.
+// The one door between throw and code. Runs the callable; an `int` that it throws is the result, a std::exception goes
+// to Q_TranslateAndReportException, anything else propagates. A callable without a result answers 0.
 template <class Body>
 int KFSp_Boundary(Body&& body)
 {

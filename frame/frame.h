@@ -11,22 +11,23 @@ class KFS_RenderOptionsBase;
 class KFS_StreamFactory;
 class KFS_StreamIDPath;
 
-// What the library asks of its application. An entry is called without a look whether it is null: the host sets all those that its
-// streams need before it uses them.
+// What the library asks of its application. An entry is called without a look whether it is null: the host sets all
+// those that its streams need before it uses them.
 struct KFS_AppCallbacks {
     // An old file stored a type number in place of a path: fills the path in. If null, the path stays as read.
     void (*oldPathFixupFunc)(int oldType, KFS_StreamIDPath* path) = nullptr;
     int (*layerDefaultValueFunc)(KFS_ParamLayerStream const* stream) = nullptr;
     long (*layerIndependentFunc)(KFS_ParamLayerStream const* stream, bool independent) = nullptr;
-    hearth::utility::Guid (*layerRenderGuidFunc)(KFS_ParamLayerStream const* stream, KFS_RenderOptionsBase const& options,
+    hearth::utility::Guid (*layerRenderGuidFunc)(KFS_ParamLayerStream const* stream,
+                                                 KFS_RenderOptionsBase const& options,
                                                  GetRenderGuidFilter* filter) = nullptr;
     int (*pathIndependentFunc)(KFS_ParamPathStream const* stream, bool independent) = nullptr;
     hearth::utility::Guid (*pathRenderGuidFunc)(KFS_ParamPathStream const* stream, KFS_RenderOptionsBase const& options,
                                                 GetRenderGuidFilter* filter) = nullptr;
 };
 
-// Bracket all use of the library: make and destroy the default stream factory and what the tree shares. On the main thread. 0 or an error
-// code; a failed Birth is followed by Death as well.
+// Bracket all use of the library: make and destroy the default stream factory and what the tree shares. On the main
+// thread. 0 or an error code; a failed Birth is followed by Death as well.
 KFS_API int KFS_Birth();
 KFS_API int KFS_Death();
 

@@ -83,7 +83,8 @@ Q_ZRow const MessageRows[] = {
     {"$$$/VX/KFS/LStr/0074=time is before first keyframe or after last"},
     {"$$$/VX/KFS/LStr/0075=compute derivative to a non-spatial"},
     {"$$$/VX/KFS/LStr/0076=set multiplier of"},
-    {"$$$/VX/KFS/LStr/0077=Some interpolated values may be incorrect in this project due to nearly overlapping keyframes."},
+    {"$$$/VX/KFS/LStr/0077=Some interpolated values may be incorrect in this project due to nearly overlapping "
+     "keyframes."},
     {"$$$/VX/KFS/LStr/0078=adaptive stream temporary data"},
     {"$$$/VX/KFS/LStr/0079=only 2d or 3d spatial streams are allowed for this operation."},
     {"$$$/VX/KFS/LStr/0080=Expression info block"},
@@ -113,7 +114,7 @@ static_assert(std::size(MessageRows) == KFSp_RowCount + 1);
 Q_ZTable const MessageTable{"KFS", KFSp_RowCount + 1, MessageRows};
 Q_ZTable const* const MessageTablePointer = &MessageTable;
 
-} // namespace
+}  // namespace
 
 Q_ZTable const* const* const KFS_G_zref = &MessageTablePointer;
 

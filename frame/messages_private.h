@@ -2,8 +2,8 @@
 
 #include "frame/services/strings.h"
 
-// Rows of the message table, by what they say. Callers of KFSp_CheckStream and KFSp_ReportErr name the action with one of these; it
-// fills the `%s` of the error's own sentence.
+// Rows of the message table, by what they say. Callers of KFSp_CheckStream and KFSp_ReportErr name the action with one
+// of these; it fills the `%s` of the error's own sentence.
 enum KFSp_Row : short {
     KFSp_Row_Damaged = 0,
     KFSp_Row_UnknownError = 2,

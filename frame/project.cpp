@@ -114,15 +114,15 @@ void KFS_CapsuleOverrides::MergeInScopedCapsuleParamBag(Q_ScSetReset<KFS_ParamBa
 }
 
 KFS_DetectExpressionErrors::KFS_DetectExpressionErrors(KFS_ExpState const* state)
-    : state_(state), saved_(state->detectingErrors)
+    : state_(state),
+      saved_(state->detectingErrors)
 {
     state_->detectingErrors = true;
 }
 
 KFS_DetectExpressionErrors::KFS_DetectExpressionErrors(boost::shared_ptr<KFS_ExpState> const& state)
     : KFS_DetectExpressionErrors(state.get())
-{
-}
+{}
 
 KFS_DetectExpressionErrors::~KFS_DetectExpressionErrors()
 {

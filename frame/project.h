@@ -12,8 +12,8 @@ class KFS_ExpState;
 class KFS_ParamBag;
 class KFS_StreamBase;
 
-// The owner of a stream tree, subclassed by the host, with the two ideas of place that its code runs in: a context that says which
-// project it is, and a render context that carries named per-render states.
+// The owner of a stream tree, subclassed by the host, with the two ideas of place that its code runs in: a context that
+// says which project it is, and a render context that carries named per-render states.
 class KFS_API KFS_Project : public Q_MemTrackedObject {
 public:
     KFS_Project() = default;
@@ -25,7 +25,8 @@ public:
     void InitializeContexts();
     // The host's number.
     int GetProjectKind() const { return projectKind_; }
-    // With `useCurrent` the thread's current render context if there is one; else the project's own. Not owned by the caller.
+    // With `useCurrent` the thread's current render context if there is one; else the project's own. Not owned by the
+    // caller.
     Q_RenderContext* GetRenderContext(bool useCurrent) const;
     boost::shared_ptr<KFS_Context> const& GetContext() const { return context_; }
 
@@ -101,7 +102,8 @@ private:
     Q_ScAutoPtr<KFS_ParamBag> bag_;
 };
 
-// For a scope, expression errors are looked for rather than reported. Scopes nest; the end of the outermost clears the error count.
+// For a scope, expression errors are looked for rather than reported. Scopes nest; the end of the outermost clears the
+// error count.
 class KFS_API KFS_DetectExpressionErrors {
 public:
     explicit KFS_DetectExpressionErrors(KFS_ExpState const* state);

@@ -49,7 +49,7 @@ void FormatRow(short row, Value value)
 #pragma GCC diagnostic pop
 }
 
-} // namespace
+}  // namespace
 
 int KFSp_CheckStream(short operation, KFS_Stream const* stream, short messageIndex)
 {
@@ -64,7 +64,8 @@ int KFSp_ReportErr(int operation, int error, short argument)
     if (error == 0) {
         return 0;
     }
-    auto const row = std::find_if(ErrorRows.begin(), ErrorRows.end(), [error](ErrorRow const& r) { return r.code == error; });
+    auto const row =
+        std::find_if(ErrorRows.begin(), ErrorRows.end(), [error](ErrorRow const& r) { return r.code == error; });
     if (row != ErrorRows.end() && row->fill == Fill::Nothing) {
         return KFSp_ReportRow(operation, error, row->row);
     }

@@ -5,8 +5,8 @@
 
 class KFS_Stream;
 
-// Operation numbers: the low half of a report's id says which operation failed. They are part of the interface towards whoever
-// reads the reports; numbers that no operation uses are free.
+// Operation numbers: the low half of a report's id says which operation failed. They are part of the interface towards
+// whoever reads the reports; numbers that no operation uses are free.
 enum KFSp_Op : short {
     KFSp_Op_StreamDestroy = 4,
     KFSp_Op_StreamCopy = 5,
@@ -95,7 +95,8 @@ constexpr int KFSp_ReportId(int operation)
     return (operation & 0xFFFF) | 0x1D0000;
 }
 
-// 0 if the stream's validity stamp is right, else reports code 2 and returns it. Reads nothing of the stream but the stamp.
+// 0 if the stream's validity stamp is right, else reports code 2 and returns it. Reads nothing of the stream but the
+// stamp.
 int KFSp_CheckStream(short operation, KFS_Stream const* stream, short messageIndex);
 
 // Reports `error` and returns it; 0 reports nothing. `argument` is the row that fills the sentence's `%s`, or for

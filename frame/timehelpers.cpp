@@ -16,7 +16,7 @@ int ToScale(int code, unsigned int scale, T_Time* result)
     return converted;
 }
 
-} // namespace
+}  // namespace
 
 int KFS_AddTime(T_Time const* a, T_Time const* b, unsigned int scale, T_Time* result)
 {

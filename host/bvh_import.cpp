@@ -23,8 +23,8 @@ bool Fits(Rational const& last, unsigned int scale)
     return std::abs(last.ToUnits(scale)) <= MaxKeyUnits;
 }
 
-// A scale in which each multiple of the frame time is a whole number, fine enough to read between frames; without one that
-// fits, the finest power of two.
+// A scale in which each multiple of the frame time is a whole number, fine enough to read between frames; without one
+// that fits, the finest power of two.
 unsigned int ChooseScale(Rational const& frameTime, Rational const& last)
 {
     auto const isWhole = [&](unsigned int scale) { return scale % frameTime.Denominator() == 0; };

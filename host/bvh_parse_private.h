@@ -13,7 +13,8 @@ struct BvhJoint {
     std::vector<std::string> channels;  // "Xposition", "Zrotation" and so on, in the file's order
 };
 
-// A motion capture file: its joints in the order in which the file opens them, and a row of numbers a frame in that same order.
+// A motion capture file: its joints in the order in which the file opens them, and a row of numbers a frame in that
+// same order.
 struct BvhMotion {
     std::vector<BvhJoint> joints;
     std::size_t channelCount = 0;

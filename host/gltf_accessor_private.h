@@ -8,8 +8,8 @@
 
 namespace kfshost {
 
-// Reads the numbers of one accessor: plain or sparse, floats or normalised integers. What it says about itself is held against the
-// bytes that are there before anything is allocated. All of it throws ImportError.
+// Reads the numbers of one accessor: plain or sparse, floats or normalised integers. What it says about itself is held
+// against the bytes that are there before anything is allocated. All of it throws ImportError.
 class AccessorReader {
 public:
     // `index` is as the file has it; `place` is who asks.

@@ -145,8 +145,8 @@ std::string Lacking(std::size_t has, std::uint64_t wants)
 // All buffers' bytes by the names under which the reader is to ask for them.
 using BufferFiles = std::map<std::string, std::string>;
 
-// Puts where each buffer's bytes are at hand into the JSON, and leaves nothing for the reader to look for on the disk. The
-// bytes may be more than the buffer's, which then grows.
+// Puts where each buffer's bytes are at hand into the JSON, and leaves nothing for the reader to look for on the disk.
+// The bytes may be more than the buffer's, which then grows.
 void ResolveBuffer(json& buffer, std::string const& place, std::string const& fileName, Container const& container,
                    BufferFiles& files)
 {

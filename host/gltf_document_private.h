@@ -9,8 +9,9 @@
 
 namespace kfshost {
 
-// The parts of a .gltf or .glb file that animation consists of, with the bytes of its buffers. Buffers in files of their own
-// must lie in the file's folder or below. A channel without a target node has target_node -1. Throws ImportError.
+// The parts of a .gltf or .glb file that animation consists of, with the bytes of its buffers. Buffers in files of
+// their own must lie in the file's folder or below. A channel without a target node has target_node -1. Throws
+// ImportError.
 tinygltf::Model LoadGltfDocument(std::string const& fileName);
 
 }  // namespace kfshost

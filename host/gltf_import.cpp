@@ -15,8 +15,8 @@ namespace kfshost {
 
 namespace {
 
-// Channels may share accessors, so a small file can ask for any number of keys. This many doubles in all key records, 0.8 GB,
-// are more than files of this kind come with.
+// Channels may share accessors, so a small file can ask for any number of keys. This many doubles in all key records,
+// 0.8 GB, are more than files of this kind come with.
 constexpr std::size_t MaxNumbers = 100'000'000;
 constexpr std::size_t NumbersPerComponent = 5;
 

@@ -7,8 +7,8 @@ namespace kfshost {
 
 namespace {
 
-// The number of bytes of the UTF-8 sequence that `text` begins with; 0 if it begins with none. Overlong forms, surrogates and
-// numbers past the last code point count as none.
+// The number of bytes of the UTF-8 sequence that `text` begins with; 0 if it begins with none. Overlong forms,
+// surrogates and numbers past the last code point count as none.
 std::size_t SequenceLength(std::string_view text)
 {
     auto const byte = [&](std::size_t index) {

@@ -6,7 +6,8 @@
 
 namespace kfshost {
 
-// A name from a file as text that can be shown and written anywhere: control characters and bytes that aren't UTF-8 become '?'.
+// A name from a file as text that can be shown and written anywhere: control characters and bytes that aren't UTF-8
+// become '?'.
 std::string CleanName(std::string_view name);
 
 // The file's name without folder and last ending.

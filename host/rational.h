@@ -8,16 +8,16 @@
 
 namespace kfshost {
 
-// An exact number, in lowest terms with a positive denominator: seconds, frames, and frames a second are all of this kind.
-// Results that don't fit 64 bits throw std::overflow_error.
+// An exact number, in lowest terms with a positive denominator: seconds, frames, and frames a second are all of this
+// kind. Results that don't fit 64 bits throw std::overflow_error.
 class Rational {
 public:
     Rational() = default;
     // Throws std::invalid_argument for a denominator of 0.
     Rational(std::int64_t numerator, std::int64_t denominator);
 
-    // "12", "-0.25", "30000/1001", ".0083333", "8.3333e-3": exactly what the text says. Nothing for any other text, for a denominator of 0,
-    // and for what doesn't fit.
+    // "12", "-0.25", "30000/1001", ".0083333", "8.3333e-3": exactly what the text says. Nothing for any other text, for
+    // a denominator of 0, and for what doesn't fit.
     static std::optional<Rational> Parse(std::string_view text);
 
     std::int64_t Numerator() const { return numerator_; }

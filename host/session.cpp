@@ -19,7 +19,8 @@ public:
     bool CanEvaluate() const override { return false; }
 };
 
-// Layers and paths have no meaning here: nothing to fix up, nothing that depends on a place, and no identity of their own.
+// Layers and paths have no meaning here: nothing to fix up, nothing that depends on a place, and no identity of their
+// own.
 KFS_AppCallbacks HarmlessCallbacks()
 {
     KFS_AppCallbacks callbacks;

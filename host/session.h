@@ -7,7 +7,8 @@
 
 namespace kfshost {
 
-// How this host's renders read streams: from the keys alone. There is no expression engine here, so no expression can run.
+// How this host's renders read streams: from the keys alone. There is no expression engine here, so no expression can
+// run.
 class ExpState final : public KFS_ExpState {
 public:
     void EvalExprValue(KFS_Stream const* stream, int time, int flags, void* value, KFS_ParamBag const* bag) override;
@@ -27,12 +28,12 @@ public:
     Project();
 };
 
-// A render context with the four states that reads and overrides look for. `tempClone`: for one render's private use, whose
-// reads then work on copies of the key data and leave the streams alone.
+// A render context with the four states that reads and overrides look for. `tempClone`: for one render's private use,
+// whose reads then work on copies of the key data and leave the streams alone.
 boost::shared_ptr<Q_RenderContext> MakeRenderContext(bool tempClone);
 
-// The library, started for as long as this object lives, with a project whose contexts are current on the thread that made
-// it. One at a time, made and destroyed on the main thread; streams must be gone before it is.
+// The library, started for as long as this object lives, with a project whose contexts are current on the thread that
+// made it. One at a time, made and destroyed on the main thread; streams must be gone before it is.
 class Session {
 public:
     // Throws std::runtime_error when the library can't start.

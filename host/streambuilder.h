@@ -8,8 +8,8 @@
 
 namespace kfshost {
 
-// The four numbers of a key's handles, for each component: speeds in value units a second, influences as fractions of the
-// segment on that side.
+// The four numbers of a key's handles, for each component: speeds in value units a second, influences as fractions of
+// the segment on that side.
 struct KeyHandles {
     double const* inSpeed;
     double const* inInfluence;
@@ -29,14 +29,14 @@ public:
     // A key's record, five doubles a component behind a head, has to fit the 15 bits of a list item's size.
     static constexpr int MaxDimension = 818;
 
-    // Keys come in the order of their times, `value` with `dimension` doubles. The codes are those of KFS_Interp for the
-    // segments on both sides.
+    // Keys come in the order of their times, `value` with `dimension` doubles. The codes are those of KFS_Interp for
+    // the segments on both sides.
     void Append(int time, double const* value, KFS_Interp inInterp, KFS_Interp outInterp);
-    // The handles of a key that stands already; they matter on sides that are KFS_Interp_Spline. On a path they are single
-    // numbers, and a speed is distance along the path a second.
+    // The handles of a key that stands already; they matter on sides that are KFS_Interp_Spline. On a path they are
+    // single numbers, and a speed is distance along the path a second.
     void SetHandles(int index, KeyHandles const& handles);
-    // Of a path: the tangents of a key that stands already, `dimension` doubles each, as offsets from its value. A key that
-    // isn't given any keeps those that follow from its neighbours.
+    // Of a path: the tangents of a key that stands already, `dimension` doubles each, as offsets from its value. A key
+    // that isn't given any keeps those that follow from its neighbours.
     void SetPathTangents(int index, double const* in, double const* out);
     // Of a path: how far a position may be off along the route, in value units.
     void SetPathAccuracy(double distance);

@@ -9,9 +9,9 @@ namespace kfshost {
 
 namespace {
 
-// 120000 makes whole numbers of the frames of all common rates, 30000/1001 and 60000/1001 included, and lasts for two hours and
-// a half. The divisors of it behind are for longer times. Then come scales for 72, 90 and 144 frames a second and for
-// decimals of up to eight places, with the common frames in them where that leaves room.
+// 120000 makes whole numbers of the frames of all common rates, 30000/1001 and 60000/1001 included, and lasts for two
+// hours and a half. The divisors of it behind are for longer times. Then come scales for 72, 90 and 144 frames a second
+// and for decimals of up to eight places, with the common frames in them where that leaves room.
 constexpr std::array<unsigned int, 11> WellKnown{120000,  30000,   24000,    6000,     600,      360000,
                                                  1000000, 3000000, 10000000, 30000000, 100000000};
 

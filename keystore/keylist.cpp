@@ -40,7 +40,7 @@ int DisposeRemapTable(SEQ_Head**, long, int, void* item)
     return SEQ_Dispose(std::exchange(key->remapTable, nullptr), 0);
 }
 
-} // namespace
+}  // namespace
 
 int KFSp_SearchKeys(KFS_StreamKeyData const* data, int time, bool* found, int* index)
 {

@@ -5,13 +5,14 @@
 
 #include <climits>
 
-// Everything that searches, inserts, removes or retimes keys goes through here, which keeps the packed times of the key data in step
-// with the list.
+// Everything that searches, inserts, removes or retimes keys goes through here, which keeps the packed times of the key
+// data in step with the list.
 
 // Bytes of one record of the key list, head and value data.
 inline int KFSp_KeyItemSize(KFS_ValueDesc const& desc, bool spatial, short dimension)
 {
-    return KFS_GetKeyScalarDataSize(&desc, spatial, dimension) + (spatial ? KFS_KeySpatialHeadSize + 4 : KFS_KeyHeadSize);
+    return KFS_GetKeyScalarDataSize(&desc, spatial, dimension) +
+           (spatial ? KFS_KeySpatialHeadSize + 4 : KFS_KeyHeadSize);
 }
 
 inline int KFSp_KeyItemSize(KFS_Stream const* stream)
@@ -56,8 +57,8 @@ inline bool KFSp_HasNoValue(KFS_Stream const* stream, KFS_StreamKeyData const* d
     return KFSp_KeyCount(stream, data) == 0;
 }
 
-// The key at exactly `time`: `found` and its index; or not found, and the index of the first key after it (the count past the end).
-// A missing list is an empty one. Answers the list service's code.
+// The key at exactly `time`: `found` and its index; or not found, and the index of the first key after it (the count
+// past the end). A missing list is an empty one. Answers the list service's code.
 int KFSp_SearchKeys(KFS_StreamKeyData const* data, int time, bool* found, int* index);
 
 // A key of the list, read-only; -1 names the last one.

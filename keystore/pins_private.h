@@ -3,15 +3,15 @@
 #include "frame/boundary_private.h"
 #include "keystore/keytypes.h"
 
-// One pin of a list until the scope ends. `error` outlives it: it keeps a failed lock's code at once, and the unlock's if nothing
-// failed before, so it is read after the pin is gone.
+// One pin of a list until the scope ends. `error` outlives it: it keeps a failed lock's code at once, and the unlock's
+// if nothing failed before, so it is read after the pin is gone.
 class KFSp_ScConstPin {
 public:
     KFSp_ScConstPin(SEQ_Head const* const* list, KFSp_FirstError& error) noexcept : error_(error)
     {
         int const code = SEQ_LockConst(1, list);
         if (code == 0) {
-            list_ = list;   // a failed lock owes no unlock
+            list_ = list;  // a failed lock owes no unlock
         }
         error_.Keep(code);
     }
@@ -54,7 +54,8 @@ private:
     SEQ_Head** list_ = nullptr;
 };
 
-// One key of a list, taken for writing: the list is pinned until the scope ends. get() is null when the key couldn't be had.
+// One key of a list, taken for writing: the list is pinned until the scope ends. get() is null when the key couldn't be
+// had.
 class KFSp_ScKey {
 public:
     KFSp_ScKey(SEQ_Head** list, int index, KFSp_FirstError& error) noexcept : error_(error)

@@ -73,8 +73,8 @@ int RetimeKeys(KFS_Stream* stream, KFS_StreamKeyData* data, unsigned int newScal
     return 0;
 }
 
-// While some times are in the old scale and some in the new, no speed can be worked out of them. Listeners that are told
-// of a removal may read.
+// While some times are in the old scale and some in the new, no speed can be worked out of them. Listeners that are
+// told of a removal may read.
 class ScNoUpdates {
 public:
     explicit ScNoUpdates(KFS_Stream* stream) : stream_(stream) { stream_->SetDisabledUpdateStream(true); }

@@ -27,8 +27,8 @@ SEQ_Head** RemapTableOf(KFS_KeyScalar const* key)
     return KFSp_HasSpatialBlock(key) ? key->remapTable : nullptr;
 }
 
-// Gives the duplicate of a list arc tables of its own. All keys are visited, also after a failure: until a key has been, its table may
-// be the source's.
+// Gives the duplicate of a list arc tables of its own. All keys are visited, also after a failure: until a key has
+// been, its table may be the source's.
 int DuplicateRemapTables(SEQ_Head const* const* source, SEQ_Head** copy)
 {
     KFSp_FirstError error;
@@ -83,7 +83,8 @@ int SetCustomDescription(KFS_Stream* stream, KFS_ValueDesc const& desc)
 int SetPlainDescription(KFS_Stream* stream, KFS_ValueDesc const& newDesc)
 {
     auto const type = static_cast<signed char>(newDesc.dataType & 0xFF);
-    if (type > KFS_Type_Double || !KFSp_KeyItemFits(*stream->GetValueDesc(), stream->IsSpatial(), stream->GetDimension())) {
+    if (type > KFS_Type_Double ||
+        !KFSp_KeyItemFits(*stream->GetValueDesc(), stream->IsSpatial(), stream->GetDimension())) {
         return KFS_Err_BadValueDesc;
     }
     KFS_ValueDesc* const desc = stream->GetValueDescForModify();
@@ -103,7 +104,7 @@ int SetPlainDescription(KFS_Stream* stream, KFS_ValueDesc const& newDesc)
     return code;
 }
 
-} // namespace
+}  // namespace
 
 KFS_StreamKeyData::KFS_StreamKeyData(KFS_StreamKeyData const& source, KFS_Stream const* stream)
     : invalidKeyIndex{source.invalidKeyIndex[0], source.invalidKeyIndex[1]},
@@ -141,8 +142,13 @@ KFS_StreamKeyData::~KFS_StreamKeyData()
 KFS_Stream::KFS_Stream(short dimension, unsigned int timeScale, unsigned char noKeys, unsigned char spatial,
                        unsigned short interpMask, unsigned short spInterpMask, KFS_ValueDesc const& valueDesc,
                        KFS_MatchName const* matchName, KFS_StreamFactory* factory, bool canonical)
-    : KFS_StreamBase(matchName, factory, canonical), stamp_(KFS_StreamValidStamp), dimension_(dimension),
-      spInterpMask_(spInterpMask), interpMask_(interpMask), timeScale_(timeScale), multiplier_{1.0, 1.0, 1.0, 1.0},
+    : KFS_StreamBase(matchName, factory, canonical),
+      stamp_(KFS_StreamValidStamp),
+      dimension_(dimension),
+      spInterpMask_(spInterpMask),
+      interpMask_(interpMask),
+      timeScale_(timeScale),
+      multiplier_{1.0, 1.0, 1.0, 1.0},
       interpFunc_(KFSp_Interpolate)
 {
     if (noKeys) {
@@ -168,11 +174,20 @@ KFS_Stream::KFS_Stream(short dimension, unsigned int timeScale, unsigned char no
 }
 
 KFS_Stream::KFS_Stream(KFS_Stream const& source, KFS_CloneStreamParams const& params)
-    : KFS_StreamBase(Undamaged(source)), stamp_(KFS_StreamValidStamp), dimension_(source.dimension_),
-      kfsFlags_(source.kfsFlags_), spInterp_(source.spInterp_), spInterpMask_(source.spInterpMask_),
-      interpMask_(source.interpMask_), timeScale_(source.timeScale_), accuracy_(source.accuracy_),
-      multiplier_(source.multiplier_), valueDesc_(source.valueDesc_), interpFunc_(source.interpFunc_),
-      copyItemFunc_(source.copyItemFunc_), disposeItemFunc_(source.disposeItemFunc_),
+    : KFS_StreamBase(Undamaged(source)),
+      stamp_(KFS_StreamValidStamp),
+      dimension_(source.dimension_),
+      kfsFlags_(source.kfsFlags_),
+      spInterp_(source.spInterp_),
+      spInterpMask_(source.spInterpMask_),
+      interpMask_(source.interpMask_),
+      timeScale_(source.timeScale_),
+      accuracy_(source.accuracy_),
+      multiplier_(source.multiplier_),
+      valueDesc_(source.valueDesc_),
+      interpFunc_(source.interpFunc_),
+      copyItemFunc_(source.copyItemFunc_),
+      disposeItemFunc_(source.disposeItemFunc_),
       temporarilyNonCustom_(source.temporarilyNonCustom_)
 {
     int const code = KFSp_Boundary([&] {
@@ -300,7 +315,8 @@ void KFS_Stream::NotifyValueChanged()
 }
 
 KFS_Stream::QuietExpressionErrorToken::QuietExpressionErrorToken(KFS_Stream* stream)
-    : stream_(stream), saved_(stream->ExpressionErrorsAreQuiet())
+    : stream_(stream),
+      saved_(stream->ExpressionErrorsAreQuiet())
 {
     stream_->SetExpressionErrorsAreQuiet(true);
 }

@@ -22,20 +22,21 @@ struct KFS_CloneStreamParams {
 // A read request as one value.
 struct KFS_EvalData {
     T_Time time;
-    int flags;                  // of the Plus forms: bit 0x1 means no expression, the others are the host's
-    KFS_ParamBag const* bag;    // may be null
+    int flags;                // of the Plus forms: bit 0x1 means no expression, the others are the host's
+    KFS_ParamBag const* bag;  // may be null
 };
 
 // The part of a stream of which a render has a private copy.
 //
-// Reads write it: the cache record is scratch, and derived data of stale keys is repaired where it is needed. So one key data serves one
-// thread at a time.
+// Reads write it: the cache record is scratch, and derived data of stale keys is repaired where it is needed. So one
+// key data serves one thread at a time.
 struct KFS_API KFS_StreamKeyData {
-    SEQ_Head** keys = nullptr;                                                  // null while none was made
-    int invalidKeyIndex[2] = {KFS_INVALID_INDEX, KFS_INVALID_INDEX};            // first and last key whose tangents are stale
-    int arcInvalidKeyIndex[2] = {KFS_INVALID_INDEX, KFS_INVALID_INDEX};         // the same for arc lengths and spatial tangents
-    KFS_KeyScalar* cache = nullptr;                                             // with room for a full value
-    mutable KFS_KeyTimes times;                                                 // derived from `keys`
+    SEQ_Head** keys = nullptr;                                        // null while none was made
+    int invalidKeyIndex[2] = {KFS_INVALID_INDEX, KFS_INVALID_INDEX};  // first and last key whose tangents are stale
+    int arcInvalidKeyIndex[2] = {KFS_INVALID_INDEX,
+                                 KFS_INVALID_INDEX};  // the same for arc lengths and spatial tangents
+    KFS_KeyScalar* cache = nullptr;                   // with room for a full value
+    mutable KFS_KeyTimes times;                       // derived from `keys`
 
     KFS_StreamKeyData() = default;
     // A copy that shares nothing with `source`. Throws an int: the list service's code, 4, or the copy function's.
@@ -50,21 +51,22 @@ private:
     KFS_Stream const* valueOwner_ = nullptr;
 };
 
-// The leaf of a stream tree: one animatable property. It holds a single value (KFS_StreamFlag_NoKeys, the value lives in the cache
-// record), or a sorted list of keys.
+// The leaf of a stream tree: one animatable property. It holds a single value (KFS_StreamFlag_NoKeys, the value lives
+// in the cache record), or a sorted list of keys.
 //
-// Errors: exported functions on a stream refuse one whose validity stamp is wrong with code 2 and touch nothing else of it. Class
-// operations throw their code as an int.
-// Threads: edits belong to the main thread. Accessors marked "key data" answer for the calling thread's key data: the stream's own, or
-// on a temporary clone context that render's private copy.
+// Errors: exported functions on a stream refuse one whose validity stamp is wrong with code 2 and touch nothing else of
+// it. Class operations throw their code as an int.
+// Threads: edits belong to the main thread. Accessors marked "key data" answer for the calling thread's key data: the
+// stream's own, or on a temporary clone context that render's private copy.
 class KFS_API KFS_Stream : public KFS_StreamBase {
 public:
-    // `dimension`: components of the value. `timeScale`: time units a second. `spatial`: keys carry tangents in space. `valueDesc`: what
-    // a value is. `matchName` and `factory` may be null. Throws an int: 7433 for a data type above 9, 4 when out of memory, 7431 where
-    // automatic spatial tangents are asked for (bit 0x8 of `spInterpMask`) but `interpMask` lacks bit 0x4.
-    KFS_Stream(short dimension, unsigned int timeScale, unsigned char noKeys, unsigned char spatial, unsigned short interpMask,
-               unsigned short spInterpMask, KFS_ValueDesc const& valueDesc, KFS_MatchName const* matchName,
-               KFS_StreamFactory* factory, bool canonical);
+    // `dimension`: components of the value. `timeScale`: time units a second. `spatial`: keys carry tangents in space.
+    // `valueDesc`: what a value is. `matchName` and `factory` may be null. Throws an int: 7433 for a data type above 9,
+    // 4 when out of memory, 7431 where automatic spatial tangents are asked for (bit 0x8 of `spInterpMask`) but
+    // `interpMask` lacks bit 0x4.
+    KFS_Stream(short dimension, unsigned int timeScale, unsigned char noKeys, unsigned char spatial,
+               unsigned short interpMask, unsigned short spInterpMask, KFS_ValueDesc const& valueDesc,
+               KFS_MatchName const* matchName, KFS_StreamFactory* factory, bool canonical);
     // A stream in its own right without a parent. Throws an int.
     KFS_Stream(KFS_Stream const& source, KFS_CloneStreamParams const& params);
     ~KFS_Stream() override;
@@ -73,11 +75,13 @@ public:
     // The clone as a leaf; without keys and expression it holds the value of the cache record. The caller owns it.
     KFS_Stream* CloneLeaf(KFS_CloneStreamParams const& params) const;
     KFS_Stream* CloneLeafNoKeysOrExpr() const;
-    // Exchanges the content of two leaves, names and flags included, while each keeps its place: parent, factory, client pointer, and the
-    // permitted temporal interpolations. Listeners hear of this one only. Throws the list service's code, with the content exchanged.
+    // Exchanges the content of two leaves, names and flags included, while each keeps its place: parent, factory,
+    // client pointer, and the permitted temporal interpolations. Listeners hear of this one only. Throws the list
+    // service's code, with the content exchanged.
     void swap(KFS_Stream& other);
     bool IsModified() const override;
-    // Keys, or an expression (`evenIfDisabled`: any text; else one that is active). A stream with separated dimensions asks its followers.
+    // Keys, or an expression (`evenIfDisabled`: any text; else one that is active). A stream with separated dimensions
+    // asks its followers.
     bool IsAnimated(bool evenIfDisabled) const override;
     bool IsLeaf() const override;
     KFS_Stream* GetAsLeaf() override;
@@ -86,14 +90,16 @@ public:
     bool AreDimensionsSeparated() const override;
     void SetDimensionsSeparated(bool separated) override;
     bool AffectsRendering(KFS_RenderOptionsBase const& options) const override;
-    hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const& options, GetRenderGuidFilter* filter) const override;
+    hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const& options,
+                                        GetRenderGuidFilter* filter) const override;
     void GetExpressionDependencyIds(std::set<int>& ids) const override;
-    // The stream as one "LIST" of type "kfbs", to be read back by a stream of the same class. Both throw an int: the chunk service's or
-    // the list service's code, or one that has been reported.
+    // The stream as one "LIST" of type "kfbs", to be read back by a stream of the same class. Both throw an int: the
+    // chunk service's or the list service's code, or one that has been reported.
     //
-    // Read takes the list that the caller has entered; null stands for the next one at the file's place. It replaces what the stream had.
-    // A failed Read leaves a whole stream with some of the file's content. A stream of exactly this class takes its dimension and value
-    // description from the file; one of a derived class keeps its own, and refuses another dimension with KFS_Err_BadFileInfo.
+    // Read takes the list that the caller has entered; null stands for the next one at the file's place. It replaces
+    // what the stream had. A failed Read leaves a whole stream with some of the file's content. A stream of exactly
+    // this class takes its dimension and value description from the file; one of a derived class keeps its own, and
+    // refuses another dimension with KFS_Err_BadFileInfo.
     void Read(CKF_File* file, CKF_ChunkInfo const* chunk) override;
     bool ShouldWriteForVersion(CKF_File const* file) const override;
     void Write(CKF_File* file) const override;
@@ -106,14 +112,16 @@ public:
     virtual void InsertDefaultKey(T_Time const& time);
     virtual void CopyDefaultKey(T_Time const& time, KFS_Stream const* source);
     virtual void PrepareForInsertOfForeignValue(KFS_Stream const* source);
-    // Leaves the value at a time in the cache record, so that the next read at that time is free. A constant only takes the time.
+    // Leaves the value at a time in the cache record, so that the next read at that time is free. A constant only takes
+    // the time.
     virtual void ValidateCacheAtTime(T_Time const& time);
     virtual void ForceInterpolateAtTime(T_Time const& time);
     // Whether both times give the same value, as far as can be told without evaluating. Throws an int.
     virtual bool SameValueAtTimes(T_Time const& a, T_Time const& b, KFS_ParamBag const* bag) const;
-    virtual void MixInValueAtTime(hearth::utility::MixHashGuidT<hearth::utility::Murmur3MixerState>& hash, T_Time const& time) const;
-    virtual void MixInValueAtTime(hearth::utility::MixHashGuidT<hearth::utility::Murmur3MixerState>& hash, T_Time const& time,
-                                  KFS_ParamBag const* bag) const;
+    virtual void MixInValueAtTime(hearth::utility::MixHashGuidT<hearth::utility::Murmur3MixerState>& hash,
+                                  T_Time const& time) const;
+    virtual void MixInValueAtTime(hearth::utility::MixHashGuidT<hearth::utility::Murmur3MixerState>& hash,
+                                  T_Time const& time, KFS_ParamBag const* bag) const;
     virtual bool HasMinValue() const;
     virtual bool HasMaxValue() const;
     virtual short GetEffectiveDimension() const;
@@ -152,7 +160,8 @@ public:
     virtual KFS_Stream const* GetSeparationFollower(int dimension) const;
     virtual bool IsCustomValuePointer() const;
     // Runs the expression at the tree's root. 1 means that there is no value.
-    virtual int EvaluateExpression(T_Time const* time, double* values, void** customValue, KFS_ParamBag const* bag) const;
+    virtual int EvaluateExpression(T_Time const* time, double* values, void** customValue,
+                                   KFS_ParamBag const* bag) const;
 
     unsigned short GetStamp() const { return stamp_; }
 
@@ -169,8 +178,8 @@ public:
     KFS_StreamKeyData const* GetKeyData() const;
     KFS_StreamKeyData* GetKeyDataForModify() const { return const_cast<KFS_StreamKeyData*>(GetKeyData()); }
     SEQ_Head** GetKeys() const { return GetKeyData()->keys; }
-    // Takes over a list whose head names this stream; the earlier one isn't disposed. Also to be called by whoever has rewritten the
-    // times of keys through the list's handle.
+    // Takes over a list whose head names this stream; the earlier one isn't disposed. Also to be called by whoever has
+    // rewritten the times of keys through the list's handle.
     void SetKeys(SEQ_Head** keys);
     KFS_KeyScalar* GetCache() const { return GetKeyData()->cache; }
     int const* GetInvalidKeyIndex() const { return GetKeyData()->invalidKeyIndex; }
@@ -201,7 +210,8 @@ public:
     void SetCopyItemFunc(KFS_CopyItemFunc func) { copyItemFunc_ = func; }
     KFS_DisposeItemFunc GetDisposeItemFunc() const { return disposeItemFunc_; }
     void SetDisposeItemFunc(KFS_DisposeItemFunc func) { disposeItemFunc_ = func; }
-    // The word handed to the item functions: the description's data type on a custom stream (its low 32 bits), 0 on a plain one.
+    // The word handed to the item functions: the description's data type on a custom stream (its low 32 bits), 0 on a
+    // plain one.
     long GetItemRefcon() const { return IsCustom() ? static_cast<int>(valueDesc_.dataType) : 0; }
 
     KFS_ExprInfo const& GetExprInfo() const { return exprInfo_; }
@@ -243,19 +253,19 @@ public:
     // A copy that owns its value. Throws an int.
     KFS_KeyScalar* CloneCache(KFS_KeyScalar const* source) const;
 
-    // The number of keys, the count against which ends of the list are compared: on a stream without a list 0 while it has no value,
-    // else -1. Key data.
+    // The number of keys, the count against which ends of the list are compared: on a stream without a list 0 while it
+    // has no value, else -1. Key data.
     int GetKeyCount() const;
     // Whether the stream has nothing to answer: no key, or a constant without a value. Key data.
     bool HasNoValue() const;
 
-    // Mark the keys from `index` - `count` to `index` as stale; `index` -1 counts from the end. Key data. They answer the list service's
-    // code.
+    // Mark the keys from `index` - `count` to `index` as stale; `index` -1 counts from the end. Key data. They answer
+    // the list service's code.
     int SetInvalid(int index, short count) const;
     int SetArcInvalid(int index, short count) const;
 
-    // Repairs what is stale: spatial tangents and arcs, temporal tangents, float times, in this order. Const, because it writes derived
-    // data only. Key data. The marks are consumed whether or not the repair finished.
+    // Repairs what is stale: spatial tangents and arcs, temporal tangents, float times, in this order. Const, because
+    // it writes derived data only. Key data. The marks are consumed whether or not the repair finished.
     int UpdateStream() const;
     int UpdateStreamIfStaleTangents(int index) const;
     int UpdateStreamIfFloatItem(KFS_KeyScalar const* key, int index) const;
@@ -294,7 +304,7 @@ private:
     bool expressionErrorsAreQuiet_ = false;
 };
 
-// Changes what a value of the stream is; the old description goes to `oldDesc` if that isn't null, and a null `newDesc` changes nothing.
-// A custom stream that is given a plain description counts as custom again once a custom one comes back. Doesn't notify.
-// Operation 9. Errors: 2; 7433 for a data type above 9, not reported.
+// Changes what a value of the stream is; the old description goes to `oldDesc` if that isn't null, and a null `newDesc`
+// changes nothing. A custom stream that is given a plain description counts as custom again once a custom one comes
+// back. Doesn't notify. Operation 9. Errors: 2; 7433 for a data type above 9, not reported.
 KFS_API int KFS_SetValueDescription(KFS_Stream* stream, KFS_ValueDesc const* newDesc, KFS_ValueDesc* oldDesc);

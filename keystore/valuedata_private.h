@@ -50,10 +50,12 @@ struct KFSp_TemporalRuns {
     Number* outInfluence;
 
     KFSp_TemporalRuns(Number* numbers, int dimension)
-        : value(numbers), inSpeed(numbers + dimension), inInfluence(numbers + 2 * dimension), outSpeed(numbers + 3 * dimension),
+        : value(numbers),
+          inSpeed(numbers + dimension),
+          inInfluence(numbers + 2 * dimension),
+          outSpeed(numbers + 3 * dimension),
           outInfluence(numbers + 4 * dimension)
-    {
-    }
+    {}
 };
 
 inline KFSp_TemporalRuns<double> KFSp_GetTemporalRuns(KFS_KeyScalar* key, int dimension)
@@ -74,9 +76,10 @@ struct KFSp_SpatialRuns {
     Number* outTangent;
 
     KFSp_SpatialRuns(Number* numbers, int dimension)
-        : value(numbers), inTangent(numbers + dimension), outTangent(numbers + 2 * dimension)
-    {
-    }
+        : value(numbers),
+          inTangent(numbers + dimension),
+          outTangent(numbers + 2 * dimension)
+    {}
 };
 
 inline KFSp_SpatialRuns<double> KFSp_GetSpatialRuns(KFS_KeyScalar* key, int dimension)
@@ -89,7 +92,8 @@ inline KFSp_SpatialRuns<double const> KFSp_GetSpatialRuns(KFS_KeyScalar const* k
     return {KFSp_Numbers(key), dimension};
 }
 
-// Later minus earlier, as a signed 32-bit difference taken with wrap-around: how this library orders and measures key times.
+// Later minus earlier, as a signed 32-bit difference taken with wrap-around: how this library orders and measures key
+// times.
 inline int KFSp_TimeDifference(int later, int earlier)
 {
     return static_cast<int>(static_cast<unsigned int>(later) - static_cast<unsigned int>(earlier));

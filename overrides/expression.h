@@ -5,7 +5,7 @@
 
 // Bits of KFS_ExprInfo's flag word; the other bits are the host's.
 enum KFS_ExprFlag : unsigned int {
-    KFS_ExprFlag_Disabled = 0x1,    // the author switched the expression off
+    KFS_ExprFlag_Disabled = 0x1,  // the author switched the expression off
 };
 
 // The expression attached to a leaf: its text, its last error and its flags. The library doesn't parse or run it.

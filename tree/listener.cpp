@@ -22,7 +22,7 @@ bool& ThisThreadsPause()
     return *state;
 }
 
-} // namespace
+}  // namespace
 
 KFS_StreamListener::~KFS_StreamListener() = default;
 
@@ -65,7 +65,8 @@ bool KFSp_IsHeard(KFS_StreamBase* stream)
     if (stream->GetListenerState() == KFS_ListenerState_Silent) {
         return false;
     }
-    if (Q_GetRunMode() == Q_RunMode_Silent || stream->IsCanonical() || ThisThreadsPause() || !S_KFS_MainListenerManager) {
+    if (Q_GetRunMode() == Q_RunMode_Silent || stream->IsCanonical() || ThisThreadsPause() ||
+        !S_KFS_MainListenerManager) {
         return false;
     }
     int state = stream->GetListenerState();

@@ -11,10 +11,12 @@ class KFS_Stream;
 class KFS_StreamBase;
 class KFS_StreamGroup;
 
-// Told when a stream's value, flags, name or place changes. The host derives from it and registers one object; the order of the virtual
-// operations is part of the binary interface. A listener must not unregister itself from inside a notification.
+// Told when a stream's value, flags, name or place changes. The host derives from it and registers one object; the
+// order of the virtual operations is part of the binary interface. A listener must not unregister itself from inside a
+// notification.
 //
-// Only streams below a root that wants to be heard are heard (KFS_StreamBase::ProbeListenerState), and never a canonical instance.
+// Only streams below a root that wants to be heard are heard (KFS_StreamBase::ProbeListenerState), and never a
+// canonical instance.
 class KFS_API KFS_StreamListener {
 public:
     virtual ~KFS_StreamListener();
@@ -27,7 +29,8 @@ public:
     virtual void StreamSwapped(KFS_StreamGroup* group, KFS_StreamBase const* stream, unsigned int index) = 0;
     virtual void StreamsAboutToBeReordered(KFS_StreamGroup* group, KFS_StreamBase const* stream, unsigned int from,
                                            unsigned int to) = 0;
-    virtual void StreamsReordered(KFS_StreamGroup* group, KFS_StreamBase const* stream, unsigned int from, unsigned int to) = 0;
+    virtual void StreamsReordered(KFS_StreamGroup* group, KFS_StreamBase const* stream, unsigned int from,
+                                  unsigned int to) = 0;
     // The stream is in its destructor.
     virtual void StreamDestroyed(KFS_StreamBase const* stream) = 0;
     // Not called; it keeps the later ones in their places.
@@ -60,7 +63,8 @@ private:
     std::set<KFS_StreamListener*> listeners_;
 };
 
-// Between KFS_Birth and KFS_Death. Registering one listener twice leaves one entry; an unknown one is passed over. They return 0.
+// Between KFS_Birth and KFS_Death. Registering one listener twice leaves one entry; an unknown one is passed over. They
+// return 0.
 KFS_API int KFS_RegisterMainListener(KFS_StreamListener* listener);
 KFS_API int KFS_UnregisterMainListener(KFS_StreamListener* listener);
 // Silences the calling thread, or not; `wasPaused` gets what was before, for the caller to restore. Returns 0.

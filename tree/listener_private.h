@@ -2,8 +2,8 @@
 
 #include "tree/listener.h"
 
-// Whether a notification from this stream would reach the listeners: not in silent run mode, not canonical, this thread not paused, and
-// its root wants to be heard. A silent stream costs a load and a compare.
+// Whether a notification from this stream would reach the listeners: not in silent run mode, not canonical, this thread
+// not paused, and its root wants to be heard. A silent stream costs a load and a compare.
 bool KFSp_IsHeard(KFS_StreamBase* stream);
 
 // Null outside KFS_StreamBase::Birth .. Death.

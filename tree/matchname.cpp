@@ -35,7 +35,7 @@ hearth::utility::Guid HashText(unsigned char const* text)
     return guid;
 }
 
-} // namespace
+}  // namespace
 
 KFSp_MatchNameEntry::KFSp_MatchNameEntry(unsigned char const* text) : name_(text), guid_(HashText(text)) {}
 

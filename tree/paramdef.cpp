@@ -8,7 +8,7 @@
 namespace {
 
 constexpr int ModuleId = 0x1d0000;
-constexpr unsigned int KindsWithParamName = 0x8090;     // bits 4, 7 and 15
+constexpr unsigned int KindsWithParamName = 0x8090;  // bits 4, 7 and 15
 
 char*& ParamNameField(FX_ParamDef* def)
 {
@@ -20,7 +20,7 @@ char const* ParamNameField(FX_ParamDef const* def)
     return def->paramType == FX_Param_CHOICE ? def->value.choice.paramName : def->value.named.paramName;
 }
 
-} // namespace
+}  // namespace
 
 u16str FX_ParamDef_GetName(FX_ParamDef const* def)
 {

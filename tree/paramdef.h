@@ -25,11 +25,11 @@ enum FX_ParamKind : int {
 inline constexpr unsigned int FX_ParamFlag_CannotAnimate = 0x2;
 inline constexpr unsigned int FX_ParamFlag_HoldOnly = 0x4;
 
-// The record by which the host's effect interface describes a parameter: its kind, its name, its valid and slider range, its default.
-// The kinds overlay one another in `value`. Numbers called 16.16 are signed, 65536 for 1.0.
+// The record by which the host's effect interface describes a parameter: its kind, its name, its valid and slider
+// range, its default. The kinds overlay one another in `value`. Numbers called 16.16 are signed, 65536 for 1.0.
 //
-// `paramName` of the kinds BOOL, CHOICE and LABEL is owned by the record: a byte copy must never be kept as an owner, every copy goes
-// through FX_ParamDef_Copy, and KFS_DeleteParamDefInternalString frees it.
+// `paramName` of the kinds BOOL, CHOICE and LABEL is owned by the record: a byte copy must never be kept as an owner,
+// every copy goes through FX_ParamDef_Copy, and KFS_DeleteParamDefInternalString frees it.
 struct FX_ParamDef {
     struct LayerValue {
         void* reservedPointer;
@@ -40,14 +40,14 @@ struct FX_ParamDef {
         int validMin, validMax, sliderMin, sliderMax, defaultValue;
     };
     struct FixedSliderValue {
-        int validMin, validMax, sliderMin, sliderMax, defaultValue;     // 16.16
+        int validMin, validMax, sliderMin, sliderMax, defaultValue;  // 16.16
         short precision;
         unsigned short displayFlags;
     };
     struct FixedAngleValue {
-        int defaultValue, validMin, validMax;                           // 16.16 degrees
+        int defaultValue, validMin, validMax;  // 16.16 degrees
     };
-    struct NamedValue {             // BOOL and LABEL
+    struct NamedValue {  // BOOL and LABEL
         unsigned char defaultValue;
         char* paramName;
     };
@@ -55,7 +55,7 @@ struct FX_ParamDef {
         unsigned char alpha, red, green, blue;
     };
     struct Point2DValue {
-        int defaultX, defaultY;     // 16.16 times 100
+        int defaultX, defaultY;  // 16.16 times 100
     };
     struct ChoiceValue {
         short choiceCount;
@@ -65,7 +65,7 @@ struct FX_ParamDef {
     // precision and displayFlags stand first: they share their four bytes with validMin of the two integer sliders.
     struct FloatSliderValue {
         short precision;
-        unsigned short displayFlags;    // bit 0 percent, bit 2 pixels
+        unsigned short displayFlags;  // bit 0 percent, bit 2 pixels
         float validMin, validMax, sliderMin, sliderMax, defaultValue;
         unsigned int floatFlags;
     };
@@ -73,14 +73,14 @@ struct FX_ParamDef {
         unsigned int pathIdentifier, defaultPathIdentifier;
     };
     struct Point3DValue {
-        double defaultX, defaultY, defaultZ;    // times 100
+        double defaultX, defaultY, defaultZ;  // times 100
     };
 
     int reservedA;
     int reservedWord;
     int reservedB;
     int paramType;
-    char name[32];      // NUL-terminated, UTF-8
+    char name[32];  // NUL-terminated, UTF-8
     unsigned int paramFlags;
     union {
         LayerValue layer;
@@ -105,8 +105,8 @@ KFS_API void FX_ParamDef_SetName(FX_ParamDef* def, u16str const& name);
 KFS_API bool FX_ParamDef_HasParamName(FX_ParamDef const* def);
 // Empty for the other kinds and for a null paramName.
 KFS_API u16str FX_ParamDef_GetParamName(FX_ParamDef const* def);
-// Replaces the owned text; an empty one leaves null unless `keepEmpty`. Does nothing for the other kinds. Throws the int 4 when out of
-// memory; the field is then null.
+// Replaces the owned text; an empty one leaves null unless `keepEmpty`. Does nothing for the other kinds. Throws the
+// int 4 when out of memory; the field is then null.
 KFS_API void FX_ParamDef_SetParamName(FX_ParamDef* def, u16str const& name, bool keepEmpty);
 // Frees what `target` owns and makes it a deep copy of `source`. Throws the int 4 when out of memory.
 KFS_API void FX_ParamDef_Copy(FX_ParamDef const& source, FX_ParamDef* target);

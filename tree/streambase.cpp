@@ -25,7 +25,7 @@ struct KFSp_RescaleNewlyInstalledStream {
     void operator()(KFS_Stream* leaf) const { KFSp_ThrowIf(KFS_RescaleStream(leaf, scale)); }
 };
 
-} // namespace
+}  // namespace
 
 static KFS_MatchName* S_KFS_EndOfIDPathSentinelMatchName = nullptr;
 
@@ -52,7 +52,8 @@ KFS_MatchName const& KFSp_GetEndOfIDPathSentinelMatchName()
 }
 
 KFS_StreamBase::KFS_StreamBase(KFS_MatchName const* name, KFS_StreamFactory* factory, bool canonical)
-    : flags_(KFS_BaseFlag_Active | (canonical ? KFS_BaseFlag_Canonical : 0U)), factory_(factory)
+    : flags_(KFS_BaseFlag_Active | (canonical ? KFS_BaseFlag_Canonical : 0U)),
+      factory_(factory)
 {
     if (name) {
         matchName_ = *name;
@@ -61,7 +62,10 @@ KFS_StreamBase::KFS_StreamBase(KFS_MatchName const* name, KFS_StreamFactory* fac
 }
 
 KFS_StreamBase::KFS_StreamBase(KFS_StreamBase const& source)
-    : matchName_(source.matchName_), flags_(source.flags_), listenerState_(source.listenerState_), factory_(source.factory_),
+    : matchName_(source.matchName_),
+      flags_(source.flags_),
+      listenerState_(source.listenerState_),
+      factory_(source.factory_),
       displayName_(source.displayName_)
 {
     FX_ParamDef_Copy(source.paramDef_, &paramDef_);
@@ -313,8 +317,8 @@ void KFS_StreamBase::SetDisplayName(u16str const& name)
 void KFS_StreamBase::pSetDisplayName(u16str const& name) const
 {
     displayName_ = name;
-    // In the word itself, since a name that is filled in on demand is no news to listeners; and only where the bit is set, since
-    // readers fill names in beside other readers of the word.
+    // In the word itself, since a name that is filled in on demand is no news to listeners; and only where the bit is
+    // set, since readers fill names in beside other readers of the word.
     if (NamesSameInitted()) {
         const_cast<KFS_StreamBase*>(this)->flags_ &= ~static_cast<unsigned int>(KFS_BaseFlag_NamesSameInitted);
     }
@@ -476,7 +480,8 @@ void KFS_StreamBase::SwapBase(KFS_StreamBase& other)
 }
 
 KFS_ScSetResetIndependent::KFS_ScSetResetIndependent(KFS_StreamBase* stream, bool wanted)
-    : stream_(stream), saved_(stream->IsIndependent())
+    : stream_(stream),
+      saved_(stream->IsIndependent())
 {
     if (saved_ != wanted) {
         stream_->MakeIndependent(wanted);

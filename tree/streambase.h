@@ -31,11 +31,11 @@ struct KFS_CloneStreamParams;
 enum KFS_BaseFlag : unsigned int {
     KFS_BaseFlag_Active = 0x00000001,
     KFS_BaseFlag_Hidden = 0x00000002,
-    KFS_BaseFlag_Canonical = 0x00000004,            // the shared default instance of its match name; must not be edited
+    KFS_BaseFlag_Canonical = 0x00000004,  // the shared default instance of its match name; must not be edited
     KFS_BaseFlag_ShowActiveSwitch = 0x00000008,
     KFS_BaseFlag_Disabled = 0x00000010,
     KFS_BaseFlag_Elided = 0x00000020,
-    KFS_BaseFlag_Independent = 0x00000040,          // the value stands by itself, without the application's context around it
+    KFS_BaseFlag_Independent = 0x00000040,  // the value stands by itself, without the application's context around it
     KFS_BaseFlag_SkipLeafRead = 0x00000080,
     KFS_BaseFlag_Reserved8 = 0x00000100,
     KFS_BaseFlag_MarkedGraph = 0x00000200,
@@ -64,15 +64,16 @@ struct KFS_API KFS_StreamCapsuleData {
     u16str id;              // the root's identifier followed by the path as JSON; a canonical instance's match name
 };
 
-// Any node of a stream tree: a leaf (KFS_Stream) or an interior node (KFS_StreamGroup). It knows its name, its flags, its parent and
-// its factory; it doesn't own its children, and its destructor doesn't detach it from its parent.
+// Any node of a stream tree: a leaf (KFS_Stream) or an interior node (KFS_StreamGroup). It knows its name, its flags,
+// its parent and its factory; it doesn't own its children, and its destructor doesn't detach it from its parent.
 //
-// A node is either canonical, the factory's shared default instance of its match name, or a real instance that belongs to one tree.
+// A node is either canonical, the factory's shared default instance of its match name, or a real instance that belongs
+// to one tree.
 //
 // The virtual operations' order is part of the binary interface: hosts derive from this class.
 //
-// Threads: structure and flags change on one thread at a time, by contract with the host. The getters that fill a value on demand
-// (display name, 16-bit match name, capsule data, host value) are safe under concurrent readers.
+// Threads: structure and flags change on one thread at a time, by contract with the host. The getters that fill a value
+// on demand (display name, 16-bit match name, capsule data, host value) are safe under concurrent readers.
 class KFS_API KFS_StreamBase : public Q_MemTrackedObject {
 public:
     virtual ~KFS_StreamBase();
@@ -92,8 +93,8 @@ public:
     virtual bool IsLeaf() const;
     virtual bool IsFloatBased() const;
     virtual bool IsLoading() const;
-    // Whether listeners hear this stream (KFS_ListenerState). Asked once, then remembered for the stream's life; a stream without a
-    // parent stays unknown. A root that can be heard overrides this and answers Heard.
+    // Whether listeners hear this stream (KFS_ListenerState). Asked once, then remembered for the stream's life; a
+    // stream without a parent stays unknown. A root that can be heard overrides this and answers Heard.
     virtual int ProbeListenerState();
     // The tree's own casts: null for the wrong kind.
     virtual KFS_Stream* GetAsLeaf();
@@ -116,7 +117,8 @@ public:
     virtual bool SkipReveal() const;
     virtual bool DisplayNameIncludesParent() const;
     virtual bool AffectsRendering(KFS_RenderOptionsBase const& options) const = 0;
-    virtual hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const& options, GetRenderGuidFilter* filter) const = 0;
+    virtual hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const& options,
+                                                GetRenderGuidFilter* filter) const = 0;
     virtual bool CanDisplayPostExpressionValue() const;
     virtual void Read(CKF_File* file, CKF_ChunkInfo const* chunk);
     virtual bool ShouldWriteForVersion(CKF_File const* file) const;
@@ -149,8 +151,8 @@ public:
     KFS_StreamFactory* GetFactory() const { return factory_; }
     KFS_StreamGroup* GetParent() { return parent_; }
     KFS_StreamGroup const* GetParent() const { return parent_; }
-    // Stores the parent; then tells the ancestors and takes each non-canonical leaf to the group's preferred time scale. Throws the
-    // rescale's code, with the parent already set.
+    // Stores the parent; then tells the ancestors and takes each non-canonical leaf to the group's preferred time
+    // scale. Throws the rescale's code, with the parent already set.
     void SetParent(KFS_StreamGroup* group);
     // The topmost ancestor; null without a parent: a root isn't its own root.
     KFS_StreamGroup* GetRoot();
@@ -161,8 +163,8 @@ public:
     bool IsHiddenByAncestor() const;
     bool IsNotAnimated(bool evenIfDisabled) const { return !IsAnimated(evenIfDisabled); }
 
-    // The path to this node, and in `root` its topmost ancestor, the node itself if it has no parent; null if that is a leaf. Slow,
-    // because an indexed group searches for each child. `root` and `path` must not be null.
+    // The path to this node, and in `root` its topmost ancestor, the node itself if it has no parent; null if that is a
+    // leaf. Slow, because an indexed group searches for each child. `root` and `path` must not be null.
     void SlowGetPathFromRootToMe(KFS_StreamGroup** root, KFS_StreamIDPath* path);
     void SlowGetPathFromRootToMe(KFS_StreamGroup const** root, KFS_StreamIDPath* path) const;
     // Of the place that the node has when first asked: the answer is kept and doesn't follow the node through the tree.
@@ -236,7 +238,7 @@ protected:
     KFS_StreamBase(KFS_StreamBase const& source);
 
 private:
-    friend class KFS_StreamGroup;   // gives a clone's children their parent
+    friend class KFS_StreamGroup;  // gives a clone's children their parent
 
     bool HasFlag(KFS_BaseFlag flag) const { return (flags_ & flag) != 0; }
     void SetFlag(KFS_BaseFlag flag, bool on) { SetStreamBaseFlags(on ? flag : 0U, flag); }
@@ -252,7 +254,8 @@ private:
     mutable KFS_ClientRefCon* refCon_ = nullptr;
     mutable KFS_StreamCapsuleData capsuleData_;
     mutable boost::any smDataPath_;
-    // Guards displayName_, matchName16_, capsuleData_ and smDataPath_. Whoever holds it may take an ancestor's or the factory's.
+    // Guards displayName_, matchName16_, capsuleData_ and smDataPath_. Whoever holds it may take an ancestor's or the
+    // factory's.
     mutable hearth::threads::RecursiveMutex lock_{nullptr};
 };
 

@@ -48,8 +48,8 @@ using Q_AnyTree = boost::property_tree::basic_ptree<u16str, Q_Any>;
 // Operations on a tree, which it borrows.
 //
 // In JSON a node with children is an object, or an array if all its keys are empty; a node without children is its
-// value: a number, a text, or null. The root is always one of the first two, {} when it is empty. A node that has both a
-// value and children is an object too, with the value in front under Q_MixedValueKey.
+// value: a number, a text, or null. The root is always one of the first two, {} when it is empty. A node that has both
+// a value and children is an object too, with the value in front under Q_MixedValueKey.
 class KFS_SERVICE_API Q_AnyTreeWrapper {
 public:
     explicit Q_AnyTreeWrapper(Q_AnyTree& tree) noexcept : tree_(&tree) {}

@@ -1,15 +1,16 @@
 // Project files: a tree of chunks in a big-endian container, for reading and for writing.
 //
 // A chunk has a four-letter id and a length. A "LIST" also has a list type and holds chunks; every other chunk, an
-// atom, holds bytes. Ids are ints whose four bytes, most significant first, spell them: CKF_Id("kfbs"). Bytes of an atom
-// are written and read as they come; who calls swaps. docs/file-format.md has the layout and a worked example.
+// atom, holds bytes. Ids are ints whose four bytes, most significant first, spell them: CKF_Id("kfbs"). Bytes of an
+// atom are written and read as they come; who calls swaps. docs/file-format.md has the layout and a worked example.
 //
 // Errors   A CKF_File remembers the first failure: every later operation on it does nothing and gives the same code, so
 //          a save whose calls were never looked at still fails at Commit, and a broken file is broken from the first
 //          bad byte on. Only the answer that a chunk isn't there, CKF_Err_NoSuchChunk, is no failure. What the service
 //          throws is such a code, as an int.
 // Hostile  Nothing of a file is trusted. A length is held against what its parent has left before anything is
-// files    allocated or read, lists nest at most CKF_MaxDepth deep, and a search that found nothing isn't made again, so
+// files    allocated or read, lists nest at most CKF_MaxDepth deep, and a search that found nothing isn't made again,
+// so
 //          that reading costs time in proportion to the file whatever stands in it.
 // Threads  One file is used by one thread at a time. No lock.
 #pragma once
@@ -127,10 +128,10 @@ struct KFS_SERVICE_API CKF_File {
     int Create(char const* path, CKF_IoHook* hook = nullptr);
     int CreateInMemory(CKF_IoHook* hook = nullptr);
 
-    // Ends writing: all chunks must be closed. Puts version and lengths right, flushes the temporary file to disk, checks
-    // its size, renames it over the target and flushes the folder. Returns the first failure since Create, if there was
-    // one; the target is then untouched and the temporary file gone. The one exception is a folder that can't be flushed:
-    // the new file is in place, but may not survive a power cut.
+    // Ends writing: all chunks must be closed. Puts version and lengths right, flushes the temporary file to disk,
+    // checks its size, renames it over the target and flushes the folder. Returns the first failure since Create, if
+    // there was one; the target is then untouched and the temporary file gone. The one exception is a folder that can't
+    // be flushed: the new file is in place, but may not survive a power cut.
     int Commit();
     // Closes the file. One that was being written and not committed leaves nothing behind.
     void Close() noexcept;
@@ -140,8 +141,8 @@ struct KFS_SERVICE_API CKF_File {
     std::span<unsigned char const> GetBytes() const noexcept;
 
     void SetVersion(int major, int minor) noexcept;
-    // Whether time stamps that change without an edit go into this save. False at first, so that two saves of one project
-    // are the same bytes.
+    // Whether time stamps that change without an edit go into this save. False at first, so that two saves of one
+    // project are the same bytes.
     bool GetShouldWriteModificationTimes() const noexcept;
     void SetShouldWriteModificationTimes(bool wanted) noexcept;
     // A limit below the 4 GiB that the format has, for the files written from the next Create on.
@@ -188,8 +189,8 @@ private:
 // Writes a handle's bytes as an atom.
 KFS_SERVICE_API int CKF_WriteHandle(CKF_File* file, int id, char** handle);
 
-// Text goes into atoms as UTF-8 without a terminator. A surrogate that has no partner is written as the three bytes that
-// it would have as a code point, so every text comes back unit for unit.
+// Text goes into atoms as UTF-8 without a terminator. A surrogate that has no partner is written as the three bytes
+// that it would have as a code point, so every text comes back unit for unit.
 //
 // Writes a text as a CKF_Utf16Id atom. Throws on failure; the result is 0.
 KFS_SERVICE_API int CKF_WriteUTF16(CKF_File* file, u16str const& text);
@@ -205,11 +206,11 @@ KFS_SERVICE_API char** CKF_NewHandleFromString(u16str const& text, bool marked);
 // ---- reading
 //
 // A search looks forward from the present position to the end of the innermost open list and steps over what it doesn't
-// look for. One that finds nothing leaves the position where it was. `parent` is that list's info, or null; a chunk that
-// isn't the innermost open one is CKF_Err_Unbalanced.
+// look for. One that finds nothing leaves the position where it was. `parent` is that list's info, or null; a chunk
+// that isn't the innermost open one is CKF_Err_Unbalanced.
 
-// Finds the next atom with this id and copies its data: all of it, or the first `size` bytes. What is behind the data of
-// a shorter atom in the buffer stays untouched. The position is then behind the atom.
+// Finds the next atom with this id and copies its data: all of it, or the first `size` bytes. What is behind the data
+// of a shorter atom in the buffer stays untouched. The position is then behind the atom.
 KFS_SERVICE_API int CKF_ReadAtom(CKF_File* file, int id, CKF_ChunkInfo const* parent, int size, void* buffer);
 
 // A chunk that is entered for a scope. Descents nest like a stack.
@@ -222,8 +223,9 @@ public:
     CKF_ScDescend(CKF_ScDescend const&) = delete;
     CKF_ScDescend& operator=(CKF_ScDescend const&) = delete;
 
-    // Enters the next chunk with this id and list type; 0 stands for any. Throws on failure. A chunk that isn't there is
-    // a failure only where `found` is null, and then it is CKF_Err_NoSuchChunk; otherwise `found` says whether it was.
+    // Enters the next chunk with this id and list type; 0 stands for any. Throws on failure. A chunk that isn't there
+    // is a failure only where `found` is null, and then it is CKF_Err_NoSuchChunk; otherwise `found` says whether it
+    // was.
     void Descend(CKF_File* file, int id, int listType, CKF_ChunkInfo const* parent, bool* found);
 
     // The chunk entered, until this descent ends. All zero on an idle descent.

@@ -32,8 +32,8 @@ std::size_t FindLoneSurrogate(u16str const& text, std::size_t index) noexcept
     return index;
 }
 
-// The first three-byte form of a surrogate from an index on, or the number of bytes. A byte ED always begins a sequence,
-// so none is found inside another character.
+// The first three-byte form of a surrogate from an index on, or the number of bytes. A byte ED always begins a
+// sequence, so none is found inside another character.
 std::size_t FindSurrogateBytes(CKFp_Bytes bytes, std::size_t index) noexcept
 {
     for (; index < bytes.size(); ++index)

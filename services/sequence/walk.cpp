@@ -33,9 +33,9 @@ int SEQ_GetSortedConstItem(SEQ_Head const* const* list, long, void const* probe,
         *index = 0;
         return 0;
     }
-    // The first item that isn't before the probe is one of `size` items from `first` on, or the one behind them. How many
-    // steps there are and how far each goes depends on the count alone, so the only thing a step waits for is its own
-    // comparison: times come in an order that nothing can predict.
+    // The first item that isn't before the probe is one of `size` items from `first` on, or the one behind them. How
+    // many steps there are and how far each goes depends on the count alone, so the only thing a step waits for is its
+    // own comparison: times come in an order that nothing can predict.
     int first = 0;
     int equal = -1;  // the lowest item known to compare equal
     const auto isAfter = [&](int item) {

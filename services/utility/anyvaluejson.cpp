@@ -1,5 +1,5 @@
-// JSON text of trees. The library for JSON does lexing and escaping; trees are built and written here, so that order and
-// repeated keys stay, and depth is bounded on both ways.
+// JSON text of trees. The library for JSON does lexing and escaping; trees are built and written here, so that order
+// and repeated keys stay, and depth is bounded on both ways.
 #include "frame/services/anyvalue.h"
 
 #include <nlohmann/json.hpp>

@@ -11,7 +11,8 @@ struct Outcome {
     std::string errors;
 };
 
-// Runs the built command. The arguments need no quoting. `output`: where its standard output goes in place of the result.
+// Runs the built command. The arguments need no quoting. `output`: where its standard output goes in place of the
+// result.
 Outcome RunKfs(std::vector<std::string> const& arguments, std::string const& output = "");
 
 // A folder that goes away with its content.

@@ -86,4 +86,4 @@ TEST(Boundary, TurnsWhatIsThrownIntoAResult)
     EXPECT_THROW(KFSp_Boundary([] { throw 'x'; }), char);
 }
 
-} // namespace
+}  // namespace

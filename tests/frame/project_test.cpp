@@ -48,7 +48,8 @@ TEST_F(Projects, InitializingAgainReplacesBothContexts)
     project.InitializeContexts();
     EXPECT_NE(context, project.GetContext());
     EXPECT_EQ(&project, project.GetContext()->GetProject());
-    EXPECT_EQ(nullptr, project.GetRenderContext(false)->PeekState(KFS_ExpState::S_StateName)) << "states are the host's affair";
+    EXPECT_EQ(nullptr, project.GetRenderContext(false)->PeekState(KFS_ExpState::S_StateName))
+        << "states are the host's affair";
 }
 
 TEST_F(Projects, StatesAreFoundByTheirNames)
@@ -120,4 +121,4 @@ TEST_F(Projects, CapsuleBagsAreReplacedAndMergedForAScope)
     EXPECT_EQ(0u, overrides.GetCapsuleParamBag()->GetOverrideCount());
 }
 
-} // namespace
+}  // namespace

@@ -23,7 +23,9 @@ TEST_F(Reports, EveryCodeHasItsSentence)
         {7427, 14, "attempt to inquire about a key value in a time stream with no key values."},
         {7428, 19, "invalid time scale in time conversion."},
         {7429, 20, "addition caused time value overflow."},
-        {7430, 5, "attempt to insert a key value into a time stream at a time position not representable in the stream time scale."},
+        {7430, 5,
+         "attempt to insert a key value into a time stream at a time position not representable in the stream time "
+         "scale."},
         {7431, -3, "interpolation method not allowed for this stream (-3)."},
         {7432, 46, "invalid time stream information in file (header length)."},
         {7433, 33, "unknown error (7433)."},
@@ -51,7 +53,8 @@ TEST_F(Reports, NothingIsReportedForSuccess)
     EXPECT_NO_REPORT(reports);
 }
 
-// Only sentences that are formatted clear the thread's last error, and only the low half of the operation goes into the id.
+// Only sentences that are formatted clear the thread's last error, and only the low half of the operation goes into the
+// id.
 TEST_F(Reports, LastErrorAndIdFollowTheKindOfSentence)
 {
     Qp_SetThreadLastError(77);
@@ -71,7 +74,8 @@ TEST_F(Reports, RefusedCustomValuesNameWhatWasAsked)
     EXPECT_REPORT(reports, 81, "can#{rsquo}t convert to custom value");
 }
 
-// The texts and their order are what translators and readers of reports hold on to: one hundred rows, each with its own number.
+// The texts and their order are what translators and readers of reports hold on to: one hundred rows, each with its own
+// number.
 TEST_F(Reports, TableHoldsOneHundredNumberedRowsAndACloser)
 {
     Q_ZTable const& table = **KFS_G_zref;
@@ -96,4 +100,4 @@ TEST_F(Reports, DamagedStreamIsKnownByItsStampAlone)
     EXPECT_EQ(0, KFSp_CheckStream(23, TestStream().get(), 14));
 }
 
-} // namespace
+}  // namespace

@@ -59,4 +59,4 @@ TEST(TimeHelpers, EqualInstantsHashAlike)
     EXPECT_THROW(MixIn({1, 0}), int);
 }
 
-} // namespace
+}  // namespace

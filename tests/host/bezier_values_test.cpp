@@ -110,8 +110,8 @@ std::vector<Rational> TimesOf(json const& list)
     return times;
 }
 
-// Whether the curve comes within `tolerance` of `value` at most `reach` units from a time: how a curve is compared where it
-// is next to vertical, or where the time was printed with few digits.
+// Whether the curve comes within `tolerance` of `value` at most `reach` units from a time: how a curve is compared
+// where it is next to vertical, or where the time was printed with few digits.
 bool Reaches(KFS_Stream const& stream, Rational const& time, std::int64_t reach, double value, double tolerance)
 {
     double low = HUGE_VAL;
@@ -216,8 +216,8 @@ bool IsInside(std::vector<CurveKey> const& keys, Rational const& time)
 
 }  // namespace
 
-// Most are printed with six digits, times too, and the program that made them is good to about as much: a value must be met
-// within two millionths of its time.
+// Most are printed with six digits, times too, and the program that made them is good to about as much: a value must be
+// met within two millionths of its time.
 TEST_F(SampledSplines, BaselinesAreMet)
 {
     int compared = 0;

@@ -35,8 +35,8 @@ double RangeOf(json const& values)
     return high > low ? high - low : std::max(std::abs(high), 1.0);
 }
 
-// What a curve has within a stretch of time: its value must be met in it, since keys and samples are where the scale has a
-// unit for them.
+// What a curve has within a stretch of time: its value must be met in it, since keys and samples are where the scale
+// has a unit for them.
 struct Met {
     double low = HUGE_VAL;
     double high = -HUGE_VAL;

@@ -173,7 +173,8 @@ struct Owned {
     }
     static int Dispose(KFS_Stream const* stream, long, short, void* block)
     {
-        EXPECT_EQ(KFS_StreamValidStamp, stream->GetStamp()) << "a stream that dies is whole until its values are given back";
+        EXPECT_EQ(KFS_StreamValidStamp, stream->GetStamp())
+            << "a stream that dies is whole until its values are given back";
         int* held = nullptr;
         std::memcpy(&held, block, sizeof held);
         std::free(held);
@@ -244,7 +245,9 @@ TEST_F(Cache, AKeyThatCannotBeCopiedLeavesItEmpty)
 TEST_F(Cache, ARenderReadsItsOwnCopyAndLeavesTheStreamAlone)
 {
     TestStream stream({.dimension = 2, .spatial = true});
-    stream.Key(0, {0.0, 0.0}, KFS_Interp_Spline).Key(600, {3.0, 4.0}, KFS_Interp_Spline).Key(1200, {9.0, 4.0}, KFS_Interp_Spline);
+    stream.Key(0, {0.0, 0.0}, KFS_Interp_Spline)
+        .Key(600, {3.0, 4.0}, KFS_Interp_Spline)
+        .Key(1200, {9.0, 4.0}, KFS_Interp_Spline);
     const auto stale = stream.Stale();
     const auto arcStale = stream.ArcStale();
     ASSERT_NE(TestStream::NotStale, arcStale);
@@ -311,4 +314,4 @@ TEST_F(Cache, CopyingKeyDataWithoutMemoryThrows4AndLeaksNothing)
     EXPECT_GE(failures, 4);
 }
 
-} // namespace
+}  // namespace

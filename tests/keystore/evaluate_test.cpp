@@ -36,12 +36,13 @@ public:
     {
         Run(stream, time, value);
     }
-    void EvalNoExprValue(KFS_Stream const* stream, int time, int, void* value, unsigned char* atKey, KFS_ParamBag const*,
-                         KFS_InterpFunc* interpFunc, long refcon) override
+    void EvalNoExprValue(KFS_Stream const* stream, int time, int, void* value, unsigned char* atKey,
+                         KFS_ParamBag const*, KFS_InterpFunc* interpFunc, long refcon) override
     {
         KFS_GetValueNoExpr(stream, time, 0, value, atKey, nullptr, interpFunc, refcon);
     }
-    void EvalNoExprValueF(KFS_Stream const* stream, int time, int, double* value, unsigned char* atKey, KFS_ParamBag const*) override
+    void EvalNoExprValueF(KFS_Stream const* stream, int time, int, double* value, unsigned char* atKey,
+                          KFS_ParamBag const*) override
     {
         KFS_GetValueFNoExpr(stream, time, 0, value, atKey, nullptr);
     }
@@ -111,7 +112,8 @@ TEST_F(Evaluate, TheStagesGoInTheirOrder)
              engine->expression = [](KFS_Stream const*, int, double*) -> int { return KFS_Err_ExprNoValue; };
          },
          0, 0, 2.0, 1},
-        {"any other error is the result", [&] { engine->expression = [](KFS_Stream const*, int, double*) { return 99; }; }, 0, 99, -1.0, 9},
+        {"any other error is the result",
+         [&] { engine->expression = [](KFS_Stream const*, int, double*) { return 99; }; }, 0, 99, -1.0, 9},
     };
     const T_Time at{100, 600};
     for (const Row& row : rows) {
@@ -225,12 +227,14 @@ TEST_F(Evaluate, DamagedStreamsAreRefusedUntouched)
     };
     const Row rows[] = {
         {113, "get a value from", [&] { return KFS_GetValue(stream, &at, 0, &value, &atKey, nullptr); }},
-        {113, "get a value from", [&] { return KFS_GetValuePlus(stream, &at, 0, &value, &atKey, nullptr, nullptr, 0); }},
+        {113, "get a value from",
+         [&] { return KFS_GetValuePlus(stream, &at, 0, &value, &atKey, nullptr, nullptr, 0); }},
         {113, "get a value from", [&] { return KFS_GetValueF(stream, &at, 0, &value, &atKey, nullptr); }},
         {113, "get a value from", [&] { return KFS_GetValueFPlus(stream, &at, 0, &value, &atKey, nullptr); }},
         {36, "get a value from",
          [&] { return KFSp_Boundary([&] { KFS_GetValueNoExpr(stream, 0, 0, &value, &atKey, nullptr, nullptr, 0); }); }},
-        {36, "get a value from", [&] { return KFSp_Boundary([&] { KFS_GetValueFNoExpr(stream, 0, 0, &value, &atKey, nullptr); }); }},
+        {36, "get a value from",
+         [&] { return KFSp_Boundary([&] { KFS_GetValueFNoExpr(stream, 0, 0, &value, &atKey, nullptr); }); }},
         {115, "get a value from", [&] { return KFS_GetValuesFPlus(stream, &at, &at, 1, 0, &handle); }},
         {105, "dispose", [&] { return KFS_DisposeValue(stream, &value); }},
         {9, "set value description", [&] { return KFS_SetValueDescription(stream, nullptr, nullptr); }},
@@ -311,7 +315,8 @@ public:
     using KFS_Stream::KFS_Stream;
     KFS_Stream const* GetSeparationFollower(int dimension) const override
     {
-        return dimension < static_cast<int>(followers.size()) ? followers[static_cast<std::size_t>(dimension)] : nullptr;
+        return dimension < static_cast<int>(followers.size()) ? followers[static_cast<std::size_t>(dimension)]
+                                                              : nullptr;
     }
     void GetSeparationFollowers(std::vector<KFS_Stream const*>& found) const override { found = followers; }
     std::vector<KFS_Stream const*> followers;
@@ -339,7 +344,8 @@ TEST_F(Evaluate, SeparatedDimensionsAnswerFromTheirFollowers)
     double separated[3] = {-1.0, -1.0, -1.0};
     atKey = 9;
     ASSERT_EQ(0, KFS_GetValueFPlus(&leader, &at, 0, separated, &atKey, nullptr));
-    EXPECT_EQ((std::vector{15.0, 5.0, -1.0}), std::vector(separated, separated + 3)) << "without a follower a place stays";
+    EXPECT_EQ((std::vector{15.0, 5.0, -1.0}), std::vector(separated, separated + 3))
+        << "without a follower a place stays";
     EXPECT_EQ(9, atKey);
     leader.ForceInterpolateAtTime(at);  // whose buffer has to hold the followers' doubles, and not three bytes
     char** handle = nullptr;
@@ -399,4 +405,4 @@ TEST_F(Evaluate, ReadsAllocateNothing)
     Q_FailAllocation(0);
 }
 
-} // namespace
+}  // namespace

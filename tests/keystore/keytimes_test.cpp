@@ -69,4 +69,4 @@ TEST_F(KeyTimes, OrderIsByTheDifferenceWithWrapAround)
     EXPECT_EQ(index, viaList);
 }
 
-} // namespace
+}  // namespace

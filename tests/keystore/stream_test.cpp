@@ -9,9 +9,11 @@ namespace {
 
 class Streams : public StreamTest {};
 
-int ConstructionCode(short dimension, bool spatial, unsigned short interpMask, unsigned short spInterpMask, KFS_ValueDesc const& desc)
+int ConstructionCode(short dimension, bool spatial, unsigned short interpMask, unsigned short spInterpMask,
+                     KFS_ValueDesc const& desc)
 {
-    return KFSp_Boundary([&] { KFS_Stream(dimension, 600, 0, spatial, interpMask, spInterpMask, desc, nullptr, nullptr, false); });
+    return KFSp_Boundary(
+        [&] { KFS_Stream(dimension, 600, 0, spatial, interpMask, spInterpMask, desc, nullptr, nullptr, false); });
 }
 
 KFS_ValueDesc Plain(int type)
@@ -55,7 +57,7 @@ TEST_F(Streams, ConstructionSetsWhatItsArgumentsAskFor)
         {1, false, 8, 0, 0},
         {2, true, 0, 0x2 | 0x4 | 0x8, 0},
         {3, true, 8, 0x2 | 0x4 | 0x8, 3},
-        {4, true, 8, 0x2 | 0x4, 0},     // no arc length, and no automatic tangents, above three dimensions
+        {4, true, 8, 0x2 | 0x4, 0},  // no arc length, and no automatic tangents, above three dimensions
     };
     for (const Row& row : rows) {
         SCOPED_TRACE(row.dimension);
@@ -81,7 +83,8 @@ TEST_F(Streams, ConstructionRefusesWhatCannotBe)
     EXPECT_EQ(7433, ConstructionCode(1, false, 7, 0, Custom(40000)));
     EXPECT_NO_REPORT(reports);
     // Automatic tangents are code 3, whose permit is the hold bit of the temporal mask.
-    EXPECT_EQ(7431, ConstructionCode(2, true, KFS_InterpMask_Linear | KFS_InterpMask_Spline, 8, Plain(KFS_Type_Double)));
+    EXPECT_EQ(7431,
+              ConstructionCode(2, true, KFS_InterpMask_Linear | KFS_InterpMask_Spline, 8, Plain(KFS_Type_Double)));
     EXPECT_REPORT(reports, 15, "spatial interpolation method not allowed for this stream (3).");
 }
 
@@ -192,7 +195,7 @@ TEST_F(Streams, AClonesKeysAreItsOwn)
     TestStream source({.dimension = 2, .spatial = true});
     source.Key(0, {0.0, 0.0}).Key(600, {3.0, 4.0}).Key(1200, {6.0, 0.0});
     ASSERT_EQ((std::vector{3.0, 4.0}), source.At(600));
-    source.At(300);     // measures the arcs
+    source.At(300);  // measures the arcs
     ASSERT_NE(nullptr, source.Record(0)->remapTable);
     source->SetDisabledUpdateStream(true);
     const std::unique_ptr<KFS_StreamBase> base(source->Clone(true));
@@ -223,17 +226,16 @@ TEST_F(Streams, CloningWithoutMemoryThrows4AndLeaksNothing)
     TestStream source({.dimension = 2, .spatial = true});
     source.Key(0, {0.0, 0.0}).Key(600, {3.0, 4.0});
     source.At(300);
-    const int failures = FailEveryAllocation([&] { return std::make_unique<KFS_StreamBase*>(nullptr); },
-                                             [&](KFS_StreamBase*& clone) {
-                                                 clone = source->Clone(true);
-                                                 delete clone;
-                                                 return 0;
-                                             },
-                                             [](KFS_StreamBase*&, int, Q_MemoryCount const& before) {
-                                                 EXPECT_EQ(before, Q_MemoryLive(nullptr));
-                                             });
+    const int failures = FailEveryAllocation(
+        [&] { return std::make_unique<KFS_StreamBase*>(nullptr); },
+        [&](KFS_StreamBase*& clone) {
+            clone = source->Clone(true);
+            delete clone;
+            return 0;
+        },
+        [](KFS_StreamBase*&, int, Q_MemoryCount const& before) { EXPECT_EQ(before, Q_MemoryLive(nullptr)); });
     EXPECT_GE(failures, 3);
-    reports.Take();     // std::bad_alloc is reported where it is translated
+    reports.Take();  // std::bad_alloc is reported where it is translated
 }
 
 TEST_F(Streams, NothingIsLeftAfterEverything)
@@ -255,4 +257,4 @@ TEST_F(Streams, NothingIsLeftAfterEverything)
     EXPECT_EQ(before, Q_MemoryLive(nullptr));
 }
 
-} // namespace
+}  // namespace

@@ -1,6 +1,7 @@
 #include "keystore/stream.h"
 
 #include "frame/errors.h"
+#include "keystore/attributes.h"
 #include "overrides/streamexpression.h"
 #include "tests/persist/leaffile.h"
 #include "tests/support/listening.h"
@@ -351,25 +352,55 @@ TEST_F(LeafRead, AllKeysAreStaleHoweverMany)
     EXPECT_EQ(69998.5, (stream.Key(140000, {0.0}), stream.At1(69998) + 0.5));
 }
 
+// A class whose values own something.
+class OwnedLeaf : public KFS_Stream {
+public:
+    OwnedLeaf() : KFS_Stream(1, 600, 1, 0, KFS_InterpMask_All, 0, Desc(), nullptr, nullptr, false)
+    {
+        EXPECT_EQ(0, KFS_SetCustomFuncs(this, OwnedValues::Copy, OwnedValues::Dispose));
+    }
+
+private:
+    static KFS_ValueDesc Desc()
+    {
+        KFS_ValueDesc desc;
+        desc.isCustom = 1;
+        desc.itemSize = sizeof(OwnedValues::Ticket);
+        desc.interpFunc = OwnedValues::Interpolate;
+        return desc;
+    }
+};
+
+// The stream owns what the file brings, and has given back what it had.
 TEST_F(LeafRead, ValuesThatOwnSomething)
 {
-    OwnedValues::Reset();
-    {
-        auto const stream = OwnedValues::MakeStream(true);
-        OwnedValues::Ticket const first = OwnedValues::Make(1.0);
-        T_Time const at{0, 600};
-        ASSERT_EQ(0, KFS_InsertKey(stream.get(), &at, 1, &first, 0, 0));
-        OwnedValues::Free(first);
-        ASSERT_EQ(1, OwnedValues::Live());
-        // A ticket that the file brings: the stream owns it from then on, and has given back the one that it had.
-        OwnedValues::Ticket const second = OwnedValues::Make(2.0);
-        LeafRecord record;
-        record.Put(56, Short(1)).Put(58, Short(4));
-        std::string const data(reinterpret_cast<char const*>(&second), sizeof second);
-        ASSERT_EQ(0, ReadLeaf(stream.get(), Form(Leaf(record, Atom("cdat", data)))));
-        EXPECT_EQ(1, OwnedValues::Live());
+    for (bool const derived : {false, true}) {
+        SCOPED_TRACE(derived);
+        OwnedValues::Reset();
+        {
+            std::unique_ptr<KFS_Stream> const stream =
+                derived ? std::make_unique<OwnedLeaf>() : OwnedValues::MakeStream(true);
+            OwnedValues::Ticket const first = OwnedValues::Make(1.0);
+            T_Time const at{0, 600};
+            ASSERT_EQ(0, KFS_InsertKey(stream.get(), &at, 1, &first, 0, 0));
+            OwnedValues::Free(first);
+            ASSERT_EQ(1, OwnedValues::Live());
+            OwnedValues::Ticket const second = OwnedValues::Make(2.0);
+            std::string const data(reinterpret_cast<char const*>(&second), sizeof second);
+            LeafRecord constant;
+            constant.Put(56, Short(1)).Put(58, Short(4));
+            ASSERT_EQ(0, ReadLeaf(stream.get(), Form(Leaf(constant, Atom("cdat", data)))));
+            EXPECT_EQ(1, OwnedValues::Live());
+            OwnedValues::Ticket const third = OwnedValues::Make(3.0);
+            std::string const key =
+                KeyHead(0, 1, 1, 0) + std::string(reinterpret_cast<char const*>(&third), sizeof third);
+            LeafRecord keyed = constant;
+            keyed.Flags(0).HasList();
+            ASSERT_EQ(0, ReadLeaf(stream.get(), Form(Leaf(keyed, Keys(12, {key})))));
+            EXPECT_EQ(1, OwnedValues::Live());
+        }
+        EXPECT_EQ(0, OwnedValues::Live());
     }
-    EXPECT_EQ(0, OwnedValues::Live());
 }
 
 // A stream of any shape comes back with the same bytes and the same values at all times.

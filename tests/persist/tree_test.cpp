@@ -6,6 +6,7 @@
 #include "tree/paramstreams.h"
 
 #include <limits>
+#include <random>
 #include <utility>
 
 namespace {
@@ -167,6 +168,32 @@ TEST_F(Tree, LeavesThatDifferAreWritten)
         auto const node = MakeNode();
         edit.make(node->GetEditableStream(Name("opacity")));
         Lines const expected = edit.isWritten ? Lines{"opacity", "transform"} : Lines{"transform"};
+        EXPECT_EQ(expected, NamesIn(WrittenGroup(node.get())));
+    }
+}
+
+// Either end of a slider's range that isn't the canonical one's is a difference; a NaN is one even from itself.
+TEST_F(Tree, RangesThatDifferAreWritten)
+{
+    float const nan = std::numeric_limits<float>::quiet_NaN();
+    struct {
+        float low, high, canonicalLow, canonicalHigh;
+        bool isWritten;
+    } const cases[] = {{0, 10, 0, 10, false}, {-1, 10, 0, 10, true},  {1, 10, 0, 10, true},
+                       {0, 9, 0, 10, true},   {0, 11, 0, 10, true},   {nan, 10, 0, 10, true},
+                       {0, nan, 0, 10, true}, {0, 10, nan, 10, true}, {0, nan, 0, nan, true}};
+    for (auto const& c : cases) {
+        SCOPED_TRACE(testing::Message() << c.low << ' ' << c.high << ' ' << c.canonicalLow << ' ' << c.canonicalHigh);
+        FX_ParamDef def{};
+        def.paramType = FX_Param_FLOAT_SLIDER;
+        def.value.floatSlider.sliderMin = c.canonicalLow;
+        def.value.floatSlider.sliderMax = c.canonicalHigh;
+        Get_VX_StreamFactory()->GetCanonicalStream(Name("opacity"))->SetParamDef(def);
+        auto const node = MakeNode();
+        def.value.floatSlider.sliderMin = c.low;
+        def.value.floatSlider.sliderMax = c.high;
+        node->GetEditableStream(Name("opacity"))->SetParamDef(def);
+        Lines const expected = c.isWritten ? Lines{"opacity", "transform"} : Lines{"transform"};
         EXPECT_EQ(expected, NamesIn(WrittenGroup(node.get())));
     }
 }
@@ -490,6 +517,46 @@ TEST_F(Tree, BrokenFilesLeaveAWholeTree)
         }
         ASSERT_EQ(before, Q_MemoryLive(nullptr));
     }
+}
+
+// Whatever stands in a file, reading it gives a tree that can be written, and nothing is left of it afterwards.
+TEST_F(Tree, FilesThatNobodyWrote)
+{
+    auto const layers = MakeLayers();
+    auto* const node = static_cast<KFS_NamedStreamGroup*>(Append(layers.get(), "node"));
+    SetValue(node->GetEditableStream(Name("opacity")), 1.0);
+    SetValue(Append(Append(layers.get(), "layers")->GetAsIndexedGroup(), "opacity"), 2.0);
+    std::vector<unsigned char> const whole = WrittenGroup(layers.get()).Bytes();
+    std::mt19937 random(5);
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
+    for (int round = 0; round < 1500; ++round) {
+        std::vector<unsigned char> bytes = whole;
+        for (int i = 0; i < 1 + round % 6; ++i) {
+            bytes[32 + random() % (bytes.size() - 32)] =
+                static_cast<unsigned char>(random() % 3 == 0 ? random() : random() % 4);
+        }
+        auto const other = MakeLayers();
+        CKF_File file;
+        if (file.Open(bytes) == 0 && KFSp_Boundary([&] { other->Read(&file, nullptr); }) == 0) {
+            WrittenGroup(other.get());
+        }
+        static_cast<void>(reports.Take());
+    }
+    // Names that files bring are kept for good, texts of reports too.
+    EXPECT_LT(Q_MemoryLive(nullptr).bytes - before.bytes, 1 << 20);
+}
+
+TEST_F(Tree, GroupsInGroupsHaveAnEnd)
+{
+    auto const nested = [](int depth) {
+        std::string file = Group(Marker, "");
+        for (int i = 1; i < depth; ++i) {
+            file = Group(Marker, MatchName("layers") + file);
+        }
+        return Form(file);
+    };
+    EXPECT_EQ(0, ReadGroup(MakeLayers().get(), nested(CKF_MaxDepth / 2)));
+    EXPECT_EQ(CKF_Err_TooDeep, ReadGroup(MakeLayers().get(), nested(2 * CKF_MaxDepth)));
 }
 
 }  // namespace

@@ -13,14 +13,14 @@
 struct Reported {
     int id = 0;
     int severity = 0;
-    std::string text;   // empty where only a code was reported
+    std::string text;  // empty where only a code was reported
     int code = 0;
 
     bool operator==(Reported const&) const = default;
     friend std::ostream& operator<<(std::ostream& out, Reported const& report)
     {
-        return out << std::hex << "0x" << report.id << std::dec << " severity " << report.severity << " code " << report.code
-                   << " \"" << report.text << '"';
+        return out << std::hex << "0x" << report.id << std::dec << " severity " << report.severity << " code "
+                   << report.code << " \"" << report.text << '"';
     }
 };
 
@@ -30,8 +30,8 @@ inline Reported KfsReport(int operation, std::string text)
     return {operation | 0x1D0000, 8, std::move(text), 0};
 }
 
-// Takes all reports for its scope. Whatever a test doesn't take with Take() is a failure at the end, so an unexpected report never
-// goes unseen. Reports may come from any thread.
+// Takes all reports for its scope. Whatever a test doesn't take with Take() is a failure at the end, so an unexpected
+// report never goes unseen. Reports may come from any thread.
 class ReportRecorder {
 public:
     ReportRecorder()
@@ -39,8 +39,7 @@ public:
               std::lock_guard const guard(mutex_);
               seen_.push_back({report.id, report.severity, report.text ? report.text : "", report.code});
           }))
-    {
-    }
+    {}
     ~ReportRecorder()
     {
         Q_SetReportSink(previous_);
@@ -65,5 +64,6 @@ private:
 };
 
 // The only report since the last Take(), or a failure.
-#define EXPECT_REPORT(recorder, operation, text) EXPECT_EQ((recorder).Take(), std::vector<Reported>{KfsReport(operation, text)})
+#define EXPECT_REPORT(recorder, operation, text)                                                                       \
+    EXPECT_EQ((recorder).Take(), std::vector<Reported>{KfsReport(operation, text)})
 #define EXPECT_NO_REPORT(recorder) EXPECT_EQ((recorder).Take(), std::vector<Reported>{})

@@ -23,7 +23,7 @@ struct StreamOptions {
     bool noKeys = false;
     bool spatial = false;
     unsigned short interpMask = KFS_InterpMask_All;
-    unsigned short spInterpMask = KFS_InterpMask_Negative;      // spatial streams get automatic tangents
+    unsigned short spInterpMask = KFS_InterpMask_Negative;  // spatial streams get automatic tangents
     signed char type = KFS_Type_Double;
 };
 
@@ -31,8 +31,8 @@ inline std::unique_ptr<KFS_Stream> MakeStream(StreamOptions const& options = {})
 {
     KFS_ValueDesc desc;
     desc.dataType = options.type;
-    return std::make_unique<KFS_Stream>(options.dimension, options.timeScale, options.noKeys, options.spatial, options.interpMask,
-                                        options.spInterpMask, desc, nullptr, nullptr, false);
+    return std::make_unique<KFS_Stream>(options.dimension, options.timeScale, options.noKeys, options.spatial,
+                                        options.interpMask, options.spInterpMask, desc, nullptr, nullptr, false);
 }
 
 // A stream with short words for what tests do all the time. Times are values in the stream's scale.
@@ -95,16 +95,21 @@ public:
 
     // The stale ranges: {first, last} of tangents and of arcs.
     std::array<int, 2> Stale() const { return {stream_->GetInvalidKeyIndex()[0], stream_->GetInvalidKeyIndex()[1]}; }
-    std::array<int, 2> ArcStale() const { return {stream_->GetArcInvalidKeyIndex()[0], stream_->GetArcInvalidKeyIndex()[1]}; }
+    std::array<int, 2> ArcStale() const
+    {
+        return {stream_->GetArcInvalidKeyIndex()[0], stream_->GetArcInvalidKeyIndex()[1]};
+    }
     static constexpr std::array<int, 2> NotStale{KFS_INVALID_INDEX, KFS_INVALID_INDEX};
 
-    // A copy of everything stored: every byte of every record, to see that nothing changed. Arc tables count by address.
+    // A copy of everything stored: every byte of every record, to see that nothing changed. Arc tables count by
+    // address.
     std::vector<unsigned char> Bytes() const
     {
         std::vector<unsigned char> bytes;
         for (int i = 0; i < Count(); ++i) {
             auto const* const record = reinterpret_cast<unsigned char const*>(Record(i));
-            bytes.insert(bytes.end(), record, record + KFSp_ValueDataOffset(Record(i)) + static_cast<int>(8 * Numbers(i).size()));
+            bytes.insert(bytes.end(), record,
+                         record + KFSp_ValueDataOffset(Record(i)) + static_cast<int>(8 * Numbers(i).size()));
         }
         return bytes;
     }
@@ -146,8 +151,9 @@ inline Reported DamagedReport(int operation, std::string const& action)
     return KfsReport(operation, "attempt to " + action + " an internally damaged time stream.");
 }
 
-// Runs `edit` with the n-th allocation failing, for n = 1, 2, ... until it gets through untouched. `make` builds the fixture anew each
-// time, `edit` takes it and answers the code, `check` looks at it after each failure. Answers how many failures there were.
+// Runs `edit` with the n-th allocation failing, for n = 1, 2, ... until it gets through untouched. `make` builds the
+// fixture anew each time, `edit` takes it and answers the code, `check` looks at it after each failure. Answers how
+// many failures there were.
 template <class Make, class Edit, class Check>
 int FailEveryAllocation(Make&& make, Edit&& edit, Check&& check)
 {

@@ -59,12 +59,13 @@ protected:
     TestStream spatial{{.dimension = 3, .spatial = true}};
 };
 
-// The host's gate: the main thread holds its edits until every render has its copies. From then on reads and edits run side by side.
+// The host's gate: the main thread holds its edits until every render has its copies. From then on reads and edits run
+// side by side.
 TEST_F(RenderThreads, RendersSeeTheStreamsAsTheyStoodWhileTheMainThreadEdits)
 {
     const std::vector<double> asTheyStood = Sample();
     std::mt19937 random(11);
-    Edit(random);       // leaves stale ranges for the copies to repair
+    Edit(random);  // leaves stale ranges for the copies to repair
     const std::vector<double> expected = [&] {
         const Q_ScSetCurrentRenderContext current(kfshost::MakeRenderContext(true));
         return Sample();
@@ -79,7 +80,7 @@ TEST_F(RenderThreads, RendersSeeTheStreamsAsTheyStoodWhileTheMainThreadEdits)
     for (int r = 0; r < Renders; ++r) {
         renders.emplace_back([&] {
             const Q_ScSetCurrentRenderContext current(kfshost::MakeRenderContext(true));
-            const std::vector<double> first = Sample();     // under the gate: nobody edits
+            const std::vector<double> first = Sample();  // under the gate: nobody edits
             ++ready;
             while (!go) {
                 std::this_thread::yield();
@@ -139,4 +140,4 @@ TEST_F(RenderThreads, ReportsOfRendersDontMix)
     }
 }
 
-} // namespace
+}  // namespace

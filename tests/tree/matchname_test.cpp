@@ -27,13 +27,15 @@ TEST(MatchName, TextGoesInAndComesBackOut)
     EXPECT_EQ(position, other);
 }
 
-// The hash of a text is the same in every process: MurmurHash3 x64 128 of all its bytes, also of those that the pool doesn't keep.
+// The hash of a text is the same in every process: MurmurHash3 x64 128 of all its bytes, also of those that the pool
+// doesn't keep.
 TEST(MatchName, HashIsOfTheWholeText)
 {
     const KFS_MatchName empty("", true);
     EXPECT_FALSE(empty.IsValid()) << "the hash of no bytes is all zero, like a name that was never set";
     EXPECT_EQ(empty, KFS_MatchName(static_cast<char const*>(nullptr), true));
-    const hearth::utility::Guid published({0x6c, 0x1b, 0x07, 0xbc, 0x7b, 0xbc, 0x4b, 0xe3,     // h1 and h2 of a well-known vector
+    const hearth::utility::Guid published({0x6c, 0x1b, 0x07, 0xbc, 0x7b, 0xbc, 0x4b,
+                                           0xe3,  // h1 and h2 of a well-known vector
                                            0x47, 0x93, 0x9a, 0xc4, 0xa9, 0x3c, 0x43, 0x7a});
     EXPECT_TRUE(published == KFS_MatchName("The quick brown fox jumps over the lazy dog", true).GetGuid());
     const std::string common(45, 'x');
@@ -97,8 +99,9 @@ TEST(MatchNameThreads, ManyThreadsInternOneEntryAText)
     }
     EXPECT_EQ(0, differing);
     for (int i = 0; i < Texts; ++i) {
-        EXPECT_EQ(first[static_cast<std::size_t>(i)], KFS_MatchName(("interned at once " + std::to_string(i)).c_str(), true).GetName());
+        EXPECT_EQ(first[static_cast<std::size_t>(i)],
+                  KFS_MatchName(("interned at once " + std::to_string(i)).c_str(), true).GetName());
     }
 }
 
-} // namespace
+}  // namespace

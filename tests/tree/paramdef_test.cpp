@@ -24,7 +24,9 @@ TEST(ParamDef, OnlyThreeKindsOwnAName)
 {
     for (int kind = -1; kind < 40; ++kind) {
         const FX_ParamDef def = OfKind(kind);
-        EXPECT_EQ(kind == FX_Param_BOOL || kind == FX_Param_CHOICE || kind == FX_Param_LABEL, FX_ParamDef_HasParamName(&def)) << kind;
+        EXPECT_EQ(kind == FX_Param_BOOL || kind == FX_Param_CHOICE || kind == FX_Param_LABEL,
+                  FX_ParamDef_HasParamName(&def))
+            << kind;
     }
 }
 
@@ -78,7 +80,8 @@ TEST(ParamDef, NamesAreCutToTheirPlace)
     EXPECT_EQ(Text("0123456789012345678901234567890"), FX_ParamDef_GetName(&def));
 }
 
-// The integer sliders' minimum and the float slider's precision and display flags share four bytes; unit names rely on it.
+// The integer sliders' minimum and the float slider's precision and display flags share four bytes; unit names rely on
+// it.
 TEST(ParamDef, SlidersOverlay)
 {
     FX_ParamDef def{};
@@ -87,4 +90,4 @@ TEST(ParamDef, SlidersOverlay)
     EXPECT_EQ(5, def.value.floatSlider.displayFlags);
 }
 
-} // namespace
+}  // namespace

@@ -213,7 +213,7 @@ TEST_F(StreamBase, AncestorsHearOfAStoredStreamOnce)
     const TestStream leaf, second;
     root.Store(&middle);
     root.stored.clear();
-    root.alsoStore = second;    // stores a further stream from inside the notification
+    root.alsoStore = second;  // stores a further stream from inside the notification
     middle.Store(leaf);
     using Pairs = std::vector<std::pair<KFS_StreamGroup*, KFS_StreamBase*>>;
     EXPECT_EQ((Pairs{{&middle, leaf.get()}}), middle.stored);
@@ -251,7 +251,7 @@ TEST_F(StreamBase, ListenersHearOnlyTreesThatAskToBeHeard)
         EXPECT_EQ(Heard{}, listener.Take());
         root.Store(leaf);
         leaf->SetHidden(false);
-        leaf->SetHidden(false);     // changes nothing
+        leaf->SetHidden(false);  // changes nothing
         leaf->NotifyValueChanged();
         leaf->SetDisplayName(Text("y"));
         EXPECT_EQ(1, root.probes) << "asked once";
@@ -283,7 +283,8 @@ TEST_F(StreamBase, ComparedNamesAreAChangeOfFlagsAndFilledInOnesNoNews)
     leaf->pSetDisplayName(Text("blur"));
     EXPECT_EQ(Heard{}, listener.Take());
     EXPECT_TRUE(leaf->IsMatchNameSameAsDisplayName());
-    EXPECT_EQ((Heard{"flags 1 to 524289", "flags 524289 to 786433"}), listener.Take()) << "the answer first, then that it holds";
+    EXPECT_EQ((Heard{"flags 1 to 524289", "flags 524289 to 786433"}), listener.Take())
+        << "the answer first, then that it holds";
     EXPECT_TRUE(leaf->IsMatchNameSameAsDisplayName());
     leaf->pSetDisplayName(Text("Blur"));
     EXPECT_EQ(Heard{}, listener.Take());
@@ -354,4 +355,4 @@ TEST_F(StreamBase, SwappingTheBaseLeavesThePlace)
     EXPECT_FALSE(b->IsHidden());
 }
 
-} // namespace
+}  // namespace
