@@ -1,6 +1,6 @@
 #pragma once
 
-// Everything that a host of the animation store includes.
+// What a host of the animation store includes. Reports, chunk files and the other services have headers of their own in frame/services/.
 
 #include "curves/floatkeys.h"
 #include "curves/spacetangents.h"

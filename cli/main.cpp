@@ -154,7 +154,7 @@ try {
                "  kfs plot walk.glb --stream '*/Hips/translation' -o hips.svg\n"
                "  kfs plot walk.glb --motion --stream '*/Hips/translation' -o path.svg\n"
                "\n"
-               "Errors are one line on the standard error and exit code 2; nothing is written then.");
+               "What is wrong with a file is one line on the standard error and exit code 2; nothing is written then.");
     InfoOptions info;
     EvalOptions eval;
     PlotOptions plot;

@@ -232,7 +232,7 @@ private:
             }
         }
         for (Note const& note : notes) {
-            svg_.Text({note.at.x, note.at.y + 21}, note.text, {12.0, "#333333", Anchor::Middle});
+            svg_.Text({note.at.x, note.at.y + 21}, note.text, {12.0, "#333333", Anchor::Middle, false, true});
         }
     }
 
@@ -294,7 +294,9 @@ private:
             line("tangent", [&](Point at) { DrawTangent(svg_, {at.x - 14, at.y}, {at.x + 14, at.y}); });
         }
         svg_.Text({left, y + 16}, fmt::format("{} keys", motion.samples.keys.size()), {13.0, "#666666"});
-        svg_.Text({left, y + 36}, fmt::format("{:.4g} units long", motion.length), {13.0, "#666666"});
+        if (motion.length > 0.0) {
+            svg_.Text({left, y + 36}, fmt::format("{:.4g} units long", motion.length), {13.0, "#666666"});
+        }
     }
 
     void DrawSpeed(Motion const& motion)

@@ -96,7 +96,7 @@ void Svg::Diamond(Point center, double radius, std::string_view fill, Pen const&
 void Svg::Text(Point at, std::string_view text, Font const& font)
 {
     fmt::format_to(std::back_inserter(text_),
-                   "<text x=\"{:.2f}\" y=\"{:.2f}\" font-size=\"{}\" fill=\"{}\" text-anchor=\"{}\"{}>{}</text>\n",
+                   "<text x=\"{:.2f}\" y=\"{:.2f}\" font-size=\"{}\" fill=\"{}\" text-anchor=\"{}\"{}{}>{}</text>\n",
                    at.x, at.y, font.size, font.color, NameOf(font.anchor), font.bold ? " font-weight=\"bold\"" : "",
-                   Escape(text));
+                   font.halo ? " stroke=\"#ffffff\" stroke-width=\"3\" paint-order=\"stroke\"" : "", Escape(text));
 }

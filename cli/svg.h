@@ -24,6 +24,7 @@ struct Font {
     std::string_view color = "#333333";
     Anchor anchor = Anchor::Start;
     bool bold = false;
+    bool halo = false;  // a white rim, for text on top of lines
 };
 
 // An SVG drawing as it grows.

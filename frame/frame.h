@@ -11,8 +11,8 @@ class KFS_RenderOptionsBase;
 class KFS_StreamFactory;
 class KFS_StreamIDPath;
 
-// What the library asks of its application. An entry is called without a look whether it is null: the host sets all
-// those that its streams need before it uses them.
+// What the library asks of its application. Apart from oldPathFixupFunc, an entry is called without a look whether it is
+// null: the host sets all those that its streams need before it uses them.
 struct KFS_AppCallbacks {
     // An old file stored a type number in place of a path: fills the path in. If null, the path stays as read.
     void (*oldPathFixupFunc)(int oldType, KFS_StreamIDPath* path) = nullptr;

@@ -2,6 +2,7 @@
 
 #include "curves/floatkeys.h"
 #include "curves/tangents.h"
+#include "host/import_error.h"
 #include "host/storeerror.h"
 #include "host/streambuilder.h"
 #include "keystore/lookup.h"
@@ -110,7 +111,11 @@ std::unique_ptr<KFS_Stream> MakePath(StreamItem const& item)
         builder.Append(UnitsOf(source, i), key.value.data(), static_cast<KFS_Interp>(key.inInterp),
                        static_cast<KFS_Interp>(key.outInterp));
     }
-    if (double const size = box.Diagonal(); size > 0.0) {
+    double const size = KeyCount(source) == 0 ? 0.0 : box.Diagonal();
+    if (!std::isfinite(size)) {
+        throw ImportError(item.place, "positions are too far apart for a path");
+    }
+    if (size > 0.0) {
         builder.SetPathAccuracy(size * AccuracyShare);
     }
     for (int i = 0; i < KeyCount(source); ++i) {

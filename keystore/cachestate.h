@@ -11,6 +11,8 @@
 // The private copies of a render on a temporary clone context: for each stream that it reads, the key data as it stood
 // at the first read. The host puts one into each such context, and makes the first reads (or all of them) while nobody
 // edits the streams.
+// A temporary clone context without this state can't be read in. Copies are found by the stream's address: streams outlive this state, or
+// FreeCacheData is called first.
 // Threads: reached by the thread of one context at a time.
 class KFS_API KFS_StreamCacheState : public Q_RenderState {
 public:

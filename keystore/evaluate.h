@@ -11,7 +11,8 @@
 // Common to all: `time` is converted to the stream's scale, and null is value 0 there. `value` is the caller's buffer
 // for one value, in external form (`dimension` elements of the data type, or a custom block) or as `dimension` doubles
 // in the F forms; null asks only for `atKey` and the side effects. `atKey`, out or null, gets whether a key stands at
-// the time; it stays untouched where followers answer. `bag` holds overrides, may be null. A value that owns memory
+// the time; it stays untouched where followers answer. They
+// answer doubles whatever the data type, `dimension` of them, and a place without a follower stays as it is: initialise it. `bag` holds overrides, may be null. A value that owns memory
 // goes to KFS_DisposeValue.
 //
 // Results: 0, or

@@ -90,6 +90,7 @@ public:
     bool AreDimensionsSeparated() const override;
     void SetDimensionsSeparated(bool separated) override;
     bool AffectsRendering(KFS_RenderOptionsBase const& options) const override;
+    // Identities aren't computed yet: the unset Guid, and MixInValueAtTime mixes nothing.
     hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const& options,
                                         GetRenderGuidFilter* filter) const override;
     void GetExpressionDependencyIds(std::set<int>& ids) const override;

@@ -11,7 +11,7 @@
 class KFS_StreamOverride;
 
 // A set of overrides handed to an evaluation, at most one a stream, by the stream's capsule identifier. Copies share
-// the overrides. Threads: one thread at a time.
+// the overrides. There is no operation yet that adds one. Threads: one thread at a time.
 class KFS_API KFS_ParamBag {
 public:
     KFS_ParamBag() = default;

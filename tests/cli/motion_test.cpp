@@ -177,7 +177,7 @@ TEST(KfsMotion, CombinationsThatMeanNothingAreRefused)
                   folder.Path("a.bvh") + ": the chosen streams have no keys to draw");
     ExpectFailure(
         RunKfs({"plot", "--motion", folder.Write("a.bvh", Motion({"1e308 0 0", "-1e308 0 0"})), "-o", drawing}),
-        "plot: the numbers are too large to draw");
+        folder.Path("a.bvh") + ": joints[0]: positions are too far apart for a path");
     EXPECT_FALSE(std::filesystem::exists(drawing));
     Outcome const outcome = RunKfs({"eval", Sample(), "--as", "curves"});
     EXPECT_EQ("--as: curves not in {plain,spatial}\nRun with --help for more information.\n", outcome.errors);
