@@ -1,9 +1,11 @@
 #include "cli/commands.h"
+#include "cli/project.h"
 #include "cli/usererror.h"
 
 #include "frame/services/reports.h"
 #include "host/import.h"
 #include "host/import_error.h"
+#include "host/projectfile.h"
 #include "host/session.h"
 #include "host/storeerror.h"
 
@@ -29,7 +31,7 @@ void RememberFirstReport(Q_Report const& report)
 
 void AddSelection(CLI::App& command, Selection& selection)
 {
-    command.add_option("FILE", selection.file, "a .gltf, .glb or .bvh file")->required();
+    command.add_option("FILE", selection.file, "a project, or a .gltf, .glb or .bvh file")->required();
     command
         .add_option("--stream", selection.glob, "only streams whose path matches this pattern, with * and ? (quote it)")
         ->type_name("GLOB")
@@ -116,6 +118,18 @@ void AddPlot(CLI::App& app, PlotOptions& options)
     command->callback([&options, command] { RunEitherPlot(options, command->count("--as") > 0); });
 }
 
+// A project is known by how it begins, whatever its name is.
+kfshost::Scene ReadScene(Selection const& selection)
+{
+    if (!kfshost::IsProjectFile(selection.file)) {
+        return kfshost::ImportFile(selection.file, {selection.timeScale});
+    }
+    if (selection.timeScale != 0) {
+        throw UserError("--time-scale", "a project has the times with which it was imported");
+    }
+    return kfshost::TakeScene(kfshost::LoadProject(selection.file));
+}
+
 int Fail(std::string const& message)
 {
     std::fprintf(stderr, "kfs: %s\n", message.c_str());
@@ -130,7 +144,7 @@ kfshost::Scene LoadScene(Selection const& selection)
         throw UserError("--rove", "only paths have keys that can float: add --as spatial");
     }
     try {
-        kfshost::Scene scene = kfshost::ImportFile(selection.file, {selection.timeScale});
+        kfshost::Scene scene = ReadScene(selection);
         if (selection.asPaths) {
             HoldAsPaths(scene, selection);
         }
@@ -153,14 +167,17 @@ try {
                "  kfs eval walk.glb --stream '*/Hips/*' --fps 30 --format csv\n"
                "  kfs plot walk.glb --stream '*/Hips/translation' -o hips.svg\n"
                "  kfs plot walk.glb --motion --stream '*/Hips/translation' -o path.svg\n"
+               "  kfs import walk.glb -o walk.kfs\n"
                "\n"
                "What is wrong with a file is one line on the standard error and exit code 2; nothing is written then.");
     InfoOptions info;
     EvalOptions eval;
     PlotOptions plot;
+    ProjectOptions project;
     AddInfo(app, info);
     AddEval(app, eval);
     AddPlot(app, plot);
+    AddProjectCommands(app, project);
     CLI11_PARSE(app, argc, argv);
     return 0;
 } catch (kfshost::StoreError const& error) {

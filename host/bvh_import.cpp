@@ -119,9 +119,11 @@ private:
             return;
         }
         StreamItem item;
-        item.path = paths_.Make("motion/" + joint.name + '/' + std::string(NameOf(channels.kind)));
+        item.animation = "motion";
+        item.node = joint.name;
         item.place = place;
         item.kind = channels.kind;
+        item.path = paths_.Make(PathOf(item));
         item.components = channels.names;
         try {
             item.stream = BuildStream(item.path, channels);

@@ -138,7 +138,9 @@ private:
         channel.path = &*path;
         channel.item.kind = path->kind;
         channel.item.interpolation = InterpolationOf(sampler, channel.samplerPlace);
-        channel.item.path = paths_.Make(animationName + '/' + NodeName(source.target_node) + '/' + source.target_path);
+        channel.item.animation = animationName;
+        channel.item.node = NodeName(source.target_node);
+        channel.item.path = paths_.Make(PathOf(channel.item));
         channels_.push_back(std::move(channel));
     }
 

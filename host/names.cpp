@@ -70,10 +70,14 @@ std::string StemOf(std::string const& fileName)
 
 std::string UniqueNames::Make(std::string const& wanted)
 {
-    std::string name = wanted;
-    for (int copy = 2; !taken_.insert(name).second; ++copy) {
-        name = wanted + '#' + std::to_string(copy);
+    if (taken_.insert(wanted).second) {
+        return wanted;
     }
+    int& copy = copies_.try_emplace(wanted, 1).first->second;
+    std::string name;
+    do {
+        name = wanted + '#' + std::to_string(++copy);
+    } while (!taken_.insert(name).second);
     return name;
 }
 

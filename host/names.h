@@ -2,6 +2,7 @@
 
 #include <string>
 #include <string_view>
+#include <unordered_map>
 #include <unordered_set>
 
 namespace kfshost {
@@ -20,6 +21,7 @@ public:
 
 private:
     std::unordered_set<std::string> taken_;
+    std::unordered_map<std::string, int> copies_;  // of a name that was wanted before: the last number tried
 };
 
 }  // namespace kfshost

@@ -29,6 +29,11 @@ std::string_view NameOf(SourceInterpolation interpolation)
     return "";
 }
 
+std::string PathOf(StreamItem const& item)
+{
+    return item.animation + '/' + item.node + '/' + std::string(NameOf(item.kind));
+}
+
 int KeyCount(KFS_Stream const& stream)
 {
     return stream.GetKeyCount();

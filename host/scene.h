@@ -21,7 +21,9 @@ std::string_view NameOf(SourceInterpolation interpolation);
 
 // One animated property of a scene.
 struct StreamItem {
-    std::string path;   // "animation/node/translation"; no two items of a scene have the same
+    std::string path;  // "animation/node/translation"; no two items of a scene have the same
+    std::string animation;
+    std::string node;
     std::string place;  // where the file has it: "animations[0].channels[2]", "joint Hips"
     StreamKind kind = StreamKind::Translation;
     SourceInterpolation interpolation = SourceInterpolation::Linear;
@@ -37,6 +39,9 @@ struct Scene {
     double worstTimeError = 0.0;  // the greatest distance of a key from the file's number, in seconds
     std::vector<StreamItem> streams;
 };
+
+// The path that an item has where no other has the same: its animation, node and kind.
+std::string PathOf(StreamItem const& item);
 
 // The number of keys of a stream.
 int KeyCount(KFS_Stream const& stream);

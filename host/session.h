@@ -1,6 +1,7 @@
 #pragma once
 
 #include "frame/project.h"
+#include "host/kinds.h"
 #include "keystore/expstate.h"
 
 #include <boost/shared_ptr.hpp>
@@ -54,6 +55,7 @@ private:
     };
 
     Library library_;
+    SceneKinds kinds_;
     boost::shared_ptr<Project> project_;
     Q_ScSetCurrentContext currentContext_;
     Q_ScSetCurrentRenderContext currentRenderContext_;

@@ -1,0 +1,70 @@
+#include "cli/project.h"
+
+#include "cli/output.h"
+#include "cli/usererror.h"
+#include "host/chunkdump.h"
+#include "host/import.h"
+#include "host/import_error.h"
+#include "host/projectfile.h"
+
+#include <fmt/format.h>
+
+namespace {
+
+constexpr int DamagedCode = 1;
+
+void RunImport(ProjectOptions const& options)
+{
+    if (options.output == "-") {
+        throw UserError("-o", "a project goes into a file, not to the standard output");
+    }
+    try {
+        kfshost::Scene scene = kfshost::ImportFile(options.file, {options.timeScale});
+        std::size_t keys = 0;
+        for (kfshost::StreamItem const& item : scene.streams) {
+            keys += static_cast<std::size_t>(kfshost::KeyCount(*item.stream));
+        }
+        std::string const summary =
+            fmt::format("{}: {} streams, {} keys\n", options.output, scene.streams.size(), keys);
+        kfshost::SaveProject(*kfshost::MakeTree(std::move(scene)), options.output);
+        WriteToStandardOutput(summary);
+    } catch (kfshost::ImportError const& error) {
+        throw UserError(options.file, error.what());
+    }
+}
+
+// Shows what it can, and then tells by the exit code whether all of it was sound.
+void RunDump(ProjectOptions const& options)
+{
+    try {
+        kfshost::ChunkDump const dump = kfshost::DumpChunks(options.file);
+        WriteToStandardOutput(dump.text);
+        if (dump.problems > 0) {
+            throw CLI::RuntimeError(DamagedCode);
+        }
+    } catch (kfshost::ImportError const& error) {
+        throw UserError(options.file, error.what());
+    }
+}
+
+}  // namespace
+
+void AddProjectCommands(CLI::App& app, ProjectOptions& options)
+{
+    CLI::App* const import = app.add_subcommand("import", "Save the animation of a file as a project");
+    import->add_option("FILE", options.file, "a .gltf, .glb or .bvh file")->required();
+    import->add_option("-o,--output", options.output, "the project file")->required()->type_name("PROJECT");
+    import
+        ->add_option("--time-scale", options.timeScale,
+                     "hold times in this many units a second (default: chosen so that key times are exact)")
+        ->check(CLI::PositiveNumber)
+        ->type_name("N");
+    import->callback([&options] { RunImport(options);
+});
+
+CLI::App* const dump = app.add_subcommand("dump", "Show the chunks of a project file, broken ones too");
+dump->add_option("FILE", options.file, "a project file")->required();
+dump->footer("Each line has the offset of a chunk, its id, its length in brackets, and what stands in it.\n"
+             "The exit code is 1 if anything is wrong with a chunk; its line says what.");
+dump->callback([&options] { RunDump(options); });
+}

@@ -1,0 +1,358 @@
+#include "host/projectfile.h"
+
+#include "frame/frame.h"
+#include "frame/services/chunkfile.h"
+#include "host/names.h"
+#include "host/storeerror.h"
+#include "keystore/lookup.h"
+
+#include <algorithm>
+#include <bit>
+#include <cmath>
+#include <fstream>
+#include <limits>
+#include <optional>
+#include <unordered_map>
+#include <utility>
+
+// A project file of this host:
+//
+//   LIST khsc
+//     khti               units a second, whether the times are exact (4 bytes each), and the greatest error, a double
+//   LIST kfgp            the tree
+//   LIST khch            of each leaf that is animated, in the tree's order:
+//     khin               how the source goes from key to key, 4 bytes
+//     khco               the names of the components, a line each
+
+namespace kfshost {
+
+namespace {
+
+constexpr int SceneListType = CKF_Id("khsc");
+constexpr int TimesId = CKF_Id("khti");
+constexpr int ChannelListType = CKF_Id("khch");
+constexpr int InterpolationId = CKF_Id("khin");
+constexpr int ComponentsId = CKF_Id("khco");
+
+// ---- numbers in the file's byte order
+
+template <std::size_t Size>
+void PutWord(std::array<unsigned char, Size>& bytes, std::size_t offset, std::uint32_t word)
+{
+    for (std::size_t i = 0; i < 4; ++i) {
+        bytes[offset + i] = static_cast<unsigned char>(word >> (24 - 8 * i));
+    }
+}
+
+template <std::size_t Size>
+std::uint32_t GetWord(std::array<unsigned char, Size> const& bytes, std::size_t offset)
+{
+    std::uint32_t word = 0;
+    for (std::size_t i = 0; i < 4; ++i) {
+        word = word << 8 | bytes[offset + i];
+    }
+    return word;
+}
+
+void ThrowCode(int code)
+{
+    if (code != 0) {
+        throw int{code};
+    }
+}
+
+// ---- going through a tree
+
+struct Channel {
+    AnimationGroup& animation;
+    NodeGroup& node;
+    StreamKind kind;
+};
+
+// Hands each animated leaf to `visit`, in the order of the tree. The layouts let nothing else into these groups.
+template <class Visit>
+void ForEachChannel(SceneGroup const& tree, Visit const& visit)
+{
+    auto& scene = const_cast<SceneGroup&>(tree);
+    for (unsigned int i = 0; i < scene.GetNumStreams(); ++i) {
+        auto& animation = dynamic_cast<AnimationGroup&>(*scene.GetEditableStream(i));
+        for (unsigned int j = 0; j < animation.GetNumStreams(); ++j) {
+            auto& node = dynamic_cast<NodeGroup&>(*animation.GetEditableStream(j));
+            for (StreamKind const kind : AllStreamKinds) {
+                if (node.FindChannel(kind)) {
+                    visit(Channel{animation, node, kind});
+                }
+            }
+        }
+    }
+}
+
+// ---- writing
+
+void WriteTimes(CKF_File* file, SceneGroup::Times const& times)
+{
+    CKF_ScWriteList const list(file, SceneListType, 0);
+    std::array<unsigned char, 16> bytes{};
+    PutWord(bytes, 0, times.scale);
+    PutWord(bytes, 4, times.exact ? 1 : 0);
+    auto const error = std::bit_cast<std::uint64_t>(times.worstError);
+    PutWord(bytes, 8, static_cast<std::uint32_t>(error >> 32));
+    PutWord(bytes, 12, static_cast<std::uint32_t>(error));
+    ThrowCode(CKF_WriteAtom(file, TimesId, static_cast<int>(bytes.size()), bytes.data()));
+}
+
+void WriteFacts(CKF_File* file, ChannelFacts const& facts)
+{
+    CKF_ScWriteList const list(file, ChannelListType, 0);
+    std::array<unsigned char, 4> interpolation{};
+    PutWord(interpolation, 0, static_cast<std::uint32_t>(facts.interpolation));
+    ThrowCode(CKF_WriteAtom(file, InterpolationId, 4, interpolation.data()));
+    std::string lines;
+    for (std::string const& component : facts.components) {
+        lines += (lines.empty() ? "" : "\n") + component;
+    }
+    ThrowCode(CKF_WriteString(file, ComponentsId, Q_MBToUTF16String(lines), 0));
+}
+
+void WriteProject(CKF_File* file, SceneGroup const& tree)
+{
+    WriteTimes(file, tree.times);
+    tree.Write(file);
+    ForEachChannel(tree, [file](Channel const& channel) { WriteFacts(file, channel.node.FactsOf(channel.kind)); });
+}
+
+// ---- reading
+
+class ProjectReader {
+public:
+    explicit ProjectReader(std::string const& fileName) : fileName_(fileName)
+    {
+        if (int const code = file_.Open(fileName.c_str())) {
+            Fail(code);
+        }
+    }
+
+    std::unique_ptr<SceneGroup> Run()
+    {
+        tree_ = std::make_unique<SceneGroup>(Get_VX_StreamFactory());
+        try {
+            ReadTimes();
+            tree_->Read(&file_, nullptr);
+        } catch (int code) {
+            Fail(code);
+        }
+        ForEachChannel(*tree_, [this](Channel const& channel) { CheckChannel(channel); });
+        return std::move(tree_);
+    }
+
+private:
+    [[noreturn]] void Fail(int code) const
+    {
+        std::string const text = file_.LastErrorText();
+        throw ProjectError(fileName_, text.empty() ? "damaged: " + std::string(StoreError(code).what()) : text);
+    }
+
+    void ReadTimes()
+    {
+        bool found = false;
+        CKF_ScDescendList const list(&file_, SceneListType, nullptr, &found);
+        if (!found) {
+            throw ProjectError(fileName_, "a project, but not one with a scene of this program");
+        }
+        std::array<unsigned char, 16> bytes{};
+        ThrowCode(CKF_ReadAtom(&file_, TimesId, list.GetChunkInfo(), static_cast<int>(bytes.size()), bytes.data()));
+        SceneGroup::Times& times = tree_->times;
+        times.scale = GetWord(bytes, 0);
+        times.exact = GetWord(bytes, 4) != 0;
+        times.worstError =
+            std::bit_cast<double>(static_cast<std::uint64_t>(GetWord(bytes, 8)) << 32 | GetWord(bytes, 12));
+        if (times.scale == 0 || times.scale > static_cast<unsigned int>(std::numeric_limits<int>::max()) ||
+            !(times.worstError >= 0.0)) {
+            throw ProjectError(fileName_, "damaged: the scene has times in 1/" + std::to_string(times.scale) + " s");
+        }
+    }
+
+    void CheckChannel(Channel const& channel)
+    {
+        KFS_Stream const& stream = *channel.node.FindChannel(channel.kind);
+        try {
+            CheckStream(channel, stream);
+            channel.node.SetFacts(channel.kind, ReadFacts(channel, static_cast<std::size_t>(stream.GetDimension())));
+        } catch (int code) {
+            Fail(code);
+        } catch (StoreError const& error) {
+            FailIn(channel, error.what());
+        }
+    }
+
+    [[noreturn]] void FailIn(Channel const& channel, std::string const& what) const
+    {
+        throw ProjectError(fileName_, "damaged: " + DisplayNameOf(channel.animation) + '/' +
+                                          DisplayNameOf(channel.node) + '/' + std::string(NameOf(channel.kind)) + ' ' +
+                                          what);
+    }
+
+    void CheckStream(Channel const& channel, KFS_Stream const& stream) const
+    {
+        if (stream.GetValueDesc()->isCustom || stream.GetDimension() < 1) {
+            FailIn(channel, "isn't made of numbers");
+        }
+        if (stream.IsSpatial() && (stream.GetDimension() < 2 || stream.GetDimension() > 3)) {
+            FailIn(channel, "is a path in " + std::to_string(stream.GetDimension()) + " dimensions");
+        }
+        if (stream.GetTimeScale() != tree_->times.scale) {
+            FailIn(channel, "isn't in the times of its scene");
+        }
+        CheckKeys(channel, stream);
+    }
+
+    void CheckKeys(Channel const& channel, KFS_Stream const& stream) const
+    {
+        std::vector<double> numbers(static_cast<std::size_t>(stream.GetDimension()));
+        T_Time before{};
+        for (int i = 0; i < stream.GetKeyCount(); ++i) {
+            T_Time time{};
+            ThrowIfFailed(KFS_IndexToTime(&stream, i, &time));
+            if (i > 0 && time.value <= before.value) {
+                FailIn(channel, "has keys that aren't in the order of their times");
+            }
+            before = time;
+            ThrowIfFailed(KFS_GetKeyF(&stream, i, numbers.data(), nullptr, nullptr));
+            if (!std::ranges::all_of(numbers, [](double number) { return std::isfinite(number); })) {
+                FailIn(channel, "has a key without a finite value");
+            }
+        }
+    }
+
+    ChannelFacts ReadFacts(Channel const& channel, std::size_t dimension)
+    {
+        bool found = false;
+        CKF_ScDescendList const list(&file_, ChannelListType, nullptr, &found);
+        if (!found) {
+            FailIn(channel, "isn't described");
+        }
+        std::array<unsigned char, 4> interpolation{};
+        ThrowCode(CKF_ReadAtom(&file_, InterpolationId, list.GetChunkInfo(), 4, interpolation.data()));
+        u16str lines;
+        CKF_ReadString(&file_, list.GetChunkInfo(), ComponentsId, &lines, u16str(), 0);
+        ChannelFacts facts;
+        facts.interpolation = static_cast<SourceInterpolation>(GetWord(interpolation, 0));
+        std::string const text = Q_UTF16ToMBString(lines);
+        bool const isKnown = !NameOf(facts.interpolation).empty();
+        if (!isKnown || static_cast<std::size_t>(std::ranges::count(text, '\n')) + 1 != dimension) {
+            FailIn(channel, "is described as something else");
+        }
+        for (std::size_t begin = 0; begin <= text.size();) {
+            std::size_t const end = std::min(text.find('\n', begin), text.size());
+            facts.components.push_back(CleanName(std::string_view(text).substr(begin, end - begin)));
+            begin = end + 1;
+        }
+        return facts;
+    }
+
+    std::string const& fileName_;
+    CKF_File file_;
+    std::unique_ptr<SceneGroup> tree_;
+};
+
+// ---- between a scene and its tree
+
+// Finds the group that an item belongs to. A file may have several nodes of one name: the n-th leaf of a kind goes to
+// the n-th of them, so that the order of the paths stays.
+class AnimationBuilder {
+public:
+    AnimationBuilder(SceneGroup& tree, std::string const& name) : name_(name), group_(tree.AppendAnimation(name)) {}
+
+    std::string const& Name() const { return name_; }
+
+    NodeGroup& NodeFor(StreamItem const& item)
+    {
+        std::vector<NodeGroup*>& nodes = nodes_[item.node];
+        std::size_t const index = leaves_[PathOf(item)]++;
+        if (index == nodes.size()) {
+            nodes.push_back(&group_.AppendNode(item.node));
+        }
+        return *nodes[index];
+    }
+
+private:
+    std::string name_;
+    AnimationGroup& group_;
+    std::unordered_map<std::string, std::vector<NodeGroup*>> nodes_;
+    std::unordered_map<std::string, std::size_t> leaves_;
+};
+
+}  // namespace
+
+std::unique_ptr<SceneGroup> MakeTree(Scene scene)
+{
+    auto tree = std::make_unique<SceneGroup>(Get_VX_StreamFactory());
+    tree->SetDisplayName(Q_MBToUTF16String(scene.name));
+    tree->times = {scene.timeScale, scene.exactTimes, scene.worstTimeError};
+    std::optional<AnimationBuilder> animation;
+    for (StreamItem& item : scene.streams) {
+        if (!animation || animation->Name() != item.animation) {
+            animation.emplace(*tree, item.animation);
+        }
+        NodeGroup& node = animation->NodeFor(item);
+        node.PutChannel(item.kind, std::move(item.stream));
+        node.SetFacts(item.kind, {item.interpolation, std::move(item.components)});
+    }
+    return tree;
+}
+
+Scene TakeScene(std::unique_ptr<SceneGroup> tree)
+{
+    Scene scene;
+    scene.name = DisplayNameOf(*tree);
+    scene.timeScale = tree->times.scale;
+    scene.exactTimes = tree->times.exact;
+    scene.worstTimeError = tree->times.worstError;
+    UniqueNames paths;
+    ForEachChannel(*tree, [&](Channel const& channel) {
+        ChannelFacts const& facts = channel.node.FactsOf(channel.kind);
+        StreamItem item;
+        item.animation = DisplayNameOf(channel.animation);
+        item.node = DisplayNameOf(channel.node);
+        item.kind = channel.kind;
+        item.path = paths.Make(PathOf(item));
+        item.place = item.path;
+        item.interpolation = facts.interpolation;
+        item.components = facts.components;
+        item.stream = channel.node.TakeChannel(channel.kind);
+        scene.streams.push_back(std::move(item));
+    });
+    return scene;
+}
+
+void SaveProject(SceneGroup const& tree, std::string const& fileName, CKF_IoHook* hook)
+{
+    CKF_File file;
+    auto const check = [&](int code) {
+        if (code != 0) {
+            std::string const text = file.LastErrorText();
+            throw ProjectError(fileName, "can't be saved: " + (text.empty() ? StoreError(code).what() : text));
+        }
+    };
+    check(file.Create(fileName.c_str(), hook));
+    try {
+        WriteProject(&file, tree);
+    } catch (int code) {
+        check(code);
+    }
+    check(file.Commit());
+}
+
+std::unique_ptr<SceneGroup> LoadProject(std::string const& fileName)
+{
+    return ProjectReader(fileName).Run();
+}
+
+bool IsProjectFile(std::string const& fileName)
+{
+    char magic[4] = {};
+    std::ifstream(fileName, std::ios::binary).read(magic, sizeof magic);
+    return std::string_view(magic, sizeof magic) == "KFSF";
+}
+
+}  // namespace kfshost

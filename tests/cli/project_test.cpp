@@ -1,0 +1,122 @@
+#include "tests/cli/command.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+
+namespace {
+
+std::string const Sample = KFS_TEST_SAMPLES "/bouncing_ball.gltf";
+
+std::string Contents(std::string const& fileName)
+{
+    std::ifstream file(fileName, std::ios::binary);
+    return {std::istreambuf_iterator<char>(file), {}};
+}
+
+// A folder with the sample as a project.
+class KfsProject : public testing::Test {
+protected:
+    void SetUp() override
+    {
+        Outcome const outcome = RunKfs({"import", Sample, "-o", project_});
+        ASSERT_EQ(0, outcome.code) << outcome.errors;
+        EXPECT_EQ(project_ + ": 3 streams, 20 keys\n", outcome.output);
+    }
+    static void ExpectFailure(Outcome const& outcome, std::string const& error)
+    {
+        EXPECT_EQ(2, outcome.code);
+        EXPECT_EQ("", outcome.output);
+        EXPECT_EQ("kfs: " + error + '\n', outcome.errors);
+    }
+
+    ScratchFolder folder_;
+    std::string const project_ = folder_.Path("ball.of-any-name");
+};
+
+TEST_F(KfsProject, AnswersLikeTheFileThatItWasImportedFrom)
+{
+    std::vector<std::vector<std::string>> const commands{{"info"},
+                                                         {"eval", "--format", "json", "--fps", "30"},
+                                                         {"eval", "--as", "spatial", "--stream", "*translation"},
+                                                         {"plot", "-o", "-"}};
+    for (std::vector<std::string> command : commands) {
+        SCOPED_TRACE(command.front());
+        command.push_back(Sample);
+        Outcome const expected = RunKfs(command);
+        EXPECT_EQ(0, expected.code) << expected.errors;
+        command.back() = project_;
+        Outcome const found = RunKfs(command);
+        EXPECT_EQ("", found.errors);
+        std::string output = found.output;
+        // The file's name stands in what a JSON answer says of itself.
+        for (std::size_t at = 0; (at = output.find(project_)) != std::string::npos;) {
+            output.replace(at, project_.size(), Sample);
+        }
+        EXPECT_TRUE(expected.output == output) << found.output;
+    }
+}
+
+TEST_F(KfsProject, ImportingTwiceGivesTheSameBytes)
+{
+    std::string const again = folder_.Path("again");
+    EXPECT_EQ(0, RunKfs({"import", Sample, "-o", again}).code);
+    EXPECT_TRUE(Contents(project_) == Contents(again));
+    EXPECT_EQ(2, std::distance(std::filesystem::directory_iterator(folder_.Path("")), {}));
+}
+
+TEST_F(KfsProject, WhatCannotBeDoneIsOneLine)
+{
+    ExpectFailure(RunKfs({"import", Sample, "-o", "-"}), "-o: a project goes into a file, not to the standard output");
+    ExpectFailure(RunKfs({"import", project_, "-o", folder_.Path("new")}),
+                  project_ + ": the name doesn't end in .gltf, .glb or .bvh");
+    ExpectFailure(RunKfs({"info", project_, "--time-scale", "25"}),
+                  "--time-scale: a project has the times with which it was imported");
+    ExpectFailure(RunKfs({"dump", folder_.Path("absent")}),
+                  folder_.Path("absent") + ": can't be opened: No such file or directory");
+    EXPECT_FALSE(std::filesystem::exists(folder_.Path("new")));
+
+    std::string const bytes = Contents(project_);
+    Outcome const cut = RunKfs({"info", folder_.Write("cut", bytes.substr(0, bytes.size() / 2))});
+    EXPECT_EQ(2, cut.code);
+    EXPECT_TRUE(cut.errors.starts_with("kfs: " + folder_.Path("cut") + ": ")) << cut.errors;
+    EXPECT_EQ(1, std::ranges::count(cut.errors, '\n')) << cut.errors;
+}
+
+TEST_F(KfsProject, DumpShowsTheChunks)
+{
+    Outcome const outcome = RunKfs({"dump", project_});
+    EXPECT_EQ(0, outcome.code);
+    EXPECT_EQ("", outcome.errors);
+    for (char const* const line :
+         {"       0  KFSF proj [", "\n      12    vers [12] version 95.0, encoding 0\n",
+          "khti [16] 1/120000 s, exact, off by up to ", "kfsn [13] \"bouncing_ball\"\n",
+          "kfmn [40] \"KFS Animation\"\n", "kfsn [6] \"bounce\"\n", "kfb4 [124] dimension 4, 1/120000 s, keys\n",
+          "] 6 keys of 128 bytes, times 0 to 300000\n", "khin [4] 2\n", "khco [7] \"x y z w\"\n"}) {
+        EXPECT_NE(std::string::npos, outcome.output.find(line)) << line << "in\n" << outcome.output;
+    }
+}
+
+TEST_F(KfsProject, DumpShowsWhatIsWrong)
+{
+    std::string const bytes = Contents(project_);
+    for (std::size_t const size : {std::size_t{0}, std::size_t{3}, std::size_t{30}, bytes.size() - 1}) {
+        Outcome const outcome = RunKfs({"dump", folder_.Write("cut", bytes.substr(0, size))});
+        EXPECT_EQ(1, outcome.code) << size;
+        EXPECT_EQ("", outcome.errors);
+        EXPECT_NE(std::string::npos, outcome.output.find("  <-- ")) << size << ": " << outcome.output;
+    }
+    // The walk goes on behind a list that claims too much.
+    std::string wrong = bytes;
+    std::size_t const leaf = wrong.find("kfbs");
+    ASSERT_NE(std::string::npos, leaf);
+    wrong.replace(leaf - 4, 4, "\x7F\xFF\xFF\xFF");
+    Outcome const outcome = RunKfs({"dump", folder_.Write("wrong", wrong)});
+    EXPECT_EQ(1, outcome.code);
+    EXPECT_NE(std::string::npos, outcome.output.find("khch")) << outcome.output;
+}
+
+}  // namespace
