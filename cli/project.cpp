@@ -1,5 +1,7 @@
 #include "cli/project.h"
 
+#include "cli/commands.h"
+#include "cli/diff.h"
 #include "cli/output.h"
 #include "cli/usererror.h"
 #include "host/chunkdump.h"
@@ -11,7 +13,8 @@
 
 namespace {
 
-constexpr int DamagedCode = 1;
+// What a command answers that looked at its files and found something.
+constexpr int FoundCode = 1;
 
 void RunImport(ProjectOptions const& options)
 {
@@ -40,10 +43,23 @@ void RunDump(ProjectOptions const& options)
         kfshost::ChunkDump const dump = kfshost::DumpChunks(options.file);
         WriteToStandardOutput(dump.text);
         if (dump.problems > 0) {
-            throw CLI::RuntimeError(DamagedCode);
+            throw CLI::RuntimeError(FoundCode);
         }
     } catch (kfshost::ImportError const& error) {
         throw UserError(options.file, error.what());
+    }
+}
+
+void RunDiff(ProjectOptions const& options)
+{
+    Selection before;
+    before.file = options.file;
+    Selection after;
+    after.file = options.other;
+    std::string const text = DifferencesOf(LoadScene(before), LoadScene(after));
+    WriteToStandardOutput(text);
+    if (!text.empty()) {
+        throw CLI::RuntimeError(FoundCode);
     }
 }
 
@@ -51,20 +67,27 @@ void RunDump(ProjectOptions const& options)
 
 void AddProjectCommands(CLI::App& app, ProjectOptions& options)
 {
-    CLI::App* const import = app.add_subcommand("import", "Save the animation of a file as a project");
-    import->add_option("FILE", options.file, "a .gltf, .glb or .bvh file")->required();
-    import->add_option("-o,--output", options.output, "the project file")->required()->type_name("PROJECT");
-    import
+    CLI::App* const importer = app.add_subcommand("import", "Save the animation of a file as a project");
+    importer->add_option("FILE", options.file, "a .gltf, .glb or .bvh file")->required();
+    importer->add_option("-o,--output", options.output, "the project file")->required()->type_name("PROJECT");
+    importer
         ->add_option("--time-scale", options.timeScale,
                      "hold times in this many units a second (default: chosen so that key times are exact)")
         ->check(CLI::PositiveNumber)
         ->type_name("N");
-    import->callback([&options] { RunImport(options);
-});
+    importer->callback([&options] { RunImport(options); });
 
-CLI::App* const dump = app.add_subcommand("dump", "Show the chunks of a project file, broken ones too");
-dump->add_option("FILE", options.file, "a project file")->required();
-dump->footer("Each line has the offset of a chunk, its id, its length in brackets, and what stands in it.\n"
-             "The exit code is 1 if anything is wrong with a chunk; its line says what.");
-dump->callback([&options] { RunDump(options); });
+    CLI::App* const dump = app.add_subcommand("dump", "Show the chunks of a project file, broken ones too");
+    dump->add_option("FILE", options.file, "a project file")->required();
+    dump->footer("Each line has the offset of a chunk, its id, its length in brackets, and what stands in it.\n"
+                 "The exit code is 1 if anything is wrong with a chunk; its line says what.");
+    dump->callback([&options] { RunDump(options); });
+
+    CLI::App* const diff = app.add_subcommand("diff", "Tell how the streams of two files differ");
+    diff->add_option("BEFORE", options.file, "a project, or a .gltf, .glb or .bvh file")->required();
+    diff->add_option("AFTER", options.other, "another one")->required();
+    diff->footer("A line for each stream: - only in BEFORE, + only in AFTER, ~ in both, with what differs first.\n"
+                 "Keys show their values and the codes of the interpolation before and after them.\n"
+                 "The exit code is 0 if nothing differs and 1 if something does.");
+    diff->callback([&options] { RunDiff(options); });
 }

@@ -6,9 +6,10 @@
 
 struct ProjectOptions {
     std::string file;
+    std::string other;  // what `file` is compared with
     std::string output;
     unsigned int timeScale = 0;
 };
 
-// The commands that make project files and look into them: import and dump.
+// The commands that make project files and look into them: import, dump and diff.
 void AddProjectCommands(CLI::App& app, ProjectOptions& options);

@@ -27,7 +27,9 @@ void HoldAsPath(StreamItem& item, Selection const& selection)
     if (selection.roving && item.interpolation == kfshost::SourceInterpolation::Step) {
         throw UserError(item.path, "steps from key to key, so there is no way on which keys could rove");
     }
-    item.stream = kfshost::MakePath(item);
+    if (!item.stream->IsSpatial()) {  // a project may hold it as a path already
+        item.stream = kfshost::MakePath(item);
+    }
     if (selection.roving) {
         kfshost::LetInnerKeysFloat(*item.stream);
     }

@@ -86,6 +86,36 @@ TEST_F(KfsProject, WhatCannotBeDoneIsOneLine)
     EXPECT_EQ(1, std::ranges::count(cut.errors, '\n')) << cut.errors;
 }
 
+TEST_F(KfsProject, DiffTellsWhatFirstDiffers)
+{
+    Outcome const same = RunKfs({"diff", Sample, project_});
+    EXPECT_EQ(0, same.code) << same.errors;
+    EXPECT_EQ("", same.output);
+
+    std::string const bytes = Contents(project_);
+    std::size_t const keys = bytes.find("seql");  // of the translation: head of 16 bytes, then keys of 128
+    ASSERT_NE(std::string::npos, keys);
+    std::size_t const second = keys + 16 + 128;
+    auto const diffWith = [&](std::size_t offset, std::string const& with) {
+        std::string changed = bytes;
+        changed.replace(offset, with.size(), with);
+        Outcome const outcome = RunKfs({"diff", project_, folder_.Write("changed", changed)});
+        EXPECT_EQ(1, outcome.code) << outcome.errors;
+        return outcome.output;
+    };
+    std::string const path = "~ bounce/ball/translation: ";
+    EXPECT_EQ(path + "key 1: 1/2 s | 1/120000 s\n", diffWith(second, std::string("\0\0\0\1", 4)));
+    EXPECT_EQ(path + "curves of x y z | curves of a y z\n", diffWith(bytes.find("khco") + 8, "a"));
+    EXPECT_EQ("- bounce/ball/translation\n- bounce/ball/rotation\n- bounce/ball/scale\n"
+              "+ BOUNCE/ball/translation\n+ BOUNCE/ball/rotation\n+ BOUNCE/ball/scale\n",
+              diffWith(bytes.find("bounce"), "BOUNCE"));
+    // Another first value of the second key, and then another first speed, which only shows between the keys.
+    std::string const value = diffWith(second + 8, "\x40\x22");
+    EXPECT_TRUE(value.starts_with(path + "key 1 at 1/2 s: ")) << value;
+    std::string const speed = diffWith(second + 8 + 24, "\x40\x59");
+    EXPECT_TRUE(speed.starts_with(path + "between keys at 1/4 s: ")) << speed;
+}
+
 TEST_F(KfsProject, DumpShowsTheChunks)
 {
     Outcome const outcome = RunKfs({"dump", project_});

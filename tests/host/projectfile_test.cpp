@@ -2,6 +2,7 @@
 
 #include "frame/services/chunkfile.h"
 #include "host/import.h"
+#include "host/paths.h"
 #include "host/storeerror.h"
 #include "keystore/lookup.h"
 #include "tests/host/hosttest.h"
@@ -184,6 +185,31 @@ TEST_F(ProjectFile, KeepsRealFiles)
     for (char const* const name :
          {"gltf/Fox.glb", "gltf/interpolation_test.gltf", "gltf/MorphStressTest.gltf", "bvh/fair1_dab.bvh"}) {
         ExpectRoundTrip(SharedData(name).string(), folder_);
+    }
+}
+
+// Paths, with keys that float too: what is derived of them isn't believed and comes out the same.
+TEST_F(ProjectFile, KeepsPaths)
+{
+    auto const makeScene = [](bool roving) {
+        Scene scene = kfshost::ImportFile(Sample);
+        for (StreamItem& item : scene.streams) {
+            if (kfshost::IsPosition(item)) {
+                item.stream = kfshost::MakePath(item);
+                if (roving) {
+                    kfshost::LetInnerKeysFloat(*item.stream);
+                    ReadOne(*item.stream, kfshost::Rational(1, 3));  // which is what settles the times of float keys
+                }
+            }
+        }
+        return scene;
+    };
+    for (bool const roving : {false, true}) {
+        SCOPED_TRACE(roving);
+        Scene const loaded = Load(Save(makeScene(roving), "paths"));
+        EXPECT_TRUE(loaded.streams.front().stream->IsSpatial());
+        EXPECT_EQ(roving, kfshost::FloatKeyCount(*loaded.streams.front().stream) > 0);
+        ExpectSameScene(makeScene(roving), loaded);
     }
 }
 
