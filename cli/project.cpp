@@ -36,6 +36,17 @@ void RunImport(ProjectOptions const& options)
     }
 }
 
+// Through the tree and nothing else, so that what a file has comes out as this version writes it.
+void RunSaveAs(ProjectOptions const& options)
+{
+    try {
+        kfshost::SaveProject(*kfshost::LoadProject(options.file), options.output);
+        WriteToStandardOutput(fmt::format("{}: saved\n", options.output));
+    } catch (kfshost::ImportError const& error) {
+        throw UserError(options.file, error.what());
+    }
+}
+
 // Shows what it can, and then tells by the exit code whether all of it was sound.
 void RunDump(ProjectOptions const& options)
 {
@@ -76,6 +87,11 @@ void AddProjectCommands(CLI::App& app, ProjectOptions& options)
         ->check(CLI::PositiveNumber)
         ->type_name("N");
     importer->callback([&options] { RunImport(options); });
+
+    CLI::App* const saveAs = app.add_subcommand("save-as", "Load a project and save it as another file");
+    saveAs->add_option("FILE", options.file, "a project file")->required();
+    saveAs->add_option("-o,--output", options.output, "the new project file")->required()->type_name("PROJECT");
+    saveAs->callback([&options] { RunSaveAs(options); });
 
     CLI::App* const dump = app.add_subcommand("dump", "Show the chunks of a project file, broken ones too");
     dump->add_option("FILE", options.file, "a project file")->required();

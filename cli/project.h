@@ -11,5 +11,5 @@ struct ProjectOptions {
     unsigned int timeScale = 0;
 };
 
-// The commands that make project files and look into them: import, dump and diff.
+// The commands that make project files and look into them: import, save-as, dump and diff.
 void AddProjectCommands(CLI::App& app, ProjectOptions& options);

@@ -3,9 +3,17 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <chrono>
+#include <csignal>
 #include <filesystem>
 #include <fstream>
 #include <iterator>
+#include <random>
+#include <thread>
+
+#include <fcntl.h>
+#include <sys/wait.h>
+#include <unistd.h>
 
 namespace {
 
@@ -36,6 +44,64 @@ protected:
     ScratchFolder folder_;
     std::string const project_ = folder_.Path("ball.of-any-name");
 };
+
+TEST_F(KfsProject, SavedAgainItIsTheSameBytesAndTheOldFileStaysWhole)
+{
+    std::string const bytes = Contents(project_);
+    std::string const copy = folder_.Path("again");
+    Outcome const saved = RunKfs({"save-as", project_, "-o", copy});
+    EXPECT_EQ(0, saved.code) << saved.errors;
+    EXPECT_TRUE(bytes == Contents(copy));
+    EXPECT_EQ(0, RunKfs({"save-as", project_, "-o", project_}).code) << "onto itself";
+    EXPECT_TRUE(bytes == Contents(project_));
+    EXPECT_EQ(2, RunKfs({"save-as", Sample, "-o", copy}).code) << "not a project";
+    EXPECT_TRUE(bytes == Contents(copy));
+}
+
+// Starts `kfs save-as from -o to` and kills it after a while, unless it is done by then.
+void KillWhileSaving(std::string const& from, std::string const& to, std::chrono::microseconds after)
+{
+    pid_t const child = fork();
+    ASSERT_NE(-1, child);
+    if (child == 0) {
+        int const nowhere = open("/dev/null", O_WRONLY);
+        dup2(nowhere, STDOUT_FILENO);
+        execl(KFS_TEST_COMMAND, KFS_TEST_COMMAND, "save-as", from.c_str(), "-o", to.c_str(), nullptr);
+        _exit(127);
+    }
+    std::this_thread::sleep_for(after);
+    kill(child, SIGKILL);
+    int status = 0;
+    ASSERT_EQ(child, waitpid(child, &status, 0));
+}
+
+// Whenever the saving process dies, the project is the old one or the new one, whole.
+TEST_F(KfsProject, AKilledSaveLeavesTheOldFileOrTheNewOne)
+{
+    std::string const slower = folder_.Path("slower");
+    ASSERT_EQ(0, RunKfs({"import", Sample, "-o", slower, "--time-scale", "600000"}).code);
+    std::string const contents[] = {Contents(project_), Contents(slower)};
+    ASSERT_TRUE(contents[0] != contents[1]);
+    std::string const target = folder_.Path("target");
+    ASSERT_EQ(0, RunKfs({"save-as", project_, "-o", target}).code);
+    std::mt19937 random(1);
+    for (int round = 0; round < 40; ++round) {
+        SCOPED_TRACE(round);
+        KillWhileSaving(round % 2 ? project_ : slower, target, std::chrono::microseconds(random() % 40000));
+        std::string const found = Contents(target);
+        ASSERT_TRUE(found == contents[0] || found == contents[1]) << found.size() << " bytes";
+    }
+    EXPECT_EQ(0, RunKfs({"save-as", slower, "-o", target}).code) << "what a dead process left is in nobody's way";
+    EXPECT_TRUE(contents[1] == Contents(target));
+}
+
+// The format, byte for byte: a change of it is a decision, and shows in the dump that stands beside the file.
+TEST_F(KfsProject, TheSamplesBytesAndTheirDumpAreTheGoldenOnes)
+{
+    std::string const golden = KFS_TEST_SAMPLES "/../../tests/cli/golden/bouncing_ball";
+    EXPECT_TRUE(Contents(golden + ".project") == Contents(project_));
+    EXPECT_EQ(Contents(golden + ".txt"), RunKfs({"dump", golden + ".project"}).output);
+}
 
 TEST_F(KfsProject, AnswersLikeTheFileThatItWasImportedFrom)
 {
