@@ -1,6 +1,7 @@
 #include "curves/interpolate_private.h"
 
 #include "curves/neighbours_private.h"
+#include "curves/solvesegment_private.h"
 #include "keystore/keylist_private.h"
 
 namespace {
@@ -33,36 +34,80 @@ int FindSegment(KFS_Stream const* stream, KFS_StreamKeyData const* data, int tim
     return code;
 }
 
-void InterpolateLinear(int dimension, Segment const& segment, int time, double* result)
+// The share of the segment that lies before the time.
+double Fraction(Segment segment, int time)
+{
+    return static_cast<double>(KFSp_TimeDifference(time, segment.a->time)) /
+           static_cast<double>(KFSp_TimeDifference(segment.b->time, segment.a->time));
+}
+
+void InterpolateLinear(int dimension, Segment segment, int time, double* result)
 {
     double const* const from = KFSp_Numbers(segment.a);
     double const* const to = KFSp_Numbers(segment.b);
-    double const fraction = static_cast<double>(KFSp_TimeDifference(time, segment.a->time)) /
-                            static_cast<double>(KFSp_TimeDifference(segment.b->time, segment.a->time));
+    double const fraction = Fraction(segment, time);
     for (int i = 0; i < dimension; ++i) result[i] = from[i] + (to[i] - from[i]) * fraction;
 }
 
+// What the components of a curved segment share.
+struct CurvedSegment {
+    KFSp_TemporalRuns<double const> from;
+    KFSp_TemporalRuns<double const> to;
+    bool fromSpline;
+    bool toSpline;
+    double dt;  // seconds from key to key
+    double x;   // seconds from the first key to the time
+
+    CurvedSegment(KFS_Stream const* stream, Segment segment, int time)
+        : from(KFSp_GetTemporalRuns(segment.a, stream->GetDimension())),
+          to(KFSp_GetTemporalRuns(segment.b, stream->GetDimension())),
+          fromSpline(segment.a->outInterp == KFS_Interp_Spline),
+          toSpline(segment.b->inInterp == KFS_Interp_Spline),
+          dt(KFSp_Seconds(segment.b->time, segment.a->time, stream->GetTimeScale())),
+          x(KFSp_Seconds(time, segment.a->time, stream->GetTimeScale()))
+    {}
+    KFSp_TemporalEnd First(int i) const { return {from.value[i], from.outSpeed[i], from.outInfluence[i], fromSpline}; }
+    KFSp_TemporalEnd Last(int i) const { return {to.value[i], to.inSpeed[i], to.inInfluence[i], toSpline}; }
+};
+
 // Builds each component's cubic and hands it to `kernel`, which evaluates it at an x.
 template <class Kernel>
-inline int EvaluateCurved(KFS_Stream const* stream, Segment const& segment, int time, double* result, Kernel kernel)
+int EvaluateCurves(KFS_Stream const* stream, CurvedSegment const& segment, int first, double* result, Kernel kernel)
 {
-    int const dimension = stream->GetDimension();
-    KFSp_TemporalRuns<double const> const from = KFSp_GetTemporalRuns(segment.a, dimension);
-    KFSp_TemporalRuns<double const> const to = KFSp_GetTemporalRuns(segment.b, dimension);
-    bool const fromSpline = segment.a->outInterp == KFS_Interp_Spline;
-    bool const toSpline = segment.b->inInterp == KFS_Interp_Spline;
     bool const nonDecreasing = (stream->GetKFSFlags() & KFS_StreamFlag_NonDecreasing) != 0;
-    double const dt = KFSp_Seconds(segment.b->time, segment.a->time, stream->GetTimeScale());
-    double const x = KFSp_Seconds(time, segment.a->time, stream->GetTimeScale());
-
     KFSp_SegmentCurve cubic(2);
-    for (int i = 0; i < dimension; ++i) {
-        KFSp_FillTemporalSegment({from.value[i], from.outSpeed[i], from.outInfluence[i], fromSpline},
-                                 {to.value[i], to.inSpeed[i], to.inInfluence[i], toSpline}, dt, cubic.curve);
-        if (nonDecreasing) [[unlikely]] {
+    for (int i = first; i < stream->GetDimension(); ++i) {
+        KFSp_FillTemporalSegment(segment.First(i), segment.Last(i), segment.dt, cubic.curve);
+        if (nonDecreasing) {
             if (int const code = CRV_CurveSetNonDecreasing(&cubic.curve, nullptr)) return code;
         }
-        if (int const code = kernel(&cubic.curve, &result[i], x)) return code;
+        if (int const code = kernel(&cubic.curve, &result[i], segment.x)) return code;
+    }
+    return 0;
+}
+
+[[gnu::noinline, gnu::cold]] int EvaluateCurvedSlow(KFS_Stream const* stream, Segment keys, int time, int first,
+                                                    double* result)
+{
+    return EvaluateCurves(stream, CurvedSegment(stream, keys, time), first, result,
+                          [](CRV_Curve const* curve, double* y, double x) { return CRV_EvaluateYFromX(curve, y, x); });
+}
+
+// What isn't ordinary takes the long way, from the component on that isn't.
+int EvaluateCurved(KFS_Stream const* stream, Segment keys, int time, double* result)
+{
+    if (stream->GetKFSFlags() & KFS_StreamFlag_NonDecreasing) [[unlikely]] {
+        return EvaluateCurvedSlow(stream, keys, time, 0, result);
+    }
+    CurvedSegment const segment(stream, keys, time);
+    double const u = Fraction(keys, time);
+    int const dimension = stream->GetDimension();
+    for (int i = 0; i < dimension; ++i) {
+        KFSp_TemporalEnd const a = segment.First(i);
+        KFSp_TemporalEnd const b = segment.Last(i);
+        if (!KFSp_SolveSegment(a, b, KFSp_GetTemporalHandles(a, b, segment.dt), u, &result[i])) [[unlikely]] {
+            return EvaluateCurvedSlow(stream, keys, time, i, result);
+        }
     }
     return 0;
 }
@@ -75,10 +120,7 @@ int KFSp_InterpolateBetween(KFS_Stream const* stream, KFS_KeyScalar const* a, KF
     Segment const segment{a, b};
     switch (KFSp_GetSegmentKind(a->outInterp, b->inInterp)) {
     case KFSp_SegmentKind::Linear: InterpolateLinear(stream->GetDimension(), segment, time, result); return 0;
-    case KFSp_SegmentKind::Curved:
-        return EvaluateCurved(stream, segment, time, result, [](CRV_Curve const* curve, double* y, double x) {
-            return CRV_EvaluateYFromX(curve, y, x);
-        });
+    case KFSp_SegmentKind::Curved: return EvaluateCurved(stream, segment, time, result);
     case KFSp_SegmentKind::Hold:
     case KFSp_SegmentKind::Other: break;
     }
@@ -99,7 +141,7 @@ int KFSp_InterpDeriv(KFS_Stream const* stream, long, int time, int keyIndex)
     Segment segment;
     if (int const code = FindSegment(stream, data, time, keyIndex, &segment)) return code;
     if (KFSp_GetSegmentKind(segment.a->outInterp, segment.b->inInterp) != KFSp_SegmentKind::Curved) return 0;
-    return EvaluateCurved(
-        stream, segment, time, KFSp_Numbers(data->cache),
+    return EvaluateCurves(
+        stream, CurvedSegment(stream, segment, time), 0, KFSp_Numbers(data->cache),
         [](CRV_Curve const* curve, double* dydx, double x) { return CRV_Evaluate1dDerivFromX(curve, dydx, x); });
 }

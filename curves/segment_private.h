@@ -54,40 +54,66 @@ struct KFSp_TemporalEnd {
     bool spline;
 };
 
-// Fills a temporal segment of `dt` seconds that begins at x = 0. `curve` has 2 coordinates.
-inline void KFSp_FillTemporalSegment(KFSp_TemporalEnd const& a, KFSp_TemporalEnd const& b, double dt,
-                                     CRV_Curve const& curve)
+// The two inner control points of a temporal segment, in seconds since its begin and in units of the value.
+struct KFSp_TemporalHandles {
+    double x1, y1, x2, y2;
+};
+
+// The handles of a temporal segment of `dt` seconds that begins at x = 0.
+inline KFSp_TemporalHandles KFSp_GetTemporalHandles(KFSp_TemporalEnd const& a, KFSp_TemporalEnd const& b, double dt)
 {
-    curve.p0[0] = 0.0;
-    curve.p0[1] = a.value;
-    curve.p3[0] = dt;
-    curve.p3[1] = b.value;
+    KFSp_TemporalHandles handles;
     if (a.spline) {
         double const h = a.influence * dt;
-        curve.p1[0] = h;
-        curve.p1[1] = a.value + h * a.speed;
+        handles.x1 = h;
+        handles.y1 = a.value + h * a.speed;
     } else {
-        curve.p1[0] = dt * KFSp_OneSixth;
-        curve.p1[1] = a.value + (b.value - a.value) * KFSp_OneSixth;
+        handles.x1 = dt * KFSp_OneSixth;
+        handles.y1 = a.value + (b.value - a.value) * KFSp_OneSixth;
     }
     if (b.spline) {
         double const h = -b.influence * dt;
-        curve.p2[0] = dt + h;
-        curve.p2[1] = b.value + h * b.speed;
+        handles.x2 = dt + h;
+        handles.y2 = b.value + h * b.speed;
     } else {
-        curve.p2[0] = dt - dt * KFSp_OneSixth;
-        curve.p2[1] = b.value - (b.value - a.value) * KFSp_OneSixth;
+        handles.x2 = dt - dt * KFSp_OneSixth;
+        handles.y2 = b.value - (b.value - a.value) * KFSp_OneSixth;
     }
+    return handles;
 }
 
-// Fills the speed graph between two anchors of a spatial stream: distance along the path, 0 to `total`, over `dt`
-// seconds.
+// Fills the same segment's curve, which has 2 coordinates.
+inline void KFSp_FillTemporalSegment(KFSp_TemporalEnd const& a, KFSp_TemporalEnd const& b, double dt,
+                                     CRV_Curve const& curve)
+{
+    KFSp_TemporalHandles const handles = KFSp_GetTemporalHandles(a, b, dt);
+    curve.p0[0] = 0.0;
+    curve.p0[1] = a.value;
+    curve.p1[0] = handles.x1;
+    curve.p1[1] = handles.y1;
+    curve.p2[0] = handles.x2;
+    curve.p2[1] = handles.y2;
+    curve.p3[0] = dt;
+    curve.p3[1] = b.value;
+}
+
+// The ends of the speed graph between two anchors of a spatial stream: distance along the path, 0 to `total`.
+struct KFSp_SpeedGraphEnds {
+    KFSp_TemporalEnd a;
+    KFSp_TemporalEnd b;
+
+    KFSp_SpeedGraphEnds(KFS_KeyScalar const* from, KFS_KeyScalar const* to, double total)
+        : a{0.0, from->outSpeed, from->outInfluence, from->outInterp == KFS_Interp_Spline},
+          b{total, to->inSpeed, to->inInfluence, to->inInterp == KFS_Interp_Spline}
+    {}
+};
+
+// Fills that graph's curve, over `dt` seconds.
 inline void KFSp_FillSpeedGraph(KFS_KeyScalar const* a, KFS_KeyScalar const* b, double total, double dt,
                                 CRV_Curve const& curve)
 {
-    KFSp_TemporalEnd const from{0.0, a->outSpeed, a->outInfluence, a->outInterp == KFS_Interp_Spline};
-    KFSp_TemporalEnd const to{total, b->inSpeed, b->inInfluence, b->inInterp == KFS_Interp_Spline};
-    KFSp_FillTemporalSegment(from, to, dt, curve);
+    KFSp_SpeedGraphEnds const ends(a, b, total);
+    KFSp_FillTemporalSegment(ends.a, ends.b, dt, curve);
 }
 
 // Fills the path from spatial key `a` to spatial key `b`, in the coordinates of the value.

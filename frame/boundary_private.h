@@ -9,7 +9,7 @@
 // The one door between throw and code. Runs the callable; an `int` that it throws is the result, a std::exception goes
 // to Q_TranslateAndReportException, anything else propagates. A callable without a result answers 0.
 template <class Body>
-int KFSp_Boundary(Body&& body)
+[[gnu::always_inline]] inline int KFSp_Boundary(Body&& body)
 {
     try {
         if constexpr (std::is_void_v<std::invoke_result_t<Body>>) {

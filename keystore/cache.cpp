@@ -30,12 +30,32 @@ int CopyKeyToCache(KFS_StreamKeyData const* data, int index)
     return code;
 }
 
+// What a request asks of the cache, beyond a value at a time.
+struct Request {
+    unsigned char keyOnly;
+    void const* value;
+    unsigned char* atKey;
+    KFS_InterpFunc* interpFunc;
+    long refcon;
+};
+
+// The common one asks for the value and nothing else. The compiler makes a shorter way of it.
+struct PlainRequest {
+    static constexpr unsigned char keyOnly = 0;
+    static constexpr bool value = true;
+    static constexpr unsigned char* atKey = nullptr;
+    static constexpr KFS_InterpFunc* interpFunc = nullptr;
+    static constexpr long refcon = 0;
+};
+
 int InterpolateToCache(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int keyIndex,
                        KFS_InterpFunc* interpFunc, long refcon)
 {
     KFS_InterpFunc const func = interpFunc ? *interpFunc : stream->GetInterpFunc();
-    if (!func) {
+    if (!func) {  // a file can say that a stream is a client's, and has none of the client's functions
         KFSp_ReportRow(KFSp_Op_UpdateCache, 0, KFSp_Row_NoInterpFunc);
+        data->cache->time = KFS_INVALID_INDEX;
+        return KFS_Err_InterpNotAllowed;
     }
     int const code = func(stream, interpFunc ? refcon : stream->GetItemRefcon(), time, keyIndex);
     data->cache->time = code == 0 ? time : KFS_INVALID_INDEX;
@@ -44,8 +64,8 @@ int InterpolateToCache(KFS_Stream const* stream, KFS_StreamKeyData const* data, 
 
 // The value between, before or after keys. `next` is the index of the first key after the time. Only a function that
 // may call the list again while it holds a key runs under a pin.
-int FillBetweenKeys(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int next,
-                    KFS_InterpFunc* interpFunc, long refcon)
+inline int FillBetweenKeys(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int next,
+                           KFS_InterpFunc* interpFunc, long refcon)
 {
     if (next == 0) {
         return CopyKeyToCache(data, 0);
@@ -54,14 +74,7 @@ int FillBetweenKeys(KFS_Stream const* stream, KFS_StreamKeyData const* data, int
         return CopyKeyToCache(data, next - 1);
     }
     if (!stream->IsSpatial()) {
-        KFS_KeyScalar const* a = nullptr;
-        KFS_KeyScalar const* b = nullptr;
-        KFSp_FirstError error;
-        error.Keep(KFSp_GetConstKey(data, next - 1, &a));
-        error.Keep(KFSp_GetConstKey(data, next, &b));
-        if (!error.None()) {
-            return error.Code();
-        }
+        auto const [a, b] = KFSp_GetKeyPair(data, next - 1);
         if (a->outInterp == KFS_Interp_Hold) {
             return CopyKeyToCache(data, next - 1);
         }
@@ -181,23 +194,28 @@ void KFSp_UpdateStreamCacheToTime(KFS_Stream const* stream, int time, unsigned c
     KFSp_UpdateCacheToTime(stream, stream->GetKeyData(), time, keyOnly, value, atKey, interpFunc, refcon);
 }
 
-void KFSp_UpdateCacheToTime(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, unsigned char keyOnly,
-                            void const* value, unsigned char* atKey, KFS_InterpFunc* interpFunc, long refcon)
+namespace {
+
+template <class Request>
+inline void UpdateCache(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, Request const& request)
 {
     KFS_KeyScalar* const cache = data->cache;
     if (stream->HasNoKeys()) {
         if (time != KFS_INVALID_INDEX) {  // which would say that the constant has no value
             cache->time = time;
         }
-        if (atKey) {
-            *atKey = 1;
+        if (request.atKey) {
+            *request.atKey = 1;
         }
+        return;
+    }
+    bool const stands = !request.value || (cache->time == time && !KFSp_CacheIsEmpty(cache));
+    if (stands && !request.atKey) {
         return;
     }
     bool found = false;
     int index = 0;
     KFSp_ThrowIf(KFSp_SearchKeys(data, time, &found, &index));
-    bool const stands = !value || (cache->time == time && !KFSp_CacheIsEmpty(cache));
     if (!stands) {
         KFSp_ThrowIf(KFSp_ClearCacheRecord(stream, cache));
         bool mayBeStale = KFSp_IsStale(data);
@@ -212,11 +230,24 @@ void KFSp_UpdateCacheToTime(KFS_Stream const* stream, KFS_StreamKeyData const* d
         }
         if (found) {
             KFSp_ThrowIf(CopyKeyToCache(data, index));
-        } else if (!keyOnly && KFSp_ItemCount(data) > 0) {
-            KFSp_ThrowIf(FillBetweenKeys(stream, data, time, index, interpFunc, refcon));
+        } else if (!request.keyOnly && KFSp_ItemCount(data) > 0) {
+            KFSp_ThrowIf(FillBetweenKeys(stream, data, time, index, request.interpFunc, request.refcon));
         }
     }
-    if (atKey) {
-        *atKey = found ? 1 : 0;
+    if (request.atKey) {
+        *request.atKey = found ? 1 : 0;
     }
+}
+
+}  // namespace
+
+void KFSp_UpdateCacheToTime(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, unsigned char keyOnly,
+                            void const* value, unsigned char* atKey, KFS_InterpFunc* interpFunc, long refcon)
+{
+    UpdateCache(stream, data, time, Request{keyOnly, value, atKey, interpFunc, refcon});
+}
+
+void KFSp_UpdateCacheToTime(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time)
+{
+    UpdateCache(stream, data, time, PlainRequest{});
 }

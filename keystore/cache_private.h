@@ -29,3 +29,5 @@ void KFSp_UpdateStreamCacheToTime(KFS_Stream const* stream, int time, unsigned c
 // The same on key data that the caller has at hand.
 void KFSp_UpdateCacheToTime(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, unsigned char keyOnly,
                             void const* value, unsigned char* atKey, KFS_InterpFunc* interpFunc, long refcon);
+// The same for a read that wants the value and nothing else.
+void KFSp_UpdateCacheToTime(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time);

@@ -171,6 +171,10 @@ bool BringCache(KFS_Stream const* stream, KFS_StreamKeyData const* data, int tim
     if (KFSp_HasNoValue(stream, data)) [[unlikely]] {
         throw KFSp_ReportErr(KFSp_Op_GetValueNoExpr, KFS_Err_NoKeys, KFSp_Row_GetValue);
     }
+    if (value && !keyOnly && !atKey && !interpFunc) [[likely]] {
+        KFSp_UpdateCacheToTime(stream, data, time);
+        return stream->GetDimension() >= 1;
+    }
     unsigned char found = 0;
     KFSp_UpdateCacheToTime(stream, data, time, keyOnly, value, &found, interpFunc, refcon);
     if (atKey) {

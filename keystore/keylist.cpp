@@ -31,32 +31,23 @@ void KeepMarked(int* range, int inserted)
     }
 }
 
-int DisposeRemapTable(SEQ_Head**, long, int, void* item)
+int DisposeRemapTableOfItem(SEQ_Head**, long, int, void* item)
 {
-    auto* const key = static_cast<KFS_KeyScalar*>(item);
-    if (!KFSp_HasSpatialBlock(key) || !key->remapTable) {
-        return 0;
-    }
-    return SEQ_Dispose(std::exchange(key->remapTable, nullptr), 0);
+    return KFSp_DisposeRemapTable(static_cast<KFS_KeyScalar*>(item));
 }
 
 }  // namespace
 
-int KFSp_SearchKeys(KFS_StreamKeyData const* data, int time, bool* found, int* index)
+// Builds the packed times, and searches the list itself where there is no memory for them.
+int KFSp_SearchKeyList(KFS_StreamKeyData const* data, int time, bool* found, int* index)
 {
     *found = false;
     *index = 0;
     if (!data->keys) {
         return 0;
     }
-    int const count = (*data->keys)->count;
-    if (!data->times.Mirrors(count) && !data->times.Build(data->keys)) {
-        return SearchList(data, time, found, index);
-    }
-    int const position = data->times.LowerBound(time);
-    *index = position;
-    *found = position < count && data->times[position] == time;
-    return 0;
+    return data->times.Build(data->keys) ? KFSp_SearchKeys(data, time, found, index)
+                                         : SearchList(data, time, found, index);
 }
 
 int KFSp_InsertKeyItem(KFS_StreamKeyData* data, KFS_KeyScalar const* record, int index)
@@ -101,10 +92,23 @@ void KFSp_RetimeKey(KFS_StreamKeyData* data, int index, KFS_KeyScalar* key, int 
     }
 }
 
+int KFSp_DisposeRemapTable(KFS_KeyScalar* key)
+{
+    if (!KFSp_HasSpatialBlock(key) || !key->remapTable) {
+        return 0;
+    }
+    return SEQ_Dispose(std::exchange(key->remapTable, nullptr), 0);
+}
+
+int KFSp_DisposeRemapTables(SEQ_Head** keys)
+{
+    return SEQ_ForEach(keys, 0, DisposeRemapTableOfItem, 0);
+}
+
 void KFSp_DisposeKeyList(SEQ_Head** keys)
 {
     if (keys) {
-        static_cast<void>(SEQ_ForEach(keys, 0, DisposeRemapTable, 0));
+        static_cast<void>(KFSp_DisposeRemapTables(keys));
         static_cast<void>(SEQ_Dispose(keys, 0));
     }
 }

@@ -2,6 +2,7 @@
 
 #include "keystore/items.h"
 #include "keystore/stream.h"
+#include "services/sequence/list_private.h"
 
 #include <climits>
 
@@ -59,7 +60,22 @@ inline bool KFSp_HasNoValue(KFS_Stream const* stream, KFS_StreamKeyData const* d
 
 // The key at exactly `time`: `found` and its index; or not found, and the index of the first key after it (the count
 // past the end). A missing list is an empty one. Answers the list service's code.
-int KFSp_SearchKeys(KFS_StreamKeyData const* data, int time, bool* found, int* index);
+int KFSp_SearchKeyList(KFS_StreamKeyData const* data, int time, bool* found, int* index);
+inline int KFSp_SearchKeys(KFS_StreamKeyData const* data, int time, bool* found, int* index)
+{
+    if (!data->keys || !data->times.Mirrors((*data->keys)->count)) [[unlikely]] {
+        bool foundInList = false;  // not the caller's own, which stay in registers that way
+        int indexInList = 0;
+        int const code = KFSp_SearchKeyList(data, time, &foundInList, &indexInList);
+        *found = foundInList;
+        *index = indexInList;
+        return code;
+    }
+    int const position = data->times.LowerBound(time);
+    *index = position;
+    *found = position < (*data->keys)->count && data->times[position] == time;
+    return 0;
+}
 
 // A key of the list, read-only; -1 names the last one.
 inline int KFSp_GetConstKey(KFS_StreamKeyData const* data, int index, KFS_KeyScalar const** key)
@@ -70,6 +86,18 @@ inline int KFSp_GetConstKey(KFS_StreamKeyData const* data, int index, KFS_KeySca
     return code;
 }
 
+// Two neighbours, read-only, without a call: there is a key at `index` and one after it.
+struct KFSp_KeyPair {
+    KFS_KeyScalar const* a;
+    KFS_KeyScalar const* b;
+};
+inline KFSp_KeyPair KFSp_GetKeyPair(KFS_StreamKeyData const* data, int index)
+{
+    SEQ_Head const& head = **data->keys;
+    unsigned char const* const first = SEQp_Item(head, index);
+    return {reinterpret_cast<KFS_KeyScalar const*>(first), reinterpret_cast<KFS_KeyScalar const*>(first + head.stride)};
+}
+
 // Inserts a copy of `record` so that it stands at `index`; the list exists.
 int KFSp_InsertKeyItem(KFS_StreamKeyData* data, KFS_KeyScalar const* record, int index);
 // Removes a key; `record`, if not null, takes it over without disposal.
@@ -78,6 +106,11 @@ int KFSp_RemoveKeyItem(KFS_StreamKeyData* data, int index, KFS_KeyScalar* record
 int KFSp_ReplaceKeyItem(KFS_StreamKeyData* data, KFS_KeyScalar const* record, int index);
 // Writes the time of the key at `index`, which `key` points to. The caller keeps the list sorted.
 void KFSp_RetimeKey(KFS_StreamKeyData* data, int index, KFS_KeyScalar* key, int time);
+
+// Disposes the arc table that a key owns, if it has one.
+int KFSp_DisposeRemapTable(KFS_KeyScalar* key);
+// The same for all keys of a list.
+int KFSp_DisposeRemapTables(SEQ_Head** keys);
 
 // Disposes a list of keys with the arc tables that they own; null is fine. There is nobody to tell of a failure.
 void KFSp_DisposeKeyList(SEQ_Head** keys);

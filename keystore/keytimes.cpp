@@ -21,6 +21,7 @@ bool KFS_KeyTimes::Build(SEQ_Head const* const* keys)
         times_[static_cast<std::size_t>(i)] = static_cast<KFS_KeyScalar const*>(item)->time;
     }
     mirrors_ = true;
+    Changed();
     return true;
 }
 
@@ -28,6 +29,16 @@ void KFS_KeyTimes::Drop() noexcept
 {
     mirrors_ = false;
     times_.clear();
+    Changed();
+}
+
+// The times of a list that spans less than half of the 32-bit circle ascend as numbers too; of a longer one nothing is
+// foretold, since which key comes first depends on where one looks from.
+void KFS_KeyTimes::Changed() noexcept
+{
+    walking_ = false;
+    ordered_ = !times_.empty() && times_.front() <= times_.back() &&
+               static_cast<unsigned int>(times_.back()) - static_cast<unsigned int>(times_.front()) < 1U << 31;
 }
 
 void KFS_KeyTimes::Inserted(int index, int time) noexcept
@@ -40,12 +51,14 @@ void KFS_KeyTimes::Inserted(int index, int time) noexcept
     } catch (std::bad_alloc const&) {
         Drop();
     }
+    Changed();
 }
 
 void KFS_KeyTimes::Removed(int index) noexcept
 {
     if (mirrors_) {
         times_.erase(times_.begin() + index);
+        Changed();
     }
 }
 
@@ -53,25 +66,35 @@ void KFS_KeyTimes::Retimed(int index, int time) noexcept
 {
     if (mirrors_) {
         times_[static_cast<std::size_t>(index)] = time;
+        Changed();
     }
 }
 
 // By the difference with wrap-around, as the list sorts. The sign of the difference is turned into a step or none,
 // because a branch on it would be mispredicted every other time.
-int KFS_KeyTimes::LowerBound(int time) const noexcept
+int KFS_KeyTimes::Search(int time) const noexcept
 {
     auto const isBefore = [time](int other) {
         return (static_cast<unsigned int>(other) - static_cast<unsigned int>(time)) >> 31;
     };
     int const* base = times_.data();
-    auto count = static_cast<unsigned int>(times_.size());
-    if (count == 0) {
+    auto const all = static_cast<unsigned int>(times_.size());
+    if (all == 0) {
         return 0;
     }
-    while (count > 1) {
+    // Keys are mostly added at the end.
+    if (ordered_ && times_.back() < time &&
+        static_cast<unsigned int>(time) - static_cast<unsigned int>(times_.front()) < 1U << 31) {
+        return static_cast<int>(all);
+    }
+    for (unsigned int count = all; count > 1;) {
         unsigned int const half = count / 2;
         base += half & (0U - isBefore(base[half - 1]));
         count -= half;
     }
-    return static_cast<int>(base - times_.data()) + static_cast<int>(isBefore(*base));
+    int const found = static_cast<int>(base - times_.data()) + static_cast<int>(isBefore(*base));
+    walking_ =
+        ordered_ && static_cast<unsigned int>(found - last_) <= 1 && found > 0 && found < static_cast<int>(all) - 1;
+    last_ = found;
+    return found;
 }

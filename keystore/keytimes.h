@@ -25,11 +25,35 @@ public:
     void Removed(int index) noexcept;
     void Retimed(int index, int time) noexcept;
 
-    // The number of keys before `time`: the index of the first key at or after it.
+    // The number of keys before `time`: the index of the first key at or after it. Reads mostly walk along the time
+    // line, so the last answer and the one after it are tried first where the last search found them right. That never
+    // changes an answer, only what it costs.
     int LowerBound(int time) const noexcept;
     int operator[](int index) const noexcept { return times_[static_cast<std::size_t>(index)]; }
 
 private:
+    int Search(int time) const noexcept;
+    void Changed() noexcept;
+
     std::vector<int, Q_Allocator<int>> times_;
     bool mirrors_ = false;
+    bool ordered_ = false;          // ascending also without wrap-around, so that neighbours enclose a time for sure
+    mutable bool walking_ = false;  // the last search ended where the one before did, or one key on
+    mutable int last_ = 0;
 };
+
+inline int KFS_KeyTimes::LowerBound(int time) const noexcept
+{
+    if (walking_) {
+        int const* const at = times_.data() + last_;  // there is a key before it and one after it
+        if (at[-1] < time) {
+            if (time <= at[0]) return last_;
+            if (time <= at[1]) {
+                int const next = last_ + 1;
+                if (next + 1 < static_cast<int>(times_.size())) last_ = next;
+                return next;
+            }
+        }
+    }
+    return Search(time);
+}

@@ -307,5 +307,7 @@ private:
 
 // Changes what a value of the stream is; the old description goes to `oldDesc` if that isn't null, and a null `newDesc`
 // changes nothing. A custom stream that is given a plain description counts as custom again once a custom one comes
-// back. Doesn't notify. Operation 9. Errors: 2; 7433 for a data type above 9, not reported.
+// back. The cache record and the key list keep their sizes: whoever makes the values of a live stream larger calls
+// AllocateCache after it and gives the stream a new list. Doesn't notify. Operation 9. Errors: 2; 7433 for a data type
+// above 9, not reported.
 KFS_API int KFS_SetValueDescription(KFS_Stream* stream, KFS_ValueDesc const* newDesc, KFS_ValueDesc* oldDesc);

@@ -70,12 +70,6 @@ void ShortenBeside(Handle const& handle, Handle const& other)
     Shorten(handle, 1.0);
 }
 
-// Both handles between the two end values: the case of nearly every call.
-bool IsInside(double y0, double y1, double y2, double y3)
-{
-    return (y0 <= y1) & (y1 <= y3) & (y0 <= y2) & (y2 <= y3);
-}
-
 bool MoveHandles(CRV_Curve* curve)
 {
     const Handle out{curve->p1, curve->p0, curve->p3};
@@ -111,7 +105,7 @@ int CRV_CurveSetNonDecreasing(CRV_Curve* curve, unsigned char* changed)
     const double y1 = curve->p1[1];
     const double y2 = curve->p2[1];
     const double y3 = curve->p3[1];
-    if (IsInside(y0, y1, y2, y3) || IsInside(y3, y2, y1, y0)) return 0;
+    if (CRVp_IsInside(y0, y1, y2, y3) || CRVp_IsInside(y3, y2, y1, y0)) return 0;
     if (!CRVp_AllFinite(curve)) return CRV_Err_NotFinite;
     if (MoveHandles(curve) && changed) *changed = 1;
     return 0;

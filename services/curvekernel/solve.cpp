@@ -40,24 +40,6 @@ int UnitTurningPoints(double a, double b, double turns[2])
     return count;
 }
 
-// The root of cubic(t) = u for handles a and b between 0 and 1. The curve is turned around where that brings the root
-// into the first half; there the cubic is near a parabola, whose root is a good start also where the slope at the end
-// is 0. False where three steps weren't enough, next to a plateau.
-bool SteepRoot(double a, double b, double u, double& root)
-{
-    const bool turned = 8.0 * u > 1.0 + 3.0 * (a + b);
-    const CRVp_UnitCubic cubic =
-        turned ? CRVp_UnitCubic::FromHandles(1.0 - b, 1.0 - a) : CRVp_UnitCubic::FromHandles(a, b);
-    const double target = turned ? 1.0 - u : u;
-
-    // 0.3 t^2 stands for t^3: the choice that fails least often over random handles.
-    const double discriminant = cubic.a1 * cubic.a1 + 4.0 * (cubic.a2 + 0.3 * cubic.a3) * target;
-    const double start = 2.0 * target / (cubic.a1 + (discriminant > 0.0 ? std::sqrt(discriminant) : 0.0));
-    const double t = CRVp_HalleySteps(cubic, target, start);
-    root = turned ? 1.0 - t : t;
-    return CRVp_IsRoot(cubic, target, t);
-}
-
 // The root of cubic(t) = u between low, where it is below u, and high, where it isn't; it grows in between.
 // Newton steps, bisection where a step leaves the bracket or doesn't halve the one before. The bracket test is closed:
 // at convergence the step lands on an end of the bracket, and bisecting from there would start all over.
@@ -130,7 +112,7 @@ double CRVp_ReachSlow(double c0, double c1, double c2, double c3, double v)
 
     const bool ordered = a >= 0.0 && a <= 1.0 && b >= 0.0 && b <= 1.0;
     double root = 0.0;
-    if (ordered && SteepRoot(a, b, u, root)) return root;
+    if (ordered && CRVp_SteepRoot(a, b, u, root)) return root;
 
     const CRVp_UnitCubic cubic = CRVp_UnitCubic::FromHandles(a, b);
     double low = 0.0;

@@ -6,6 +6,8 @@
 // whatever fails the check, and every other shape, goes to CRVp_ReachSlow.
 #pragma once
 
+#include <cmath>
+
 // The power form of a cubic with value 0 at t = 0 and 1 at t = 1: ((a3 t + a2) t + a1) t.
 struct CRVp_UnitCubic {
     double a3, a2, a1;
@@ -20,12 +22,13 @@ struct CRVp_UnitCubic {
     double Slope(double t) const { return (3.0 * a3 * t + 2.0 * a2) * t + a1; }
 };
 
-// Three Halley steps towards cubic(t) = u.
+// Three Halley steps towards cubic(t) = u. What a step costs is how long its operations wait for each other, so the value
+// is summed in two halves.
 inline double CRVp_HalleySteps(CRVp_UnitCubic const& cubic, double u, double t)
 {
     for (int step = 0; step < 3; ++step) {
         const double at = cubic.a3 * t;
-        const double f = ((at + cubic.a2) * t + cubic.a1) * t - u;
+        const double f = (at + cubic.a2) * (t * t) + (cubic.a1 * t - u);
         const double slope = (3.0 * at + 2.0 * cubic.a2) * t + cubic.a1;
         const double halfCurvature = 3.0 * at + cubic.a2;
         t -= f * slope / (slope * slope - f * halfCurvature);
@@ -76,26 +79,59 @@ inline double CRVp_LimitToHull(double c0, double c1, double c2, double c3, doubl
     return CRVp_Max(low, CRVp_Min(high, value));
 }
 
+// Both handles between the two end values, which ascend: the curve doesn't run backwards. The case of nearly every curve.
+inline bool CRVp_IsInside(double c0, double c1, double c2, double c3)
+{
+    return (c0 <= c1) & (c1 <= c3) & (c0 <= c2) & (c2 <= c3);
+}
+
 // False for NaN and the infinities.
 inline bool CRVp_IsFinite(double value)
 {
     return value - value == 0.0;
 }
 
-inline double CRVp_Reach(double c0, double c1, double c2, double c3, double v)
+// The root of cubic(t) = u for handles a and b between 0 and 1. The curve is turned around where that brings the root
+// into the first half; there the cubic is near a parabola, whose root is a good start also where the slope at the end
+// is 0. False where three steps weren't enough, next to a plateau.
+inline bool CRVp_SteepRoot(double a, double b, double u, double& root)
 {
-    const bool ordered = (v > c0) & (v < c3) & (c1 >= c0) & (c1 <= c3) & (c2 >= c0) & (c2 <= c3);
-    if (!ordered) return CRVp_ReachSlow(c0, c1, c2, c3, v);
+    const bool turned = 8.0 * u > 1.0 + 3.0 * (a + b);
+    const CRVp_UnitCubic cubic =
+        turned ? CRVp_UnitCubic::FromHandles(1.0 - b, 1.0 - a) : CRVp_UnitCubic::FromHandles(a, b);
+    const double target = turned ? 1.0 - u : u;
 
-    const double inverse = 1.0 / (c3 - c0);
-    const double u = (v - c0) * inverse;
-    const CRVp_UnitCubic cubic = CRVp_UnitCubic::FromHandles((c1 - c0) * inverse, (c2 - c0) * inverse);
+    // 0.3 t^2 stands for t^3: the choice that fails least often over random handles.
+    const double discriminant = cubic.a1 * cubic.a1 + 4.0 * (cubic.a2 + 0.3 * cubic.a3) * target;
+    const double start = 2.0 * target / (cubic.a1 + (discriminant > 0.0 ? std::sqrt(discriminant) : 0.0));
+    const double t = CRVp_HalleySteps(cubic, target, start);
+    root = turned ? 1.0 - t : t;
+    return CRVp_IsRoot(cubic, target, t);
+}
+
+// The root of cubic(t) = u for the handles a and b of a unit cubic, in all but the rare cases. False where only
+// CRVp_ReachSlow can tell: `t` has no meaning then. A NaN passes no comparison.
+inline bool CRVp_UnitRoot(double a, double b, double u, double& t)
+{
+    const bool ordered = (CRVp_Min(CRVp_Min(a, b), u) >= 0.0) & (CRVp_Max(a, b) <= 1.0) & (u < 1.0);
+    if (!ordered) return false;
+    const CRVp_UnitCubic cubic = CRVp_UnitCubic::FromHandles(a, b);
 
     // Both influences one third, up to the rounding of the handles: the coordinate is linear in t.
-    const double bend = (cubic.a3 < 0.0 ? -cubic.a3 : cubic.a3) + (cubic.a2 < 0.0 ? -cubic.a2 : cubic.a2);
-    if (bend <= 4e-15) return u;
+    if (std::fabs(cubic.a3) + std::fabs(cubic.a2) <= 4e-15) {
+        t = u;
+        return true;
+    }
+    t = CRVp_HalleySteps(cubic, u, u);
+    return CRVp_IsRoot(cubic, u, t) || CRVp_SteepRoot(a, b, u, t);
+}
 
-    const double t = CRVp_HalleySteps(cubic, u, u);
-    if (CRVp_IsRoot(cubic, u, t)) return t;
-    return CRVp_ReachSlow(c0, c1, c2, c3, v);
+// An extent of 0 and one that overflows end in a NaN here, and so at CRVp_ReachSlow.
+inline double CRVp_Reach(double c0, double c1, double c2, double c3, double v)
+{
+    const double inverse = 1.0 / (c3 - c0);
+    double t = 0.0;
+    return CRVp_UnitRoot((c1 - c0) * inverse, (c2 - c0) * inverse, (v - c0) * inverse, t)
+               ? t
+               : CRVp_ReachSlow(c0, c1, c2, c3, v);
 }

@@ -1,72 +1,96 @@
+// The packed index of key times: what it remembers of the last search must never show in an answer.
+
 #include "keystore/keytimes.h"
 
-#include "keystore/keylist_private.h"
 #include "tests/support/streams.h"
+
+#include <gtest/gtest.h>
 
 #include <algorithm>
 #include <climits>
 #include <random>
+#include <vector>
 
 namespace {
 
-class KeyTimes : public StreamTest {};
+// A list of records of which only the times are looked at.
+class KeyTimesTest : public StreamTest {
+protected:
+    KeyTimesTest() { EXPECT_EQ(SEQ_New(0, sizeof(KFS_KeyScalar), 0, 0, &list_), 0); }
+    ~KeyTimesTest() override { SEQ_Dispose(list_, 0); }
 
-// Whatever order keys come and go in, a search answers like a search of a sorted vector.
-TEST_F(KeyTimes, SearchesAgreeWithASortedVectorThroughEdits)
-{
-    std::mt19937 random(7);
-    TestStream stream;
-    std::vector<int> model;
-    for (int step = 0; step < 400; ++step) {
-        const int time = static_cast<int>(random() % 300) - 150;
-        const auto at = std::lower_bound(model.begin(), model.end(), time);
-        const bool stands = at != model.end() && *at == time;
-        if (stands && random() % 2) {
-            ASSERT_EQ(0, KFS_RemoveKey(stream, static_cast<int>(at - model.begin()), nullptr));
-            model.erase(at);
-        } else if (!stands) {
-            stream.Key(time, {1.0 * time});
-            model.insert(at, time);
-        }
-        const int asked = static_cast<int>(random() % 320) - 160;
-        const auto expected = std::lower_bound(model.begin(), model.end(), asked);
-        bool found = false;
-        int index = -7;
-        ASSERT_EQ(0, KFSp_SearchKeys(stream->GetKeyData(), asked, &found, &index));
-        ASSERT_EQ(expected - model.begin(), index) << "step " << step << " asked " << asked;
-        ASSERT_EQ(expected != model.end() && *expected == asked, found);
+    void Insert(int time)
+    {
+        auto const at = std::lower_bound(expected_.begin(), expected_.end(), time);
+        if (at != expected_.end() && *at == time) return;
+        times_.Inserted(static_cast<int>(at - expected_.begin()), time);
+        expected_.insert(at, time);
     }
-    EXPECT_EQ(model, stream.Times());
+    void RemoveAny(std::mt19937& random)
+    {
+        if (expected_.empty()) return;
+        int const index = static_cast<int>(random() % expected_.size());
+        times_.Removed(index);
+        expected_.erase(expected_.begin() + index);
+    }
+    // Half of a gap, so that the order stays.
+    void RetimeAny(std::mt19937& random)
+    {
+        if (expected_.size() < 2) return;
+        std::size_t const index = random() % (expected_.size() - 1);
+        expected_[index] += (expected_[index + 1] - expected_[index]) / 2;
+        times_.Retimed(static_cast<int>(index), expected_[index]);
+    }
+    void Ask(int time)
+    {
+        int const right =
+            static_cast<int>(std::lower_bound(expected_.begin(), expected_.end(), time) - expected_.begin());
+        ASSERT_EQ(times_.LowerBound(time), right) << "at " << time << " of " << expected_.size() << " keys";
+    }
+
+    SEQ_Head** list_ = nullptr;
+    std::vector<int> expected_;
+    KFS_KeyTimes times_;
+};
+
+TEST_F(KeyTimesTest, AnswersDontDependOnTheSearchesBefore)
+{
+    std::mt19937 random(11);
+    ASSERT_TRUE(times_.Build(list_));
+    int cursor = 0;
+    for (int step = 0; step < 20000; ++step) {
+        switch (random() % 16) {
+        case 0: Insert(static_cast<int>(random() % 2000)); break;
+        case 1: RemoveAny(random); break;
+        case 2: RetimeAny(random); break;
+        case 3: cursor = static_cast<int>(random() % 2200) - 100; break;  // a seek
+        case 4:
+            Ask(INT_MAX);
+            Ask(INT_MIN + 4000);
+            break;                                                      // far outside, not yet around the circle
+        default: cursor += static_cast<int>(random() % 12) - 2; break;  // play, now and then a step back
+        }
+        Ask(cursor);
+        if (HasFatalFailure()) return;
+    }
+    EXPECT_GT(expected_.size(), 0U);
 }
 
-TEST_F(KeyTimes, NeverDecidesAResult)
+// Half of the 32-bit circle away, a time lies before or after a key depending on the key: the memory has no say there.
+TEST_F(KeyTimesTest, AListAroundHalfTheCircleIsSearchedWhole)
 {
-    TestStream stream;
-    stream.Key(10, {1.0}).Key(20, {3.0}).Key(30, {5.0});
-    stream->GetKeyData()->times.Drop();
-    Q_FailAllocation(1);
-    EXPECT_DOUBLE_EQ(2.0, stream.At1(15));
-    Q_FailAllocation(0);
-    // Whoever retimes keys through the list's handle says so, and is believed.
-    stream.Record(1)->time = 26;
-    stream->SetKeys(stream->GetKeys());
-    EXPECT_DOUBLE_EQ(2.0, stream.At1(18));
-}
-
-TEST_F(KeyTimes, OrderIsByTheDifferenceWithWrapAround)
-{
-    TestStream stream;
-    stream.Key(INT_MAX - 10, {1.0}).Key(INT_MAX - 5, {2.0});
-    bool found = false;
-    int index = 0;
-    ASSERT_EQ(0, KFSp_SearchKeys(stream->GetKeyData(), INT_MIN + 5, &found, &index));
-    EXPECT_EQ(2, index) << "just past the end of the numbers is later";
-    int viaList = 0;
-    KFS_KeyScalar probe{};
-    probe.time = INT_MIN + 5;
-    unsigned char foundByte = 1;
-    ASSERT_EQ(0, SEQ_GetSortedConstItem(stream->GetKeys(), 0, &probe, &foundByte, 0, &viaList));
-    EXPECT_EQ(index, viaList);
+    ASSERT_TRUE(times_.Build(list_));
+    std::vector<int> const times{INT_MIN + 10, -1000, 1000, INT_MAX - 10};
+    for (std::size_t i = 0; i < times.size(); ++i) times_.Inserted(static_cast<int>(i), times[i]);
+    for (int const time : {-999, 0, 999, 5000, -5000, INT_MAX - 11}) {
+        KFS_KeyTimes fresh;
+        ASSERT_TRUE(fresh.Build(list_));
+        for (std::size_t i = 0; i < times.size(); ++i) fresh.Inserted(static_cast<int>(i), times[i]);
+        int const first = fresh.LowerBound(time);
+        times_.LowerBound(0);
+        times_.LowerBound(1);
+        EXPECT_EQ(times_.LowerBound(time), first) << time;
+    }
 }
 
 }  // namespace
