@@ -2,13 +2,16 @@
 
 #include "curves/arcs_private.h"
 #include "curves/neighbours_private.h"
-#include "curves/segment_private.h"
+#include "curves/solvesegment_private.h"
 #include "curves/spatial_private.h"
 #include "curves/update.h"
 #include "curves/update_private.h"
 #include "frame/boundary_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/valuedata_private.h"
+
+// A read is a chain of small steps that three functions share. Left to the compiler, the calls between them are a tenth
+// of what a read costs, so the longer ones are inlined by force.
 
 namespace {
 
@@ -41,7 +44,8 @@ bool TakeHint(KFS_StreamKeyData const* data, int time, int keyIndex, Run* run)
     return run->a->time < time && time < run->b->time;
 }
 
-int FindAnchors(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int keyIndex, Run* run)
+[[gnu::always_inline]] inline int FindAnchors(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time,
+                                              int keyIndex, Run* run)
 {
     bool const hinted = TakeHint(data, time, keyIndex, run);
     bool const floats = hinted && stream->IsSParametrized() && (KFSp_Floats(run->a) || KFSp_Floats(run->b));
@@ -68,15 +72,26 @@ double LinearFraction(KFS_KeyScalar const* a, KFS_KeyScalar const* b, int time)
 }
 
 // Fills the speed graph, which never runs backwards, whatever KFS_StreamFlag_NonDecreasing says.
-int BuildSpeedGraph(KFS_Stream const* stream, Run const& run, KFSp_SegmentCurve& graph)
+[[gnu::always_inline]] inline int BuildSpeedGraph(KFS_Stream const* stream, Run const& run, KFSp_SegmentCurve& graph)
 {
     double const dt = KFSp_Seconds(run.b->time, run.a->time, stream->GetTimeScale());
     KFSp_FillSpeedGraph(run.a, run.b, run.total, dt, graph.curve);
     return CRV_CurveSetNonDecreasing(&graph.curve, nullptr);
 }
 
+// The distance where the graph doesn't run backwards as it is. False where it has to be built.
+[[gnu::always_inline]] inline bool SolveSpeedGraph(KFS_Stream const* stream, Run const& run, int time, double* s)
+{
+    KFSp_SpeedGraphEnds const ends(run.a, run.b, run.total);
+    double const dt = KFSp_Seconds(run.b->time, run.a->time, stream->GetTimeScale());
+    KFSp_TemporalHandles const handles = KFSp_GetTemporalHandles(ends.a, ends.b, dt);
+    return CRVp_IsInside(0.0, handles.y1, handles.y2, run.total) &&
+           KFSp_SolveSegment(ends.a, ends.b, handles, LinearFraction(run.a, run.b, time), s);
+}
+
 // The distance from the first anchor. Codes that have no shape answer 0 and KFS_Err_InterpNotAllowed.
-int GetDistance(KFS_Stream const* stream, Run const& run, int time, KFSp_SegmentCurve& graph, double* s)
+[[gnu::always_inline]] inline int GetDistance(KFS_Stream const* stream, Run const& run, int time,
+                                              KFSp_SegmentCurve& graph, double* s)
 {
     *s = 0.0;
     switch (KFSp_GetSegmentKind(run.a->outInterp, run.b->inInterp)) {
@@ -85,6 +100,8 @@ int GetDistance(KFS_Stream const* stream, Run const& run, int time, KFSp_Segment
     case KFSp_SegmentKind::Curved: break;
     case KFSp_SegmentKind::Other: return KFS_Err_InterpNotAllowed;
     }
+    if (SolveSpeedGraph(stream, run, time, s)) [[likely]]
+        return 0;
     if (int const code = BuildSpeedGraph(stream, run, graph); code != 0) return code;
     return CRV_EvaluateYFromX(&graph.curve, s, KFSp_Seconds(time, run.a->time, stream->GetTimeScale()));
 }
@@ -117,10 +134,23 @@ SEQ_Head** TableOf(KFS_KeyScalar const* key)
     return KFSp_HasSpatialBlock(key) ? key->remapTable : nullptr;
 }
 
+// Asks for an arc's table ahead of its use. In a long path it is seldom in a cache, and finding the distance takes about
+// as long as memory does. The kernel makes a table in one piece, of some 600 bytes, of which the far end isn't read.
+void PrefetchTable(KFS_KeyScalar const* key)
+{
+    constexpr int line = 64;
+    constexpr int lines = 8;
+    char const* const table = reinterpret_cast<char const*>(TableOf(key));
+    if (!table) return;
+    for (int i = 0; i < lines; ++i) {
+        __builtin_prefetch(table + i * line);
+    }
+}
+
 // The path's parameter at a place. `path` is filled here, with the piece's points in the value's coordinates, where
 // `fill` asks for it or the table is missing.
-int GetParameter(KFS_Stream const* stream, Run const& run, Place const& place, bool fill, KFSp_SegmentCurve& path,
-                 double* t)
+[[gnu::always_inline]] inline int GetParameter(KFS_Stream const* stream, Run const& run, Place const& place, bool fill,
+                                               KFSp_SegmentCurve& path, double* t)
 {
     if (!TableOf(place.first)) {
         if (int const code = KFS_ForceUpdateStream(stream); code != 0) return code;
@@ -146,13 +176,21 @@ void WriteStraight(KFS_Stream const* stream, Run const& run, double t, double* r
     for (int i = 0; i < dimension; ++i) {
         result[i] = from[i] + (to[i] - from[i]) * t;
     }
-    result[2 * dimension] = t;
+    if (dimension > 0) {  // the record of a value without components has no room for it
+        result[2 * dimension] = t;
+    }
 }
 
-int FindRun(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int keyIndex, Run* run)
+[[gnu::always_inline]] inline int FindRun(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time,
+                                          int keyIndex, Run* run)
 {
     if (int const code = KFSp_CheckPathDimension(stream); code != 0) return code;
     if (int const code = FindAnchors(stream, data, time, keyIndex, run); code != 0) return code;
+    PrefetchTable(run->a);
+    if (run->Adjacent()) {
+        run->total = run->a->arcLength;
+        return 0;
+    }
     return KFSp_SumArcs(data, run->aIndex, run->bIndex, &run->total);
 }
 
@@ -228,6 +266,7 @@ int KFSp_InterpDerivSpatial(KFS_Stream const* stream, long, int time, int keyInd
     bool const bothSpline = run.a->outInterp == KFS_Interp_Spline && run.b->inInterp == KFS_Interp_Spline;
     if (int const code = KFSp_SumArcs(data, run.aIndex, run.bIndex, &run.total); code != 0 && !bothSpline) return code;
     if (KFSp_GetSegmentKind(run.a->outInterp, run.b->inInterp) != KFSp_SegmentKind::Curved) return 0;
+    if (stream->GetDimension() < 1) return 0;  // as in WriteStraight
 
     KFSp_SegmentCurve graph(2);
     if (int const code = BuildSpeedGraph(stream, run, graph); code != 0) return code;

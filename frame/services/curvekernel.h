@@ -117,7 +117,8 @@ KFS_SERVICE_API int CRV_CurveSetNonDecreasing(CRV_Curve* curve, unsigned char* c
 
 // Measures a spatial curve and makes its table from distance to parameter.
 //
-//   remapTable   in and out, not null. Holds null or a table of an earlier call, which is replaced. The table is a list
+//   remapTable   in and out, not null. Holds null or a table of an earlier call, which is replaced: left as it is where
+//                the curve and the accuracy are the same, else in the same memory where it fits. The table is a list
 //                for SEQ_Dispose; its items are private. On failure the older table is gone and null is left.
 //   arcLength    out, not null. In the units of the curve's coordinates. On failure 0.
 //   accuracy     absolute, in the same units. `arcLength` is that close to the true length, and the point that the
@@ -126,7 +127,11 @@ KFS_SERVICE_API int CRV_CurveSetNonDecreasing(CRV_Curve* curve, unsigned char* c
 //
 // Whatever the accuracy, the table keeps the speed along the path even to 3e-4, so that equal distances stay equal
 // steps. A curve whose points coincide has length 0 and a table that answers 0.
-// Dimension 1 to 4. Cost: microseconds.
+// Dimension 1 to 4.
+//
+// Cost: 0.5 to 2 microseconds and 400 to 900 bytes, one allocation; 32 bytes for each place at which the path is cut.
+// At an accuracy of 1e-6 of the path's size a gentle segment needs some 13 of them, the median of a hundred thousand
+// segments of all kinds 22 and the worst 100; the finest accuracy needs three times as many.
 KFS_SERVICE_API int CRV_BuildArcSpline(CRV_Curve const* curve, SEQ_Head*** remapTable, double* arcLength,
                                        double accuracy);
 
@@ -137,4 +142,6 @@ KFS_SERVICE_API int CRV_BuildArcSpline(CRV_Curve const* curve, SEQ_Head*** remap
 //                measured, at the cost of building a table.
 //   s            in the units of the measured curve; limited to 0 to the arc length, whose answer is exactly `one`.
 //   one          the parameter at p3: the answer runs from 0 to this. Callers pass 1.0.
+//
+// SEQ_Err_BadList for a list that isn't such a table.
 KFS_SERVICE_API int CRV_TFromSSpline(CRV_Curve const* curve, SEQ_Head*** remapTable, double* t, double s, double one);

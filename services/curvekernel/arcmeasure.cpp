@@ -1,9 +1,17 @@
-// Measuring a path: from control points to the pieces of its table.
+// Measuring a path: from control points to the knots of its table.
+//
+// The squared speed of a cubic is a polynomial of degree 4, so nothing below depends on the dimension. A piece may be
+// about as long as the distance, in the complex plane, to the next place where that polynomial is 0: steps go from the
+// slow end of a stretch to its fast end, and each step's error says how long the next one may be.
 
 #include "services/curvekernel/arctable_private.h"
 #include "services/curvekernel/curve_private.h"
 
-#include <limits>
+#include <algorithm>
+#include <bit>
+#include <cstdint>
+#include <iterator>
+#include <utility>
 
 namespace {
 
@@ -18,88 +26,33 @@ constexpr double kNegligible = 1e-7;
 constexpr double kFinestAccuracy = 1e-9;
 
 // Positions between two samples of the speed error stay below this share of its maximum times the piece's length: the
-// error of a Hermite quintic, v^3 (1-v)^3, stands at 0.29 of its steepest slope.
+// error of a Hermite quintic, v^3 (1-v)^3, stands at 0.29 of its steepest slope. What a piece may use of the accuracy
+// leaves the rest to the errors that the samples don't see, and to those of the lengths.
 constexpr double kErrorShare = 0.35;
+constexpr double kSteepest = 0.276;
+constexpr double kAccuracyShare = 0.4;
 
-// How a path leaves a parameter: speed and its first two derivatives by t. At a standstill the speed is 0 and the
-// derivatives are those to the right; to the left they have the other sign.
-struct Knot {
-    double t;
-    double speed, first, second;
-    bool standstill;
-};
+// What differs by less than this share differs by rounding. A line that doesn't turn back is as long as its chord, so
+// that whole numbers stay whole.
+constexpr double kRounding = 1e-14;
 
-// Speed of a path of up to N dimensions. The unused coordinates are 0.
-template <int N>
-class Path {
+// The squared speed q0 + q1 t + ... + q4 t^4. Rounding is 1e-16 of the largest coefficient, in the speed less than what
+// makes a standstill.
+class SquaredSpeed {
 public:
-    Path(CRV_Curve const* curve, double scale)
+    explicit SquaredSpeed(double const* q) : q_{q[0], q[1], q[2], q[3], q[4]} {}
+
+    double At(double t) const
     {
-        double polygon = 0.0;
-        double steps[3][N] = {};
-        double const* points[] = {curve->p0, curve->p1, curve->p2, curve->p3};
-        for (int k = 0; k < 3; ++k) {
-            double squares = 0.0;
-            for (int i = 0; i < curve->dimension; ++i) {
-                steps[k][i] = scale * points[k + 1][i] - scale * points[k][i];
-                squares += steps[k][i] * steps[k][i];
-            }
-            polygon += std::sqrt(squares);
-        }
-        for (int i = 0; i < N; ++i) {
-            g0_[i] = 3.0 * steps[0][i];
-            g1_[i] = 6.0 * (steps[1][i] - steps[0][i]);
-            g2_[i] = 3.0 * ((steps[2][i] - steps[1][i]) - (steps[1][i] - steps[0][i]));
-        }
-        polygon_ = polygon;
+        const double square = (((q_[4] * t + q_[3]) * t + q_[2]) * t + q_[1]) * t + q_[0];
+        return square > 0.0 ? square : 0.0;
     }
+    // The derivatives by t, the first and second halved, the third by 6.
+    double HalfSlope(double t) const { return ((2.0 * q_[4] * t + 1.5 * q_[3]) * t + q_[2]) * t + 0.5 * q_[1]; }
+    double HalfBend(double t) const { return (6.0 * q_[4] * t + 3.0 * q_[3]) * t + q_[2]; }
+    double SixthJerk(double t) const { return 4.0 * q_[4] * t + q_[3]; }
 
-    double Polygon() const { return polygon_; }
-
-    double Speed(double t) const
-    {
-        double squares = 0.0;
-        for (int i = 0; i < N; ++i) {
-            const double d = (g2_[i] * t + g1_[i]) * t + g0_[i];
-            squares += d * d;
-        }
-        return std::sqrt(squares);
-    }
-
-    // Half the derivative of the squared speed; 0 where the speed is smallest.
-    double SlowingAt(double t) const
-    {
-        double sum = 0.0;
-        for (int i = 0; i < N; ++i) sum += ((g2_[i] * t + g1_[i]) * t + g0_[i]) * (2.0 * g2_[i] * t + g1_[i]);
-        return sum;
-    }
-
-    Knot KnotAt(double t, double negligible) const
-    {
-        double squares = 0.0;      // D D
-        double firstDot = 0.0;     // D D'
-        double secondDot = 0.0;    // D D''
-        double bendSquares = 0.0;  // D' D'
-        double bendDot = 0.0;      // D' D''
-        for (int i = 0; i < N; ++i) {
-            const double d = (g2_[i] * t + g1_[i]) * t + g0_[i];
-            const double bend = 2.0 * g2_[i] * t + g1_[i];
-            const double change = 2.0 * g2_[i];
-            squares += d * d;
-            firstDot += d * bend;
-            secondDot += d * change;
-            bendSquares += bend * bend;
-            bendDot += bend * change;
-        }
-        // Near its minimum the speed is sqrt(squares + bendSquares tau^2), which is slow over squares / bend.
-        const double bend = std::sqrt(bendSquares);
-        if (squares <= 0.25 * negligible * bend && bend > 0.0) return {t, 0.0, bend, bendDot / bend, true};
-        const double speed = std::sqrt(squares);
-        const double first = firstDot / speed;
-        return {t, speed, first, (bendSquares + secondDot - first * first) / speed, false};
-    }
-
-    // Gauss and Legendre's five points.
+    // The length from one parameter to another, by Gauss and Legendre's five points.
     double Length(double from, double to) const
     {
         constexpr double kInner = 0.53846931010568309104, kOuter = 0.90617984593866399280;
@@ -107,198 +60,283 @@ public:
         constexpr double kMiddleWeight = 0.56888888888888888889;
         const double half = 0.5 * (to - from);
         const double middle = from + half;
-        const double outer = Speed(middle - kOuter * half) + Speed(middle + kOuter * half);
-        const double inner = Speed(middle - kInner * half) + Speed(middle + kInner * half);
-        return half * (kMiddleWeight * Speed(middle) + (kInnerWeight * inner + kOuterWeight * outer));
+        const double outer = std::sqrt(At(middle - kOuter * half)) + std::sqrt(At(middle + kOuter * half));
+        const double inner = std::sqrt(At(middle - kInner * half)) + std::sqrt(At(middle + kInner * half));
+        return half * (kMiddleWeight * std::sqrt(At(middle)) + (kInnerWeight * inner + kOuterWeight * outer));
     }
 
-private:
-    double g0_[N], g1_[N], g2_[N];  // the derivative by t: g0 + g1 t + g2 t^2
-    double polygon_;
-};
-
-// The quintic with these values, first and second derivatives at 0 and 1.
-void SetHermite(double (&c)[6], double f0, double d0, double dd0, double f1, double d1, double dd1)
-{
-    c[0] = f0;
-    c[1] = d0;
-    c[2] = 0.5 * dd0;
-    const double value = f1 - c[0] - c[1] - c[2];
-    const double slope = d1 - c[1] - 2.0 * c[2];
-    const double bend = dd1 - 2.0 * c[2];
-    // The three have the same pattern of signs on purpose: where signs alternate, gcc 12 fuses multiplication and
-    // addition on machines that can, also under -ffp-contract=off, and the bits would depend on the machine.
-    const double third = 10.0 * value - 4.0 * slope + 0.5 * bend;
-    const double fourth = 15.0 * value - 7.0 * slope + bend;
-    const double fifth = 6.0 * value - 3.0 * slope + 0.5 * bend;
-    c[3] = third;
-    c[4] = -fourth;
-    c[5] = fifth;
-}
-
-// Cuts a path into pieces from left to right.
-template <int N>
-class Cutter {
-public:
-    Cutter(Path<N> const& path, double accuracy, CRVp_ArcTable& table)
-        : path_(path),
-          table_(table),
-          accuracy_(accuracy),
-          negligible_(kNegligible * path.Polygon())
+    // The slowest places inside, ascending: at most two.
+    int Slowest(double (&places)[2]) const
     {
-        if (negligible_ > 0.1 * accuracy) negligible_ = 0.1 * accuracy;
-    }
-
-    // `unscale` takes the path's units back to the caller's.
-    void Run(double unscale)
-    {
-        Knot from = path_.KnotAt(0.0, negligible_);
-        Knot pending[kDeepest + 1];
-        int waiting = 0;
-        pending[waiting++] = path_.KnotAt(1.0, negligible_);
-        while (waiting > 0) {
-            const Knot to = pending[waiting - 1];
-            const bool full = waiting >= kDeepest || table_.count + waiting >= CRVp_MostArcPieces - 1;
-            if (AddPiece(from, to, full)) {
-                from = to;
-                --waiting;
-            } else {
-                pending[waiting] = path_.KnotAt(Cut(from.t, to.t), negligible_);
-                ++waiting;
-            }
+        // Between the turns of the slope it has one root at most.
+        double bounds[4] = {0.0, 0.0, 0.0, 0.0};
+        int count = 1;
+        const double a = 6.0 * q_[4], b = 1.5 * q_[3], c = q_[2];  // a t^2 + 2 b t + c
+        const double discriminant = b * b - a * c;
+        if (discriminant > 0.0) {
+            const double root = std::sqrt(discriminant);
+            const double q = b < 0.0 ? root - b : -(root + b);
+            double first = q / a;
+            double second = c / q;
+            if (second < first) std::swap(first, second);
+            if (first > 0.0 && first < 1.0) bounds[count++] = first;
+            if (second > 0.0 && second < 1.0) bounds[count++] = second;
         }
-        Finish(unscale);
+        bounds[count] = 1.0;
+        int found = 0;
+        for (int i = 0; i < count && found < 2; ++i)
+            if (HalfSlope(bounds[i]) < 0.0 && HalfSlope(bounds[i + 1]) > 0.0)
+                places[found++] = SlopeRoot(bounds[i], bounds[i + 1]);
+        return found;
     }
 
 private:
-    static constexpr int kDeepest = 60;
-
-    // The slowest place, where the trouble is, if it lies between; else the middle.
-    double Cut(double from, double to) const
+    // Newton steps, bisection where one leaves the bracket; a root of multiplicity 3 takes the most.
+    double SlopeRoot(double low, double high) const
     {
-        const double middle = 0.5 * (from + to);
-        if (!(path_.SlowingAt(from) < 0.0 && path_.SlowingAt(to) > 0.0)) return middle;
-        double low = from;
-        double high = to;
-        for (int step = 0; step < 54; ++step) {
-            const double t = 0.5 * (low + high);
-            if (path_.SlowingAt(t) < 0.0)
+        double t = low + 0.5 * (high - low);
+        for (int step = 0; step < 60; ++step) {
+            const double f = HalfSlope(t);
+            if (f < 0.0)
                 low = t;
             else
                 high = t;
+            double next = t - f / HalfBend(t);
+            if (!(next >= low && next <= high)) next = low + 0.5 * (high - low);
+            if (std::fabs(next - t) <= 0x1p-52) return next;
+            t = next;
         }
-        // A cut close to an end leaves a sliver and no progress.
-        const double margin = 0.02 * (to - from);
-        return high > from + margin && high < to - margin ? high : middle;
+        return t;
     }
 
-    // Adds the piece if it is good enough, or if `forced`.
-    bool AddPiece(Knot const& from, Knot const& to, bool forced)
-    {
-        const double length = path_.Length(from.t, to.t);
-        CRVp_ArcPiece& piece = table_.pieces[table_.count];
-        piece.start = table_.length;
-        if (length <= negligible_ || forced) {
-            piece.offset = 0.0;
-            piece.rate = length > 0.0 ? 1.0 / length : 0.0;
-            piece.root = 0;
-            SetHermite(piece.c, from.t, to.t - from.t, 0.0, to.t, to.t - from.t, 0.0);
-        } else if (from.standstill && to.standstill) {
-            return false;
-        } else {
-            SetCoefficients(piece, from, to, length);
-            if (!IsGood(piece, from, to, length)) return false;
-        }
-        table_.length += length;
-        ++table_.count;
-        return true;
-    }
-
-    static void SetCoefficients(CRVp_ArcPiece& piece, Knot const& from, Knot const& to, double length)
-    {
-        piece.root = from.standstill || to.standstill;
-        piece.offset = to.standstill ? 1.0 : 0.0;
-        piece.rate = (to.standstill ? -1.0 : 1.0) / length;
-        if (!piece.root) {
-            const double fromRate = length / from.speed;
-            const double toRate = length / to.speed;
-            SetHermite(piece.c, from.t, fromRate, -from.first / from.speed * fromRate * fromRate, to.t, toRate,
-                       -to.first / to.speed * toRate * toRate);
-            return;
-        }
-        // Measured from the standstill, where speed = a tau + b tau^2 / 2, the distance is length r^2.
-        const double side = from.standstill ? 1.0 : -1.0;
-        Knot const& still = from.standstill ? from : to;
-        Knot const& moving = from.standstill ? to : from;
-        const double start = std::sqrt(2.0 * length / still.first);
-        const double startBend = -(side * still.second / still.first) * start * start / 3.0;
-        const double end = 2.0 * length / moving.speed;
-        const double endBend = end - side * moving.first / moving.speed * end * end;
-        SetHermite(piece.c, still.t, side * start, side * startBend, moving.t, side * end, side * endBend);
-    }
-
-    // Whether the speed along the piece is 1 within tolerance, and its length trustworthy.
-    bool IsGood(CRVp_ArcPiece const& piece, Knot const& from, Knot const& to, double length) const
-    {
-        // The integral by the end values is of the order of the quintic, Gauss's far better: where they agree this well
-        // there is nothing between the samples that either has missed.
-        const double h = to.t - from.t;
-        const double toSign = to.standstill ? -1.0 : 1.0;
-        const double byEnds =
-            h * (0.5 * (from.speed + to.speed) +
-                 h * (0.1 * (from.first - toSign * to.first) + h * (from.second + toSign * to.second) / 120.0));
-        if (!(std::fabs(byEnds - length) <= kSpeedTolerance * length)) return false;
-
-        double worst = 0.0;
-        for (const double r : {0.25, 0.5, 0.75}) {
-            double const* c = piece.c;
-            const double t = ((((c[5] * r + c[4]) * r + c[3]) * r + c[2]) * r + c[1]) * r + c[0];
-            const double slope = (((5.0 * c[5] * r + 4.0 * c[4]) * r + 3.0 * c[3]) * r + 2.0 * c[2]) * r + c[1];
-            const double distanceSlope = length * (piece.root ? 2.0 * r : 1.0);
-            const double error = std::fabs(std::fabs(slope) * path_.Speed(t) - distanceSlope) / distanceSlope;
-            if (!(error <= kSpeedTolerance)) return false;
-            worst = CRVp_Max(worst, error);
-        }
-        return kErrorShare * worst * length <= 0.25 * accuracy_;
-    }
-
-    void Finish(double unscale)
-    {
-        CRVp_ArcPiece& end = table_.pieces[table_.count++];
-        end = {table_.length, 0.0, 0.0, {1.0, 0.0, 0.0, 0.0, 0.0, 0.0}, 0};
-        if (unscale == 1.0) return;
-        for (int i = 0; i < table_.count; ++i) {
-            table_.pieces[i].start *= unscale;
-            // A path as short as the smallest numbers wants more than the largest; infinity would be a NaN at s = 0.
-            constexpr double largest = std::numeric_limits<double>::max();
-            const double rate = table_.pieces[i].rate / unscale;
-            table_.pieces[i].rate = CRVp_Max(-largest, CRVp_Min(largest, rate));
-        }
-        table_.length *= unscale;
-    }
-
-    Path<N> const& path_;
-    CRVp_ArcTable& table_;
-    double accuracy_;
-    double negligible_;
+    double q_[5];
 };
 
-template <int N>
-void Measure(CRV_Curve const* curve, double accuracy, double scale, CRVp_ArcTable& table)
+// A place, and how the path leaves it: speed and its first two derivatives by t. At a standstill the speed is 0 and the
+// derivatives are those to the right; to the left they have the other sign.
+struct Place {
+    CRVp_ArcKnot knot;
+    double square;
+    double speed, first, second;
+    double reach;  // about how far away, by t, the path could stand still for all that is known here
+
+    bool IsStill() const { return knot.slope < 0.0; }
+};
+
+// The N-th root, a few per cent off: an N-th of the exponent and, near enough, of the rest. For x >= 0; what comes of 0
+// or infinity is very small or very large.
+template <unsigned N>
+double RoughRoot(double x)
 {
-    const Path<N> path(curve, scale);
-    table.count = 0;
-    table.length = 0.0;
-    if (path.Polygon() == 0.0) {
-        table.pieces[table.count++] = {0.0, 0.0, 0.0, {}, 0};
-        return;
-    }
-    const double finest = kFinestAccuracy * path.Polygon();
-    const double asked = accuracy * scale;
-    Cutter<N>(path, asked > finest ? asked : finest, table).Run(1.0 / scale);
+    constexpr std::uint64_t one = std::bit_cast<std::uint64_t>(1.0);
+    return std::bit_cast<double>(std::bit_cast<std::uint64_t>(x) / N + (one - one / N));
 }
 
-// A power of two that brings the coordinates to where their squares neither overflow nor vanish; 1 for nearly all.
+// Cuts a path into pieces.
+class Cutter {
+public:
+    explicit Cutter(double const (&inputs)[CRVp_ArcInputs])
+        : speed_(inputs),
+          loadByShift_(kErrorShare / (kAccuracyShare * inputs[6])),
+          polygon_(inputs[5]),
+          negligible_(CRVp_Min(kNegligible * inputs[5], 0.1 * inputs[6]))
+    {}
+
+    void Run()
+    {
+        const Place start = PlaceAt(0.0);
+        const Place end = PlaceAt(1.0);
+        double slow[2];
+        const int count = speed_.Slowest(slow);
+        knots_[0] = start.knot;
+        Place from = start;
+        for (int i = 0; i < count; ++i) {
+            const Place at = PlaceAt(slow[i]);
+            // A gentle minimum needs no cut.
+            if (at.square > kSharp * CRVp_Max(start.square, end.square)) continue;
+            CutStretch(from, at);
+            from = at;
+        }
+        CutStretch(from, end);
+    }
+
+    void Write(CRVp_ArcTable& table) const
+    {
+        int count = count_ + 1;
+        for (int i = 1; i < count_; ++i) count += IsKeptTwice(i);
+        table.items = count + CRVp_ArcItemsBesideKnots;
+        double* const starts = table.words + 1;
+        double* word = starts + count;
+        double s = 0.0;
+        int at = 0;
+        const auto put = [&](CRVp_ArcKnot const& knot) {
+            starts[at++] = s;
+            *word++ = knot.t;
+            *word++ = knot.slope;
+            *word++ = knot.bend;
+        };
+        for (int i = 0; i < count_; ++i) {
+            if (i > 0 && IsKeptTwice(i)) put(knots_[i]);
+            put(straight_[i] ? CRVp_ArcKnot{knots_[i].t, 0.0, 0.0} : knots_[i]);
+            s += lengths_[i];
+        }
+        // Next to the polygon's length the path is a line that doesn't turn back, up to far less than any accuracy.
+        if (std::fabs(polygon_ - s) <= 0.1 * kFinestAccuracy * polygon_) s = polygon_;
+        put(straight_[count_ - 1] ? CRVp_ArcKnot{1.0, 0.0, 0.0} : knots_[count_]);
+    }
+
+private:
+    static constexpr int kMostPieces = CRVp_MostArcKnots / 3 * 2 - 1;  // each second knot may be kept twice
+    static constexpr int kKeptBack = 8;                                // pieces for the stretches that come
+    static constexpr int kMostTrials = 4 * kMostPieces;
+    static constexpr double kSharp = 0.05;
+
+    // The end of a curved piece and the start of a straight one are two knots.
+    bool IsKeptTwice(int i) const { return straight_[i] && !straight_[i - 1]; }
+
+    Place PlaceAt(double t) const
+    {
+        const double square = speed_.At(t);
+        const double halfSlope = speed_.HalfSlope(t);
+        const double halfBend = speed_.HalfBend(t);
+        // Near its minimum the speed is sqrt(square + halfBend tau^2), which is slow over square / sqrt(halfBend).
+        const double slow = 0.25 * negligible_;
+        if (halfBend > 0.0 && square * square <= slow * slow * halfBend) {
+            const double first = std::sqrt(halfBend);
+            const double sixthJerk = speed_.SixthJerk(t);
+            const double second = sixthJerk / first;
+            const CRVp_ArcKnot knot{t, -std::sqrt(2.0 / first), -(second / first) * (2.0 / first) / 3.0};
+            return {knot, 0.0, 0.0, first, second, halfBend / CRVp_Max(std::fabs(sixthJerk), halfBend / kFarthest)};
+        }
+        const double speed = std::sqrt(square);
+        const double inverse = 1.0 / speed;
+        const double first = halfSlope * inverse;
+        const double way = std::fabs(first) + RoughRoot<2>(first * first + std::fabs(halfBend));
+        // 0 over 0 where the speed vanishes like the square of t, or more; nothing is known there.
+        const double reach = speed > kFarthest * way ? kFarthest : square > 0.0 ? speed / way : 0.25;
+        const CRVp_ArcKnot knot{t, inverse, -(first * inverse) * inverse * inverse};
+        return {knot, square, speed, first, (halfBend - first * first) * inverse, reach};
+    }
+
+    // From a slow end towards a fast one; from both ends where the middle is faster than either.
+    void CutStretch(Place const& from, Place const& to)
+    {
+        const double middle = from.knot.t + 0.5 * (to.knot.t - from.knot.t);
+        if (CRVp_Max(from.square, to.square) <= kSharp * speed_.At(middle)) {
+            const Place between = PlaceAt(middle);
+            Walk<true>(from, between);
+            WalkBack(between, to);
+        } else if (from.square <= to.square) {
+            Walk<true>(from, to);
+        } else {
+            WalkBack(from, to);
+        }
+    }
+
+    // The pieces from `from` to `to`, found from `to` on.
+    void WalkBack(Place const& from, Place const& to)
+    {
+        const int first = count_;
+        Walk<false>(to, from);
+        std::reverse(lengths_ + first, lengths_ + count_);
+        std::reverse(straight_ + first, straight_ + count_);
+        std::reverse(knots_ + first + 1, knots_ + count_);
+        knots_[first] = from.knot;
+        knots_[count_] = to.knot;
+    }
+
+    // Adds the pieces from a place to the goal, on either side of it.
+    //
+    // A step is a share of the place's reach. What a step's load says of the share counts for the step after the next:
+    // the next one then doesn't wait for it.
+    template <bool forward>
+    void Walk(Place near, Place const& goal)
+    {
+        double share = kFirstShare;
+        double laterShare = kFirstShare;
+        for (bool arrived = false; !arrived;) {
+            const double rest = std::fabs(goal.knot.t - near.knot.t);
+            const double step = share * near.reach;
+            const bool forced = count_ >= kMostPieces - kKeptBack || trials_ >= kMostTrials;
+            const bool last = forced || rest <= step;
+            // The last steps are equal, so that none is a sliver.
+            const double h = last ? rest : rest < 4.0 * step ? rest / (1 + static_cast<int>(rest / step)) : step;
+            const Place far = last ? goal : PlaceAt(forward ? near.knot.t + h : near.knot.t - h);
+            ++trials_;
+            Place const& from = forward ? near : far;
+            Place const& to = forward ? far : near;
+            const double length = speed_.Length(from.knot.t, to.knot.t);
+            const bool straight = forced || length <= negligible_;
+            const double load = straight ? 0.0 : Load(from, to, length);
+            const double taken = h / near.reach;
+            if (load <= 1.0) {
+                straight_[count_] = straight;
+                lengths_[count_] = length;
+                knots_[++count_] = far.knot;
+                near = far;
+                arrived = last;
+                share = straight ? kFirstShare : laterShare;
+                laterShare = straight ? kFirstShare
+                                      : taken * CRVp_Min(kMostGrowth, kCaution * RoughRoot<6>(1.0 / (load + 1e-6)));
+            } else if (load < kUnknown) {
+                share = taken * CRVp_Min(0.8, kCaution * RoughRoot<6>(1.0 / load));
+                laterShare = share;
+            } else {
+                near.reach *= 0.25 * CRVp_Min(1.0, taken);  // less is known there than it seemed
+            }
+        }
+    }
+
+    // What a piece uses of what it may be off by; above 1 it is too long. kUnknown where it isn't known at all.
+    double Load(Place const& from, Place const& to, double length) const
+    {
+        constexpr double kOneIn120 = 1.0 / 120.0;
+        if (from.IsStill() && to.IsStill()) return kUnknown;
+
+        // The integral by the end values is of the order of the quintic, Gauss's far better: where they agree this well
+        // there is nothing between the samples that either has missed.
+        const double h = to.knot.t - from.knot.t;
+        const double toSign = to.IsStill() ? -1.0 : 1.0;
+        const double byEnds =
+            h * (0.5 * (from.speed + to.speed) +
+                 h * (0.1 * (from.first - toSign * to.first) + h * kOneIn120 * (from.second + toSign * to.second)));
+        if (!(std::fabs(byEnds - length) <= kSpeedTolerance * length)) return kUnknown;
+
+        const bool root = from.IsStill() || to.IsStill();
+        const CRVp_ArcQuintic t = !root            ? CRVp_EvenQuintic(from.knot, to.knot, length)
+                                  : from.IsStill() ? CRVp_RootQuintic(from.knot, to.knot, length, 1.0)
+                                                   : CRVp_RootQuintic(to.knot, from.knot, length, -1.0);
+        const double inverse = 1.0 / (length * length);
+        double worst = 0.0;
+        for (const double r : {kSteepest, 1.0 - kSteepest}) {
+            const double slope = t.SlopeAt(r);
+            const double even = root ? inverse / (4.0 * r * r) : inverse;
+            const double error = 0.5 * std::fabs(slope * slope * speed_.At(t.At(r)) * even - 1.0);
+            if (!(error < 1.0)) return kUnknown;
+            worst = CRVp_Max(worst, error);
+        }
+        return CRVp_Min(0.5 * kUnknown, worst * CRVp_Max(1.0 / kSpeedTolerance, length * loadByShift_));
+    }
+
+    static constexpr double kUnknown = 1e5;
+    static constexpr double kFarthest = 4.0;  // more is as good as everywhere
+    static constexpr double kFirstShare = 0.6;
+    static constexpr double kMostGrowth = 3.0;
+    static constexpr double kCaution = 0.9;
+
+    SquaredSpeed speed_;
+    double loadByShift_;  // of a speed error along the piece's length
+    double polygon_;
+    double negligible_;
+    int count_ = 0;
+    int trials_ = 0;
+    CRVp_ArcKnot knots_[kMostPieces + 1];
+    double lengths_[kMostPieces];
+    bool straight_[kMostPieces];
+};
+
+// A power of two that brings the coordinates to where no product of squares overflows or vanishes; 1 for nearly all.
+// Even, so that the square root of the scale is one too.
 double ScaleFor(CRV_Curve const* curve)
 {
     double step = 0.0;
@@ -307,21 +345,83 @@ double ScaleFor(CRV_Curve const* curve)
         const double high = CRVp_Max(CRVp_Max(curve->p0[i], curve->p1[i]), CRVp_Max(curve->p2[i], curve->p3[i]));
         step = CRVp_Max(step, 0.5 * high - 0.5 * low);
     }
-    if (step > 0x1p400) return 0x1p-700;
-    return step < 0x1p-300 ? 0x1p700 : 1.0;
+    if (step == 0.0 || (step > 0x1p-100 && step < 0x1p100)) return 1.0;
+    const int exponent = std::ilogb(step) / 2 * 2;
+    return std::ldexp(1.0, -std::clamp(exponent, -1000, 1000));
+}
+
+double SquaredChord(CRV_Curve const* curve, double scale)
+{
+    double squares = 0.0;
+    for (int i = 0; i < curve->dimension; ++i) {
+        const double step = scale * curve->p3[i] - scale * curve->p0[i];
+        squares += step * step;
+    }
+    return squares;
 }
 
 }  // namespace
 
-int CRVp_MeasureArc(CRV_Curve const* curve, double accuracy, CRVp_ArcTable& table)
+int CRVp_PrepareArc(CRV_Curve const* curve, double accuracy, CRVp_ArcMeasured& measured)
 {
     if (const int code = CRVp_CheckPath(curve)) return code;
     if (!CRVp_AllFinite(curve)) return CRV_Err_NotFinite;
 
     const double scale = ScaleFor(curve);
-    if (curve->dimension <= 2)
-        Measure<2>(curve, accuracy, scale, table);
-    else
-        Measure<4>(curve, accuracy, scale, table);
+    double const* const points[] = {curve->p0, curve->p1, curve->p2, curve->p3};
+    double steps[3][CRVp_MostCurveDimensions];
+    double polygon = 0.0;
+    for (int k = 0; k < 3; ++k) {
+        double squares = 0.0;
+        for (int i = 0; i < curve->dimension; ++i) {
+            steps[k][i] = scale * points[k + 1][i] - scale * points[k][i];
+            squares += steps[k][i] * steps[k][i];
+        }
+        polygon += std::sqrt(squares);
+    }
+    // The derivative by t is g0 + g1 t + g2 t^2.
+    double q0 = 0.0, q1 = 0.0, q2 = 0.0, q3 = 0.0, q4 = 0.0;
+    for (int i = 0; i < curve->dimension; ++i) {
+        const double g0 = 3.0 * steps[0][i];
+        const double g1 = 6.0 * (steps[1][i] - steps[0][i]);
+        const double g2 = 3.0 * ((steps[2][i] - steps[1][i]) - (steps[1][i] - steps[0][i]));
+        q0 += g0 * g0;
+        q1 += g0 * g1;
+        q2 += g1 * g1 + 2.0 * g0 * g2;
+        q3 += g1 * g2;
+        q4 += g2 * g2;
+    }
+    q1 *= 2.0;
+    q3 *= 2.0;
+    const double squaredChord = SquaredChord(curve, scale);
+    const double chord = std::sqrt(squaredChord);
+    if (polygon - chord <= kRounding * polygon) polygon = chord;
+    if (std::fabs(q1) + std::fabs(q2) + std::fabs(q3) + std::fabs(q4) <= kRounding * q0) {
+        q0 = squaredChord;
+        q1 = q2 = q3 = q4 = 0.0;
+    }
+    const double finest = kFinestAccuracy * polygon;
+    const double asked = accuracy * scale;
+    measured = {scale, {q0, q1, q2, q3, q4, polygon, asked > finest ? asked : finest}};
+    return 0;
+}
+
+int CRVp_MeasureArc(CRVp_ArcMeasured const& measured, CRVp_ArcTable& table)
+{
+    double const* const q = measured.inputs;
+    if (q[1] == 0.0 && q[2] == 0.0 && q[3] == 0.0 && q[4] == 0.0) {
+        // One straight piece; of a path without length only its end is ever asked for, which is its start then.
+        const double length = std::sqrt(q[0]);
+        const double even[] = {0.0, length, 0.0, 0.0, 0.0, length > 0.0 ? 1.0 : 0.0, 0.0, 0.0};
+        std::copy(std::begin(even), std::end(even), table.words + 1);
+        table.items = CRVp_FewestArcItems;
+    } else {
+        Cutter cutter(measured.inputs);
+        cutter.Run();
+        cutter.Write(table);
+    }
+    table.words[0] = measured.scale;
+    table.length = CRVp_ArcLength(table.words, table.items);
+    std::copy_n(measured.inputs, CRVp_ArcInputs, table.words + 4 * table.items - CRVp_ArcInputs);
     return CRVp_IsFinite(table.length) ? 0 : CRV_Err_NotFinite;
 }

@@ -27,8 +27,12 @@ int MakeList(CKFp_Bytes items, short itemSize, int count, SEQ_Head*** list)
         return code;
     }
     const std::size_t size = static_cast<std::size_t>(itemSize);
-    for (int i = 0; i < count; ++i)
-        std::memcpy(SEQp_Item(**made, i), items.data() + static_cast<std::size_t>(i) * size, size);
+    if (itemSize == (*made)->stride) {
+        if (count > 0) std::memcpy((*made)->items, items.data(), items.size());
+    } else {
+        for (int i = 0; i < count; ++i)
+            std::memcpy(SEQp_Item(**made, i), items.data() + static_cast<std::size_t>(i) * size, size);
+    }
     *list = made;
     return 0;
 }

@@ -27,16 +27,54 @@ void Replace(Func& present, Func wanted) noexcept
         present = wanted;
 }
 
+static_assert(sizeof(SEQp_List) % 16 == 0);  // items that follow the head are aligned like any others
+
+unsigned char* BehindHead(SEQ_Head& head) noexcept
+{
+    return reinterpret_cast<unsigned char*>(&head + 1);
+}
+
+bool IsOneBlock(SEQ_Head& head) noexcept
+{
+    return head.items == BehindHead(head);
+}
+
+void FreeItems(SEQ_Head& head) noexcept
+{
+    if (!IsOneBlock(head)) Q_FreePtr(head.items);
+}
+
+SEQ_Head** MakeHead(void* block, int itemSize) noexcept
+{
+    SEQp_List* const made = new (block) SEQp_List{};
+    made->head = &made->body;
+    made->body.itemSize = itemSize;
+    made->body.stride = (itemSize + 7) & ~7;
+    return &made->head;
+}
+
+void CopyRefconAndFuncs(SEQ_Head const& from, SEQ_Head& copy) noexcept
+{
+    copy.refcon = from.refcon;
+    copy.copy = from.copy;
+    copy.dispose = from.dispose;
+    copy.sort = from.sort;
+}
+
+// The copy of a list whose items are plain bytes.
+int DuplicateBytes(SEQ_Head const& from, SEQ_Head*** out)
+{
+    if (const int code = SEQp_NewInOneBlock(from.itemSize, from.count, out)) return code;
+    CopyRefconAndFuncs(from, ***out);
+    std::memcpy((**out)->items, from.items, SEQp_Bytes(from, from.count));
+    return 0;
+}
+
 int CopyAllItems(SEQ_Head const* const* source, SEQ_Head& copy)
 {
     SEQ_Head const& from = **source;
     if (from.count == 0) return 0;
     if (const int code = SEQp_SetCapacity(copy, from.count)) return code;
-    if (!from.copy) {
-        std::memcpy(copy.items, from.items, SEQp_Bytes(from, from.count));
-        copy.count = from.count;
-        return 0;
-    }
     std::memset(copy.items, 0, SEQp_Bytes(from, from.count));
     for (int i = 0; i < from.count; ++i) {
         if (const int code = from.copy(from.refcon, source, SEQp_Item(from, i), SEQp_Item(copy, i))) return code;
@@ -56,9 +94,23 @@ int SEQp_SetCapacity(SEQ_Head& head, int capacity) noexcept
         if (!items) return Q_Err_OutOfMemory;
         if (head.count > 0) std::memcpy(items, head.items, SEQp_Bytes(head, head.count));
     }
-    Q_FreePtr(head.items);
+    FreeItems(head);
     head.items = items;
     head.capacity = capacity;
+    return 0;
+}
+
+int SEQp_NewInOneBlock(int itemSize, int count, SEQ_Head*** list) noexcept
+{
+    const std::size_t stride = (static_cast<std::size_t>(itemSize) + 7) & ~std::size_t{7};
+    const std::size_t bytes = sizeof(SEQp_List) + stride * static_cast<std::size_t>(count);
+    void* const block = Q_AllocatePtr(SEQp_AllocationId, ListLabel, bytes);
+    if (!block) return Q_Err_OutOfMemory;
+    SEQ_Head** const made = MakeHead(block, itemSize);
+    (*made)->items = BehindHead(**made);
+    (*made)->count = count;
+    (*made)->capacity = count;
+    *list = made;
     return 0;
 }
 
@@ -73,13 +125,9 @@ int SEQp_Grow(SEQ_Head& head, int count) noexcept
 int SEQ_New(int, short itemSize, int, int, SEQ_Head*** list)
 {
     if (itemSize <= 0 || !list) return SEQ_Err_BadArgument;
-    void* const block = Q_AllocatePtrClear(SEQp_AllocationId, ListLabel, sizeof(SEQp_List));
+    void* const block = Q_AllocatePtr(SEQp_AllocationId, ListLabel, sizeof(SEQp_List));
     if (!block) return Q_Err_OutOfMemory;
-    SEQp_List* const made = new (block) SEQp_List{};
-    made->head = &made->body;
-    made->body.itemSize = itemSize;
-    made->body.stride = (itemSize + 7) & ~7;
-    *list = &made->head;
+    *list = MakeHead(block, itemSize);
     return 0;
 }
 
@@ -91,7 +139,7 @@ int SEQ_Dispose(SEQ_Head** list, long)
     if (head.dispose)
         for (int i = 0; i < head.count; ++i)
             if (const int code = SEQp_DisposeItem(list, SEQp_Item(head, i)); first == 0) first = code;
-    Q_FreePtr(head.items);
+    FreeItems(head);
     Q_FreePtr(list);  // the handle is the address of the block's first word
     return first;
 }
@@ -101,15 +149,12 @@ int SEQ_Duplicate(SEQ_Head const* const* list, long, SEQ_Head*** out)
     if (!SEQp_IsList(list)) return SEQ_Err_BadList;
     if (!out) return SEQ_Err_BadArgument;
     SEQ_Head const& source = **list;
+    if (!source.copy && source.count > 0) return DuplicateBytes(source, out);
     SEQ_Head** made = nullptr;
     if (const int code = SEQ_New(0, static_cast<short>(source.itemSize), 4, 1, &made)) return code;
     ListOwner owner(made);
-    SEQ_Head& copy = **made;
-    copy.refcon = source.refcon;
-    copy.copy = source.copy;
-    copy.dispose = source.dispose;
-    copy.sort = source.sort;
-    if (const int code = CopyAllItems(list, copy)) return code;
+    CopyRefconAndFuncs(source, **made);
+    if (const int code = CopyAllItems(list, **made)) return code;
     *out = owner.release();
     return 0;
 }
@@ -173,7 +218,8 @@ int SEQ_Compact(SEQ_Head** list)
 {
     if (!SEQp_IsList(list)) return SEQ_Err_BadList;
     SEQ_Head& head = **list;
-    if (head.pins > 0 || head.capacity == head.count) return 0;
+    // Room in the head's own block can't be given back.
+    if (head.pins > 0 || head.capacity == head.count || IsOneBlock(head)) return 0;
     return SEQp_SetCapacity(head, head.count);
 }
 

@@ -34,6 +34,11 @@ inline unsigned char* SEQp_Item(SEQ_Head const& head, int index) noexcept
     return head.items + SEQp_Bytes(head, index);
 }
 
+// Makes an unpinned list without item functions whose `count` items, not set here, lie in one block with the head: half
+// the allocations, and an item is next to what leads to it. Such a list can grow like any other; it then leaves that
+// room unused. `itemSize` and `count` are good ones. 0 or 4.
+int SEQp_NewInOneBlock(int itemSize, int count, SEQ_Head*** list) noexcept;
+
 // Makes room for `count` items in all, with the room that keeps repeated appending cheap. 0 or a code; the items may
 // move.
 int SEQp_Grow(SEQ_Head& head, int count) noexcept;
