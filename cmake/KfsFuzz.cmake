@@ -1,5 +1,8 @@
 # fuzz/<name>.cpp defines LLVMFuzzerTestOneInput and makes fuzz_<name>: with libFuzzer in the `fuzz` preset, and with a
 # plain main that runs the given files elsewhere. Files in fuzz/corpus/<name>/ are run as a test, so a find stays found.
+# What fuzz/mutators holds tells libFuzzer how to change inputs of a kind.
+
+set(chunkFileTargets leaf project tree)
 
 kfs_sources(fuzzSources fuzz)
 foreach(source IN LISTS fuzzSources)
@@ -7,6 +10,9 @@ foreach(source IN LISTS fuzzSources)
     add_executable(fuzz_${name} "${source}")
     if(KFS_SANITIZE MATCHES "fuzzer")
         target_link_options(fuzz_${name} PRIVATE -fsanitize=fuzzer)
+        if(name IN_LIST chunkFileTargets)
+            target_sources(fuzz_${name} PRIVATE "${PROJECT_SOURCE_DIR}/fuzz/mutators/chunks.cpp")
+        endif()
     else()
         target_sources(fuzz_${name} PRIVATE "${PROJECT_SOURCE_DIR}/cmake/plain_fuzz_main.cpp")
     endif()

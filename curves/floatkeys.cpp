@@ -10,6 +10,8 @@
 
 #include <algorithm>
 #include <climits>
+#include <cstdlib>
+#include <numeric>
 
 namespace {
 
@@ -20,6 +22,8 @@ public:
 
     // Finds the anchors around a key and builds the graph. False, without an error, where no key lies between anchors.
     bool Begin(int index, int* code);
+    // The last key that has the same neighbours as the one that the run began with.
+    int Last() const { return next_ ? nextIndex_ - 1 : KFSp_ItemCount(data_) - 1; }
     // Gives the float keys from `first` to `last` their times, as far as they lie in the run, and answers behind which
     // key it stopped.
     int Place(int first, int last, int* placed);
@@ -29,6 +33,7 @@ private:
     int ProposeTime(double s, long long* time);
     int PlaceKey(int index, KFS_KeyScalar* key, double s);
     int MakeFree(int index, int* time) const;
+    int GetEndOfBlock(int found, int index, KFS_KeyScalar** key) const;
 
     KFS_Stream const* stream_;
     KFS_StreamKeyData* data_;
@@ -96,26 +101,46 @@ int FloatRun::ProposeTime(double s, long long* time)
     return 0;
 }
 
+// Of the keys that stand one unit of time after the other from `found` on towards `index`, the one nearest to `index`.
+// The difference of a key's time and index never falls along the list, so a block is where it stays the same.
+int FloatRun::GetEndOfBlock(int found, int index, KFS_KeyScalar** key) const
+{
+    int code = GetKey(data_, found, key);
+    long long const difference = code == 0 ? static_cast<long long>((*key)->time) - found : 0;
+    for (int inside = found, outside = index; code == 0 && std::abs(outside - inside) > 1;) {
+        int const middle = std::midpoint(inside, outside);
+        KFS_KeyScalar* probe = nullptr;
+        code = GetKey(data_, middle, &probe);
+        if (code == 0 && static_cast<long long>(probe->time) - middle == difference) {
+            inside = middle;
+            *key = probe;
+        } else {
+            outside = middle;
+        }
+    }
+    return code;
+}
+
 // Moves the time until no other key stands there: away from a later key to the past, from an earlier one to the future.
+// Not tick by tick, since keys may stand in blocks as long as the list. Behind a block there is room, or the key itself;
+// or no room, with keys of the other side, which happens while a run is only in part placed.
 int FloatRun::MakeFree(int index, int* time) const
 {
-    int const tries = 10 * KFSp_ItemCount(data_);
-    int twoTriesAgo = 0;
-    int code = 0;
+    constexpr int tries = 4;  // of which keys in their order need two
+    int direction = 0;
     for (int i = 0; i < tries; ++i) {
         T_Time const at{*time, stream_->GetTimeScale()};
         int found = KFS_INVALID_INDEX;
-        code = KFS_TimeToIndex(stream_, &at, &found);
-        if (code != 0 || found == KFS_INVALID_INDEX || found == index) break;
-        bool const even = i % 2 == 0;
-        if (even) {
-            twoTriesAgo = *time;
-        }
-        *time = KFSp_TimeDifference(*time, found > index ? 1 : -1);
-        // Between two taken times it would swing to and fro until the tries, an even number, are used up.
-        if (!even && *time == twoTriesAgo) break;
+        if (int const code = KFS_TimeToIndex(stream_, &at, &found)) return code;
+        if (found == KFS_INVALID_INDEX || found == index) break;
+        int const away = found > index ? 1 : -1;
+        if (away == -direction) break;
+        direction = away;
+        KFS_KeyScalar* end = nullptr;
+        if (int const code = GetEndOfBlock(found, index, &end)) return code;
+        *time = KFSp_TimeDifference(end->time, away);
     }
-    return code;
+    return 0;
 }
 
 int FloatRun::PlaceKey(int index, KFS_KeyScalar* key, double s)
@@ -126,10 +151,12 @@ int FloatRun::PlaceKey(int index, KFS_KeyScalar* key, double s)
     long long const earliest = static_cast<long long>(prev_->time) + (index - prevIndex_);
     long long const latest = static_cast<long long>(next_->time) - (nextIndex_ - index);
     auto time = static_cast<int>(std::min(std::max(proposed, earliest), latest));
-    int const code = MakeFree(index, &time);
+    // What stands behind the key before can only move on to right behind it.
+    bool const isSettledBefore = settledIndex_ == index - 1;
+    int const code = isSettledBefore && time <= settledTime_ ? 0 : MakeFree(index, &time);
     // Until the whole run has its times the list isn't in order, and the lookup may miss the key before.
-    if (settledIndex_ == index - 1 && time <= settledTime_) {
-        time = settledTime_ + 1;
+    if (isSettledBefore && time <= settledTime_) {
+        time = KFSp_TimeDifference(settledTime_, -1);
     }
     KFSp_RetimeKey(data_, index, key, time);
     settledIndex_ = index;
@@ -164,6 +191,8 @@ int PlaceFloatKeys(KFS_Stream const* stream, int first, int last)
         FloatRun run(stream, data);
         if (code == 0 && run.Begin(i, &code)) {
             code = run.Place(i, last, &i);
+        } else if (code == 0) {
+            i = run.Last();
         }
         if (code != 0) return code;
     }

@@ -55,8 +55,7 @@ struct ChannelSet {
 
 class BvhImport {
 public:
-    explicit BvhImport(std::string const& fileName)
-        : motion_(ParseBvh(ReadFileBytes(fileName, "", std::numeric_limits<std::size_t>::max())))
+    BvhImport(std::string_view bytes, std::string const& fileName) : motion_(ParseBvh(bytes))
     {
         scene_.name = StemOf(fileName);
     }
@@ -155,7 +154,12 @@ private:
 
 Scene ImportBvh(std::string const& fileName, ImportOptions const& options)
 {
-    return BvhImport(fileName).Run(options);
+    return ImportBvhFromMemory(ReadFileBytes(fileName, "", std::numeric_limits<std::size_t>::max()), fileName, options);
+}
+
+Scene ImportBvhFromMemory(std::string_view bytes, std::string const& fileName, ImportOptions const& options)
+{
+    return BvhImport(bytes, fileName).Run(options);
 }
 
 }  // namespace kfshost

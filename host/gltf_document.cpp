@@ -257,9 +257,8 @@ tinygltf::Model Parse(json const& document, Container const& container, BufferFi
 
 }  // namespace
 
-tinygltf::Model LoadGltfDocument(std::string const& fileName)
+tinygltf::Model LoadGltfDocument(std::string_view bytes, std::string const& fileName)
 {
-    std::string const bytes = ReadFileBytes(fileName, "", std::numeric_limits<std::uint32_t>::max());
     Container const container = Open(bytes, fileName);
     json document = ParseGltfJson(container.text);
     BufferFiles files;

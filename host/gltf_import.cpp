@@ -1,3 +1,4 @@
+#include "host/filebytes_private.h"
 #include "host/gltf_accessor_private.h"
 #include "host/import.h"
 #include "host/import_error.h"
@@ -7,6 +8,8 @@
 #include "host/timescale.h"
 
 #include <algorithm>
+#include <cstdint>
+#include <limits>
 #include <map>
 #include <stdexcept>
 #include <utility>
@@ -15,9 +18,11 @@ namespace kfshost {
 
 namespace {
 
-// Channels may share accessors, so a small file can ask for any number of keys. This many doubles in all key records,
-// 0.8 GB, are more than files of this kind come with.
-constexpr std::size_t MaxNumbers = 100'000'000;
+// Channels may share accessors, so a small file can ask for any number of keys. It gets this many doubles in all key
+// records, 8 MB, and so many more for each byte of its buffers. A component takes five doubles and one to four bytes, so
+// that is sharing by six channels at least, and by 25 if they are floats.
+constexpr std::size_t FreeNumbers = 1 << 20;
+constexpr std::size_t NumbersPerByte = 32;
 constexpr std::size_t NumbersPerComponent = 5;
 
 struct PathKind {
@@ -81,7 +86,7 @@ struct Values {
 
 class GltfImport {
 public:
-    explicit GltfImport(std::string const& fileName) : model_(LoadGltfDocument(fileName))
+    GltfImport(std::string_view bytes, std::string const& fileName) : model_(LoadGltfDocument(bytes, fileName))
     {
         scene_.name = StemOf(fileName);
     }
@@ -193,12 +198,16 @@ private:
     // Holds what the channels ask for against what there is, before anything of it is made.
     void MeasureChannels()
     {
+        std::size_t most = FreeNumbers;
+        for (tinygltf::Buffer const& buffer : model_.buffers) {
+            most += buffer.data.size() * NumbersPerByte;
+        }
         std::size_t numbers = 0;
         for (Channel& channel : channels_) {
             std::size_t const keys = times_.at(channel.input).size();
             channel.dimension = DimensionOf(channel, keys);
             numbers += keys * channel.dimension * NumbersPerComponent;
-            if (numbers > MaxNumbers) {
+            if (numbers > most) {
                 throw ImportError(channel.item.place, "the file's channels ask for more keys than are accepted");
             }
         }
@@ -228,7 +237,7 @@ private:
         std::vector<float> const& times = times_.at(channel.input);
         AccessorReader const accessor(model_, channel.output, channel.samplerPlace);
         Values const values{accessor.ReadNumbers(), channel.dimension};
-        NameComponents(channel.item, values.dimension);
+        channel.item.components = UsualComponents(channel.item.kind, values.dimension);
         try {
             StreamBuilder builder(static_cast<int>(values.dimension), scene_.timeScale, channel.item.path);
             AppendKeys(builder, channel, times, values);
@@ -238,14 +247,6 @@ private:
             channel.item.stream = builder.Take();
         } catch (StoreError const& error) {
             throw ImportError(channel.item.place, error.what());
-        }
-    }
-
-    static void NameComponents(StreamItem& item, std::size_t dimension)
-    {
-        constexpr char const* axes[] = {"x", "y", "z", "w"};
-        for (std::size_t i = 0; i < dimension; ++i) {
-            item.components.push_back(item.kind == StreamKind::Weights ? std::to_string(i).insert(0, 1, 'w') : axes[i]);
         }
     }
 
@@ -289,7 +290,13 @@ private:
 
 Scene ImportGltf(std::string const& fileName, ImportOptions const& options)
 {
-    return GltfImport(fileName).Run(options);
+    return ImportGltfFromMemory(ReadFileBytes(fileName, "", std::numeric_limits<std::uint32_t>::max()), fileName,
+                                options);
+}
+
+Scene ImportGltfFromMemory(std::string_view bytes, std::string const& fileName, ImportOptions const& options)
+{
+    return GltfImport(bytes, fileName).Run(options);
 }
 
 }  // namespace kfshost

@@ -3,6 +3,7 @@
 #include "host/scene.h"
 
 #include <string>
+#include <string_view>
 
 namespace kfshost {
 
@@ -17,5 +18,9 @@ Scene ImportFile(std::string const& fileName, ImportOptions const& options = {})
 
 Scene ImportGltf(std::string const& fileName, ImportOptions const& options = {});
 Scene ImportBvh(std::string const& fileName, ImportOptions const& options = {});
+
+// The same with a file's bytes. Its name names the scene, and the folder where a glTF file's own buffers are looked for.
+Scene ImportGltfFromMemory(std::string_view bytes, std::string const& fileName, ImportOptions const& options = {});
+Scene ImportBvhFromMemory(std::string_view bytes, std::string const& fileName, ImportOptions const& options = {});
 
 }  // namespace kfshost

@@ -1,5 +1,6 @@
 #include "host/projectfile.h"
 
+#include "frame/errors.h"
 #include "frame/frame.h"
 #include "frame/services/chunkfile.h"
 #include "host/names.h"
@@ -87,6 +88,84 @@ void ForEachChannel(SceneGroup const& tree, Visit const& visit)
     }
 }
 
+KFS_Stream const& StreamOf(Channel const& channel)
+{
+    return *channel.node.FindChannel(channel.kind);
+}
+
+std::string Sentence(Channel const& channel, std::string const& end)
+{
+    return DisplayNameOf(channel.animation) + '/' + DisplayNameOf(channel.node) + '/' +
+           std::string(NameOf(channel.kind)) + ' ' + end;
+}
+
+// While it lives a stream answers what is stored in its keys. What follows from them, such as the length of a path, may be
+// beyond all numbers, which is no fault of the file and shows when the stream is read.
+class ScStoredOnly {
+public:
+    explicit ScStoredOnly(KFS_Stream const& stream) : stream_(const_cast<KFS_Stream&>(stream))
+    {
+        stream_.SetDisabledUpdateStream(true);
+    }
+    ~ScStoredOnly() { stream_.SetDisabledUpdateStream(false); }
+    ScStoredOnly(ScStoredOnly const&) = delete;
+    ScStoredOnly& operator=(ScStoredOnly const&) = delete;
+
+private:
+    KFS_Stream& stream_;
+};
+
+// What is wrong with the keys; nothing where they are in order. Throws StoreError.
+std::string FaultOfKeys(KFS_Stream const& stream)
+{
+    ScStoredOnly const stored(stream);
+    std::vector<double> numbers(static_cast<std::size_t>(stream.GetDimension()));
+    T_Time before{};
+    for (int i = 0; i < stream.GetKeyCount(); ++i) {
+        T_Time time{};
+        ThrowIfFailed(KFS_IndexToTime(&stream, i, &time));
+        if (i > 0 && time.value <= before.value) {
+            return "has keys that aren't in the order of their times";
+        }
+        before = time;
+        ThrowIfFailed(KFS_GetKeyF(&stream, i, numbers.data(), nullptr, nullptr));
+        if (!std::ranges::all_of(numbers, [](double number) { return std::isfinite(number); })) {
+            return "has a key without a finite value";
+        }
+    }
+    return "";
+}
+
+// Why a stream can't stand in a project whose scene has that scale. A project that has one is neither saved nor loaded.
+std::string FaultOf(KFS_Stream const& stream, unsigned int timeScale)
+{
+    if (stream.GetValueDesc()->isCustom || stream.GetDimension() < 1) {
+        return "isn't made of numbers";
+    }
+    if (stream.IsSpatial() && (stream.GetDimension() < 2 || stream.GetDimension() > 3)) {
+        return "is a path in " + std::to_string(stream.GetDimension()) + " dimensions";
+    }
+    if (stream.GetTimeScale() != timeScale) {
+        return "isn't in the times of its scene";
+    }
+    // A reader makes a constant of a stream that may not move, and needs its first key's value for that.
+    if (stream.HasKeys() && stream.GetKeyCount() == 0 && !stream.CanBeAnimated()) {
+        return "may not move, and has no value to stand at";
+    }
+    return FaultOfKeys(stream);
+}
+
+// What is known of a channel, and the usual names for the components of one that an edit has made and nobody described.
+ChannelFacts DescriptionOf(Channel const& channel)
+{
+    ChannelFacts facts = channel.node.FactsOf(channel.kind);
+    auto const dimension = static_cast<std::size_t>(StreamOf(channel).GetDimension());
+    if (facts.components.size() != dimension) {
+        facts.components = UsualComponents(channel.kind, dimension);
+    }
+    return facts;
+}
+
 // ---- writing
 
 void WriteTimes(CKF_File* file, SceneGroup::Times const& times)
@@ -107,9 +186,9 @@ void WriteFacts(CKF_File* file, ChannelFacts const& facts)
     std::array<unsigned char, 4> interpolation{};
     PutWord(interpolation, 0, static_cast<std::uint32_t>(facts.interpolation));
     ThrowCode(CKF_WriteAtom(file, InterpolationId, 4, interpolation.data()));
-    std::string lines;
-    for (std::string const& component : facts.components) {
-        lines += (lines.empty() ? "" : "\n") + component;
+    std::string lines = CleanName(facts.components.front());
+    for (std::size_t i = 1; i < facts.components.size(); ++i) {
+        lines += '\n' + CleanName(facts.components[i]);
     }
     ThrowCode(CKF_WriteString(file, ComponentsId, Q_MBToUTF16String(lines), 0));
 }
@@ -118,22 +197,53 @@ void WriteProject(CKF_File* file, SceneGroup const& tree)
 {
     WriteTimes(file, tree.times);
     tree.Write(file);
-    ForEachChannel(tree, [file](Channel const& channel) { WriteFacts(file, channel.node.FactsOf(channel.kind)); });
+    ForEachChannel(tree, [file](Channel const& channel) { WriteFacts(file, DescriptionOf(channel)); });
+}
+
+void CheckTree(SceneGroup const& tree, std::string const& fileName)
+{
+    ForEachChannel(tree, [&](Channel const& channel) {
+        if (std::string const fault = FaultOf(StreamOf(channel), tree.times.scale); !fault.empty()) {
+            throw ProjectError(fileName, "can't be saved: " + Sentence(channel, fault));
+        }
+    });
+}
+
+// All of a file that was just created, with the code that this gave.
+void SaveInto(CKF_File& file, int created, SceneGroup const& tree, std::string const& fileName)
+{
+    auto const check = [&](int code) {
+        if (code != 0) {
+            std::string const text = file.LastErrorText();
+            throw ProjectError(fileName, "can't be saved: " + (text.empty() ? StoreError(code).what() : text));
+        }
+    };
+    check(created);
+    try {
+        CheckTree(tree, fileName);
+        WriteProject(&file, tree);
+    } catch (int code) {
+        check(code);
+    } catch (StoreError const& error) {
+        throw ProjectError(fileName, "can't be saved: " + std::string(error.what()));
+    }
+    check(file.Commit());
 }
 
 // ---- reading
 
 class ProjectReader {
 public:
-    explicit ProjectReader(std::string const& fileName) : fileName_(fileName)
+    explicit ProjectReader(std::string const& fileName) : fileName_(fileName) {}
+
+    // `source` is what CKF_File opens: a path, or bytes.
+    template <class Source>
+    std::unique_ptr<SceneGroup> Run(Source source)
     {
-        if (int const code = file_.Open(fileName.c_str())) {
+        if (int const code = file_.Open(source)) {
             Fail(code);
         }
-    }
-
-    std::unique_ptr<SceneGroup> Run()
-    {
+        CheckVersion();
         tree_ = std::make_unique<SceneGroup>(Get_VX_StreamFactory());
         try {
             ReadTimes();
@@ -149,7 +259,29 @@ private:
     [[noreturn]] void Fail(int code) const
     {
         std::string const text = file_.LastErrorText();
-        throw ProjectError(fileName_, text.empty() ? "damaged: " + std::string(StoreError(code).what()) : text);
+        throw ProjectError(fileName_, text.empty() ? "damaged: " + Reason(code) : text);
+    }
+
+    static std::string Reason(int code)
+    {
+        switch (code) {
+        case CKF_Err_NoSuchChunk: return "something is missing that files of its version have";
+        case KFS_Err_BadFileInfo: return "a stream has a form that this program doesn't know";
+        default: return StoreError(code).what();
+        }
+    }
+
+    // Older files are read as their version says. What a newer one says, this program may not understand, and it would
+    // lose that in the next save.
+    void CheckVersion() const
+    {
+        auto const text = [](int major, int minor) { return std::to_string(major) + '.' + std::to_string(minor); };
+        if (std::pair(file_.majorVersion, file_.minorVersion) >
+            std::pair(CKF_CurrentMajorVersion, CKF_CurrentMinorVersion)) {
+            throw ProjectError(fileName_, "a project of version " + text(file_.majorVersion, file_.minorVersion) +
+                                              ", which is newer than this program's " +
+                                              text(CKF_CurrentMajorVersion, CKF_CurrentMinorVersion));
+        }
     }
 
     void ReadTimes()
@@ -174,9 +306,11 @@ private:
 
     void CheckChannel(Channel const& channel)
     {
-        KFS_Stream const& stream = *channel.node.FindChannel(channel.kind);
+        KFS_Stream const& stream = StreamOf(channel);
         try {
-            CheckStream(channel, stream);
+            if (std::string const fault = FaultOf(stream, tree_->times.scale); !fault.empty()) {
+                FailIn(channel, fault);
+            }
             channel.node.SetFacts(channel.kind, ReadFacts(channel, static_cast<std::size_t>(stream.GetDimension())));
         } catch (int code) {
             Fail(code);
@@ -187,41 +321,7 @@ private:
 
     [[noreturn]] void FailIn(Channel const& channel, std::string const& what) const
     {
-        throw ProjectError(fileName_, "damaged: " + DisplayNameOf(channel.animation) + '/' +
-                                          DisplayNameOf(channel.node) + '/' + std::string(NameOf(channel.kind)) + ' ' +
-                                          what);
-    }
-
-    void CheckStream(Channel const& channel, KFS_Stream const& stream) const
-    {
-        if (stream.GetValueDesc()->isCustom || stream.GetDimension() < 1) {
-            FailIn(channel, "isn't made of numbers");
-        }
-        if (stream.IsSpatial() && (stream.GetDimension() < 2 || stream.GetDimension() > 3)) {
-            FailIn(channel, "is a path in " + std::to_string(stream.GetDimension()) + " dimensions");
-        }
-        if (stream.GetTimeScale() != tree_->times.scale) {
-            FailIn(channel, "isn't in the times of its scene");
-        }
-        CheckKeys(channel, stream);
-    }
-
-    void CheckKeys(Channel const& channel, KFS_Stream const& stream) const
-    {
-        std::vector<double> numbers(static_cast<std::size_t>(stream.GetDimension()));
-        T_Time before{};
-        for (int i = 0; i < stream.GetKeyCount(); ++i) {
-            T_Time time{};
-            ThrowIfFailed(KFS_IndexToTime(&stream, i, &time));
-            if (i > 0 && time.value <= before.value) {
-                FailIn(channel, "has keys that aren't in the order of their times");
-            }
-            before = time;
-            ThrowIfFailed(KFS_GetKeyF(&stream, i, numbers.data(), nullptr, nullptr));
-            if (!std::ranges::all_of(numbers, [](double number) { return std::isfinite(number); })) {
-                FailIn(channel, "has a key without a finite value");
-            }
-        }
+        throw ProjectError(fileName_, "damaged: " + Sentence(channel, what));
     }
 
     ChannelFacts ReadFacts(Channel const& channel, std::size_t dimension)
@@ -310,7 +410,7 @@ Scene TakeScene(std::unique_ptr<SceneGroup> tree)
     scene.worstTimeError = tree->times.worstError;
     UniqueNames paths;
     ForEachChannel(*tree, [&](Channel const& channel) {
-        ChannelFacts const& facts = channel.node.FactsOf(channel.kind);
+        ChannelFacts const facts = DescriptionOf(channel);
         StreamItem item;
         item.animation = DisplayNameOf(channel.animation);
         item.node = DisplayNameOf(channel.node);
@@ -328,24 +428,24 @@ Scene TakeScene(std::unique_ptr<SceneGroup> tree)
 void SaveProject(SceneGroup const& tree, std::string const& fileName, CKF_IoHook* hook)
 {
     CKF_File file;
-    auto const check = [&](int code) {
-        if (code != 0) {
-            std::string const text = file.LastErrorText();
-            throw ProjectError(fileName, "can't be saved: " + (text.empty() ? StoreError(code).what() : text));
-        }
-    };
-    check(file.Create(fileName.c_str(), hook));
-    try {
-        WriteProject(&file, tree);
-    } catch (int code) {
-        check(code);
-    }
-    check(file.Commit());
+    SaveInto(file, file.Create(fileName.c_str(), hook), tree, fileName);
+}
+
+std::vector<unsigned char> SaveProjectToMemory(SceneGroup const& tree, std::string const& name)
+{
+    CKF_File file;
+    SaveInto(file, file.CreateInMemory(), tree, name);
+    return {file.GetBytes().begin(), file.GetBytes().end()};
 }
 
 std::unique_ptr<SceneGroup> LoadProject(std::string const& fileName)
 {
-    return ProjectReader(fileName).Run();
+    return ProjectReader(fileName).Run(fileName.c_str());
+}
+
+std::unique_ptr<SceneGroup> LoadProjectFromMemory(std::span<unsigned char const> bytes, std::string const& name)
+{
+    return ProjectReader(name).Run(bytes);
 }
 
 bool IsProjectFile(std::string const& fileName)

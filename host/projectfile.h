@@ -4,8 +4,10 @@
 #include "host/scene.h"
 
 #include <memory>
+#include <span>
 #include <stdexcept>
 #include <string>
+#include <vector>
 
 class CKF_IoHook;
 
@@ -28,12 +30,15 @@ std::unique_ptr<SceneGroup> MakeTree(Scene scene);
 Scene TakeScene(std::unique_ptr<SceneGroup> tree);
 
 // Replaces the file by a complete new one or leaves it as it is. The hook is for tests, and may be null. Throws
-// ProjectError.
+// ProjectError, for what LoadProject wouldn't take too.
 void SaveProject(SceneGroup const& tree, std::string const& fileName, CKF_IoHook* hook = nullptr);
+// The bytes that SaveProject puts into the file; `name` is the file's in the text of an error.
+std::vector<unsigned char> SaveProjectToMemory(SceneGroup const& tree, std::string const& name);
 
 // All of a project, or ProjectError. Its streams are made of numbers, their keys have finite values and stand in the
 // order of their times, and the scale is the scene's.
 std::unique_ptr<SceneGroup> LoadProject(std::string const& fileName);
+std::unique_ptr<SceneGroup> LoadProjectFromMemory(std::span<unsigned char const> bytes, std::string const& name);
 
 // Whether a file begins as projects do, whatever its name says.
 bool IsProjectFile(std::string const& fileName);

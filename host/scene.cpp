@@ -29,6 +29,17 @@ std::string_view NameOf(SourceInterpolation interpolation)
     return "";
 }
 
+std::vector<std::string> UsualComponents(StreamKind kind, std::size_t dimension)
+{
+    constexpr std::string_view axes = "xyzw";
+    bool const areAxes = kind != StreamKind::Weights && dimension <= axes.size();
+    std::vector<std::string> names;
+    for (std::size_t i = 0; i < dimension; ++i) {
+        names.push_back(areAxes ? std::string(1, axes[i]) : 'w' + std::to_string(i));
+    }
+    return names;
+}
+
 std::string PathOf(StreamItem const& item)
 {
     return item.animation + '/' + item.node + '/' + std::string(NameOf(item.kind));

@@ -19,6 +19,9 @@ enum class SourceInterpolation { Step, Linear, CubicSpline };
 std::string_view NameOf(StreamKind kind);
 std::string_view NameOf(SourceInterpolation interpolation);
 
+// Names for the components of a value that has none of its own: x, y, z and w, or w0, w1 and so on.
+std::vector<std::string> UsualComponents(StreamKind kind, std::size_t dimension);
+
 // One animated property of a scene.
 struct StreamItem {
     std::string path;  // "animation/node/translation"; no two items of a scene have the same

@@ -39,7 +39,9 @@ bool IsNameKnownToReaders(KFS_StreamBase const* node, u16str const& name)
     if (!parent->IsIndexedGroup()) {
         return !parent->CouldGoMissing();
     }
-    KFS_StreamBase const* const canonical = node->GetCanonicalStream(node->GetMatchName());
+    // A node that no factory made is of no kind, and so has no canonical stream.
+    KFS_StreamBase const* const canonical =
+        node->GetFactory() ? node->GetCanonicalStream(node->GetMatchName()) : nullptr;
     return !canonical || canonical->GetDisplayName() == name;
 }
 

@@ -1,0 +1,25 @@
+// A glTF file, text or binary: imported, saved and loaded. A file is an ImportError or a scene, whatever stands in it.
+
+#include "frame/services/reports.h"
+#include "host/import.h"
+#include "host/import_error.h"
+#include "host/projectfile.h"
+#include "host/session.h"
+
+#include <cstdint>
+
+extern "C" int LLVMFuzzerTestOneInput(std::uint8_t const* data, std::size_t size)
+{
+    kfshost::Session const session;  // one a run, so that nothing outlives it
+    static Q_ReportSink const stderrSink = Q_SetReportSink([](Q_Report const&) {});
+
+    try {
+        // No buffer of its own is found in a folder that isn't there.
+        kfshost::Scene scene =
+            kfshost::ImportGltfFromMemory({reinterpret_cast<char const*>(data), size}, "nowhere/fuzzed.gltf");
+        auto const tree = kfshost::MakeTree(std::move(scene));
+        kfshost::LoadProjectFromMemory(kfshost::SaveProjectToMemory(*tree, "saved"), "saved");
+    } catch (kfshost::ImportError const&) {  // an answer
+    }
+    return 0;
+}
