@@ -136,6 +136,19 @@ int Fail(std::string const& message)
     return FailureCode;
 }
 
+// Runs what the words ask for. Help ends with 0; a word that isn't understood is told like any other error, with a hint.
+int Parse(CLI::App& app, int argc, char** argv)
+{
+    try {
+        app.parse(argc, argv);
+    } catch (CLI::RuntimeError const& answer) {  // how a command answers with a code of its own
+        return answer.get_exit_code();
+    } catch (CLI::ParseError const& error) {
+        return app.exit(error) == 0 ? 0 : FailureCode;
+    }
+    return 0;
+}
+
 }  // namespace
 
 kfshost::Scene LoadScene(Selection const& selection)
@@ -169,7 +182,8 @@ try {
                "  kfs plot walk.glb --motion --stream '*/Hips/translation' -o path.svg\n"
                "  kfs import walk.glb -o walk.kfs\n"
                "\n"
-               "What is wrong with a file is one line on the standard error and exit code 2; nothing is written then.");
+               "What is wrong with a file is one line on the standard error and exit code 2; nothing is written then.\n"
+               "A command line that isn't understood has exit code 2 too.");
     InfoOptions info;
     EvalOptions eval;
     PlotOptions plot;
@@ -178,8 +192,7 @@ try {
     AddEval(app, eval);
     AddPlot(app, plot);
     AddProjectCommands(app, project);
-    CLI11_PARSE(app, argc, argv);
-    return 0;
+    return Parse(app, argc, argv);
 } catch (kfshost::StoreError const& error) {
     return Fail(firstReport.empty() ? error.what() : error.what() + (": " + firstReport));
 } catch (std::bad_alloc const&) {

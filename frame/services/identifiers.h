@@ -6,6 +6,7 @@
 // Threads: values; one state serves one thread at a time.
 #pragma once
 
+#include "frame/services/byteorder.h"
 #include "frame/services/export.h"
 
 #include <array>
@@ -29,6 +30,14 @@ public:
     static std::array<unsigned char, 16> const& GuidToBytes(Guid const& guid) noexcept { return guid.bytes_; }
     static void GuidToBytes(Guid const& guid, unsigned char* bytes) noexcept { guid.GuidToBytes(bytes); }
 
+    // The first or the last eight bytes as a number with the first byte on top, so that numbers compare as bytes do.
+    std::uint64_t Half(int index) const noexcept
+    {
+        std::uint32_t words[2];
+        std::memcpy(words, bytes_.data() + 8 * index, sizeof words);
+        return std::uint64_t{Q_LongSwap(words[0])} << 32 | Q_LongSwap(words[1]);
+    }
+
     bool operator==(Guid const& other) const noexcept
     {
         return std::memcmp(bytes_.data(), other.bytes_.data(), bytes_.size()) == 0;
@@ -48,7 +57,7 @@ inline void GuidToBytes(Guid const& guid, unsigned char* bytes) noexcept
 // Byte by byte as unsigned numbers, from the first.
 inline bool operator<(Guid const& a, Guid const& b) noexcept
 {
-    return std::memcmp(a.GuidToBytes().data(), b.GuidToBytes().data(), sizeof(Guid)) < 0;
+    return a.Half(0) != b.Half(0) ? a.Half(0) < b.Half(0) : a.Half(1) < b.Half(1);
 }
 
 // MurmurHash3 x64 128 with seed 0. The identifier's bytes are h1 and then h2, each least significant byte first.

@@ -2,6 +2,7 @@
 
 #include <cstdlib>
 #include <cstring>
+#include <iterator>
 #include <xxhash.h>
 
 namespace {
@@ -11,6 +12,10 @@ constexpr std::size_t TableSize = 1024;
 std::atomic<Q_MemoryLabel*> table[TableSize];
 
 constinit Q_MemoryLabel overflow(0, "other labels");
+
+// The entries found last, by the address of the label. Its text is compared all the same: an address may hold another
+// one by now.
+std::atomic<Q_MemoryLabel*> recent[64];
 
 bool IsEntryOf(Q_MemoryLabel const& entry, std::uint64_t hash, char const* label) noexcept
 {
@@ -43,11 +48,8 @@ Q_MemoryLabel* Search(std::uint64_t hash, char const* label, std::atomic<Q_Memor
     return nullptr;
 }
 
-}  // namespace
-
-Q_MemoryLabel* Q_FindMemoryLabel(char const* label) noexcept
+Q_MemoryLabel* FindOrMake(char const* label) noexcept
 {
-    if (!label) label = "";
     const std::size_t length = std::strlen(label);
     const std::uint64_t hash = XXH3_64bits(label, length);
     Q_MemoryLabel* made = nullptr;
@@ -66,6 +68,19 @@ Q_MemoryLabel* Q_FindMemoryLabel(char const* label) noexcept
         // Another thread took the slot, perhaps for the same label: search again.
     }
     std::free(made);
+    return entry;
+}
+
+}  // namespace
+
+Q_MemoryLabel* Q_FindMemoryLabel(char const* label) noexcept
+{
+    if (!label) label = "";
+    std::atomic<Q_MemoryLabel*>& last = recent[(reinterpret_cast<std::uintptr_t>(label) >> 3) % std::size(recent)];
+    Q_MemoryLabel* entry = last.load(std::memory_order_acquire);
+    if (entry && std::strcmp(entry->Text(), label) == 0) return entry;
+    entry = FindOrMake(label);
+    if (entry != &overflow) last.store(entry, std::memory_order_release);
     return entry;
 }
 

@@ -1,8 +1,5 @@
 #include "tests/cli/command.h"
 
-#include <cstdlib>
-#include <fstream>
-#include <iterator>
 #include <stdexcept>
 
 #include <fcntl.h>
@@ -11,12 +8,6 @@
 #include <unistd.h>
 
 namespace {
-
-std::string Contents(std::string const& fileName)
-{
-    std::ifstream file(fileName, std::ios::binary);
-    return {std::istreambuf_iterator<char>(file), {}};
-}
 
 int Spawn(std::vector<std::string> const& arguments, std::string const& output, std::string const& errors)
 {
@@ -51,28 +42,7 @@ Outcome RunKfs(std::vector<std::string> const& arguments, std::string const& out
     std::string const out = output.empty() ? folder.Path("output") : output;
     Outcome outcome;
     outcome.code = Spawn(arguments, out, folder.Path("errors"));
-    outcome.output = output.empty() ? Contents(out) : "";
-    outcome.errors = Contents(folder.Path("errors"));
+    outcome.output = output.empty() ? FileContent(out) : "";
+    outcome.errors = FileContent(folder.Path("errors"));
     return outcome;
-}
-
-ScratchFolder::ScratchFolder()
-{
-    std::string pattern = (std::filesystem::temp_directory_path() / "kfs_cli_XXXXXX").string();
-    if (!mkdtemp(pattern.data())) {
-        throw std::runtime_error("no folder for the test");
-    }
-    path_ = pattern;
-}
-
-ScratchFolder::~ScratchFolder()
-{
-    std::error_code ignored;
-    std::filesystem::remove_all(path_, ignored);
-}
-
-std::string ScratchFolder::Write(std::string const& name, std::string const& bytes) const
-{
-    std::ofstream(path_ / name, std::ios::binary) << bytes;
-    return Path(name);
 }

@@ -1,6 +1,7 @@
 #pragma once
 
-#include <filesystem>
+#include "tests/support/scratchfolder.h"
+
 #include <string>
 #include <vector>
 
@@ -14,18 +15,3 @@ struct Outcome {
 // Runs the built command. The arguments need no quoting. `output`: where its standard output goes in place of the
 // result.
 Outcome RunKfs(std::vector<std::string> const& arguments, std::string const& output = "");
-
-// A folder that goes away with its content.
-class ScratchFolder {
-public:
-    ScratchFolder();
-    ~ScratchFolder();
-    ScratchFolder(ScratchFolder const&) = delete;
-    ScratchFolder& operator=(ScratchFolder const&) = delete;
-
-    std::string Path(std::string const& name) const { return (path_ / name).string(); }
-    std::string Write(std::string const& name, std::string const& bytes) const;
-
-private:
-    std::filesystem::path path_;
-};

@@ -19,12 +19,6 @@ namespace {
 
 std::string const Sample = KFS_TEST_SAMPLES "/bouncing_ball.gltf";
 
-std::string Contents(std::string const& fileName)
-{
-    std::ifstream file(fileName, std::ios::binary);
-    return {std::istreambuf_iterator<char>(file), {}};
-}
-
 // A folder with the sample as a project.
 class KfsProject : public testing::Test {
 protected:
@@ -47,15 +41,15 @@ protected:
 
 TEST_F(KfsProject, SavedAgainItIsTheSameBytesAndTheOldFileStaysWhole)
 {
-    std::string const bytes = Contents(project_);
+    std::string const bytes = FileContent(project_);
     std::string const copy = folder_.Path("again");
     Outcome const saved = RunKfs({"save-as", project_, "-o", copy});
     EXPECT_EQ(0, saved.code) << saved.errors;
-    EXPECT_TRUE(bytes == Contents(copy));
+    EXPECT_TRUE(bytes == FileContent(copy));
     EXPECT_EQ(0, RunKfs({"save-as", project_, "-o", project_}).code) << "onto itself";
-    EXPECT_TRUE(bytes == Contents(project_));
+    EXPECT_TRUE(bytes == FileContent(project_));
     EXPECT_EQ(2, RunKfs({"save-as", Sample, "-o", copy}).code) << "not a project";
-    EXPECT_TRUE(bytes == Contents(copy));
+    EXPECT_TRUE(bytes == FileContent(copy));
 }
 
 // Starts `kfs save-as from -o to` and kills it after a while, unless it is done by then.
@@ -80,7 +74,7 @@ TEST_F(KfsProject, AKilledSaveLeavesTheOldFileOrTheNewOne)
 {
     std::string const slower = folder_.Path("slower");
     ASSERT_EQ(0, RunKfs({"import", Sample, "-o", slower, "--time-scale", "600000"}).code);
-    std::string const contents[] = {Contents(project_), Contents(slower)};
+    std::string const contents[] = {FileContent(project_), FileContent(slower)};
     ASSERT_TRUE(contents[0] != contents[1]);
     std::string const target = folder_.Path("target");
     ASSERT_EQ(0, RunKfs({"save-as", project_, "-o", target}).code);
@@ -88,19 +82,19 @@ TEST_F(KfsProject, AKilledSaveLeavesTheOldFileOrTheNewOne)
     for (int round = 0; round < 40; ++round) {
         SCOPED_TRACE(round);
         KillWhileSaving(round % 2 ? project_ : slower, target, std::chrono::microseconds(random() % 40000));
-        std::string const found = Contents(target);
+        std::string const found = FileContent(target);
         ASSERT_TRUE(found == contents[0] || found == contents[1]) << found.size() << " bytes";
     }
     EXPECT_EQ(0, RunKfs({"save-as", slower, "-o", target}).code) << "what a dead process left is in nobody's way";
-    EXPECT_TRUE(contents[1] == Contents(target));
+    EXPECT_TRUE(contents[1] == FileContent(target));
 }
 
 // The format, byte for byte: a change of it is a decision, and shows in the dump that stands beside the file.
 TEST_F(KfsProject, TheSamplesBytesAndTheirDumpAreTheGoldenOnes)
 {
     std::string const golden = KFS_TEST_SAMPLES "/../../tests/cli/golden/bouncing_ball";
-    EXPECT_TRUE(Contents(golden + ".project") == Contents(project_));
-    EXPECT_EQ(Contents(golden + ".txt"), RunKfs({"dump", golden + ".project"}).output);
+    EXPECT_TRUE(FileContent(golden + ".project") == FileContent(project_));
+    EXPECT_EQ(FileContent(golden + ".txt"), RunKfs({"dump", golden + ".project"}).output);
 }
 
 TEST_F(KfsProject, AnswersLikeTheFileThatItWasImportedFrom)
@@ -130,7 +124,7 @@ TEST_F(KfsProject, ImportingTwiceGivesTheSameBytes)
 {
     std::string const again = folder_.Path("again");
     EXPECT_EQ(0, RunKfs({"import", Sample, "-o", again}).code);
-    EXPECT_TRUE(Contents(project_) == Contents(again));
+    EXPECT_TRUE(FileContent(project_) == FileContent(again));
     EXPECT_EQ(2, std::distance(std::filesystem::directory_iterator(folder_.Path("")), {}));
 }
 
@@ -145,7 +139,7 @@ TEST_F(KfsProject, WhatCannotBeDoneIsOneLine)
                   folder_.Path("absent") + ": can't be opened: No such file or directory");
     EXPECT_FALSE(std::filesystem::exists(folder_.Path("new")));
 
-    std::string const bytes = Contents(project_);
+    std::string const bytes = FileContent(project_);
     Outcome const cut = RunKfs({"info", folder_.Write("cut", bytes.substr(0, bytes.size() / 2))});
     EXPECT_EQ(2, cut.code);
     EXPECT_TRUE(cut.errors.starts_with("kfs: " + folder_.Path("cut") + ": ")) << cut.errors;
@@ -158,7 +152,7 @@ TEST_F(KfsProject, DiffTellsWhatFirstDiffers)
     EXPECT_EQ(0, same.code) << same.errors;
     EXPECT_EQ("", same.output);
 
-    std::string const bytes = Contents(project_);
+    std::string const bytes = FileContent(project_);
     std::size_t const keys = bytes.find("seql");  // of the translation: head of 16 bytes, then keys of 128
     ASSERT_NE(std::string::npos, keys);
     std::size_t const second = keys + 16 + 128;
@@ -198,7 +192,7 @@ TEST_F(KfsProject, DumpShowsTheChunks)
 
 TEST_F(KfsProject, DumpShowsWhatIsWrong)
 {
-    std::string const bytes = Contents(project_);
+    std::string const bytes = FileContent(project_);
     for (std::size_t const size : {std::size_t{0}, std::size_t{3}, std::size_t{30}, bytes.size() - 1}) {
         Outcome const outcome = RunKfs({"dump", folder_.Write("cut", bytes.substr(0, size))});
         EXPECT_EQ(1, outcome.code) << size;

@@ -5,6 +5,7 @@
 #include "host/session.h"
 #include "host/streambuilder.h"
 #include "tests/support/reports.h"
+#include "tests/support/scratchfolder.h"
 
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
@@ -57,35 +58,3 @@ inline double ReadOne(KFS_Stream const& stream, kfshost::Rational const& time, s
     kfshost::ReadAt(stream, time, row.data());
     return row[component];
 }
-
-// A folder that goes away with its content.
-class ScratchFolder {
-public:
-    ScratchFolder()
-    {
-        std::string pattern = (std::filesystem::temp_directory_path() / "kfs_test_XXXXXX").string();
-        if (!mkdtemp(pattern.data())) {
-            throw std::runtime_error("no folder for the test");
-        }
-        path_ = pattern;
-    }
-    ~ScratchFolder()
-    {
-        std::error_code ignored;
-        std::filesystem::remove_all(path_, ignored);
-    }
-    ScratchFolder(ScratchFolder const&) = delete;
-    ScratchFolder& operator=(ScratchFolder const&) = delete;
-
-    std::string Path(std::string const& name) const { return (path_ / name).string(); }
-    std::string Write(std::string const& name, std::string const& bytes) const
-    {
-        std::filesystem::create_directories((path_ / name).parent_path());
-        std::filesystem::remove(path_ / name);  // overwriting a file waits for the disk, a new one doesn't
-        std::ofstream(path_ / name, std::ios::binary) << bytes;
-        return Path(name);
-    }
-
-private:
-    std::filesystem::path path_;
-};

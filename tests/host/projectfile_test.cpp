@@ -21,12 +21,6 @@ namespace {
 
 std::string const Sample = KFS_TEST_SAMPLES "/bouncing_ball.gltf";
 
-std::string Contents(std::string const& fileName)
-{
-    std::ifstream file(fileName, std::ios::binary);
-    return {std::istreambuf_iterator<char>(file), {}};
-}
-
 std::map<std::string, StreamItem const*> ByPath(Scene const& scene)
 {
     std::map<std::string, StreamItem const*> items;
@@ -169,7 +163,7 @@ void ExpectRoundTrip(std::string const& source, ScratchFolder const& folder)
     kfshost::SaveProject(*kfshost::MakeTree(kfshost::ImportFile(source)), first);
     auto tree = kfshost::LoadProject(first);
     kfshost::SaveProject(*tree, second);
-    EXPECT_TRUE(Contents(first) == Contents(second));
+    EXPECT_TRUE(FileContent(first) == FileContent(second));
     Scene const loaded = kfshost::TakeScene(std::move(tree));
     ExpectSameScene(kfshost::ImportFile(source), loaded);
 }
@@ -217,16 +211,16 @@ TEST_F(ProjectFile, KeepsPaths)
 TEST_F(ProjectFile, ReadsLeaveNoTrace)
 {
     Scene scene = kfshost::ImportFile(Sample);
-    std::string const before = Contents(Save(kfshost::ImportFile(Sample), "before"));
+    std::string const before = FileContent(Save(kfshost::ImportFile(Sample), "before"));
     for (StreamItem const& item : scene.streams) {
         ReadOne(*item.stream, kfshost::Rational(7, 5));
     }
-    EXPECT_TRUE(before == Contents(Save(std::move(scene), "after")));
+    EXPECT_TRUE(before == FileContent(Save(std::move(scene), "after")));
     Scene loaded = Load(folder_.Path("after"));
     for (StreamItem const& item : loaded.streams) {
         ReadOne(*item.stream, kfshost::Rational(7, 5));
     }
-    EXPECT_TRUE(before == Contents(Save(std::move(loaded), "again")));
+    EXPECT_TRUE(before == FileContent(Save(std::move(loaded), "again")));
 }
 
 // Importers number what has the same path. A tree doesn't have the numbers, and gives them again.
@@ -296,7 +290,7 @@ TEST_F(ProjectFile, WhatIsNotAnimatedStaysCanonical)
 // A length that is cut is found before anything is read.
 TEST_F(ProjectFile, ATruncatedFileIsRefused)
 {
-    std::string const whole = Contents(Save(SmallScene(), "whole"));
+    std::string const whole = FileContent(Save(SmallScene(), "whole"));
     for (std::size_t size = 0; size < whole.size(); ++size) {
         std::string const file = folder_.Write("cut", whole.substr(0, size));
         std::string const failure = LoadFailure(file);
@@ -309,7 +303,7 @@ TEST_F(ProjectFile, ATruncatedFileIsRefused)
 // Whatever stands in a file, it gives a scene that can be read, or one line.
 TEST_F(ProjectFile, ADamagedFileIsReadableOrRefused)
 {
-    std::string const whole = Contents(Save(SmallScene(), "whole"));
+    std::string const whole = FileContent(Save(SmallScene(), "whole"));
     std::mt19937 random(19);
     int refused = 0;
     for (int round = 0; round < 3000; ++round) {
@@ -341,7 +335,7 @@ TEST_F(ProjectFile, SaysWhatIsWrong)
     std::string const absent = folder_.Path("absent");
     EXPECT_NE(std::string::npos, LoadFailure(absent).find("No such file")) << LoadFailure(absent);
 
-    std::string bytes = Contents(Save(SmallScene(), "whole"));
+    std::string bytes = FileContent(Save(SmallScene(), "whole"));
     auto const failureWith = [&](std::string const& what, std::string const& instead) {
         std::string changed = bytes;
         std::size_t const at = changed.find(what);
@@ -375,7 +369,7 @@ TEST_F(ProjectFile, AFailedSaveLeavesTheOldFile)
             EXPECT_TRUE(std::string(error.what()).starts_with(file + ": can't be saved: ")) << error.what();
         }
         ASSERT_TRUE(hook.Fired());
-        ASSERT_EQ("the old one", Contents(file)) << n;
+        ASSERT_EQ("the old one", FileContent(file)) << n;
         ASSERT_EQ(1, std::distance(std::filesystem::directory_iterator(folder_.Path("")), {})) << n;
     }
     EXPECT_GT(n, 40);
