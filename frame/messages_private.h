@@ -60,6 +60,7 @@ enum KFSp_Row : short {
     KFSp_Row_Only2D3D = 79,
     KFSp_Row_CustomNotAllowed = 81,
     KFSp_Row_StreamValueCache = 83,
+    KFSp_Row_UnknownStream = 84,
     KFSp_RowCount = 100,
 };
 

@@ -87,12 +87,15 @@ enum KFSp_Op : short {
     KFSp_Op_GetMultiplier = 118,
 };
 
+// Stands for this library in the ids of its reports, and in those of its memory.
+inline constexpr int KFSp_ModuleId = 0x1D0000;
+
 // The severity of every report of this library.
 inline constexpr int KFSp_Severity = 8;
 
 constexpr int KFSp_ReportId(int operation)
 {
-    return (operation & 0xFFFF) | 0x1D0000;
+    return (operation & 0xFFFF) | KFSp_ModuleId;
 }
 
 // 0 if the stream's validity stamp is right, else reports code 2 and returns it. Reads nothing of the stream but the

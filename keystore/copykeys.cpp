@@ -214,14 +214,6 @@ int CopyKey(Route const& route, int index, bool replace, T_Time const* time, int
     return error.Code();
 }
 
-// The arc table of a key that was overwritten belongs to the arc that was there.
-int DropRemapTable(KFS_KeyScalar* key)
-{
-    SEQ_Head** const table = key->remapTable;
-    key->remapTable = nullptr;
-    return table ? SEQ_Dispose(table, 0) : 0;
-}
-
 int CopyOneKey(Route const& route, int index, KFSp_CopyUndo& undo)
 {
     KFS_KeyScalar const* record = nullptr;
@@ -259,7 +251,8 @@ int CopyOneKey(Route const& route, int index, KFSp_CopyUndo& undo)
         return 0;
     }
     CopySpatialBlock(&head, copy);
-    return copy == record ? 0 : DropRemapTable(copy);
+    // The arc table of a key that was overwritten belongs to the arc that was there.
+    return copy == record ? 0 : KFSp_DisposeRemapTable(copy);
 }
 
 // The n-th key to be copied.

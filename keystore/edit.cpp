@@ -276,10 +276,8 @@ int DisposeRemapTable(SEQ_Head** keys, int index)
     KFSp_FirstError error;
     {
         KFSp_ScKey const key(keys, index, error);
-        if (key.get() && KFSp_HasSpatialBlock(key.get()) && key->remapTable) {
-            SEQ_Head** const table = key->remapTable;
-            key.get()->remapTable = nullptr;
-            error.Keep(SEQ_Dispose(table, 0));
+        if (key.get()) {
+            error.Keep(KFSp_DisposeRemapTable(key.get()));
         }
     }
     return error.Code();

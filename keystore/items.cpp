@@ -7,7 +7,6 @@
 
 #include <algorithm>
 #include <cstring>
-#include <utility>
 
 namespace {
 
@@ -33,15 +32,6 @@ std::size_t LeadingBytes(KFS_Stream const* stream)
             ? stream->GetDimension() * static_cast<int>(sizeof(double))
             : KFS_GetKeyScalarDataSize(stream->GetValueDesc(), stream->IsSpatial(), stream->GetDimension());
     return static_cast<std::size_t>(std::clamp(bytes, 0, 8));
-}
-
-int DisposeRemapTable(SEQ_Head**, long, int, void* item)
-{
-    auto* const key = static_cast<KFS_KeyScalar*>(item);
-    if (!KFSp_HasSpatialBlock(key) || !key->remapTable) {
-        return 0;
-    }
-    return SEQ_Dispose(std::exchange(key->remapTable, nullptr), 0);
 }
 
 }  // namespace
@@ -150,7 +140,7 @@ int KFS_DisposeRemapTables(KFS_Stream* stream)
     {
         KFSp_ScPin const pin(data->keys, error);
         if (error.None()) {
-            error.Keep(SEQ_ForEach(data->keys, 0, DisposeRemapTable, 0));
+            error.Keep(KFSp_DisposeRemapTables(data->keys));
         }
     }
     if (error.None()) {

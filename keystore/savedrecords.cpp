@@ -1,5 +1,6 @@
 #include "keystore/savedrecords_private.h"
 
+#include "frame/report_private.h"
 #include "frame/services/memory.h"
 #include "keystore/keylist_private.h"
 #include "keystore/valuedata_private.h"
@@ -9,7 +10,6 @@
 
 namespace {
 
-constexpr int ScratchMemoryId = 0x1D0000;
 constexpr char const* ScratchLabel = "key edit scratch";
 
 bool IsFloat(KFS_StreamKeyData const* data, int index)
@@ -28,7 +28,7 @@ std::size_t CountOf(int first, int last)
 KFSp_ScBytes::KFSp_ScBytes(std::size_t size) noexcept
 {
     if (size > small_.size()) {
-        bytes_ = big_ = Q_AllocatePtrClear(ScratchMemoryId, ScratchLabel, size);
+        bytes_ = big_ = Q_AllocatePtrClear(KFSp_ModuleId, ScratchLabel, size);
     } else {
         small_.fill(std::byte{});
         bytes_ = small_.data();

@@ -203,6 +203,7 @@ KFS_Stream::KFS_Stream(KFS_Stream const& source, KFS_CloneStreamParams const& pa
         if (keyData_.cache) {
             KFSp_ClearCacheRecord(this, keyData_.cache);
         }
+        SetCanonical(true);  // silent: listeners who hear the source have never seen this one, nor do they its end
         throw int{code};
     }
 }

@@ -4,9 +4,11 @@
 #include "frame/report_private.h"
 #include "frame/services/byteorder.h"
 #include "frame/services/reports.h"
+#include "keystore/edit_private.h"
 #include "keystore/items_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/pins_private.h"
+#include "persist/leafchunks_private.h"
 
 #include <algorithm>
 #include <cstring>
@@ -23,30 +25,48 @@ constexpr char const* TooBigText =
     "$$$/VX/KFS/ReadKeyframes/KeyframeSizeMismatchError=The project file is corrupt. Stored keyframes do not match the "
     "property type. Attempting to read the keyframes by truncating the values.";
 
-// The sizes of one stream's records.
+// What a stream's records look like.
 struct Layout {
     explicit Layout(KFS_Stream const* stream)
-        : diskHead(stream->IsSpatial() ? KFSp_DiskSpatialHeadSize : KFSp_DiskHeadSize),
-          memoryHead(stream->IsSpatial() ? KFS_KeySpatialHeadSize : KFS_KeyHeadSize),
-          data(KFS_GetKeyScalarDataSize(stream->GetValueDesc(), stream->IsSpatial(), stream->GetDimension()))
+        : spatial(stream->IsSpatial()),
+          custom(stream->IsCustom()),
+          diskHead(spatial ? KFSp_DiskSpatialHeadSize : KFSp_DiskHeadSize),
+          memoryHead(spatial ? KFS_KeySpatialHeadSize : KFS_KeyHeadSize),
+          data(KFSp_ValueDataSize(stream))
     {}
     int DiskSize() const { return diskHead + data; }
 
+    bool spatial;
+    bool custom;
     int diskHead;
     int memoryHead;
     int data;
 };
 
-void SwapData(KFS_Stream const* stream, void* data)
+// A client's bytes are in the client's own order.
+void SwapData(Layout const& layout, void* data)
 {
-    if (stream->IsCustom()) {
+    if (layout.custom) {
         return;
     }
-    int const size = Layout(stream).data;
     auto* const bytes = static_cast<unsigned char*>(data);
-    for (int offset = 0; offset + 8 <= size; offset += 8) {
+    for (int offset = 0; offset + 8 <= layout.data; offset += 8) {
         Q_FpLongSwap(reinterpret_cast<double*>(bytes + offset));
     }
+}
+
+void SwapRecord(Layout const& layout, KFS_KeyScalarDisk* record)
+{
+    record->time = static_cast<int>(Q_LongSwap(static_cast<unsigned int>(record->time)));
+    record->flags = Q_ShortSwap(record->flags);
+    if (layout.spatial) {
+        record->spFlags = Q_LongSwap(record->spFlags);
+        for (double* const number :
+             {&record->arcLength, &record->inSpeed, &record->inInfluence, &record->outSpeed, &record->outInfluence}) {
+            Q_FpLongSwap(number);
+        }
+    }
+    SwapData(layout, reinterpret_cast<char*>(record) + layout.diskHead);
 }
 
 // The first 8 bytes are the same in both layouts; then the fields that only differ in where they stand. `From` and `To`
@@ -65,27 +85,26 @@ void CopyHead(bool spatial, From const* from, To* to)
     }
 }
 
-void ToDiskRecord(KFS_Stream const* stream, Layout const& layout, void const* key, void* record)
+void ToDiskRecord(Layout const& layout, void const* key, void* record)
 {
     std::memset(record, 0, static_cast<std::size_t>(layout.DiskSize()));
-    CopyHead(stream->IsSpatial(), static_cast<KFS_KeyScalar const*>(key), static_cast<KFS_KeyScalarDisk*>(record));
+    CopyHead(layout.spatial, static_cast<KFS_KeyScalar const*>(key), static_cast<KFS_KeyScalarDisk*>(record));
     std::memcpy(static_cast<char*>(record) + layout.diskHead, static_cast<char const*>(key) + layout.memoryHead,
                 static_cast<std::size_t>(layout.data));
-    KFSp_ThrowIf(KFSp_KeyScalarDiskSwap(stream, static_cast<KFS_KeyScalarDisk*>(record)));
+    SwapRecord(layout, static_cast<KFS_KeyScalarDisk*>(record));
 }
 
-// `record` is swapped, and holds `recordSize` bytes, at least the head; `key` is zero throughout.
-void FromDiskRecord(KFS_Stream const* stream, Layout const& layout, void const* record, int recordSize, void* key,
-                    int keySize)
+// `record` is swapped, and holds `recordSize` bytes, at least the head; `key` is zero throughout, and stays without an
+// arc table.
+void FromDiskRecord(Layout const& layout, void const* record, int recordSize, void* key, int keySize)
 {
     auto* const memory = static_cast<KFS_KeyScalar*>(key);
-    CopyHead(stream->IsSpatial(), static_cast<KFS_KeyScalarDisk const*>(record), memory);
+    CopyHead(layout.spatial, static_cast<KFS_KeyScalarDisk const*>(record), memory);
     int const dataSize = std::min(recordSize - layout.diskHead, keySize - layout.memoryHead);
     std::memcpy(static_cast<char*>(key) + layout.memoryHead, static_cast<char const*>(record) + layout.diskHead,
                 static_cast<std::size_t>(dataSize));
     // The layout is the stream's, whatever a file's flag says: were it believed, numbers would pass for an arc table.
-    memory->flags = static_cast<unsigned short>((memory->flags & ~KFS_KeyFlag_SpatialBlock) |
-                                                (stream->IsSpatial() ? KFS_KeyFlag_SpatialBlock : 0));
+    KFSp_SetKeySpatialState(nullptr, layout.spatial ? 1 : 0, 0, key);
 }
 
 // A new key list of the stream, with `count` zeroed items, in the place of the one that it may have had.
@@ -162,7 +181,7 @@ void KFSp_ConvertToKeyDiskList(KFS_Stream const* stream, SEQ_Head** list)
         void const* key = nullptr;
         KFSp_ThrowIf(SEQ_GetAddress(list, i, 0, &record));
         KFSp_ThrowIf(SEQ_GetConstAddress(keys, i, &key));
-        ToDiskRecord(stream, layout, key, record);
+        ToDiskRecord(layout, key, record);
     }
 }
 
@@ -190,29 +209,21 @@ void KFSp_ConvertFromKeyDiskList(KFS_Stream* stream, SEQ_Head** list)
         KFSp_ThrowIf(SEQ_GetAddress(keys, i, 0, &key));
         std::memcpy(bytes, record, static_cast<std::size_t>(diskSize));
         std::memset(bytes + diskSize, 0, static_cast<std::size_t>(recordSize - diskSize));
-        KFSp_ThrowIf(KFSp_KeyScalarDiskSwap(stream, reinterpret_cast<KFS_KeyScalarDisk*>(bytes)));
-        FromDiskRecord(stream, layout, bytes, recordSize, key, (*keys)->itemSize);
+        SwapRecord(layout, reinterpret_cast<KFS_KeyScalarDisk*>(bytes));
+        FromDiskRecord(layout, bytes, recordSize, key, (*keys)->itemSize);
     }
     stream->SetKeys(keys);
 }
 
 int KFSp_KeyScalarDiskSwap(KFS_Stream const* stream, KFS_KeyScalarDisk* record)
 {
-    record->time = static_cast<int>(Q_LongSwap(static_cast<unsigned int>(record->time)));
-    record->flags = Q_ShortSwap(record->flags);
-    if (stream->IsSpatial()) {
-        record->spFlags = Q_LongSwap(record->spFlags);
-        for (double* const number :
-             {&record->arcLength, &record->inSpeed, &record->inInfluence, &record->outSpeed, &record->outInfluence}) {
-            Q_FpLongSwap(number);
-        }
-    }
-    SwapData(stream, reinterpret_cast<char*>(record) + Layout(stream).diskHead);
+    SwapRecord(Layout(stream), record);
     return 0;
 }
 
 int KFSp_KeyScalarDataSwap(KFS_Stream const* stream, KFS_KeyScalar* record)
 {
-    SwapData(stream, reinterpret_cast<char*>(record) + Layout(stream).memoryHead);
+    Layout const layout(stream);
+    SwapData(layout, reinterpret_cast<char*>(record) + layout.memoryHead);
     return 0;
 }

@@ -4,12 +4,12 @@
 #include "frame/services/chunkfile.h"
 #include "frame/services/reports.h"
 #include "keystore/cache_private.h"
-#include "keystore/edit_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/stream.h"
 #include "keystore/valuedata_private.h"
 #include "overrides/streamexpression.h"
 #include "persist/keyrecords_private.h"
+#include "persist/leafchunks_private.h"
 #include "persist/longs_private.h"
 #include "persist/streamdisk_private.h"
 #include "persist/versions_private.h"
@@ -48,7 +48,7 @@ KFSp_StreamDiskData ReadRecord(CKF_File* file, CKF_ChunkInfo const* list)
 {
     CKF_ScDescend const chunk(file, 0, 0, list, nullptr);
     int expected = 0;
-    KFSp_ThrowIf(CKF_ConvertChunkIDToXMLFormat(CKF_Id("kfb4"), &expected));
+    KFSp_ThrowIf(CKF_ConvertChunkIDToXMLFormat(KFSp_RecordId, &expected));
     CKF_ChunkInfo const* const info = chunk.GetChunkInfo();
     if (info->id != expected) {
         throw KFSp_ReportErr(KFSp_Op_Read, KFS_Err_BadFileInfo, KFSp_Row_UnrecognizedChunk);
@@ -176,15 +176,14 @@ void LeafReader::TakeDescription()
 
 void LeafReader::ReadValue()
 {
-    constexpr int id = CKF_Id("cdat");
     if (stream_->IsCustomValuePointer()) {
-        static_cast<void>(KFSp_ReadLong(file_, list_, id));  // the value isn't in the file
+        static_cast<void>(KFSp_ReadLong(file_, list_, KFSp_ValueId));  // the value isn't in the file
         return;
     }
     // Read aside, so that the old value is given back once the new one is there.
-    int const size = KFS_GetKeyScalarDataSize(stream_->GetValueDesc(), stream_->IsSpatial(), stream_->GetDimension());
+    int const size = KFSp_ValueDataSize(stream_);
     std::vector<unsigned char> value(static_cast<std::size_t>(size));
-    KFSp_ThrowIf(CKF_ReadAtom(file_, id, list_, size, value.data()));
+    KFSp_ThrowIf(CKF_ReadAtom(file_, KFSp_ValueId, list_, size, value.data()));
     KFSp_ThrowIf(KFSp_ClearCache(stream_));
     std::copy(value.begin(), value.end(), static_cast<unsigned char*>(KFSp_ValueData(stream_->GetCache())));
     KFSp_KeyScalarDataSwap(stream_, stream_->GetCache());
@@ -215,9 +214,6 @@ void LeafReader::ReadKeys()
     KFSp_ScList disk;
     KFSp_ThrowIf(SEQ_Read(file_, &disk.list));
     KFSp_ConvertFromKeyDiskList(stream_, disk.list);
-    if (stream_->HasKeys()) {  // a constant that owns a list has its value in the cache record
-        KFSp_ThrowIf(KFSp_ClearCache(stream_));
-    }
 }
 
 void LeafReader::ReadExpression()
@@ -225,7 +221,7 @@ void LeafReader::ReadExpression()
     u16str text;
     if (CKF_Version_Gen7_PreUnicode(file_)) {
         char** handle = nullptr;
-        KFSp_ThrowIf(CKF_ReadHandle(file_, list_, CKF_Id("expr"), &handle));
+        KFSp_ThrowIf(CKF_ReadHandle(file_, list_, KFSp_OldExpressionId, &handle));
         text = CKF_ConvertHandleToStringAndDisposeIfEncoded(&handle, &file_->textEncoding);
     } else {
         CKF_ReadUTF16(file_, &text, list_);
@@ -240,6 +236,8 @@ void LeafReader::ReadStream()
     TakeHeader();
     if (stream_->HasNoKeys()) {
         ReadConstant();
+    } else {
+        KFSp_ThrowIf(KFSp_ClearCache(stream_));  // of the value of a constant that now has keys, maybe none
     }
     if (record_.hasKeyList != 0 && !spatialMismatch_) {
         ReadKeys();
@@ -256,15 +254,15 @@ void LeafReader::ReadStream()
 void LeafReader::ReadLayer()
 {
     FX_ParamDef::LayerValue& layer = stream_->GetParamDef().value.layer;
-    layer.reservedPointer = Q_Int32ToPointer(KFSp_ReadLong(file_, list_, CKF_Id("kfpi")));
+    layer.reservedPointer = Q_Int32ToPointer(KFSp_ReadLong(file_, list_, KFSp_LayerId));
     layer.layerSelector =
-        KFSp_HasLayerSelector(file_) ? static_cast<short>(KFSp_ReadLong(file_, list_, CKF_Id("kfps"))) : short{0};
+        KFSp_HasLayerSelector(file_) ? static_cast<short>(KFSp_ReadLong(file_, list_, KFSp_LayerSelectorId)) : short{0};
 }
 
 void LeafReader::ReadSlider()
 {
-    double low = ReadDouble(file_, list_, CKF_Id("kfum"));
-    double high = ReadDouble(file_, list_, CKF_Id("kfuM"));
+    double low = ReadDouble(file_, list_, KFSp_SliderMinId);
+    double high = ReadDouble(file_, list_, KFSp_SliderMaxId);
     if (low == 0.0 && high == 0.0) {  // no range was set
         low = stream_->GetMinValue();
         high = stream_->GetMaxValue();
@@ -278,16 +276,14 @@ void LeafReader::ReadParam()
     if (file_->majorVersion < KFSp_FirstVersion_ParamAtoms) {
         return;
     }
-    switch (stream_->GetParamDef().paramType) {
-    case FX_Param_LAYER: ReadLayer(); break;
-    case FX_Param_INT_SLIDER:
-    case FX_Param_FIXED_SLIDER:
-    case FX_Param_FLOAT_SLIDER: ReadSlider(); break;
-    case FX_Param_PATH:
+    int const kind = stream_->GetParamDef().paramType;
+    if (kind == FX_Param_LAYER) {
+        ReadLayer();
+    } else if (KFSp_HasSliderRange(kind)) {
+        ReadSlider();
+    } else if (kind == FX_Param_PATH) {
         stream_->GetParamDef().value.path.pathIdentifier =
-            static_cast<unsigned int>(KFSp_ReadLong(file_, list_, CKF_Id("kfli")));
-        break;
-    default: break;
+            static_cast<unsigned int>(KFSp_ReadLong(file_, list_, KFSp_PathId));
     }
 }
 
@@ -303,10 +299,6 @@ void LeafReader::MarkAllStale()
 
 void LeafReader::Finish()
 {
-    if (SEQ_Head** const keys = stream_->GetKeys()) {
-        KFSp_ThrowIf(SEQ_ForEach(keys, stream_->IsSpatial() ? 1 : 0, KFSp_SetKeySpatialState, 0));
-        KFSp_ThrowIf(SEQ_ForEach(keys, 0, KFSp_KeyClearRemap, 0));
-    }
     MarkAllStale();
     if (stream_->GetParamDef().paramType != FX_Param_ALWAYS_SAVED) {
         stream_->SetConstantIfNotAnimatable();
@@ -314,27 +306,31 @@ void LeafReader::Finish()
     KFSp_ThrowIf(KFSp_CheckStream(KFSp_Op_Read, stream_, KFSp_Row_Read));
 }
 
-}  // namespace
-
-void KFS_Stream::Read(CKF_File* file, CKF_ChunkInfo const* chunk)
+void ReadLeaf(KFS_Stream* stream, CKF_File* file, CKF_ChunkInfo const* chunk)
 {
-    if ((GetStreamBaseFlags() & KFS_BaseFlag_SkipLeafRead) != 0) {
-        return;
-    }
     CKF_ScDescend descent;
     if (!chunk) {
-        descent.Descend(file, CKF_ListId, CKF_Id("kfbs"), nullptr, nullptr);
+        descent.Descend(file, CKF_ListId, KFSp_LeafListType, nullptr, nullptr);
         chunk = descent.GetChunkInfo();
     }
     // As they are before the file's flags come in.
-    bool const readsParam = (GetStreamBaseFlags() & KFS_BaseFlag_Reserved8) == 0;
-    KFS_StreamBase::Read(file, chunk);
-    LeafReader reader(this, file, chunk);
+    bool const readsParam = (stream->GetStreamBaseFlags() & KFS_BaseFlag_Reserved8) == 0;
+    stream->KFS_StreamBase::Read(file, chunk);
+    LeafReader reader(stream, file, chunk);
     reader.ReadStream();
     if (readsParam) {
         reader.ReadParam();
     }
     reader.Finish();
+}
+
+}  // namespace
+
+void KFS_Stream::Read(CKF_File* file, CKF_ChunkInfo const* chunk)
+{
+    if ((GetStreamBaseFlags() & KFS_BaseFlag_SkipLeafRead) == 0) {
+        KFSp_ThrowIf(KFSp_Boundary([&] { ReadLeaf(this, file, chunk); }));
+    }
 }
 
 void KFS_Stream::SetConstantIfNotAnimatable()

@@ -8,27 +8,13 @@
 #include "keystore/stream.h"
 #include "keystore/valuedata_private.h"
 #include "persist/keyrecords_private.h"
+#include "persist/leafchunks_private.h"
 #include "persist/longs_private.h"
 #include "persist/streamdisk_private.h"
 #include "persist/versions_private.h"
 #include "tree/paramstreams.h"
 
-// A leaf in a file:
-//
-//   LIST kfbs
-//     kfsb, kfsn         what every node has
-//     kfb4               the record
-//     cdat               the value, of a stream without keys
-//     seql               the keys, if there is a key list: a constant may own one too
-//     expr or Utf8       the expression's text, if there is one
-//     kfpi kfps, kfum kfuM, or kfli   of some kinds of parameter
-
 namespace {
-
-int ValueSize(KFS_Stream const* stream)
-{
-    return KFS_GetKeyScalarDataSize(stream->GetValueDesc(), stream->IsSpatial(), stream->GetDimension());
-}
 
 void FillInCacheFields(KFS_Stream const* stream, CKF_File const* file, KFSp_StreamDiskData& record)
 {
@@ -92,14 +78,13 @@ private:
 
 void WriteConstant(KFS_Stream const* stream, CKF_File* file)
 {
-    constexpr int id = CKF_Id("cdat");
     if (stream->IsCustomValuePointer()) {
-        KFSp_WriteLong(file, id, 0);  // an address means nothing to the next run
+        KFSp_WriteLong(file, KFSp_ValueId, 0);  // an address means nothing to the next run
         return;
     }
     ScSwappedValue const swapped(stream);
     KFS_KeyScalar const* const cache = stream->GetCache();
-    KFSp_ThrowIf(CKF_WriteAtom(file, id, ValueSize(stream), KFSp_ValueData(cache)));
+    KFSp_ThrowIf(CKF_WriteAtom(file, KFSp_ValueId, KFSp_ValueDataSize(stream), KFSp_ValueData(cache)));
 }
 
 void WriteKeys(KFS_Stream const* stream, CKF_File* file)
@@ -118,7 +103,8 @@ void WriteExpression(KFS_Stream const* stream, CKF_File* file)
         return;
     }
     char** const handle = CKF_NewHandleFromString(text, true);
-    int const code = handle ? CKF_WriteHandle(file, CKF_Id("expr"), handle) : static_cast<int>(KFS_Err_OutOfMemory);
+    int const code =
+        handle ? CKF_WriteHandle(file, KFSp_OldExpressionId, handle) : static_cast<int>(KFS_Err_OutOfMemory);
     Q_FreeHandle(handle);
     KFSp_ThrowIf(code);
 }
@@ -137,27 +123,51 @@ void WriteLayer(KFS_Stream const* stream, CKF_File* file)
                            "stream with FX_Param_LAYER isn't a KFS_ParamLayerStream");
         throw int{KFS_Err_LegacyMismatch};
     }
-    KFSp_WriteLong(file, CKF_Id("kfpi"), Q_PointerToInt32(layer->GetFlattenedReserved0()));
+    KFSp_WriteLong(file, KFSp_LayerId, Q_PointerToInt32(layer->GetFlattenedReserved0()));
     if (KFSp_HasLayerSelector(file)) {
-        KFSp_WriteLong(file, CKF_Id("kfps"), stream->GetParamDef().value.layer.layerSelector);
+        KFSp_WriteLong(file, KFSp_LayerSelectorId, stream->GetParamDef().value.layer.layerSelector);
     }
 }
 
 void WriteParam(KFS_Stream const* stream, CKF_File* file)
 {
-    switch (stream->GetParamDef().paramType) {
-    case FX_Param_LAYER: WriteLayer(stream, file); break;
-    case FX_Param_INT_SLIDER:
-    case FX_Param_FIXED_SLIDER:
-    case FX_Param_FLOAT_SLIDER:
-        WriteDouble(file, CKF_Id("kfum"), stream->GetUIMinValue());
-        WriteDouble(file, CKF_Id("kfuM"), stream->GetUIMaxValue());
-        break;
-    case FX_Param_PATH:
-        KFSp_WriteLong(file, CKF_Id("kfli"), static_cast<int>(stream->GetParamDef().value.path.pathIdentifier));
-        break;
-    default: break;
+    FX_ParamDef const& def = stream->GetParamDef();
+    if (def.paramType == FX_Param_LAYER) {
+        WriteLayer(stream, file);
+    } else if (KFSp_HasSliderRange(def.paramType)) {
+        WriteDouble(file, KFSp_SliderMinId, stream->GetUIMinValue());
+        WriteDouble(file, KFSp_SliderMaxId, stream->GetUIMaxValue());
+    } else if (def.paramType == FX_Param_PATH) {
+        KFSp_WriteLong(file, KFSp_PathId, static_cast<int>(def.value.path.pathIdentifier));
     }
+}
+
+void WriteLeaf(KFS_Stream const* stream, CKF_File* file)
+{
+    KFSp_ThrowIf(KFSp_CheckStream(KFSp_Op_Write, stream, KFSp_Row_Write));
+    if (stream->HasKeys()) {
+        KFSp_ThrowIf(KFSp_ClearCache(stream));
+    }
+    KFSp_StreamDiskData record = MakeRecord(stream, file);
+    bool const hasKeyList = record.hasKeyList != 0;
+    bool const hasExpression = record.hasExpression != 0;
+    KFSp_StreamSwap(&record);
+
+    CKF_ChunkInfo chunk{};
+    KFSp_ThrowIf(CKF_BeginChunkWrite(file, CKF_ListId, KFSp_ValueDataSize(stream) + 140, KFSp_LeafListType, &chunk));
+    stream->KFS_StreamBase::Write(file);
+    KFSp_ThrowIf(CKF_WriteAtom(file, KFSp_RecordId, sizeof record, &record));
+    if (stream->HasNoKeys()) {
+        WriteConstant(stream, file);
+    }
+    if (hasKeyList) {
+        WriteKeys(stream, file);
+    }
+    if (hasExpression) {
+        WriteExpression(stream, file);
+    }
+    WriteParam(stream, file);
+    KFSp_ThrowIf(CKF_EndChunkWrite(file, &chunk));
 }
 
 }  // namespace
@@ -175,28 +185,5 @@ bool KFS_Stream::ShouldWriteForVersion(CKF_File const* file) const
 
 void KFS_Stream::Write(CKF_File* file) const
 {
-    KFSp_ThrowIf(KFSp_CheckStream(KFSp_Op_Write, this, KFSp_Row_Write));
-    if (HasKeys()) {
-        KFSp_ThrowIf(KFSp_ClearCache(this));
-    }
-    KFSp_StreamDiskData record = MakeRecord(this, file);
-    bool const hasKeyList = record.hasKeyList != 0;
-    bool const hasExpression = record.hasExpression != 0;
-    KFSp_StreamSwap(&record);
-
-    CKF_ChunkInfo chunk{};
-    KFSp_ThrowIf(CKF_BeginChunkWrite(file, CKF_ListId, ValueSize(this) + 140, CKF_Id("kfbs"), &chunk));
-    KFS_StreamBase::Write(file);
-    KFSp_ThrowIf(CKF_WriteAtom(file, CKF_Id("kfb4"), sizeof record, &record));
-    if (HasNoKeys()) {
-        WriteConstant(this, file);
-    }
-    if (hasKeyList) {
-        WriteKeys(this, file);
-    }
-    if (hasExpression) {
-        WriteExpression(this, file);
-    }
-    WriteParam(this, file);
-    KFSp_ThrowIf(CKF_EndChunkWrite(file, &chunk));
+    KFSp_ThrowIf(KFSp_Boundary([&] { WriteLeaf(this, file); }));
 }

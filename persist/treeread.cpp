@@ -16,29 +16,34 @@ void ReadChild(KFS_StreamBase* child, CKF_File* file, CKF_ChunkInfo const* list)
     child->Read(file, child->IsLeaf() ? nullptr : list);
 }
 
-}  // namespace
-
-void KFS_StreamGroup::Read(CKF_File* file, CKF_ChunkInfo const* parent)
+void ReadGroup(KFS_StreamGroup* group, CKF_File* file, CKF_ChunkInfo const* parent)
 {
     bool found = false;
     CKF_ScDescendList const list(file, CKF_Id("kfgp"), parent, &found);
     if (!found) {
         return;
     }
-    KFS_StreamBase::Read(file, list.GetChunkInfo());
+    group->KFS_StreamBase::Read(file, list.GetChunkInfo());
     for (;;) {
         KFS_MatchName name;
         name.Read(file, list.GetChunkInfo());  // steps over what nobody has taken
         if (name.IsEndOfGroupMarker()) {
             return;
         }
-        ReadAndStore(name, file, list.GetChunkInfo());
+        group->ReadAndStore(name, file, list.GetChunkInfo());
     }
+}
+
+}  // namespace
+
+void KFS_StreamGroup::Read(CKF_File* file, CKF_ChunkInfo const* parent)
+{
+    KFSp_ThrowIf(KFSp_Boundary([&] { ReadGroup(this, file, parent); }));
 }
 
 void KFS_NamedStreamGroup::ReadAndStore(KFS_MatchName const& name, CKF_File* file, CKF_ChunkInfo const* chunk)
 {
-    Q_ScAutoPtr<KFS_StreamBase> stream(GetFactory()->CreateStream(name, true, NewStreamScale, false, false));
+    Q_ScAutoPtr<KFS_StreamBase> stream(CreateStream(name, true, NewStreamScale, false, false));
     KFS_StreamBase* const child = stream.get();
     if (!child) {
         return;
@@ -56,7 +61,7 @@ void KFS_NamedStreamGroup::ReadAndStore(KFS_MatchName const& name, CKF_File* fil
 
 void KFS_IndexedStreamGroup::ReadAndStore(KFS_MatchName const& name, CKF_File* file, CKF_ChunkInfo const* chunk)
 {
-    Q_ScAutoPtr<KFS_StreamBase> stream(GetFactory()->CreateStream(name, true, NewStreamScale, true, false));
+    Q_ScAutoPtr<KFS_StreamBase> stream(CreateStream(name, true, NewStreamScale, true, false));
     KFS_StreamBase* const child = stream.get();
     if (!child) {
         return;

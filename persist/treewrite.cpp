@@ -1,6 +1,7 @@
 #include "frame/boundary_private.h"
 #include "frame/services/chunkfile.h"
 #include "keystore/stream.h"
+#include "persist/leafchunks_private.h"
 #include "tree/factory.h"
 #include "tree/paramstreams.h"
 #include "tree/streamgroup.h"
@@ -16,12 +17,6 @@
 
 namespace {
 
-bool IsSlider(KFS_StreamBase const* node)
-{
-    int const kind = node->GetParamDef().paramType;
-    return kind == FX_Param_INT_SLIDER || kind == FX_Param_FIXED_SLIDER || kind == FX_Param_FLOAT_SLIDER;
-}
-
 // A NaN is unlike everything.
 bool HasSameRange(KFS_Stream const* a, KFS_Stream const* b)
 {
@@ -33,7 +28,8 @@ bool IsDescribedLike(KFS_StreamBase const* child, KFS_StreamBase const* canonica
 {
     KFS_Stream const* const leaf = child->GetAsLeaf();
     KFS_Stream const* const canonicalLeaf = canonical->GetAsLeaf();
-    if (leaf && IsSlider(child) && (!canonicalLeaf || !HasSameRange(leaf, canonicalLeaf))) {
+    if (leaf && KFSp_HasSliderRange(child->GetParamDef().paramType) &&
+        (!canonicalLeaf || !HasSameRange(leaf, canonicalLeaf))) {
         return false;
     }
     if (((child->GetStreamBaseFlags() ^ canonical->GetStreamBaseFlags()) &
@@ -57,20 +53,25 @@ bool IsWritten(KFS_StreamGroup const* group, KFS_StreamBase const* child, CKF_Fi
     return !canonical || !IsDescribedLike(child, canonical);
 }
 
-}  // namespace
-
-void KFS_StreamGroup::Write(CKF_File* file) const
+void WriteGroup(KFS_StreamGroup const* group, CKF_File* file)
 {
     CKF_ChunkInfo chunk{};
     KFSp_ThrowIf(CKF_BeginChunkWrite(file, CKF_ListId, 0, CKF_Id("kfgp"), &chunk));
-    KFS_StreamBase::Write(file);
-    for (unsigned int i = 0; i < GetNumStreams(); ++i) {
-        KFS_StreamBase const* const child = GetStream(i);
-        if (IsWritten(this, child, file)) {
+    group->KFS_StreamBase::Write(file);
+    for (unsigned int i = 0; i < group->GetNumStreams(); ++i) {
+        KFS_StreamBase const* const child = group->GetStream(i);
+        if (IsWritten(group, child, file)) {
             child->GetMatchNameOverrideForSave(file).Write(file);
             child->Write(file);
         }
     }
     KFS_MatchName::WriteEndOfGroupMarker(file);
     KFSp_ThrowIf(CKF_EndChunkWrite(file, &chunk));
+}
+
+}  // namespace
+
+void KFS_StreamGroup::Write(CKF_File* file) const
+{
+    KFSp_ThrowIf(KFSp_Boundary([&] { WriteGroup(this, file); }));
 }

@@ -18,8 +18,6 @@ using hearth::threads::ScRecursiveLock;
 
 namespace {
 
-constexpr int ModuleId = 0x1D0000;
-constexpr int UnknownKindRow = 84;
 constexpr T_Time DefaultKeyTime{0, 1};
 
 // Null, unless the unknown kind is to be reported; the report's code is thrown.
@@ -27,8 +25,8 @@ KFS_StreamBase* RefuseUnknownKind(KFS_MatchName const& name, bool report)
 {
     if (report) {
         char text[256];
-        Q_SubString(text, sizeof text, KFSp_MessageText(UnknownKindRow), name.GetName());
-        KFSp_ThrowIf(Qp_ReportLegacyErrString(ModuleId, KFSp_Severity, KFS_Err_UnknownStream, text));
+        Q_SubString(text, sizeof text, KFSp_MessageText(KFSp_Row_UnknownStream), name.GetName());
+        KFSp_ThrowIf(Qp_ReportLegacyErrString(KFSp_ModuleId, KFSp_Severity, KFS_Err_UnknownStream, text));
     }
     return nullptr;
 }
@@ -49,21 +47,22 @@ bool KFS_StreamFactory::RegisterFactoryFunc(KFS_MatchName const& name, KFS_Facto
     if (!factoryFuncs_.emplace(name, func).second) {
         return false;
     }
-    KFS_StreamBase* instance = nullptr;
+    Q_ScAutoPtr<KFS_StreamBase> instance;
     try {
-        Q_ScAutoPtr<KFS_StreamBase> made(CreateStream(name, true, 600, true, true));
-        if (!made) {
+        instance.reset(CreateStream(name, true, 600, true, true));
+        if (!instance) {
             throw int{KFS_Err_UnknownStream};
         }
-        canonicalInstances_.emplace(name, made.get());
-        instance = made.release();
+        canonicalInstances_.emplace(name, instance.get());
+        if (!deferLayout) {
+            instance->SetupCanonicalLayout();
+        }
     } catch (...) {
+        canonicalInstances_.erase(name);
         factoryFuncs_.erase(name);
         throw;
     }
-    if (!deferLayout) {
-        instance->SetupCanonicalLayout();
-    }
+    static_cast<void>(instance.release());
     return true;
 }
 

@@ -38,7 +38,7 @@ public:
     KFS_StreamFactory& operator=(KFS_StreamFactory const&) = delete;
 
     // False if the name is taken. With `deferLayout` the canonical instance gets its layout by SetupCanonicalStream,
-    // which the host calls once all kinds that the layout names are registered.
+    // which the host calls once all kinds that the layout names are registered. If it throws, the name is free as before.
     bool RegisterFactoryFunc(KFS_MatchName const& name, KFS_FactoryFunc const& func, bool deferLayout);
     // True if there was such a kind; its canonical instance is deleted. The absence of one is logged, unless `nullOK`.
     bool UnregisterFactoryFunc(KFS_MatchName const& name);

@@ -44,26 +44,10 @@ KFS_IndexedStreamGroup::KFS_IndexedStreamGroup(KFS_MatchName const* name, KFS_St
 
 KFS_IndexedStreamGroup::KFS_IndexedStreamGroup(KFS_IndexedStreamGroup const& source,
                                                KFS_CloneStreamParams const& params)
-    : KFS_StreamGroup(source)
+    : KFS_StreamGroup(source),
+      streams_(KFSp_CloneChildren(source.streams_, params))
 {
-    streams_.reserve(source.streams_.size());
-    try {
-        for (KFS_StreamBase* const child : source.streams_) {
-            if (child->IsCanonical()) {
-                streams_.push_back(child);
-            } else {
-                streams_.push_back(child->CloneStream(params));
-                pSetParent(streams_.back(), this);
-            }
-        }
-    } catch (...) {
-        for (KFS_StreamBase* const child : streams_) {
-            if (!child->IsCanonical()) {
-                delete child;
-            }
-        }
-        throw;
-    }
+    pAdopt(streams_);
 }
 
 KFS_IndexedStreamGroup::~KFS_IndexedStreamGroup()
@@ -96,12 +80,6 @@ KFS_IndexedStreamGroup const* KFS_IndexedStreamGroup::GetAsIndexedGroup() const
 KFS_IndexedStreamGroup* KFS_IndexedStreamGroup::GetAsIndexedGroup()
 {
     return this;
-}
-
-// Render identity isn't computed yet.
-hearth::utility::Guid KFS_IndexedStreamGroup::GetRenderGuid(KFS_RenderOptionsBase const&, GetRenderGuidFilter*) const
-{
-    return {};
 }
 
 unsigned int KFS_IndexedStreamGroup::GetNumStreams() const
@@ -192,6 +170,7 @@ KFS_StreamBase* KFS_IndexedStreamGroup::DuplicateStream(unsigned int index)
 {
     Q_ScAutoPtr<KFS_StreamBase> copy(GetStream(index)->CloneStream(KFS_CloneStreamParams{true, true}));
     KFS_StreamBase* const stream = copy.get();
+    stream->SetCanonical(false);  // the factory knows nothing of this one, so it must be the group's
     InsertStream(index + 1, &copy);
     return stream;
 }
@@ -213,10 +192,7 @@ KFS_StreamBase* KFS_IndexedStreamGroup::SwapStream(unsigned int index, Q_ScAutoP
     // A failure further on must not lose the stream that left.
     Q_ScAutoPtr<KFS_StreamBase> leaving(outgoing->IsCanonical() ? nullptr : outgoing);
     outgoing->SetParent(nullptr);
-    {
-        KFS_ScSetResetIndependent const tiedIn(incoming, false);
-        KFSp_NotifyOfChild(&KFS_StreamListener::StreamSwapped, this, streams_[index], index);
-    }
+    KFSp_NotifyOfSwap(this, incoming, streams_[index], index);
     static_cast<void>(leaving.release());
     return outgoing;
 }
@@ -253,8 +229,8 @@ void KFS_IndexedStreamGroup::ReorderStreams(unsigned int from, unsigned int to)
     ReorderStreamsStart(stream, from, to);
     {
         PausedListeners const paused;
-        Q_ScAutoPtr<KFS_StreamBase> moving(RemoveStream(from));
-        InsertStream(to, &moving);
+        KFSp_ScIncoming moving(RemoveStream(from));
+        InsertStream(to, &moving.stream);
     }
     ReorderStreamsEnd(stream, from, to);
 }

@@ -3,8 +3,6 @@
 #include "frame/services/scoped.h"
 #include "tree/streamgroup.h"
 
-#include <vector>
-
 // A group whose children form a list, free in number. They are found by position, and CanStore decides which match
 // names may stand in it. Every edit is told to the listeners before and after.
 //
@@ -24,8 +22,6 @@ public:
     bool IsIndexedGroup() const override;
     KFS_IndexedStreamGroup const* GetAsIndexedGroup() const override;
     KFS_IndexedStreamGroup* GetAsIndexedGroup() override;
-    hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const& options,
-                                        GetRenderGuidFilter* filter) const override;
 
     unsigned int GetNumStreams() const override;
     // These four give the entry as it is: there is no upgrade here, and a bad index is a broken invariant in all of
@@ -65,10 +61,8 @@ public:
     unsigned int AppendStream(Q_ScAutoPtr<KFS_StreamBase>* stream);
 
 private:
-    using Streams = std::vector<KFS_StreamBase*, Q_Allocator<KFS_StreamBase*>>;
-
     KFS_StreamBase* At(unsigned int index) const;
     KFS_StreamBase* At(KFS_StreamID const& id) const;
 
-    Streams streams_;
+    KFS_GroupChildren streams_;
 };

@@ -62,10 +62,19 @@ KFSp_MatchNamePool::KFSp_MatchNamePool() : entries_(16)
     entries_.max_load_factor(1.0F);
 }
 
+KFSp_MatchNameEntry const* KFSp_MatchNamePool::FindRecent(hearth::utility::Guid const& guid) const
+{
+    KFSp_MatchNameEntry const* const entry = RecentOf(guid).load(std::memory_order_acquire);
+    return entry && entry->GetGuid() == guid ? entry : nullptr;
+}
+
 hearth::utility::Guid KFSp_MatchNamePool::GuidFromName(unsigned char const* text)
 {
-    boost::upgrade_lock<boost::shared_mutex> shared(mutex_);
     KFSp_MatchNameEntry const key(text);
+    if (FindRecent(key.GetGuid())) {
+        return key.GetGuid();
+    }
+    boost::upgrade_lock<boost::shared_mutex> shared(mutex_);
     auto found = entries_.find(key);
     if (found == entries_.end()) {
         boost::upgrade_to_unique_lock<boost::shared_mutex> const exclusive(shared);
@@ -74,14 +83,22 @@ hearth::utility::Guid KFSp_MatchNamePool::GuidFromName(unsigned char const* text
             found = entries_.insert(key);
         }
     }
+    RecentOf(key.GetGuid()).store(&*found, std::memory_order_release);
     return found->GetGuid();
 }
 
 unsigned char const* KFSp_MatchNamePool::NameFromGuid(hearth::utility::Guid const& guid) const
 {
+    if (KFSp_MatchNameEntry const* const recent = FindRecent(guid)) {
+        return recent->GetName();
+    }
     boost::shared_lock<boost::shared_mutex> const shared(mutex_);
     auto const found = entries_.find(KFSp_MatchNameEntry(guid));
-    return found == entries_.end() ? nullptr : found->GetName();
+    if (found == entries_.end()) {
+        return nullptr;
+    }
+    RecentOf(guid).store(&*found, std::memory_order_release);
+    return found->GetName();
 }
 
 KFS_MatchName::KFS_MatchName(unsigned char const* text, bool)

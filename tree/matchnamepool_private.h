@@ -5,6 +5,8 @@
 #include <boost/thread/shared_mutex.hpp>
 #include <boost/unordered_set.hpp>
 
+#include <array>
+#include <atomic>
 #include <cstddef>
 #include <functional>
 
@@ -45,8 +47,15 @@ public:
     unsigned char const* NameFromGuid(hearth::utility::Guid const& guid) const;
 
 private:
+    using Recent = std::atomic<KFSp_MatchNameEntry const*>;
+
+    Recent& RecentOf(hearth::utility::Guid const& guid) const { return recent_[guid.GuidToBytes()[0]]; }
+    KFSp_MatchNameEntry const* FindRecent(hearth::utility::Guid const& guid) const;
+
     boost::unordered_multiset<KFSp_MatchNameEntry, KFSp_HashGuid, std::equal_to<KFSp_MatchNameEntry>> entries_;
     mutable boost::shared_mutex mutex_;
+    // Entries found last, to be seen without the mutex.
+    mutable std::array<Recent, 256> recent_{};
 };
 
 // The one pool, built when the library loads.

@@ -6,6 +6,7 @@
 #include "tree/decanonicalize.h"
 #include "tree/factory.h"
 #include "tree/groupsupport_private.h"
+#include "tree/layoutorder_private.h"
 
 #include <algorithm>
 #include <utility>
@@ -43,12 +44,8 @@ KFS_NamedStreamGroup::KFS_NamedStreamGroup(KFS_NamedStreamGroup const& source, K
     : KFS_StreamGroup(source)
 {
     source.EnsureUILayoutComplete();
-    try {
-        AddClonesOf(source.streams_, params);
-    } catch (...) {
-        DeleteRealStreams();
-        throw;
-    }
+    streams_ = KFSp_CloneChildren(source.streams_, params);
+    pAdopt(streams_);
     filledFrom_ = source.filledFrom_.load();
 }
 
@@ -77,10 +74,11 @@ KFS_NamedStreamGroup* KFS_NamedStreamGroup::GetAsNamedGroup()
     return this;
 }
 
-// Render identity isn't computed yet.
-hearth::utility::Guid KFS_NamedStreamGroup::GetRenderGuid(KFS_RenderOptionsBase const&, GetRenderGuidFilter*) const
+// A new layout may lie where one lay that the children were once made from.
+void KFS_NamedStreamGroup::SetupCanonicalLayout()
 {
-    return {};
+    KFS_StreamGroup::SetupCanonicalLayout();
+    filledFrom_ = nullptr;
 }
 
 unsigned int KFS_NamedStreamGroup::GetNumStreams() const
@@ -95,17 +93,24 @@ KFS_StreamBase* KFS_NamedStreamGroup::GetEditableStream(unsigned int index)
 
 KFS_StreamBase const* KFS_NamedStreamGroup::GetStream(unsigned int index) const
 {
-    return GetStream(NameAt(index, GetLayout() ? GetLayout()->size() : 0), true);
+    return *LookupStreamAt(index);
 }
 
 KFS_StreamBase* KFS_NamedStreamGroup::GetEditableStreamNullOK(unsigned int index)
 {
+    if (IsAsInLayout(index)) {
+        return nullptr;
+    }
     return const_cast<KFS_StreamBase*>(std::as_const(*this).GetEditableStreamNullOK(index));
 }
 
 KFS_StreamBase const* KFS_NamedStreamGroup::GetEditableStreamNullOK(unsigned int index) const
 {
-    return GetEditableStreamNullOK(NameAt(index, GetLayout() ? GetLayout()->size() : 0));
+    if (IsAsInLayout(index)) {
+        return nullptr;
+    }
+    KFS_StreamBase const* const child = *LookupStreamAt(index);
+    return child->IsCanonical() ? nullptr : child;
 }
 
 KFS_StreamBase const* KFS_NamedStreamGroup::GetStream(KFS_StreamID const& id) const
@@ -154,7 +159,7 @@ KFS_StreamBase* KFS_NamedStreamGroup::GetEditableStream(KFS_MatchName const& nam
     if (!child->IsCanonical()) {
         return child;
     }
-    Q_ScAutoPtr<KFS_StreamBase> created(GetFactory()->CreateStream(name, true, 600, true, false));
+    Q_ScAutoPtr<KFS_StreamBase> created(CreateStream(name, true, 600, true, false));
     KFS_StreamBase* const stream = created.get();
     if (!stream) {
         throw int{KFS_Err_UnknownStream};
@@ -221,10 +226,7 @@ KFS_StreamBase* KFS_NamedStreamGroup::SwapStream(Q_ScAutoPtr<KFS_StreamBase>* st
     if (outgoing->GetParent()) {
         outgoing->SetParent(nullptr);
     }
-    {
-        KFS_ScSetResetIndependent const tiedIn(incoming, false);
-        KFSp_NotifyOfChild(&KFS_StreamListener::StreamSwapped, this, outgoing, index);
-    }
+    KFSp_NotifyOfSwap(this, incoming, outgoing, index);
     return leaving.release();
 }
 
@@ -233,18 +235,11 @@ KFS_StreamBase* KFS_NamedStreamGroup::SwapCanonicalForStream(KFS_MatchName const
     if ((*LookupStream(name, true))->IsCanonical()) {
         return nullptr;
     }
-    KFS_StreamBase* const canonical = GetFactory()->GetCanonicalStream(name);
-    if (!canonical) {
+    KFSp_ScIncoming incoming(GetCanonicalStream(name));
+    if (!incoming.stream) {
         KFSp_FailVerification("unexpected match name searched for in group");
     }
-    Q_ScAutoPtr<KFS_StreamBase> incoming(canonical);
-    Q_ScAutoPtr<KFS_StreamBase> leaving;
-    try {
-        leaving.reset(SwapStream(&incoming));
-    } catch (...) {
-        static_cast<void>(incoming.release());  // the factory's
-        throw;
-    }
+    Q_ScAutoPtr<KFS_StreamBase> leaving(SwapStream(&incoming.stream));
     if (KFS_ShouldAlwaysDecanonicalize()) {
         GetEditableStream(name);
     }
@@ -267,7 +262,7 @@ void KFS_NamedStreamGroup::ResetAllStreamsToCanonical(bool force)
         return;
     }
     DestroyContents();
-    SetLayout(GetCanonicalLayout(GetMatchName()));
+    ShareLayoutOf(GetMatchName());
     FillInStreamsFromCanonicalLayout();
 }
 
@@ -277,44 +272,25 @@ void KFS_NamedStreamGroup::FillInStreamsFromCanonicalLayout()
         return;
     }
     DestroyContents();
-    KFS_CanonicalLayout const& layout = *GetLayout();
-    if (IsCanonical()) {
-        for (KFS_StreamBase const* const child : layout) {
-            streams_.push_back(const_cast<KFS_StreamBase*>(child));
-        }
-    } else {
-        AddRealStreams();
+    streams_.assign(layoutOrder_->Slots().begin(), layoutOrder_->Slots().end());
+    if (!IsCanonical()) {
+        MakeSubgroupsReal();
     }
-    std::sort(streams_.begin(), streams_.end(), KFSp_StreamMatchNameCompare());
-    filledFrom_.store(&layout, std::memory_order_release);
+    filledFrom_.store(GetLayout().get(), std::memory_order_release);
 }
 
 // A slot that is a group holds a clone of the canonical group, whose own children are canonical.
-void KFS_NamedStreamGroup::AddRealStreams()
+void KFS_NamedStreamGroup::MakeSubgroupsReal()
 {
-    streams_.reserve(GetLayout()->size());
-    for (KFS_StreamBase const* const child : *GetLayout()) {
-        if (!child->IsGroup()) {
-            streams_.push_back(const_cast<KFS_StreamBase*>(child));
-            continue;
+    for (unsigned int const position : layoutOrder_->Subgroups()) {
+        KFS_StreamBase*& slot = streams_[layoutOrder_->SlotOf(position)];
+        if (!slot->IsCanonical()) {
+            continue;  // somebody who was told of an earlier one has asked for it
         }
-        KFS_StreamBase* const clone = child->CloneStream(WholeClone);
+        KFS_StreamBase* const clone = slot->CloneStream(WholeClone);
         clone->SetCanonical(false);
-        streams_.push_back(clone);
+        slot = clone;
         clone->SetParent(this);
-    }
-}
-
-void KFS_NamedStreamGroup::AddClonesOf(Streams const& source, KFS_CloneStreamParams const& params)
-{
-    streams_.reserve(source.size());
-    for (KFS_StreamBase* const child : source) {
-        if (child->IsCanonical()) {
-            streams_.push_back(child);
-            continue;
-        }
-        streams_.push_back(child->CloneStream(params));
-        pSetParent(streams_.back(), this);
     }
 }
 
@@ -362,22 +338,26 @@ void KFS_NamedStreamGroup::DestroyContents()
         child->SetParent(nullptr);
         KFSp_NotifyOfChild(&KFS_StreamListener::StreamRemoved, this, child, i);
         // A listener of what is still to come may look at this group.
-        streams_[i] = const_cast<KFS_StreamBase*>((*GetLayout())[GetIndexInUILayout(child->GetMatchName())]);
+        streams_[i] = DefaultFor(child->GetMatchName());
         delete child;
     }
-    streams_.clear();
+    DeleteRealStreams();  // what a listener has made real meanwhile
+}
+
+// The canonical child of that name. A child whose name is none of the type's, because somebody changed it, leaves
+// its place to any of them.
+KFS_StreamBase* KFS_NamedStreamGroup::DefaultFor(KFS_MatchName const& name) const
+{
+    return const_cast<KFS_StreamBase*>((*GetLayout())[FindPosition(name).value_or(0)]);
 }
 
 void KFS_NamedStreamGroup::DeleteRealStreams() noexcept
 {
-    if (!IsCanonical()) {
-        for (KFS_StreamBase* const child : streams_) {
-            if (!child->IsCanonical()) {
-                delete child;
-            }
-        }
+    if (IsCanonical()) {
+        streams_.clear();
+    } else {
+        KFSp_DeleteChildren(&streams_);
     }
-    streams_.clear();
 }
 
 KFS_NamedStreamGroup::Streams::const_iterator KFS_NamedStreamGroup::LookupStream(KFS_MatchName const& name,
@@ -391,7 +371,14 @@ KFS_NamedStreamGroup::Streams::const_iterator KFS_NamedStreamGroup::LookupStream
         }
         return found;
     }
-    if ((*found)->IsCanonical()) {
+    return Entered(found);
+}
+
+// Who is given a canonical group may look inside.
+KFS_NamedStreamGroup::Streams::const_iterator KFS_NamedStreamGroup::Entered(Streams::const_iterator found) const
+{
+    bool const hasLeavesOnly = layoutOrder_ && layoutOrder_->Subgroups().empty();
+    if (!hasLeavesOnly && (*found)->IsCanonical()) {
         if (KFS_NamedStreamGroup const* const group = std::as_const(**found).GetAsNamedGroup()) {
             group->EnsureUILayoutComplete();
         }
@@ -406,8 +393,30 @@ KFS_NamedStreamGroup::Streams::iterator KFS_NamedStreamGroup::LookupStream(KFS_M
     return streams_.begin() + (found - streams_.cbegin());
 }
 
+// Most slots are, and it shows without a look at the stream. False says nothing.
+bool KFS_NamedStreamGroup::IsAsInLayout(unsigned int position) const
+{
+    if (!IsComplete() || position >= streams_.size()) {
+        return false;
+    }
+    unsigned int const slot = layoutOrder_->SlotOf(position);
+    return streams_[slot] == layoutOrder_->Slots()[slot];
+}
+
+KFS_NamedStreamGroup::Streams::const_iterator KFS_NamedStreamGroup::LookupStreamAt(unsigned int index) const
+{
+    KFS_MatchName const& name = NameAt(index, GetLayout() ? GetLayout()->size() : 0);
+    EnsureUILayoutComplete();
+    return IsComplete() ? Entered(streams_.begin() + layoutOrder_->SlotOf(index)) : LookupStream(name, true);
+}
+
+// Where nothing is missing the order of the type says where a name stands.
 KFS_NamedStreamGroup::Streams::const_iterator KFS_NamedStreamGroup::Find(KFS_MatchName const& name) const
 {
+    if (IsComplete()) {
+        unsigned int const slot = layoutOrder_->Find(name);
+        return slot == KFSp_LayoutOrder::None ? streams_.end() : streams_.begin() + slot;
+    }
     auto const [first, last] = std::equal_range(streams_.begin(), streams_.end(), name, KFSp_StreamMatchNameCompare());
     return first == last ? streams_.end() : first;
 }

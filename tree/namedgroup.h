@@ -4,7 +4,6 @@
 #include "tree/streamgroup.h"
 
 #include <atomic>
-#include <vector>
 
 // A group whose children are fixed by its type: each instance has exactly one child for each slot of the layout. A slot
 // that nobody has edited holds the canonical instance of its match name; GetEditableStream replaces it by a real stream
@@ -26,8 +25,7 @@ public:
     bool IsNamedGroup() const override;
     KFS_NamedStreamGroup const* GetAsNamedGroup() const override;
     KFS_NamedStreamGroup* GetAsNamedGroup() override;
-    hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const& options,
-                                        GetRenderGuidFilter* filter) const override;
+    void SetupCanonicalLayout() override;
 
     // A canonical group that nobody has looked into has none yet.
     unsigned int GetNumStreams() const override;
@@ -78,15 +76,18 @@ protected:
     void DestroyContents();
 
 private:
-    using Streams = std::vector<KFS_StreamBase*, Q_Allocator<KFS_StreamBase*>>;
+    using Streams = KFS_GroupChildren;
 
     Streams::const_iterator LookupStream(KFS_MatchName const& name, bool mustExist) const;
     Streams::iterator LookupStream(KFS_MatchName const& name, bool mustExist);
+    bool IsAsInLayout(unsigned int position) const;
+    Streams::const_iterator LookupStreamAt(unsigned int index) const;
     Streams::const_iterator Find(KFS_MatchName const& name) const;
+    Streams::const_iterator Entered(Streams::const_iterator found) const;
     KFS_MatchName const& NameAt(unsigned int index, std::size_t count) const;
     bool IsComplete() const;
-    void AddRealStreams();
-    void AddClonesOf(Streams const& source, KFS_CloneStreamParams const& params);
+    void MakeSubgroupsReal();
+    KFS_StreamBase* DefaultFor(KFS_MatchName const& name) const;
     void DeleteRealStreams() noexcept;
 
     Streams streams_;  // sorted by match name

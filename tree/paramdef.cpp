@@ -1,13 +1,12 @@
 #include "tree/paramdef.h"
 
-#include "frame/boundary_private.h"
+#include "frame/report_private.h"
 #include "frame/services/memory.h"
 
 #include <string>
 
 namespace {
 
-constexpr int ModuleId = 0x1d0000;
 constexpr unsigned int KindsWithParamName = 0x8090;  // bits 4, 7 and 15
 
 char*& ParamNameField(FX_ParamDef* def)
@@ -62,9 +61,9 @@ void FX_ParamDef_SetParamName(FX_ParamDef* def, u16str const& name, bool keepEmp
     }
     std::string const text = Q_UTF16ToMBString(name, false);
     std::size_t const size = text.size() + 1;
-    auto* const buffer = static_cast<char*>(Q_AllocatePtr(ModuleId, "paramdef name field", size));
+    auto* const buffer = static_cast<char*>(Q_AllocatePtr(KFSp_ModuleId, "paramdef name field", size));
     if (!buffer) {
-        throw int{4};
+        throw int{KFS_Err_OutOfMemory};
     }
     if (int const code = Q_CopyString(text.c_str(), static_cast<int>(size), buffer)) {
         Q_FreePtr(buffer);

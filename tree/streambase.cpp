@@ -7,6 +7,7 @@
 #include "tree/listener_private.h"
 #include "tree/streambase_private.h"
 #include "tree/streamgroup.h"
+#include "tree/verify_private.h"
 
 #include <exception>
 #include <stdexcept>
@@ -15,6 +16,15 @@
 using hearth::threads::ScRecursiveLock;
 
 namespace {
+
+// Every question about kinds goes to the factory, so a node without one can't answer it.
+KFS_StreamFactory* Required(KFS_StreamFactory* factory)
+{
+    if (!factory) {
+        KFSp_FailVerification("asked a property without a factory for a property type");
+    }
+    return factory;
+}
 
 // Ends a run of paths in a file.
 constexpr char const* EndOfPathText = "ZQVM End of path sentinel";
@@ -404,22 +414,22 @@ bool KFS_StreamBase::IsHiddenByAncestor() const
 KFS_StreamBase* KFS_StreamBase::CreateStream(KFS_MatchName const& name, bool constant, unsigned int timeScale,
                                              bool reportIfUnknown, bool canonical)
 {
-    return factory_->CreateStream(name, constant, timeScale, reportIfUnknown, canonical);
+    return Required(factory_)->CreateStream(name, constant, timeScale, reportIfUnknown, canonical);
 }
 
 KFS_StreamBase* KFS_StreamBase::GetCanonicalStream(KFS_MatchName const& name) const
 {
-    return factory_->GetCanonicalStream(name);
+    return Required(factory_)->GetCanonicalStream(name);
 }
 
 void KFS_StreamBase::RegisterObsoleteStreamParent(KFS_MatchName const& obsoleteName, KFS_MatchName const& parentName)
 {
-    factory_->RegisterObsoleteStreamParent(obsoleteName, parentName);
+    Required(factory_)->RegisterObsoleteStreamParent(obsoleteName, parentName);
 }
 
 bool KFS_StreamBase::GatherObsoleteReplacementStreams(std::vector<KFS_Stream*>& replacements)
 {
-    return factory_->GatherObsoleteReplacementStreams(this, replacements);
+    return Required(factory_)->GatherObsoleteReplacementStreams(this, replacements);
 }
 
 FX_ParamDef& KFS_StreamBase::GetParamDef()
@@ -477,25 +487,4 @@ void KFS_StreamBase::SwapBase(KFS_StreamBase& other)
     std::swap(flags_, other.flags_);
     std::swap(paramDef_, other.paramDef_);  // with the text that it owns
     std::swap(displayName_, other.displayName_);
-}
-
-KFS_ScSetResetIndependent::KFS_ScSetResetIndependent(KFS_StreamBase* stream, bool wanted)
-    : stream_(stream),
-      saved_(stream->IsIndependent())
-{
-    if (saved_ != wanted) {
-        stream_->MakeIndependent(wanted);
-    }
-}
-
-KFS_ScSetResetIndependent::~KFS_ScSetResetIndependent()
-{
-    if (stream_->IsIndependent() == saved_) {
-        return;
-    }
-    try {
-        stream_->MakeIndependent(saved_);
-    } catch (...) {
-        // A destructor has nobody to tell.
-    }
 }

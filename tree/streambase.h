@@ -170,7 +170,7 @@ public:
     // Of the place that the node has when first asked: the answer is kept and doesn't follow the node through the tree.
     KFS_StreamCapsuleData const& GetStreamCapsuleData() const;
 
-    // These ask the factory, without which a node can't answer them.
+    // These ask the factory. Without one they are a broken invariant: reported, and the int 3 thrown.
     KFS_StreamBase* CreateStream(KFS_MatchName const& name, bool constant, unsigned int timeScale, bool reportIfUnknown,
                                  bool canonical);
     KFS_StreamBase* GetCanonicalStream(KFS_MatchName const& name) const;

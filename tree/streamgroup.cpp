@@ -3,6 +3,7 @@
 #include "frame/services/scoped.h"
 #include "frame/statics_private.h"
 #include "tree/factory.h"
+#include "tree/layoutorder_private.h"
 #include "tree/verify_private.h"
 
 #include <boost/make_shared.hpp>
@@ -11,12 +12,6 @@
 #include <utility>
 
 namespace {
-
-KFS_CanonicalLayout::const_iterator FindInLayout(KFS_CanonicalLayout const& layout, KFS_MatchName const& name)
-{
-    return std::find_if(layout.begin(), layout.end(),
-                        [&name](KFS_StreamBase const* child) { return child->GetMatchName() == name; });
-}
 
 // Walks down `path` with `step`, which gives a group's child for an identifier.
 template <class Base, class Group, class Step>
@@ -45,7 +40,7 @@ KFS_StreamGroup::KFS_StreamGroup(KFS_MatchName const* name, KFS_StreamFactory* f
     def.paramType = FX_Param_GROUP;
     SetParamDef(def);
     if (name) {
-        canonicalLayout_ = GetCanonicalLayout(*name);
+        ShareLayoutOf(*name);
     }
 }
 
@@ -97,6 +92,11 @@ bool KFS_StreamGroup::AffectsRendering(KFS_RenderOptionsBase const&) const
     return true;
 }
 
+hearth::utility::Guid KFS_StreamGroup::GetRenderGuid(KFS_RenderOptionsBase const&, GetRenderGuidFilter*) const
+{
+    return {};
+}
+
 void KFS_StreamGroup::MakeIndependent(bool independent)
 {
     if (IsIndependent() == independent) {
@@ -114,14 +114,17 @@ void KFS_StreamGroup::SetupCanonicalLayout()
 {
     auto const layout = boost::make_shared<KFS_CanonicalLayout>();
     FillCanonicalLayout(layout.get());
-    canonicalLayout_ = layout;
+    if (std::find(layout->begin(), layout->end(), nullptr) != layout->end()) {
+        KFSp_FailVerification("UI layout has an unregistered child");
+    }
+    SetLayout(layout);
 }
 
 void KFS_StreamGroup::UpgradeChildStream(KFS_StreamBase*) {}
 
 bool KFS_StreamGroup::CanStore(KFS_MatchName const& name) const
 {
-    return canonicalLayout_ && FindInLayout(*canonicalLayout_, name) != canonicalLayout_->end();
+    return FindPosition(name).has_value();
 }
 
 void KFS_StreamGroup::NotifyStreamStored(KFS_StreamGroup*, KFS_StreamBase*) {}
@@ -143,21 +146,42 @@ int KFS_StreamGroup::EvaluateExpression(KFS_Stream const*, T_Time const*, double
 
 unsigned int KFS_StreamGroup::GetIndexInUILayout(KFS_MatchName const& name) const
 {
-    if (canonicalLayout_) {
-        auto const found = FindInLayout(*canonicalLayout_, name);
-        if (found != canonicalLayout_->end()) {
-            return static_cast<unsigned int>(found - canonicalLayout_->begin());
-        }
+    if (std::optional<unsigned int> const position = FindPosition(name)) {
+        return *position;
     }
     KFSp_FailVerification("match name isn't in UI layout");
 }
 
-boost::shared_ptr<KFS_CanonicalLayout> KFS_StreamGroup::GetCanonicalLayout(KFS_MatchName const& name) const
+std::optional<unsigned int> KFS_StreamGroup::FindPosition(KFS_MatchName const& name) const
+{
+    unsigned int const slot = layoutOrder_ ? layoutOrder_->Find(name) : KFSp_LayoutOrder::None;
+    return slot == KFSp_LayoutOrder::None ? std::nullopt : std::optional(layoutOrder_->PositionOf(slot));
+}
+
+void KFS_StreamGroup::SetLayout(boost::shared_ptr<KFS_CanonicalLayout> layout)
+{
+    layoutOrder_.reset(layout ? new KFSp_LayoutOrder(*layout) : nullptr);
+    canonicalLayout_ = std::move(layout);
+}
+
+void KFS_StreamGroup::ShareLayoutOf(KFS_MatchName const& name)
+{
+    KFS_StreamGroup const* const group = FindCanonicalGroup(name);
+    layoutOrder_ = group ? group->layoutOrder_ : nullptr;
+    canonicalLayout_ = group ? group->canonicalLayout_ : nullptr;
+}
+
+KFS_StreamGroup const* KFS_StreamGroup::FindCanonicalGroup(KFS_MatchName const& name) const
 {
     KFS_StreamFactory* const factory = GetFactory();
     KFS_StreamBase const* const canonical = factory ? factory->GetCanonicalStream(name) : nullptr;
-    KFS_StreamGroup const* const group = canonical ? canonical->GetAsGroup() : nullptr;
-    return group ? group->canonicalLayout_ : boost::shared_ptr<KFS_CanonicalLayout>();
+    return canonical ? canonical->GetAsGroup() : nullptr;
+}
+
+boost::shared_ptr<KFS_CanonicalLayout> KFS_StreamGroup::GetCanonicalLayout(KFS_MatchName const& name) const
+{
+    KFS_StreamGroup const* const group = FindCanonicalGroup(name);
+    return group ? group->canonicalLayout_ : nullptr;
 }
 
 KFS_StreamBase const* KFS_StreamGroup::FindStream(KFS_StreamIDPath const& path) const

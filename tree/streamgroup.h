@@ -6,13 +6,18 @@
 
 #include <boost/shared_ptr.hpp>
 
+#include <optional>
 #include <vector>
 
 class KFS_ParamBag;
+class KFSp_LayoutOrder;
 struct T_Time;
 
 // The kinds of children of a group type, in display order, each as its canonical instance.
 using KFS_CanonicalLayout = std::vector<KFS_StreamBase const*, Q_Allocator<KFS_StreamBase const*>>;
+
+// A group's children, real and canonical.
+using KFS_GroupChildren = std::vector<KFS_StreamBase*, Q_Allocator<KFS_StreamBase*>>;
 
 // An interior node of a stream tree. A root is a group without a parent; hosts derive their root from one of the
 // concrete groups.
@@ -35,11 +40,15 @@ public:
     KFS_StreamGroup* GetAsGroup() override;
     KFS_StreamGroup const* GetAsGroup() const override;
     bool AffectsRendering(KFS_RenderOptionsBase const& options) const override;
+    // Identities aren't computed yet: the unset Guid.
+    hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const& options,
+                                        GetRenderGuidFilter* filter) const override;
     void Read(CKF_File* file, CKF_ChunkInfo const* parent) override;
     void Write(CKF_File* file) const override;
     // Passes the wish on to the real children, and then takes it itself. A group that is already so does nothing.
     void MakeIndependent(bool independent) override;
-    // Asks the group type for its children anew. Instances that exist keep the layout that they have.
+    // Asks the group type for its children anew. Instances that exist keep the layout that they have. A kind that isn't
+    // registered, a null in the layout, is a broken invariant, "UI layout has an unregistered child".
     void SetupCanonicalLayout() override;
 
     virtual unsigned int GetNumStreams() const = 0;
@@ -103,13 +112,29 @@ protected:
     KFS_StreamGroup(KFS_StreamGroup const& source);
 
     boost::shared_ptr<KFS_CanonicalLayout> const& GetLayout() const { return canonicalLayout_; }
-    void SetLayout(boost::shared_ptr<KFS_CanonicalLayout> layout) { canonicalLayout_ = std::move(layout); }
-    // A cloned child's parent, without what SetParent does besides.
-    static void pSetParent(KFS_StreamBase* child, KFS_StreamGroup* parent) { child->parent_ = parent; }
+    void SetLayout(boost::shared_ptr<KFS_CanonicalLayout> layout);
+    // Makes this the parent of the real ones of cloned children, without what SetParent does besides.
+    void pAdopt(KFS_GroupChildren const& children)
+    {
+        for (KFS_StreamBase* const child : children) {
+            if (!child->IsCanonical()) {
+                child->parent_ = this;
+            }
+        }
+    }
 
 private:
-    boost::shared_ptr<KFS_CanonicalLayout>
-        canonicalLayout_;  // one vector for all instances of a group type; null without a layout
+    friend class KFS_NamedStreamGroup;  // whose slots are in that order
+
+    // Takes over what the group type of that name has.
+    void ShareLayoutOf(KFS_MatchName const& name);
+    KFS_StreamGroup const* FindCanonicalGroup(KFS_MatchName const& name) const;
+    // The display position of a kind of child, or none.
+    std::optional<unsigned int> FindPosition(KFS_MatchName const& name) const;
+
+    // One vector for all instances of a group type, which nobody changes once it is here; null without a layout.
+    boost::shared_ptr<KFS_CanonicalLayout> canonicalLayout_;
+    boost::shared_ptr<KFSp_LayoutOrder const> layoutOrder_;  // of canonicalLayout_
 };
 
 template <class F>

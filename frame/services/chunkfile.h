@@ -9,9 +9,8 @@
 //          bad byte on. Only the answer that a chunk isn't there, CKF_Err_NoSuchChunk, is no failure. What the service
 //          throws is such a code, as an int.
 // Hostile  Nothing of a file is trusted. A length is held against what its parent has left before anything is
-// files    allocated or read, lists nest at most CKF_MaxDepth deep, and a search that found nothing isn't made again,
-// so
-//          that reading costs time in proportion to the file whatever stands in it.
+// files    allocated or read, lists nest at most CKF_MaxDepth deep, and a search that found nothing isn't made
+//          again, so that reading costs time in proportion to the file whatever stands in it.
 // Threads  One file is used by one thread at a time. No lock.
 #pragma once
 
@@ -42,13 +41,12 @@ inline constexpr int CKF_Err_NoSuchChunk = 0x1901;    // not there; the position
 inline constexpr int CKF_Err_BadArgument = 0x1902;    // a null address, a negative size, an id that isn't an atom's
 inline constexpr int CKF_Err_NotOpen = 0x1903;        // the file isn't open for this direction
 inline constexpr int CKF_Err_NotAChunkFile = 0x1904;  // the outer form or its version record is missing or another's
-inline constexpr int CKF_Err_Corrupt = 0x1905;  // a chunk doesn't fit its parent, or the form doesn't fit the file
-inline constexpr int CKF_Err_TooDeep = 0x1906;  // more than CKF_MaxDepth lists inside each other
-inline constexpr int CKF_Err_TooBig = 0x1907;   // the file would pass 4 GiB, or the limit that the host set
-inline constexpr int CKF_Err_Unbalanced =
-    0x1908;                                     // a chunk that isn't the innermost open one, or is still open at Commit
-inline constexpr int CKF_Err_PastEnd = 0x1909;  // more bytes asked for than the chunk has left
-inline constexpr int CKF_Err_Io = 0x190A;       // the operating system refused; the error text says why
+inline constexpr int CKF_Err_Corrupt = 0x1905;        // a chunk doesn't fit its parent, or the form its file
+inline constexpr int CKF_Err_TooDeep = 0x1906;        // more than CKF_MaxDepth lists inside each other
+inline constexpr int CKF_Err_TooBig = 0x1907;         // the file would pass 4 GiB, or the limit that the host set
+inline constexpr int CKF_Err_Unbalanced = 0x1908;     // not the innermost open chunk, or still open at Commit
+inline constexpr int CKF_Err_PastEnd = 0x1909;        // more bytes asked for than the chunk has left
+inline constexpr int CKF_Err_Io = 0x190A;             // the operating system refused; the error text says why
 
 // ---- versions
 

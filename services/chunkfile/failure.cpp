@@ -1,6 +1,7 @@
 #include "services/chunkfile/failure_private.h"
 
 #include "frame/services/chunkfile.h"
+#include "frame/services/memory.h"
 
 #include <cstdarg>
 #include <cstdio>
@@ -27,6 +28,16 @@ int CKFp_Failure::SetIo(int error, std::uint64_t offset, char const* what, char 
     } catch (std::exception const&) {  // out of memory: the sentence goes without
     }
     return Set(CKF_Err_Io, offset, "can't %s \"%s\": %s", what, path, reason.c_str());
+}
+
+int CKFp_Failure::SetOutOfMemory(std::uint64_t offset) noexcept
+{
+    return Set(Q_Err_OutOfMemory, offset, "not enough memory for the project");
+}
+
+int CKFp_Failure::SetBadAtomId(int id, std::uint64_t offset) noexcept
+{
+    return Set(CKF_Err_BadArgument, offset, "\"%s\" can't be the id of an atom", CKFp_IdText(id).text);
 }
 
 CKFp_IdText::CKFp_IdText(int id) noexcept

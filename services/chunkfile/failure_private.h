@@ -13,6 +13,9 @@ public:
     [[gnu::format(printf, 4, 5)]] int Set(int code, std::uint64_t offset, char const* format, ...) noexcept;
     // The same for an errno value: "can't <what> "<path>": <the system's text>".
     int SetIo(int error, std::uint64_t offset, char const* what, char const* path) noexcept;
+    int SetOutOfMemory(std::uint64_t offset) noexcept;
+    // For what was asked for under an id that only lists have, or none.
+    int SetBadAtomId(int id, std::uint64_t offset) noexcept;
 
 private:
     int code_ = 0;

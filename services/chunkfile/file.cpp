@@ -5,11 +5,11 @@ namespace {
 int StartReading(CKF_File& file, CKF_File::Impl& impl, CKFp_Bytes bytes)
 {
     impl.reader = std::make_unique<CKFp_Reader>(bytes, impl.failure);
-    std::int32_t major = 0, minor = 0, encoding = 0;
-    if (const int code = impl.reader->Start(&major, &minor, &encoding)) return code;
-    file.majorVersion = major;
-    file.minorVersion = minor;
-    file.textEncoding.code = encoding;
+    CKFp_Version version;
+    if (const int code = impl.reader->Start(&version)) return code;
+    file.majorVersion = version.major;
+    file.minorVersion = version.minor;
+    file.textEncoding.code = version.encoding;
     return 0;
 }
 
@@ -29,7 +29,7 @@ int Begin(CKF_File& file, CKF_File::Impl& impl, Work work)
     try {
         code = work();
     } catch (std::bad_alloc const&) {
-        code = impl.failure.Set(Q_Err_OutOfMemory, 0, "not enough memory for the project");
+        code = impl.failure.SetOutOfMemory(0);
     }
     if (code != 0) file.Close();
     return code;
@@ -76,8 +76,9 @@ int CKF_File::CreateInMemory(CKF_IoHook* hook)
 
 int CKF_File::Commit()
 {
-    const int code = CKFp_WithWriter(
-        this, [&](CKFp_Writer& writer) { return writer.Commit(majorVersion, minorVersion, textEncoding.code); });
+    const int code = CKFp_WithWriter(this, [&](CKFp_Writer& writer) {
+        return writer.Commit({majorVersion, minorVersion, textEncoding.code});
+    });
     impl_->writer.reset();
     return code;
 }

@@ -38,7 +38,7 @@ int CKFp_WithWorker(CKF_File* file, std::unique_ptr<Worker> CKF_File::Impl::*wor
     try {
         return work(*(impl.*worker));
     } catch (std::bad_alloc const&) {
-        return impl.failure.Set(Q_Err_OutOfMemory, 0, "not enough memory for the project");
+        return impl.failure.SetOutOfMemory(0);
     }
 }
 

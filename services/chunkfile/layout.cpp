@@ -2,6 +2,19 @@
 
 #include <algorithm>
 
+CKFp_Version CKFp_GetVersion(unsigned char const* record) noexcept
+{
+    return {static_cast<std::int32_t>(CKFp_Get32(record)), static_cast<std::int32_t>(CKFp_Get32(record + 4)),
+            static_cast<std::int32_t>(CKFp_Get32(record + 8))};
+}
+
+void CKFp_PutVersion(unsigned char* record, CKFp_Version const& version) noexcept
+{
+    CKFp_Put32(record, static_cast<std::uint32_t>(version.major));
+    CKFp_Put32(record + 4, static_cast<std::uint32_t>(version.minor));
+    CKFp_Put32(record + 8, static_cast<std::uint32_t>(version.encoding));
+}
+
 char const* CKFp_ParseChunk(CKFp_Bytes bytes, std::uint64_t offset, std::uint64_t limit, CKFp_Chunk* chunk) noexcept
 {
     *chunk = {};

@@ -14,7 +14,7 @@ inline constexpr int CKFp_VersionId = CKF_Id("vers");
 
 inline constexpr std::size_t CKFp_HeaderSize = 8;       // id, length
 inline constexpr std::size_t CKFp_ListHeaderSize = 12;  // and list type, which the length counts
-inline constexpr std::size_t CKFp_VersionSize = 12;     // major, minor, text encoding
+inline constexpr std::size_t CKFp_VersionSize = 12;     // what CKFp_Version holds
 inline constexpr std::size_t CKFp_LengthOffset = 4;     // of the length in a header
 inline constexpr std::size_t CKFp_VersionOffset = CKFp_ListHeaderSize + CKFp_HeaderSize;
 inline constexpr std::size_t CKFp_PreludeSize = CKFp_VersionOffset + CKFp_VersionSize;
@@ -30,6 +30,27 @@ inline std::uint32_t CKFp_Get32(unsigned char const* bytes) noexcept
 inline void CKFp_Put32(unsigned char* bytes, std::uint32_t value) noexcept
 {
     for (int i = 0; i < 4; ++i) bytes[i] = static_cast<unsigned char>(value >> (24 - 8 * i));
+}
+
+inline void CKFp_PutHeader(unsigned char* header, int id, std::uint32_t length) noexcept
+{
+    CKFp_Put32(header, static_cast<std::uint32_t>(id));
+    CKFp_Put32(header + CKFp_LengthOffset, length);
+}
+
+// What the version record holds, in its order.
+struct CKFp_Version {
+    std::int32_t major = 0;
+    std::int32_t minor = 0;
+    std::int32_t encoding = 0;
+};
+
+CKFp_Version CKFp_GetVersion(unsigned char const* record) noexcept;
+void CKFp_PutVersion(unsigned char* record, CKFp_Version const& version) noexcept;
+
+constexpr bool CKFp_IsAtomId(int id) noexcept
+{
+    return id != 0 && id != CKF_ListId && id != CKFp_FormId;
 }
 
 // One chunk inside the limits of its parent.

@@ -6,14 +6,18 @@
 
 namespace {
 
+int FailWithoutPlace(CKF_File* file, int id) noexcept
+{
+    return CKFp_FailureOf(file).Set(CKF_Err_BadArgument, 0, "atom \"%s\" is read without a place for it",
+                                    CKFp_IdText(id).text);
+}
+
 // Finds an atom and hands its data to `use`.
 template <class Use>
 int ReadAtom(CKF_File* file, int id, CKF_ChunkInfo const* parent, Use use)
 {
     return CKFp_WithReader(file, [&](CKFp_Reader& reader) {
-        if (id == 0 || id == CKF_ListId || id == CKFp_FormId)
-            return CKFp_FailureOf(file).Set(CKF_Err_BadArgument, reader.Position(), "\"%s\" can't be the id of an atom",
-                                            CKFp_IdText(id).text);
+        if (!CKFp_IsAtomId(id)) return CKFp_FailureOf(file).SetBadAtomId(id, reader.Position());
         CKFp_Chunk chunk;
         if (const int code = reader.Find(id, 0, parent, &chunk)) return code;
         return use(reader.Take(chunk));
@@ -23,9 +27,7 @@ int ReadAtom(CKF_File* file, int id, CKF_ChunkInfo const* parent, Use use)
 int ReadText(CKF_File* file, int id, CKF_ChunkInfo const* parent, unsigned long maxLength, u16str* text)
 {
     return ReadAtom(file, id, parent, [&](CKFp_Bytes bytes) {
-        if (!text)
-            return CKFp_FailureOf(file).Set(CKF_Err_BadArgument, 0, "text \"%s\" without a place",
-                                            CKFp_IdText(id).text);
+        if (!text) return FailWithoutPlace(file, id);
         *text = CKFp_CutText(CKFp_FromUtf8(bytes), maxLength);
         return 0;
     });
@@ -36,9 +38,7 @@ int ReadText(CKF_File* file, int id, CKF_ChunkInfo const* parent, unsigned long 
 int CKF_ReadAtom(CKF_File* file, int id, CKF_ChunkInfo const* parent, int size, void* buffer)
 {
     return ReadAtom(file, id, parent, [&](CKFp_Bytes bytes) {
-        if (size < 0 || (size > 0 && !buffer))
-            return CKFp_FailureOf(file).Set(CKF_Err_BadArgument, 0, "atom \"%s\" without a place",
-                                            CKFp_IdText(id).text);
+        if (size < 0 || (size > 0 && !buffer)) return FailWithoutPlace(file, id);
         const std::size_t count = std::min(static_cast<std::size_t>(size), bytes.size());
         if (count > 0) std::memcpy(buffer, bytes.data(), count);
         return 0;
@@ -48,9 +48,7 @@ int CKF_ReadAtom(CKF_File* file, int id, CKF_ChunkInfo const* parent, int size, 
 int CKF_ReadHandle(CKF_File* file, CKF_ChunkInfo const* parent, int id, char*** handle)
 {
     return ReadAtom(file, id, parent, [&](CKFp_Bytes bytes) {
-        if (!handle)
-            return CKFp_FailureOf(file).Set(CKF_Err_BadArgument, 0, "atom \"%s\" without a place",
-                                            CKFp_IdText(id).text);
+        if (!handle) return FailWithoutPlace(file, id);
         char** const made = Q_AllocateHandleClear(CKFp_AllocationId, "chunk handle", bytes.size());
         if (!made) throw std::bad_alloc();
         if (!bytes.empty()) std::memcpy(*made, bytes.data(), bytes.size());

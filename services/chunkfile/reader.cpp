@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <cstring>
 
-int CKFp_Reader::Start(std::int32_t* major, std::int32_t* minor, std::int32_t* encoding) noexcept
+int CKFp_Reader::Start(CKFp_Version* version) noexcept
 {
     if (bytes_.size() > UINT32_MAX)
         return failure_.Set(CKF_Err_TooBig, UINT32_MAX, "the file is bigger than a project file can be");
@@ -20,14 +20,11 @@ int CKFp_Reader::Start(std::int32_t* major, std::int32_t* minor, std::int32_t* e
     levels_[0] = {form, {}, 0};
     position_ = form.data;
 
-    CKFp_Chunk version;
-    if (position_ == form.end || CKFp_ParseChunk(bytes_, position_, form.end, &version) ||
-        version.id != CKFp_VersionId || version.Size() < CKFp_VersionSize)
+    CKFp_Chunk record;
+    if (position_ == form.end || CKFp_ParseChunk(bytes_, position_, form.end, &record) || record.id != CKFp_VersionId ||
+        record.Size() < CKFp_VersionSize)
         return failure_.Set(CKF_Err_NotAChunkFile, position_, "the project file doesn't begin with its version");
-    unsigned char const* const record = Take(version).data();
-    *major = static_cast<std::int32_t>(CKFp_Get32(record));
-    *minor = static_cast<std::int32_t>(CKFp_Get32(record + 4));
-    *encoding = static_cast<std::int32_t>(CKFp_Get32(record + 8));
+    *version = CKFp_GetVersion(Take(record).data());
     return 0;
 }
 

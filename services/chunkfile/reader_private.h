@@ -12,7 +12,7 @@ public:
     CKFp_Reader(CKFp_Bytes bytes, CKFp_Failure& failure) noexcept : bytes_(bytes), failure_(failure) {}
 
     // Checks the outer form and takes the version record; the position is then behind it.
-    int Start(std::int32_t* major, std::int32_t* minor, std::int32_t* encoding) noexcept;
+    int Start(CKFp_Version* version) noexcept;
 
     // Looks for the next chunk inside the innermost open list; 0 stands for any id, any list type. The position doesn't
     // move. CKF_Err_NoSuchChunk isn't recorded.

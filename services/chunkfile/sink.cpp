@@ -17,7 +17,7 @@ int CKFp_MemorySink::DoAppend(void const* bytes, std::size_t size)
         bytes_.insert(bytes_.end(), first, first + size);
         return 0;
     } catch (std::exception const&) {
-        return Failure().Set(Q_Err_OutOfMemory, Size(), "not enough memory for the project");
+        return Failure().SetOutOfMemory(Size());
     }
 }
 

@@ -11,35 +11,29 @@ int CKFp_Writer::CheckRoom(std::uint64_t size)
 int CKFp_Writer::Start()
 {
     unsigned char prelude[CKFp_PreludeSize] = {};
-    CKFp_Put32(prelude, static_cast<std::uint32_t>(CKFp_FormId));
+    CKFp_PutHeader(prelude, CKFp_FormId, 0);
     CKFp_Put32(prelude + CKFp_HeaderSize, static_cast<std::uint32_t>(CKFp_FormType));
-    CKFp_Put32(prelude + CKFp_ListHeaderSize, static_cast<std::uint32_t>(CKFp_VersionId));
-    CKFp_Put32(prelude + CKFp_ListHeaderSize + CKFp_LengthOffset, CKFp_VersionSize);
+    CKFp_PutHeader(prelude + CKFp_ListHeaderSize, CKFp_VersionId, CKFp_VersionSize);
     if (const int code = CheckRoom(sizeof prelude)) return code;
     return Append(prelude, sizeof prelude);
 }
 
-int CKFp_Writer::Commit(std::int32_t major, std::int32_t minor, std::int32_t encoding)
+int CKFp_Writer::Commit(CKFp_Version const& version)
 {
     if (open_ > 0) return failure_.Set(CKF_Err_Unbalanced, sink_->Size(), "%d lists were not closed", open_);
     if (const int code = PatchLength(CKFp_ListHeaderSize)) return code;
-    unsigned char version[CKFp_VersionSize];
-    CKFp_Put32(version, static_cast<std::uint32_t>(major));
-    CKFp_Put32(version + 4, static_cast<std::uint32_t>(minor));
-    CKFp_Put32(version + 8, static_cast<std::uint32_t>(encoding));
-    if (const int code = sink_->Patch(CKFp_VersionOffset, version, sizeof version)) return code;
+    unsigned char record[CKFp_VersionSize];
+    CKFp_PutVersion(record, version);
+    if (const int code = sink_->Patch(CKFp_VersionOffset, record, sizeof record)) return code;
     return sink_->Commit();
 }
 
 int CKFp_Writer::BeginAtom(int id, std::uint64_t size)
 {
-    if (id == 0 || id == CKF_ListId || id == CKFp_FormId)
-        return failure_.Set(CKF_Err_BadArgument, sink_->Size(), "\"%s\" can't be the id of an atom",
-                            CKFp_IdText(id).text);
+    if (!CKFp_IsAtomId(id)) return failure_.SetBadAtomId(id, sink_->Size());
     if (const int code = CheckRoom(CKFp_HeaderSize + size + (size & 1))) return code;
     unsigned char header[CKFp_HeaderSize];
-    CKFp_Put32(header, static_cast<std::uint32_t>(id));
-    CKFp_Put32(header + CKFp_LengthOffset, static_cast<std::uint32_t>(size));
+    CKFp_PutHeader(header, id, static_cast<std::uint32_t>(size));
     return Append(header, sizeof header);
 }
 
@@ -55,8 +49,8 @@ int CKFp_Writer::BeginList(int listType, CKF_ChunkInfo* chunk)
     if (open_ == CKF_MaxDepth)
         return failure_.Set(CKF_Err_TooDeep, sink_->Size(), "the project nests more than %d lists", CKF_MaxDepth);
     if (const int code = CheckRoom(CKFp_ListHeaderSize)) return code;
-    unsigned char header[CKFp_ListHeaderSize] = {};
-    CKFp_Put32(header, static_cast<std::uint32_t>(CKF_ListId));
+    unsigned char header[CKFp_ListHeaderSize];
+    CKFp_PutHeader(header, CKF_ListId, 0);
     CKFp_Put32(header + CKFp_HeaderSize, static_cast<std::uint32_t>(listType));
     if (const int code = Append(header, sizeof header)) return code;
     const std::uint32_t data = static_cast<std::uint32_t>(sink_->Size());

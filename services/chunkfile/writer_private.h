@@ -19,7 +19,7 @@ public:
     // The outer form and an empty version record.
     int Start();
     // Length of the form, version record, and the sink's commit.
-    int Commit(std::int32_t major, std::int32_t minor, std::int32_t encoding);
+    int Commit(CKFp_Version const& version);
 
     // An atom whose data comes in pieces: begin, pieces of `size` bytes together, end.
     int BeginAtom(int id, std::uint64_t size);

@@ -1,18 +1,11 @@
 #include "curves/autotangents_private.h"
 
-#include "tests/curves/keyedstream.h"
-
-#include <array>
-#include <cstring>
+#include "tests/curves/threekeys.h"
 
 namespace {
 
 using AutoTangentsTest = StreamTest;
 using Vec = std::vector<double>;
-
-constexpr int L = KFS_Interp_Linear;
-constexpr int S = KFS_Interp_Spline;
-constexpr int H = KFS_Interp_Hold;
 
 // ---- tangents in space
 
@@ -51,15 +44,9 @@ TEST_F(AutoTangentsTest, SpatialTangentsFollowTheChord)
         EXPECT_EQ(0, KFSp_ComputeDefaultSpTangents(static_cast<short>(c.in.size()), pointer(c.prev), pointer(c.cur),
                                                    pointer(c.next), in.data(), out.data()));
         for (std::size_t i = 0; i < c.in.size(); ++i) {
-            EXPECT_NEAR(c.in[i], in[i], 1e-12);
-            EXPECT_NEAR(c.out[i], out[i], 1e-12);
             // A cleared handle is exactly zero, not a very short one.
-            if (c.in[i] == 0.0) {
-                EXPECT_EQ(0.0, in[i]);
-            }
-            if (c.out[i] == 0.0) {
-                EXPECT_EQ(0.0, out[i]);
-            }
+            EXPECT_NEAR(c.in[i], in[i], c.in[i] == 0.0 ? 0.0 : 1e-12);
+            EXPECT_NEAR(c.out[i], out[i], c.out[i] == 0.0 ? 0.0 : 1e-12);
         }
         EXPECT_EQ(55.0, in.back());
         EXPECT_EQ(55.0, out.back());
@@ -90,24 +77,6 @@ Slope const Slopes[] = {
     {"last, comes in straight", 2, L, S, 15.0, 10.0},
     {"last, nothing goes out straight", 2, S, L, 0.0, 0.0},
 };
-
-KeyedStream MakeThree(bool spatial)
-{
-    StreamOptions options;
-    options.dimension = spatial ? 2 : 1;
-    options.spatial = spatial;
-    KeyedStream stream(options);
-    stream.Key(0, Vec(static_cast<std::size_t>(options.dimension), 0.0));
-    stream.Key(600, Vec(static_cast<std::size_t>(options.dimension), 10.0));
-    stream.Key(1800, Vec(static_cast<std::size_t>(options.dimension), 40.0));
-    stream.Settle();
-    if (spatial) {
-        stream.Record(0)->arcLength = 5.0;
-        stream.Record(1)->arcLength = 20.0;
-        stream.Record(2)->arcLength = 0.0;
-    }
-    return stream;
-}
 
 TEST_F(AutoTangentsTest, TheSlopeOfEveryKindOfKey)
 {
@@ -149,7 +118,7 @@ Coming const Comings[] = {
 
 TEST_F(AutoTangentsTest, AKeyThatIsAboutToEnter)
 {
-    KeyedStream const stream = MakeThree(false);
+    KeyedStream const stream = MakeThree();
     std::vector<unsigned char> const before = stream.Bytes();
     for (Coming const& c : Comings) {
         SCOPED_TRACE(c.why);
@@ -169,28 +138,22 @@ TEST_F(AutoTangentsTest, AKeyThatIsAboutToEnter)
 
 TEST_F(AutoTangentsTest, AnchorsMeasureOverFloatKeys)
 {
-    StreamOptions options;
-    options.dimension = 2;
-    options.spatial = true;
-    KeyedStream stream(options);
+    KeyedStream stream({.dimension = 2, .spatial = true});
     for (int i = 0; i < 5; ++i) stream.Key(600 * i, {1.0 * i, 0.5 * i * i}, S);
     stream.Settle();
     for (int i = 0; i < 5; ++i) stream.Record(i)->arcLength = i < 4 ? 3.0 + i : 0.0;  // 3 4 5 6
     stream.Flag(1, KFS_KeyFlag_Float).Flag(3, KFS_KeyFlag_Float);
-    struct Anchor {
-        int index;
-        double speed;
+    auto const speedOf = [&](int index) {
+        KFS_KeyScalar* const key = stream.Record(index);
+        EXPECT_EQ(0, KFSp_SetDefaultKeyframeTangents(stream, key->time, KFSp_Tangents_Temporal, key));
+        return stream.GetHandle(index).inSpeed;
     };
-    for (Anchor const& anchor : {Anchor{0, 7.0 / 2.0}, Anchor{2, 18.0 / 4.0}, Anchor{4, 11.0 / 2.0}}) {
-        KFS_KeyScalar* const key = stream.Record(anchor.index);
-        ASSERT_EQ(0, KFSp_SetDefaultKeyframeTangents(stream, key->time, KFSp_Tangents_Temporal, key));
-        EXPECT_DOUBLE_EQ(anchor.speed, stream.GetHandle(anchor.index).inSpeed) << anchor.index;
-    }
+    EXPECT_DOUBLE_EQ(7.0 / 2.0, speedOf(0));
+    EXPECT_DOUBLE_EQ(18.0 / 4.0, speedOf(2));
+    EXPECT_DOUBLE_EQ(11.0 / 2.0, speedOf(4));
     // Without arc-length parametrisation the neighbours are next door.
     stream.StreamFlag(KFS_StreamFlag_SParametrize, false);
-    KFS_KeyScalar* const middle = stream.Record(2);
-    ASSERT_EQ(0, KFSp_SetDefaultKeyframeTangents(stream, middle->time, KFSp_Tangents_Temporal, middle));
-    EXPECT_DOUBLE_EQ((4.0 + 5.0) / 2.0, stream.GetHandle(2).inSpeed);
+    EXPECT_DOUBLE_EQ((4.0 + 5.0) / 2.0, speedOf(2));
 }
 
 // ---- the path
@@ -241,10 +204,7 @@ TEST_F(AutoTangentsTest, AStraightPathStaysStraight)
 
 TEST_F(AutoTangentsTest, ThePathBendsAtFloatKeysToo)
 {
-    StreamOptions options;
-    options.dimension = 2;
-    options.spatial = true;
-    KeyedStream stream(options);
+    KeyedStream stream({.dimension = 2, .spatial = true});
     for (int i = 0; i < 4; ++i) stream.Key(600 * i, {6.0 * i, 6.0 * i * i}, S);
     stream.Settle();
     stream.Flag(1, KFS_KeyFlag_Float).Flag(2, KFS_KeyFlag_Float);
@@ -275,7 +235,7 @@ TEST_F(AutoTangentsTest, RefusesWhatHasNoKeys)
 
 TEST_F(AutoTangentsTest, LeavesCustomValuesAlone)
 {
-    KeyedStream stream = MakeThree(false);
+    KeyedStream stream = MakeThree();
     std::vector<unsigned char> const before = stream.Bytes();
     stream.get()->MarkTemporarilyNonCustom(true);  // the records count as the client's meanwhile
     EXPECT_EQ(0, KFSp_SetDefaultKeyframeTangents(stream, 600, 3, stream.Record(1)));

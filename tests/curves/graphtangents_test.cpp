@@ -113,10 +113,7 @@ TEST_F(GraphTangentsTest, AContinuousHandleKeepsItsLength)
 
 TEST_F(GraphTangentsTest, ContinuityHasItsExceptions)
 {
-    double const x = -0.5;
-    double const y = -1.0;
-    double const outX = 1.0;
-    double const outY = 7.0;
+    double const x = -0.5, y = -1.0, outX = 1.0, outY = 7.0;
     // Both sides given: each as it is.
     KeyedStream both = MakeThree();
     both.Flag(1, KFS_KeyFlag_Continuous);
@@ -164,22 +161,18 @@ TEST_F(GraphTangentsTest, TangentsComeBackAsTheyWereSet)
         EXPECT_EQ((std::array<double, 4>{in[0], in[1], out[0], out[1]}), (std::array<double, 4>{inX, inY, outX, outY}));
         // At an end there is no segment and so no handle; single answers may be asked for.
         ASSERT_EQ(0, KFS_GetKeyTangentsF(stream, 0, &inX, &inY, nullptr, &outY));
-        EXPECT_EQ(0.0, inX);
-        EXPECT_EQ(0.0, inY);
-        EXPECT_EQ(2.0 * 0.5 * 1.0, outY);
+        EXPECT_EQ((std::array{0.0, 0.0, 2.0 * 0.5 * 1.0}), (std::array{inX, inY, outY}));
     }
 }
 
 TEST_F(GraphTangentsTest, EachComponentHasItsOwnTangent)
 {
-    StreamOptions options;
-    options.dimension = 3;
-    KeyedStream stream = MakeKeyed({{0, 0.0}, {600, 10.0}, {1800, 40.0}}, S, options);
+    KeyedStream stream = MakeKeyed({{0, 0.0}, {600, 10.0}, {1800, 40.0}}, S, {.dimension = 3});
     double const inX[] = {-0.5, -0.25, 1.0};
     double const inY[] = {1.0, 2.0, 3.0};
     ASSERT_EQ(0, KFS_SetKeyTangentsF(stream, 1, inX, inY, nullptr, nullptr, 1.0));
-    EXPECT_EQ((std::array{-2.0, -8.0, 0.0}), (std::array{stream.GetHandle(1, 0).inSpeed, stream.GetHandle(1, 1).inSpeed,
-                                                         stream.GetHandle(1, 2).inSpeed}));
+    for (int i = 0; i < 3; ++i)
+        EXPECT_EQ((std::array{-2.0, -8.0, 0.0}[static_cast<std::size_t>(i)]), stream.GetHandle(1, i).inSpeed);
     double x[3] = {};
     double y[3] = {};
     ASSERT_EQ(0, KFS_GetKeyTangentsF(stream, 1, x, y, nullptr, nullptr));

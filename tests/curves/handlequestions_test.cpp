@@ -68,9 +68,7 @@ TEST_F(HandleQuestionsTest, ProposedHandlesStayBetweenTheValues)
 
 TEST_F(HandleQuestionsTest, ClampingIsPerComponentAndOnlyEverSetsItsFlag)
 {
-    StreamOptions options;
-    options.dimension = 2;
-    KeyedStream stream = MakeKeyed({{0, 0.0}, {600, 10.0}}, S, options);
+    KeyedStream stream = MakeKeyed({{0, 0.0}, {600, 10.0}}, S, {.dimension = 2});
     double speeds[] = {5.0, 50.0};
     double influences[] = {0.5, 1.0};
     unsigned char clamped = 0;
@@ -117,11 +115,9 @@ Turn const Turns[] = {
 
 TEST_F(HandleQuestionsTest, FindsWhereAComponentTurns)
 {
-    StreamOptions options;
-    options.dimension = 2;
     for (Turn const& c : Turns) {
         SCOPED_TRACE(c.why);
-        KeyedStream stream = MakeKeyed({{600, 5.0}, {1800, 5.0}}, L, options);
+        KeyedStream stream = MakeKeyed({{600, 5.0}, {1800, 5.0}}, L, {.dimension = 2});
         stream.Codes(0, L, c.out).Codes(1, c.in, L).SetHandle(0, c.first, 1).SetHandle(1, c.second, 1);
         int count = 99;
         T_Time times[2] = {{-1, 1}, {-1, 1}};

@@ -5,9 +5,9 @@
 #include "tests/support/streams.h"
 
 #include <algorithm>
-#include <optional>
 #include <random>
 #include <string>
+#include <tuple>
 #include <vector>
 
 // The handles of one component, or of a spatial key.
@@ -16,6 +16,7 @@ struct Handle {
     double inInfluence = 0.0;
     double outSpeed = 0.0;
     double outInfluence = 0.0;
+    bool operator==(Handle const&) const = default;
 };
 
 // A stream whose derived data is settled, so that a test can write records as it needs them and nothing recomputes
@@ -61,10 +62,9 @@ public:
     KeyedStream& SetHandle(int index, Handle const& handle, int component = 0)
     {
         if (get()->IsSpatial()) {
-            Record(index)->inSpeed = handle.inSpeed;
-            Record(index)->inInfluence = handle.inInfluence;
-            Record(index)->outSpeed = handle.outSpeed;
-            Record(index)->outInfluence = handle.outInfluence;
+            KFS_KeyScalar* const key = Record(index);
+            std::tie(key->inSpeed, key->inInfluence, key->outSpeed, key->outInfluence) =
+                std::tie(handle.inSpeed, handle.inInfluence, handle.outSpeed, handle.outInfluence);
             return *this;
         }
         KFSp_TemporalRuns<double> const runs = KFSp_GetTemporalRuns(Record(index), get()->GetDimension());
@@ -86,9 +86,8 @@ public:
 
     int Index(KFS_KeyScalar const* key) const
     {
-        for (int i = 0; i < Count(); ++i) {
+        for (int i = 0; i < Count(); ++i)
             if (Record(i) == key) return i;
-        }
         return key ? -2 : -1;  // -1: no key
     }
 };
@@ -98,9 +97,8 @@ inline KeyedStream MakeKeyed(std::vector<std::pair<int, double>> const& keys, ch
                              StreamOptions const& options = {})
 {
     KeyedStream stream(options);
-    for (auto const& [time, value] : keys) {
+    for (auto const& [time, value] : keys)
         stream.Key(time, std::vector<double>(static_cast<std::size_t>(options.dimension), value), interp);
-    }
     stream.Settle();
     return stream;
 }

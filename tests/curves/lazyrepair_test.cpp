@@ -178,18 +178,11 @@ void ExpectSame(KeyedStream const& expected, KeyedStream const& actual)
         SCOPED_TRACE(testing::Message() << "key " << i << " of " << last + 1);
         KFS_KeyScalar const* const a = expected.Record(i);
         KFS_KeyScalar const* const b = actual.Record(i);
-        EXPECT_EQ(a->inInterp, b->inInterp);
-        EXPECT_EQ(a->outInterp, b->outInterp);
-        EXPECT_EQ(a->flags, b->flags);
+        EXPECT_EQ(std::tie(a->inInterp, a->outInterp, a->flags), std::tie(b->inInterp, b->outInterp, b->flags));
         ASSERT_EQ(expected.Numbers(i), actual.Numbers(i));
         if (!expected->IsSpatial()) continue;
         EXPECT_EQ(a->spFlags, b->spFlags);
-        Handle const handle = expected.GetHandle(i);
-        Handle const other = actual.GetHandle(i);
-        EXPECT_EQ(handle.inSpeed, other.inSpeed);
-        EXPECT_EQ(handle.inInfluence, other.inInfluence);
-        EXPECT_EQ(handle.outSpeed, other.outSpeed);
-        EXPECT_EQ(handle.outInfluence, other.outInfluence);
+        EXPECT_EQ(expected.GetHandle(i), actual.GetHandle(i));
         EXPECT_TRUE(i == last || a->arcLength == b->arcLength);  // nothing begins at the last key
     }
     for (int time = -50; time < 5100; time += 37) ASSERT_EQ(expected.At(time), actual.At(time)) << "at " << time;
@@ -217,45 +210,28 @@ TEST_F(LazyRepair, EqualsComputingEverything)
     }
 }
 
-TEST_F(LazyRepair, DoesNotDependOnWhenItHappens)
+TEST_F(LazyRepair, DoesNotDependOnWhenItHappensAndIsNotSeenByReads)
 {
     for (Script const& script : kScripts) {
         if (script.floats) continue;  // a stale float key stands at another time, so later edits meet another list
         for (unsigned int seed = 100; seed < 120; ++seed) {
+            SCOPED_TRACE(testing::Message() << script.why << ", seed " << seed);
             Editor eager(script, seed, true);
             Editor lazy(script, seed, true);
             for (int step = 0; step < 60; ++step) {
                 eager.Edit();
                 lazy.Edit();
-                ASSERT_EQ(0, eager.Stream()->UpdateStream());
+                ASSERT_EQ(0, seed % 2 == 0 ? eager.Stream()->UpdateStream() : 0);
+                int const time = (step * 977) % 5000;
+                Vector const once = eager.Stream().At(time);
+                eager.Stream().At(4999 - time);
+                EXPECT_EQ(once, eager.Stream().At(time)) << "step " << step;
             }
+            ASSERT_EQ(0, eager.Stream()->UpdateStream());
             ASSERT_EQ(0, lazy.Stream()->UpdateStream());
-            SCOPED_TRACE(testing::Message() << script.why << ", seed " << seed);
             ExpectSame(eager.Stream(), lazy.Stream());
             if (HasFailure()) return;
         }
-    }
-}
-
-TEST_F(LazyRepair, IsNotSeenByReads)
-{
-    for (Script const& script : kScripts) {
-        if (script.floats) continue;
-        Editor reading(script, 7, true);
-        Editor blind(script, 7, true);
-        for (int step = 0; step < 100; ++step) {
-            reading.Edit();
-            blind.Edit();
-            int const time = (step * 977) % 5000;
-            Vector const once = reading.Stream().At(time);
-            EXPECT_EQ(once, reading.Stream().At(time));
-            reading.Stream().At(4999 - time);
-            EXPECT_EQ(once, reading.Stream().At(time)) << script.why << ", step " << step;
-        }
-        ASSERT_EQ(0, blind.Stream()->UpdateStream());
-        ASSERT_EQ(0, reading.Stream()->UpdateStream());
-        SCOPED_TRACE(script.why);
-        ExpectSame(reading.Stream(), blind.Stream());
     }
 }
 

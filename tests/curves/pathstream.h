@@ -11,11 +11,8 @@ using Vector = std::vector<double>;
 // A spatial stream: dimension 2 or 3 is parametrised by arc length; `automatic` asks for automatic tangents.
 inline StreamOptions PathOptions(short dimension = 2, bool automatic = true)
 {
-    StreamOptions options;
-    options.dimension = dimension;
-    options.spatial = true;
-    options.spInterpMask = automatic ? KFS_InterpMask_Negative : 0;
-    return options;
+    unsigned short const spInterpMask = automatic ? KFS_InterpMask_Negative : 0;
+    return {.dimension = dimension, .spatial = true, .spInterpMask = spInterpMask};
 }
 
 // A stream whose keys stand on a path, up to date.
@@ -30,9 +27,7 @@ public:
                         StreamOptions const& options = PathOptions())
         : KeyedStream(options)
     {
-        for (Stop const& stop : stops) {
-            Key(stop.time, stop.place, interp);
-        }
+        for (Stop const& stop : stops) Key(stop.time, stop.place, interp);
         EXPECT_EQ(0, get()->UpdateStream());
     }
 
@@ -46,9 +41,7 @@ public:
     PathStream& Straighten()
     {
         Vector const zero(static_cast<std::size_t>(get()->GetDimension()), 0.0);
-        for (int i = 0; i < Count(); ++i) {
-            Tangents(i, zero, zero);
-        }
+        for (int i = 0; i < Count(); ++i) Tangents(i, zero, zero);
         EXPECT_EQ(0, get()->UpdateStream());
         return *this;
     }
@@ -56,9 +49,7 @@ public:
     // Lets the update pass bend the path through the keys; a new key's tangents aren't automatic by themselves.
     PathStream& Bend()
     {
-        for (int i = 0; i < Count(); ++i) {
-            EXPECT_EQ(0, KFS_SetKeySpModifiable(get(), 1, i));
-        }
+        for (int i = 0; i < Count(); ++i) EXPECT_EQ(0, KFS_SetKeySpModifiable(get(), 1, i));
         EXPECT_EQ(0, get()->UpdateStream());
         return *this;
     }
@@ -68,9 +59,7 @@ public:
     std::vector<double> Arcs() const
     {
         std::vector<double> arcs;
-        for (int i = 0; i < Count(); ++i) {
-            arcs.push_back(Arc(i));
-        }
+        for (int i = 0; i < Count(); ++i) arcs.push_back(Arc(i));
         return arcs;
     }
 };
@@ -78,8 +67,6 @@ public:
 inline double Distance(Vector const& a, Vector const& b)
 {
     double sum = 0.0;
-    for (std::size_t i = 0; i < a.size(); ++i) {
-        sum += (a[i] - b[i]) * (a[i] - b[i]);
-    }
+    for (std::size_t i = 0; i < a.size(); ++i) sum += (a[i] - b[i]) * (a[i] - b[i]);
     return std::sqrt(sum);
 }

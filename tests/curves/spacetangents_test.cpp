@@ -71,28 +71,19 @@ TEST_F(SpaceTangents, AreStoredAndKeptInLine)
 
 TEST_F(SpaceTangents, AreConvertedFromTheExternalType)
 {
-    StreamOptions options = PathOptions();
-    options.type = KFS_Type_S16;
-    PathStream stream({{0, {0, 0}}, {100, {5, 5}}}, KFS_Interp_Linear, options);
+    PathStream stream({{0, {0, 0}}, {100, {5, 5}}}, KFS_Interp_Linear,
+                      {.dimension = 2, .spatial = true, .type = KFS_Type_S16});
     stream.Record(0)->spFlags = 0;
     short const given[2] = {-7, 300};
     ASSERT_EQ(0, KFS_SetKeySpaceTangents(stream, 0, 0, nullptr, given));
     double const exact[2] = {0.25, -0.75};
     ASSERT_EQ(0, KFS_SetKeySpaceTangentsF(stream, 0, 0, exact, nullptr));
-    double in[2];
-    double out[2];
-    ASSERT_EQ(0, KFS_GetKeySpaceTangentsF(stream, 0, 0, in, out));
-    EXPECT_EQ(-7.0, out[0]);
-    EXPECT_EQ(300.0, out[1]);
-    EXPECT_EQ(0.25, in[0]);
-    EXPECT_EQ(-0.75, in[1]);
+    Vector in(2), out(2);
+    ASSERT_EQ(0, KFS_GetKeySpaceTangentsF(stream, 0, 0, in.data(), out.data()));
+    EXPECT_EQ((Vector{-7, 300}), out);
+    EXPECT_EQ((Vector{0.25, -0.75}), in);
     EXPECT_EQ(KFS_Type_S16, stream->GetValueDesc()->dataType & 0xFF);
     EXPECT_EQ(nullptr, stream->GetCopyItemFunc());
-}
-
-int FailingCopy(KFS_Stream const*, long, short, void const*, void*)
-{
-    return 4711;
 }
 
 TEST_F(SpaceTangents, CountAsEditedWhenTheCopyFails)
@@ -100,7 +91,7 @@ TEST_F(SpaceTangents, CountAsEditedWhenTheCopyFails)
     PathStream stream({{0, {0, 0}}, {100, {5, 5}}, {200, {9, 0}}});
     stream.Flag(1, KFS_KeyFlag_TangentsSet, false);
     stream.Record(1)->spFlags = KFS_KeySpFlag_Modifiable;
-    stream->SetCopyItemFunc(FailingCopy);
+    stream->SetCopyItemFunc([](KFS_Stream const*, long, short, void const*, void*) { return 4711; });
     double const given[2] = {1, 2};
     EXPECT_EQ(4711, KFS_SetKeySpaceTangents(stream, 1, 0, given, given));
     stream->SetCopyItemFunc(nullptr);
@@ -112,16 +103,13 @@ TEST_F(SpaceTangents, CountAsEditedWhenTheCopyFails)
 
 TEST_F(SpaceTangents, OfAConstantAreThoseOfItsValue)
 {
-    StreamOptions options = PathOptions();
-    options.noKeys = true;
-    TestStream stream(options);
+    TestStream stream({.dimension = 2, .noKeys = true, .spatial = true});
     stream.Key(0, {3, 4});
     double const given[2] = {1, 2};
     ASSERT_EQ(0, KFS_SetKeySpaceTangentsF(stream, std::numeric_limits<int>::max(), 0, nullptr, given));
-    double out[2];
-    ASSERT_EQ(0, KFS_GetKeySpaceTangentsF(stream, -5, 0, nullptr, out));
-    EXPECT_EQ(1.0, out[0]);
-    EXPECT_EQ(2.0, out[1]);
+    Vector out(2);
+    ASSERT_EQ(0, KFS_GetKeySpaceTangentsF(stream, -5, 0, nullptr, out.data()));
+    EXPECT_EQ((Vector{1, 2}), out);
     EXPECT_EQ((Vector{3, 4}), stream.At(0));
 }
 
@@ -150,6 +138,14 @@ TEST_F(SpaceTangents, RefuseWhatHasNone)
         EXPECT_EQ(0, stream.Pins());
     }
 
+    stream->GetValueDescForModify()->isCustom = 1;
+    std::vector<unsigned char> const before = stream.Bytes();
+    EXPECT_EQ(KFS_Err_CustomValue, KFS_SetKeySpaceTangents(stream, 0, 0, tangent, tangent));
+    EXPECT_EQ(KFS_Err_CustomValue, KFS_GetKeySpaceTangentsF(stream, 0, 0, tangent, tangent));
+    EXPECT_EQ(2U, reports.Take().size());
+    EXPECT_EQ(before, stream.Bytes());
+    stream->GetValueDescForModify()->isCustom = 0;
+
     DamagedStream damaged;
     EXPECT_EQ(2, KFS_SetKeySpaceTangents(damaged.get(), 0, 0, tangent, tangent));
     EXPECT_EQ(2, KFS_SetKeySpaceTangentsF(damaged.get(), 0, 0, tangent, tangent));
@@ -157,20 +153,6 @@ TEST_F(SpaceTangents, RefuseWhatHasNone)
     EXPECT_EQ((std::vector<Reported>{DamagedReport(31, "alter a key value in"),
                                      DamagedReport(90, "alter a key value in"), DamagedReport(32, "get a value from")}),
               reports.Take());
-}
-
-TEST_F(SpaceTangents, RefuseCustomStreams)
-{
-    StreamOptions options = PathOptions();
-    PathStream stream({{0, {0, 0}}, {100, {5, 5}}}, KFS_Interp_Linear, options);
-    stream->GetValueDescForModify()->isCustom = 1;
-    std::vector<unsigned char> const before = stream.Bytes();
-    double tangent[2] = {1, 1};
-    EXPECT_EQ(KFS_Err_CustomValue, KFS_SetKeySpaceTangents(stream, 0, 0, tangent, tangent));
-    EXPECT_EQ(KFS_Err_CustomValue, KFS_GetKeySpaceTangentsF(stream, 0, 0, tangent, tangent));
-    EXPECT_EQ(2U, reports.Take().size());
-    EXPECT_EQ(before, stream.Bytes());
-    stream->GetValueDescForModify()->isCustom = 0;
 }
 
 // Which arcs a change of the flags makes stale: those around key 2, or none.
@@ -223,9 +205,7 @@ TEST_F(SpatialFlags, ShortFormsMarkOnlyWhatBecomesAutomatic)
 
 TEST_F(SpatialFlags, OfAConstantAreReadAsItsKeyFlags)
 {
-    StreamOptions options = PathOptions();
-    options.noKeys = true;
-    TestStream stream(options);
+    TestStream stream({.dimension = 2, .noKeys = true, .spatial = true});
     stream.Key(0, {3, 4});
     ASSERT_EQ(0, KFS_SetKeySpFlags(stream, 5, 3, 2));
     EXPECT_EQ(2U, stream->GetCache()->spFlags);
@@ -236,20 +216,16 @@ TEST_F(SpatialFlags, OfAConstantAreReadAsItsKeyFlags)
     EXPECT_NE(2U, flags);
 }
 
-TEST_F(SpatialFlags, OfABadIndexAreTheMarksResult)
+TEST_F(SpatialFlags, OfABadIndexAreTheMarksResultAndARecordWithoutThemStays)
 {
     PathStream stream({{0, {0, 0}}, {100, {1, 1}}});
     EXPECT_EQ(0, KFS_SetKeySpFlags(stream, 9, KFS_KeySpFlag_Modifiable, 0));
     EXPECT_EQ(SEQ_Err_BadIndex, KFS_SetKeySpFlags(stream, 9, KFS_KeySpFlag_Continuous, 0));
     EXPECT_EQ(SEQ_Err_BadIndex, KFSp_SetKeySpaceFlags(stream, 1, 9));
     unsigned int flags = 0;
-    EXPECT_EQ(SEQ_Err_BadIndex, KFS_GetKeySpFlags(stream, 9, &flags));
-    EXPECT_EQ(SEQ_Err_BadIndex, KFS_GetKeySpFlags(stream, -1, &flags));
+    for (int const index : {9, -1}) EXPECT_EQ(SEQ_Err_BadIndex, KFS_GetKeySpFlags(stream, index, &flags));
     EXPECT_EQ(0, stream.Pins());
-}
 
-TEST_F(SpatialFlags, LeaveARecordWithoutThemAlone)
-{
     KeyedStream plain = MakeKeyed({{0, 1}, {100, 2}}, KFS_Interp_Linear);
     std::vector<unsigned char> const before = plain.Bytes();
     EXPECT_EQ(0, KFSp_SetKeySpaceFlags(plain, 3, 0));

@@ -50,9 +50,8 @@ public:
                 {from.value[i], from.value[i] + from.outTangent[i], to.value[i] + to.inTangent[i], to.value[i]});
         }
         lengths_.push_back(0.0);
-        for (int i = 1; i <= Steps; ++i) {
+        for (int i = 1; i <= Steps; ++i)
             lengths_.push_back(lengths_.back() + Distance(At((i - 1.0) / Steps), At(static_cast<double>(i) / Steps)));
-        }
     }
 
     double Length() const { return lengths_.back(); }
@@ -95,52 +94,34 @@ PathStream RandomPath(std::mt19937& random, short dimension, int count, char int
     return stream;
 }
 
+// In equal steps where both sides are linear.
 TEST_F(InterpolateSpatial, FollowsThePathByTheSpeedGraph)
 {
     std::mt19937 random(20240511);
     std::uniform_real_distribution<double> influence(0.05, 0.95);
     std::uniform_real_distribution<double> speed(0.0, 60.0);
-    for (int round = 0; round < 12; ++round) {
+    for (int round = 0; round < 24; ++round) {
         SCOPED_TRACE(round);
         short const dimension = round % 2 == 0 ? 2 : 3;
-        PathStream stream = RandomPath(random, dimension, 3, KFS_Interp_Spline);
+        bool const linear = round % 4 < 2;
+        PathStream stream = RandomPath(random, dimension, 4, linear ? KFS_Interp_Linear : KFS_Interp_Spline);
         stream->SetAccuracy(1e-6);
         ASSERT_EQ(0, KFS_ForceUpdateStream(stream));
         stream.Settle();
-        stream.SetHandle(0, {0, 0, speed(random), influence(random)});
-        stream.SetHandle(1, {speed(random), influence(random), 0, 0});
-
-        SlowPath const path(stream.Record(0), stream.Record(1), dimension);
-        EXPECT_NEAR(path.Length(), stream.Arc(0), 1e-3);
-        KFSp_SegmentCurve graph(2);
-        KFSp_FillSpeedGraph(stream.Record(0), stream.Record(1), stream.Arc(0), 1.0, graph.curve);
-        ASSERT_EQ(0, CRV_CurveSetNonDecreasing(&graph.curve, nullptr));
-        long double const x[4] = {graph.p0[0], graph.p1[0], graph.p2[0], graph.p3[0]};
-        long double const y[4] = {graph.p0[1], graph.p1[1], graph.p2[1], graph.p3[1]};
-        for (int time = 7; time < 600; time += 31) {
-            double const s = static_cast<double>(CubicAt(y, SolveCubic(x, time / 600.0L)));
-            EXPECT_LT(Distance(path.AtLength(s), stream.At(time)), 0.02) << "at " << time;
-        }
-    }
-}
-
-TEST_F(InterpolateSpatial, MovesInEqualStepsAtConstantSpeed)
-{
-    std::mt19937 random(77);
-    for (short const dimension : {2, 3}) {
-        for (int round = 0; round < 10; ++round) {
-            PathStream stream = RandomPath(random, dimension, 4, KFS_Interp_Linear);
-            stream->SetAccuracy(1e-8);
-            ASSERT_EQ(0, KFS_ForceUpdateStream(stream));
-            for (int segment = 0; segment < 3; ++segment) {
-                SCOPED_TRACE(testing::Message()
-                             << "dimension " << dimension << ", round " << round << ", segment " << segment);
-                SlowPath const path(stream.Record(segment), stream.Record(segment + 1), dimension);
-                int const steps = 50;
-                for (int i = 1; i < steps; ++i) {
-                    Vector const expected = path.AtLength(path.Length() * i / steps);
-                    EXPECT_LT(Distance(expected, stream.At(600 * segment + 600 * i / steps)), 1e-3 * path.Length());
-                }
+        for (int k = 0; k < 4; ++k)
+            stream.SetHandle(k, {speed(random), influence(random), speed(random), influence(random)});
+        for (int k = 0; k < 3; ++k) {
+            SlowPath const path(stream.Record(k), stream.Record(k + 1), dimension);
+            EXPECT_NEAR(path.Length(), stream.Arc(k), 1e-3);
+            KFSp_SegmentCurve graph(2);
+            KFSp_FillSpeedGraph(stream.Record(k), stream.Record(k + 1), stream.Arc(k), 1.0, graph.curve);
+            ASSERT_EQ(0, CRV_CurveSetNonDecreasing(&graph.curve, nullptr));
+            long double const x[4] = {graph.p0[0], graph.p1[0], graph.p2[0], graph.p3[0]};
+            long double const y[4] = {graph.p0[1], graph.p1[1], graph.p2[1], graph.p3[1]};
+            for (int time = 7; time < 600; time += 31) {
+                double const s = static_cast<double>(CubicAt(y, SolveCubic(x, time / 600.0L)));
+                Vector const expected = path.AtLength(linear ? path.Length() * time / 600 : s);
+                EXPECT_LT(Distance(expected, stream.At(600 * k + time)), 0.02) << "segment " << k << " at " << time;
             }
         }
     }
@@ -150,15 +131,12 @@ TEST_F(InterpolateSpatial, AnswersTheSameWhateverTheHint)
 {
     std::mt19937 random(5);
     PathStream stream = RandomPath(random, 2, 9, KFS_Interp_Spline);
-    for (int const index : {2, 3, 6}) {
-        ASSERT_EQ(0, KFS_SetKeyFloat(stream, 1, index));
-    }
+    for (int const index : {2, 3, 6}) ASSERT_EQ(0, KFS_SetKeyFloat(stream, 1, index));
     ASSERT_EQ(0, stream->UpdateStream());
     for (int time = 3; time < 4800; time += 41) {
         Vector const expected = Interpolate(stream, time);
-        for (int hint = -1; hint <= 9; ++hint) {
-            EXPECT_EQ(expected, Interpolate(stream, time, hint)) << "at " << time << " with hint " << hint;
-        }
+        for (int hint = -1; hint <= 9; ++hint)
+            EXPECT_EQ(expected, Interpolate(stream, time, hint)) << time << " " << hint;
     }
 }
 
@@ -203,39 +181,25 @@ TEST_F(InterpolateSpatial, NeverMovesBackwards)
 }
 
 // Where the parameter is left depends on how the point was found.
-struct ParameterCase {
-    const char* why;
-    short dimension;
-    bool automatic, sParametrized;
-    int place;
-};
-
-const ParameterCase kParameterCases[] = {
-    {"a point of the path in the plane", 2, true, true, 2},
-    {"a point of the path in space", 3, true, true, 3},
-    {"a point of the path without arc lengths", 2, true, false, 2},
-    {"the straight line in the plane", 2, false, true, 4},
-    {"the straight line in space", 3, false, true, 6},
-    {"the straight line without arc lengths", 3, false, false, 6},
-};
-
 TEST_F(InterpolateSpatial, LeavesTheParameterBehindTheResult)
 {
-    for (ParameterCase const& c : kParameterCases) {
-        SCOPED_TRACE(c.why);
-        Vector const from(static_cast<std::size_t>(c.dimension), 0.0);
-        Vector const to(static_cast<std::size_t>(c.dimension), 30.0);
-        PathStream stream({{0, from}, {100, to}}, KFS_Interp_Linear, PathOptions(c.dimension, c.automatic));
-        stream.StreamFlag(KFS_StreamFlag_SParametrize, c.sParametrized);
+    for (int form = 0; form < 8; ++form) {
+        bool const automatic = form & 1;  // a point of the path, else of the straight line
+        bool const sParametrized = form & 2;
+        short const dimension = form & 4 ? 3 : 2;
+        SCOPED_TRACE(form);
+        Vector const from(static_cast<std::size_t>(dimension), 0.0);
+        Vector const to(static_cast<std::size_t>(dimension), 30.0);
+        PathStream stream({{0, from}, {100, to}}, KFS_Interp_Linear, PathOptions(dimension, automatic));
+        stream.StreamFlag(KFS_StreamFlag_SParametrize, sParametrized);
         ASSERT_EQ(0, KFS_ForceUpdateStream(stream));
-        std::fill_n(KFSp_Numbers(stream->GetCache()), 3 * c.dimension, -9.0);
-        double const t = ParameterAt(stream, 25, c.place);
-        EXPECT_GT(t, 0.1);
-        EXPECT_LT(t, 0.35);
+        std::fill_n(KFSp_Numbers(stream->GetCache()), 3 * dimension, -9.0);
+        int const place = automatic ? dimension : 2 * dimension;
+        double const t = ParameterAt(stream, 25, place);
+        EXPECT_TRUE(t > 0.1 && t < 0.35) << t;
         Vector const numbers = CacheNumbers(stream);
-        for (int i = c.dimension; i < 3 * c.dimension; ++i) {
-            EXPECT_EQ(i == c.place ? t : -9.0, numbers[static_cast<std::size_t>(i)]) << "number " << i;
-        }
+        for (int i = dimension; i < 3 * dimension; ++i)
+            EXPECT_EQ(i == place ? t : -9.0, numbers[static_cast<std::size_t>(i)]) << "number " << i;
     }
 }
 
@@ -256,8 +220,14 @@ TEST_F(InterpolateSpatial, GoesStraightInAnyDimensionWithoutCurves)
     }
 }
 
-TEST_F(InterpolateSpatial, RefusesCurvesInOtherDimensions)
+TEST_F(InterpolateSpatial, RefusesCodesWithoutAShapeAndCurvesInOtherDimensions)
 {
+    PathStream shapeless({{0, {0, 0}}, {100, {10, 0}}});
+    shapeless.Bend().Codes(0, KFS_Interp_Linear, -2);
+    EXPECT_EQ(KFS_Err_InterpNotAllowed, KFSp_InterpolateSpatial(shapeless, 0, 50, 0));  // not reported
+    EXPECT_EQ(0, KFSp_InterpTangentSpatial(shapeless, 0, 50, 0));
+    EXPECT_NEAR(10 * KFSp_OneSixth, CacheNumbers(shapeless)[0], 1e-9);  // stands at the first anchor
+
     std::string const text = "only 2d or 3d spatial streams are allowed for this operation.";
     for (short const dimension : {1, 4}) {
         auto const size = static_cast<std::size_t>(dimension);
@@ -273,15 +243,6 @@ TEST_F(InterpolateSpatial, RefusesCurvesInOtherDimensions)
             EXPECT_EQ(automatic ? 0U : 2U, reports.Take().size());
         }
     }
-}
-
-TEST_F(InterpolateSpatial, RefusesCodesWithoutAShapeSilently)
-{
-    PathStream stream({{0, {0, 0}}, {100, {10, 0}}});
-    stream.Bend().Codes(0, KFS_Interp_Linear, -2);
-    EXPECT_EQ(KFS_Err_InterpNotAllowed, KFSp_InterpolateSpatial(stream, 0, 50, 0));
-    EXPECT_EQ(0, KFSp_InterpTangentSpatial(stream, 0, 50, 0));
-    EXPECT_NEAR(10 * KFSp_OneSixth, CacheNumbers(stream)[0], 1e-9);  // stands at the first anchor
 }
 
 // Anchors at 0 and 1000, float keys in between, all on a straight line, so that a distance is an abscissa.
@@ -301,15 +262,10 @@ TEST_F(InterpolateSpatial, WalksOverFloatKeysToThePieceOfThePath)
     PathStream stream = FloatingLine(true);
     ASSERT_EQ((std::vector<int>{0, 100, 400, 1000}), stream.Times());
     // A table whose parameter runs evenly tells the piece by its fraction.
-    struct Walk {
-        int time;
-        double x, onPiece;
-    };
-    for (Walk const& walk : {Walk{50, 5, 0.5}, Walk{250, 25, 0.5}, Walk{550, 55, 0.25}, Walk{999, 99.9, 59.9 / 60}}) {
-        EXPECT_NEAR(walk.x, Interpolate(stream, walk.time)[0], 1e-2) << "at " << walk.time;
+    for (auto const& [time, onPiece] : {std::pair{50, 0.5L}, {250, 0.5L}, {550, 0.25L}, {999, 59.9L / 60}}) {
+        EXPECT_NEAR(time / 10.0, Interpolate(stream, time)[0], 1e-2) << "at " << time;
         long double const p[4] = {0, 0, 1, 1};  // a piece without tangents
-        double const expected = static_cast<double>(SolveCubic(p, static_cast<long double>(walk.onPiece)));
-        EXPECT_NEAR(expected, ParameterAt(stream, walk.time, 2), 2e-3) << "at " << walk.time;
+        EXPECT_NEAR(static_cast<double>(SolveCubic(p, onPiece)), ParameterAt(stream, time, 2), 2e-3) << "at " << time;
     }
     // A distance exactly at a float key belongs to the piece before it: its end, not the next one's start.
     EXPECT_EQ(1.0, ParameterAt(stream, 100, 2));
@@ -427,39 +383,29 @@ TEST_F(PathDirection, IsATangentOfThePath)
 
 TEST_F(PathDirection, IsThePositionWhereThereIsNoPath)
 {
-    struct Form {
-        short dimension;
-        bool automatic, direction;
-    };
-    for (Form const& form : {Form{2, true, true}, Form{2, false, false}, Form{3, true, false}, Form{5, false, false}}) {
-        auto const size = static_cast<std::size_t>(form.dimension);
+    for (auto const& [size, automatic] : {std::pair{2U, true}, {2U, false}, {3U, true}, {5U, false}}) {
         PathStream stream({{0, Vector(size, 10.0)}, {100, Vector(size, 40.0)}}, KFS_Interp_Linear,
-                          PathOptions(form.dimension, false));
+                          PathOptions(static_cast<short>(size), false));
         stream.StreamFlag(KFS_StreamFlag_SParametrize, false);
-        if (form.automatic) stream->SetSpInterp(KFS_SpInterp_Auto);
+        if (automatic) stream->SetSpInterp(KFS_SpInterp_Auto);
         ASSERT_EQ(0, KFS_ForceUpdateStream(stream));
         ASSERT_EQ(0, KFSp_InterpTangentSpatial(stream, 0, 50, 0));
         Vector const numbers = CacheNumbers(stream);
-        if (form.direction) {
-            EXPECT_LT(numbers[0], 20.0);
-            EXPECT_NEAR(0.5, numbers[size], 1e-12);
-        } else {
-            EXPECT_NEAR(25.0, numbers[0], 1e-9);
-            EXPECT_NEAR(0.5, numbers[2 * size], 1e-12);
-        }
+        bool const direction = automatic && size == 2;
+        EXPECT_TRUE(direction ? numbers[0] < 20.0 : std::fabs(numbers[0] - 25.0) <= 1e-9) << numbers[0];
+        EXPECT_NEAR(0.5, numbers[direction ? size : 2 * size], 1e-12);
     }
 }
 
 struct Covered {
-    int code;
-    double t;
+    int code = 0;
+    double t = -1.0;
 };
 
 Covered Ask(PathStream const& stream, int time, int index = 0)
 {
-    KFS_KeyScalar* first = nullptr;
-    KFS_KeyScalar* second = nullptr;
-    Covered covered{0, -1.0};
+    KFS_KeyScalar *first = nullptr, *second = nullptr;
+    Covered covered;
     covered.code = KFS_CalculateTFromStream(stream, 0, time, index, &first, &second, &covered.t);
     if (covered.code == 0) {
         EXPECT_EQ(stream.Record(index), first);
@@ -479,6 +425,9 @@ TEST_F(CalculateT, IsTheFractionOfTheArc)
     stream.Codes(0, 1, -1);
     EXPECT_EQ(KFS_Err_InterpNotAllowed, Ask(stream, 70).code);
     EXPECT_EQ(SEQ_Err_BadIndex, Ask(stream, 70, 2).code);
+    PathStream resting({{0, {5, 5}}, {100, {5, 5}}});
+    resting.Straighten();
+    EXPECT_FALSE(std::isfinite(Ask(resting, 50).t)) << "divided by an arc of no length";
 }
 
 TEST_F(CalculateT, RepairsAStaleArcFirst)
@@ -510,15 +459,6 @@ TEST_F(CalculateT, HoldsHandlesInsideTheBoxByShorteningThem)
     long double const freeX[4] = {0, 0.5L, 1 - KFSp_OneSixth, 1};
     long double const freeY[4] = {0, 2, 1 - KFSp_OneSixth, 1};
     EXPECT_NEAR(static_cast<double>(CubicAt(freeY, SolveCubic(freeX, 0.6L))), Ask(stream, 360).t, 1e-9);
-}
-
-TEST_F(CalculateT, DividesByAnArcOfNoLength)
-{
-    PathStream stream({{0, {5, 5}}, {100, {5, 5}}});
-    stream.Straighten();
-    Covered const covered = Ask(stream, 50);
-    EXPECT_EQ(0, covered.code);
-    EXPECT_FALSE(std::isfinite(covered.t));
 }
 
 }  // namespace

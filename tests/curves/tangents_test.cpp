@@ -3,8 +3,9 @@
 #include "curves/spacetangents.h"
 #include "curves/update.h"
 #include "tests/curves/threekeys.h"
-#include "tree/listener.h"
+#include "tests/support/listening.h"
 
+#include <algorithm>
 #include <cmath>
 #include <functional>
 #include <limits>
@@ -19,26 +20,23 @@ using TangentsTest = StreamTest;
 
 TEST_F(TangentsTest, InfluencesAreKeptBetweenNoneAndAll)
 {
-    struct Row {
-        double given, stored;
-    };
     for (bool const spatial : {false, true}) {
-        for (Row const& row : {Row{0.0, 0.0}, {0.3, 0.3}, {1.0, 1.0}, {1.5, 1.0}, {-0.1, 0.0}, {1e-9, 1e-9}}) {
+        for (double const given : {0.0, 0.3, 1.0, 1.5, -0.1, 1e-9}) {
+            double const stored = std::clamp(given, 0.0, 1.0);
             KeyedStream stream = MakeThree(spatial);
             stream.Flag(1, KFS_KeyFlag_Modifiable).Flag(1, KFS_KeyFlag_Continuous);
-            ASSERT_EQ(0, KFS_SetKeyInfluence(stream, 1, &row.given, nullptr));
-            EXPECT_EQ(row.stored, stream.GetHandle(1).inInfluence);
+            ASSERT_EQ(0, KFS_SetKeyInfluence(stream, 1, &given, nullptr));
+            EXPECT_EQ(stored, stream.GetHandle(1).inInfluence);
             EXPECT_EQ(0.5, stream.GetHandle(1).outInfluence) << "sides don't move together";
             EXPECT_FALSE(stream.Record(1)->flags & KFS_KeyFlag_Modifiable);
             EXPECT_EQ((spatial ? Range{0, 1} : TestStream::NotStale), stream.Stale());
-            ASSERT_EQ(0, KFS_SetKeyInfluence(stream, 1, nullptr, &row.given));
-            EXPECT_EQ(row.stored, stream.GetHandle(1).outInfluence);
+            ASSERT_EQ(0, KFS_SetKeyInfluence(stream, 1, nullptr, &given));
+            EXPECT_EQ(stored, stream.GetHandle(1).outInfluence);
             EXPECT_EQ((spatial ? Range{0, 2} : TestStream::NotStale), stream.Stale());
             double in = Unanswered;
             double out = Unanswered;
             ASSERT_EQ(0, KFS_GetKeyInfluence(stream, 1, &in, &out));
-            EXPECT_EQ(row.stored, in);
-            EXPECT_EQ(row.stored, out);
+            EXPECT_TRUE(in == stored && out == stored) << in << " and " << out;
         }
     }
 }
@@ -52,13 +50,11 @@ TEST_F(TangentsTest, OnlySplineSidesHaveAnInfluence)
             double in = 0.0;
             double out = 0.0;
             ASSERT_EQ(0, KFS_GetKeyInfluence(stream, 1, &in, &out));
-            EXPECT_EQ(0.16666666667, in);
-            EXPECT_EQ(0.5, out);
+            EXPECT_TRUE(in == 0.16666666667 && out == 0.5) << in << " and " << out;
             stream.Codes(1, S, code);
             ASSERT_EQ(0, KFS_GetKeyInfluence(stream, 1, nullptr, &out));
             EXPECT_EQ(0.16666666667, out);
-            EXPECT_EQ(0.25, stream.GetHandle(1).inInfluence);
-            EXPECT_EQ(0.5, stream.GetHandle(1).outInfluence);
+            EXPECT_EQ((Handle{3, 0.25, 2, 0.5}), stream.GetHandle(1));
         }
     }
 }
@@ -66,8 +62,7 @@ TEST_F(TangentsTest, OnlySplineSidesHaveAnInfluence)
 // A key that turns the user's keeps the numbers that nobody set: they must be those of the keys as they are now.
 TEST_F(TangentsTest, WhatAnAutomaticKeyKeepsIsUpToDate)
 {
-    KeyedStream stream;
-    stream.Key(0, {0.0}, S).Key(600, {10.0}, S).Key(1800, {40.0}, S);
+    KeyedStream stream = MakeThree();
     stream.Flag(1, KFS_KeyFlag_Modifiable);
     ASSERT_EQ(0, KFS_ForceUpdateStream(stream));
     EXPECT_DOUBLE_EQ(40.0 / 3.0, stream.GetHandle(1).outSpeed);
@@ -80,28 +75,6 @@ TEST_F(TangentsTest, WhatAnAutomaticKeyKeepsIsUpToDate)
 }
 
 // ---- the cache record
-
-// A value that was read once must not outlive the curve that it came from.
-TEST_F(TangentsTest, EverySetterDropsTheCachedValue)
-{
-    double const x = -0.9;
-    double const y = 5.0;
-    double const half = 0.9;
-    std::function<int(KFS_Stream*)> const setters[] = {
-        [&](KFS_Stream* stream) { return KFS_SetKeyTangentsF(stream, 1, &x, &y, nullptr, nullptr, 1.0); },
-        [&](KFS_Stream* stream) { return KFS_SetKeyVelocity(stream, 1, &y, nullptr); },
-        [&](KFS_Stream* stream) { return KFS_SetKeyVelocityF(stream, 1, &y, nullptr); },
-        [&](KFS_Stream* stream) { return KFS_SetKeyInfluence(stream, 1, &half, nullptr); },
-    };
-    for (auto const& set : setters) {
-        KeyedStream stream = MakeThree();
-        double const before = stream.At1(300);
-        EXPECT_FALSE(stream.CacheIsEmpty());
-        ASSERT_EQ(0, set(stream));
-        EXPECT_TRUE(stream.CacheIsEmpty());
-        EXPECT_GT(std::fabs(before - stream.At1(300)), 0.01);
-    }
-}
 
 TEST_F(TangentsTest, GettersMayUseTheCacheButNeverLeaveANumberInItAsAValue)
 {
@@ -182,9 +155,8 @@ TEST_F(TangentsTest, EveryDoorRefusesInItsOwnWords)
 
         KeyedStream const stream = MakeThree();
         std::vector<unsigned char> const before = stream.Bytes();
-        for (int const index : {3, 99, -1, -2, KFS_INVALID_INDEX, std::numeric_limits<int>::max()}) {
+        for (int const index : {3, 99, -1, -2, KFS_INVALID_INDEX, std::numeric_limits<int>::max()})
             EXPECT_EQ(SEQ_Err_BadIndex, door.call(stream, index)) << index;
-        }
         EXPECT_EQ(before, stream.Bytes());
         EXPECT_EQ(0, stream.Pins());
     }
@@ -193,23 +165,17 @@ TEST_F(TangentsTest, EveryDoorRefusesInItsOwnWords)
 TEST_F(TangentsTest, AConstantsRecordStandsInForTheKey)
 {
     for (bool const spatial : {false, true}) {
-        StreamOptions options;
-        options.noKeys = true;
-        options.spatial = spatial;
-        options.dimension = 2;
-        TestStream stream(options);
+        TestStream stream({.dimension = 2, .noKeys = true, .spatial = spatial});
         stream.Key(0, {4.0, 5.0}, S);
         double const number = 0.5;
         EXPECT_EQ(0, KFS_SetKeyTangentsF(stream, 0, &number, &number, &number, &number, 1.0));
         EXPECT_EQ(0, KFS_SetKeyInfluence(stream, 0, &number, &number));
         double const speeds[] = {1.0, 1.0};
         EXPECT_EQ(0, KFS_SetKeyVelocityF(stream, 0, speeds, speeds));
-        double x[2] = {9, 9}, y[2] = {9, 9}, outX[2] = {9, 9}, outY[2] = {9, 9};
+        double x[2] = {9, 9}, y[2] = {9, 9}, outX[2] = {9, 9}, outY[2] = {9, 9}, in[2] = {9, 9};
         EXPECT_EQ(0, KFS_GetKeyTangentsF(stream, 0, x, y, outX, outY));
-        EXPECT_EQ(0.0, std::fabs(x[0]) + std::fabs(y[0]) + std::fabs(outX[0]) + std::fabs(outY[0]));
-        double in[2] = {9, 9};
         EXPECT_EQ(0, KFS_GetKeyVelocityF(stream, 0, 1, in, nullptr));
-        EXPECT_EQ(0.0, in[0]);
+        for (double const* answer : {x, y, outX, outY, in}) EXPECT_EQ(0.0, answer[0]);
         EXPECT_EQ((std::vector<double>{4.0, 5.0}), stream.At(100));  // the value is where it was
     }
 }
@@ -221,16 +187,21 @@ int InterpolateCustom(KFS_Stream const*, long, int, int)
     return 0;
 }
 
+KFS_ValueDesc CustomValue(unsigned short size)
+{
+    KFS_ValueDesc desc;
+    desc.isCustom = 1;
+    desc.itemSize = size;
+    desc.dataType = 5;
+    desc.interpFunc = &InterpolateCustom;
+    return desc;
+}
+
 TEST_F(TangentsTest, CustomKeysHoldNoHandles)
 {
     for (unsigned short const size : {4, 8, 16}) {
         SCOPED_TRACE(size);
-        KFS_ValueDesc desc;
-        desc.isCustom = 1;
-        desc.itemSize = size;
-        desc.dataType = 5;
-        desc.interpFunc = &InterpolateCustom;
-        KFS_Stream stream(1, 600, 0, 0, KFS_InterpMask_All, 0, desc, nullptr, nullptr, false);
+        KFS_Stream stream(1, 600, 0, 0, KFS_InterpMask_All, 0, CustomValue(size), nullptr, nullptr, false);
         std::array<unsigned char, 16> value{};
         for (int k = 0; k < 3; ++k) {
             value.fill(static_cast<unsigned char>(k + 1));
@@ -257,12 +228,10 @@ TEST_F(TangentsTest, CustomKeysHoldNoHandles)
         EXPECT_EQ(before, bytes());
         EXPECT_TRUE(stream.IsCustom());
 
-        double a = 9.0, b = 9.0, c = 9.0, d = 9.0;
+        double a = 9.0, b = 9.0, c = 9.0, d = 9.0, e = 9.0, f = 9.0;
         EXPECT_EQ(0, KFS_GetKeyTangentsF(&stream, 1, &a, &b, &c, &d));
-        EXPECT_EQ(0.0, std::fabs(a) + std::fabs(b) + std::fabs(c) + std::fabs(d));
-        a = b = 9.0;
-        EXPECT_EQ(0, KFS_GetKeyVelocityF(&stream, 1, 0, &a, &b));
-        EXPECT_EQ(0.0, std::fabs(a) + std::fabs(b));
+        EXPECT_EQ(0, KFS_GetKeyVelocityF(&stream, 1, 0, &e, &f));
+        for (double const answer : {a, b, c, d, e, f}) EXPECT_EQ(0.0, answer);
         unsigned char clamped = 0;
         a = b = 100.0;
         EXPECT_EQ(0, KFS_GetClampedVelInflF(&stream, 1, 0, &a, &b, &a, &b, &clamped));
@@ -281,29 +250,20 @@ TEST_F(TangentsTest, CustomKeysHoldNoHandles)
     }
 }
 
-std::vector<long> disposedWith;
-
-int DisposeCustom(KFS_Stream const*, long refcon, short, void*)
-{
-    disposedWith.push_back(refcon);
-    return 0;
-}
-
 // The doubles' description isn't what a cached custom value is disposed by.
 TEST_F(TangentsTest, ACachedCustomValueIsDisposedAsWhatItIs)
 {
-    KFS_ValueDesc desc;
-    desc.isCustom = 1;
-    desc.itemSize = 8;
-    desc.dataType = 5;
-    desc.interpFunc = &InterpolateCustom;
-    KFS_Stream stream(1, 600, 0, 0, KFS_InterpMask_All, 0, desc, nullptr, nullptr, false);
+    KFS_Stream stream(1, 600, 0, 0, KFS_InterpMask_All, 0, CustomValue(8), nullptr, nullptr, false);
     long const value = 1;
     T_Time const time{0, 600};
     ASSERT_EQ(0, KFS_InsertKey(&stream, &time, 1, &value, L, L));
     ASSERT_EQ(0, stream.GetKeyData()->keys ? SEQ_GetItemCopy(stream.GetKeys(), 0, 0, stream.GetCache()) : 1);
-    stream.SetDisposeItemFunc(&DisposeCustom);
+    static std::vector<long> disposedWith;
     disposedWith.clear();
+    stream.SetDisposeItemFunc([](KFS_Stream const*, long refcon, short, void*) {
+        disposedWith.push_back(refcon);
+        return 0;
+    });
     double const speed = 1.0;
     ASSERT_EQ(0, KFS_SetKeyVelocityF(&stream, 0, &speed, &speed));
     stream.SetDisposeItemFunc(nullptr);
@@ -313,91 +273,60 @@ TEST_F(TangentsTest, ACachedCustomValueIsDisposedAsWhatItIs)
 
 // ---- notifications
 
-class HeardStream : public KFS_Stream {
-public:
-    using KFS_Stream::KFS_Stream;
-    int ProbeListenerState() override { return KFS_ListenerState_Heard; }
-};
-
-class Ear : public KFS_StreamListener {
-public:
-    Ear() { KFS_RegisterMainListener(this); }
-    ~Ear() override { KFS_UnregisterMainListener(this); }
-    void StreamAboutToBeInserted(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int) override {}
-    void StreamInserted(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int) override {}
-    void StreamAboutToBeRemoved(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int) override {}
-    void StreamRemoved(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int) override {}
-    void StreamAboutToBeSwapped(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int) override {}
-    void StreamSwapped(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int) override {}
-    void StreamsAboutToBeReordered(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int, unsigned int) override {}
-    void StreamsReordered(KFS_StreamGroup*, KFS_StreamBase const*, unsigned int, unsigned int) override {}
-    void StreamDestroyed(KFS_StreamBase const*) override {}
-    void StreamValueChanged(KFS_Stream*) override
-    {
-        ++heard;
-        if (answer) answer();
-    }
-    void StreamFlagsChanged(KFS_StreamBase*, unsigned int, unsigned int) override {}
-    void StreamDisplayNameChanged(KFS_StreamBase*) override {}
-
-    int heard = 0;
-    std::function<void()> answer;
-};
-
-TEST_F(TangentsTest, SettersTellOnceAndOnlyOnSuccess)
+// A value that was read once must not outlive the curve that it came from either.
+TEST_F(TangentsTest, SettersDropTheCachedValueAndTellOnceAndOnlyOnSuccess)
 {
-    KFS_ValueDesc desc;
-    desc.dataType = KFS_Type_Double;
-    HeardStream stream(1, 600, 0, 0, KFS_InterpMask_All, 0, desc, nullptr, nullptr, false);
-    for (int k = 0; k < 3; ++k) {
-        double const value = k;
-        T_Time const time{600 * k, 600};
-        ASSERT_EQ(0, KFS_InsertKeyF(&stream, &time, 1, &value, S, S));
-    }
     for (Door const& door : Doors()) {
         SCOPED_TRACE(door.name);
         bool const setter = std::string_view(door.name).starts_with("KFS_Set");
-        Ear ear;
-        EXPECT_EQ(0, door.call(&stream, 1));
-        EXPECT_EQ(setter ? 1 : 0, ear.heard);
-        EXPECT_EQ(SEQ_Err_BadIndex, door.call(&stream, 7));
-        EXPECT_EQ(setter ? 1 : 0, ear.heard);
-        if (!setter) continue;
-        ear.answer = [] { throw 4711; };
-        EXPECT_EQ(4711, door.call(&stream, 1));
-        ear.answer = [] { throw std::runtime_error("no ears"); };
-        EXPECT_EQ(Q_Err_Exception, door.call(&stream, 1));
-        EXPECT_EQ(1U, reports.Take().size());
-        ear.answer = [] { throw "something else"; };
-        EXPECT_THROW(door.call(&stream, 1), char const*);
-        EXPECT_EQ(8, stream.GetValueDesc()->itemSize);
-        EXPECT_EQ(nullptr, stream.GetCopyItemFunc());
+        HeardRoot root;
+        KeyedStream stream = MakeThree();
+        root.Store(stream);
+        double const before = stream.At1(300);
+        EXPECT_FALSE(stream.CacheIsEmpty());
+        std::function<void()> answer = [] {};
+        ValueListener listener([&] { answer(); });
+        EXPECT_EQ(0, door.call(stream, 1));
+        EXPECT_EQ(setter ? 1 : 0, listener.Take());
+        EXPECT_EQ(SEQ_Err_BadIndex, door.call(stream, 7));
+        EXPECT_EQ(0, listener.Take());
+        if (setter) {
+            EXPECT_TRUE(stream.CacheIsEmpty());
+            EXPECT_GT(std::fabs(before - stream.At1(300)), 0.01);
+            answer = [] { throw 4711; };
+            EXPECT_EQ(4711, door.call(stream, 1));
+            answer = [] { throw std::runtime_error("no ears"); };
+            EXPECT_EQ(Q_Err_Exception, door.call(stream, 1));
+            EXPECT_EQ(1U, reports.Take().size());
+            answer = [] { throw "something else"; };
+            EXPECT_THROW(door.call(stream, 1), char const*);
+            EXPECT_EQ(8, stream->GetValueDesc()->itemSize);
+            EXPECT_EQ(nullptr, stream->GetCopyItemFunc());
+        }
+        stream->SetParent(nullptr);
     }
 }
 
 // A listener that reads in the stream's own type would get doubles otherwise, for which it has no room.
 TEST_F(TangentsTest, ListenersHearOfDoublesWhenTheStreamIsItselfAgain)
 {
-    KFS_ValueDesc desc;
-    desc.dataType = KFS_Type_Float;
-    HeardStream stream(2, 600, 0, 1, KFS_InterpMask_All, KFS_InterpMask_Negative, desc, nullptr, nullptr, false);
-    double const value[2] = {1.0, 2.0};
-    for (int const at : {0, 600}) {
-        T_Time const time{at, 600};
-        ASSERT_EQ(0, KFS_InsertKeyF(&stream, &time, 1, value, S, S));
-    }
-    Ear ear;
-    ear.answer = [&] {
-        EXPECT_EQ(KFS_Type_Float, stream.GetValueDesc()->dataType);
-        EXPECT_EQ(nullptr, stream.GetCopyItemFunc());
+    HeardRoot root;
+    KeyedStream stream =
+        MakeKeyed({{0, 1.0}, {600, 2.0}}, S, {.dimension = 2, .spatial = true, .type = KFS_Type_Float});
+    root.Store(stream);
+    ValueListener listener([&] {
+        EXPECT_EQ(KFS_Type_Float, stream->GetValueDesc()->dataType);
+        EXPECT_EQ(nullptr, stream->GetCopyItemFunc());
         float read[3] = {0.0F, 0.0F, -1.0F};
         T_Time const time{300, 600};
-        EXPECT_EQ(0, KFS_GetValuePlus(&stream, &time, 0, read, nullptr, nullptr, nullptr, 0));
+        EXPECT_EQ(0, KFS_GetValuePlus(stream, &time, 0, read, nullptr, nullptr, nullptr, 0));
         EXPECT_EQ(-1.0F, read[2]);
-    };
-    EXPECT_EQ(0, KFS_SetKeyVelocityF(&stream, 1, value, nullptr));
-    EXPECT_EQ(0, KFS_SetKeySpaceTangentsF(&stream, 1, 0, value, nullptr));
-    EXPECT_EQ(2, ear.heard);
+    });
+    double const value[2] = {1.0, 2.0};
+    EXPECT_EQ(0, KFS_SetKeyVelocityF(stream, 1, value, nullptr));
+    EXPECT_EQ(0, KFS_SetKeySpaceTangentsF(stream, 1, 0, value, nullptr));
+    EXPECT_EQ(2, listener.Take());
+    stream->SetParent(nullptr);
 }
 
 }  // namespace

@@ -15,61 +15,12 @@ constexpr StreamOptions Spatial2D{.dimension = 2, .spatial = true};
 
 void FillCurvedPath(TestStream& stream)
 {
-    stream.Key(0, {0.0, 0.0}, KFS_Interp_Linear)
-        .Key(100, {10.0, 40.0}, KFS_Interp_Linear)
-        .Key(200, {50.0, 0.0}, KFS_Interp_Linear);
-}
-
-std::vector<double> Samples(TestStream const& stream)
-{
-    std::vector<double> samples;
-    for (int time = 0; time <= 200; time += 10) {
-        for (const double number : stream.At(time)) {
-            samples.push_back(number);
-        }
-    }
-    return samples;
-}
-
-TEST_F(Attributes, ADamagedStreamIsRefusedByEverySetterAndGetter)
-{
-    const DamagedStream damaged;
-    KFS_Stream* stream = damaged.get();
-    const TestStream good;
-    KFS_Stream* goodStream = good.get();
-    double number = 77.0;
-    struct Row {
-        int operation;
-        char const* action;
-        std::function<int()> call;
-    };
-    const Row rows[] = {
-        {8, "merge", [&] { return KFS_MergeStream(stream, nullptr, &goodStream); }},
-        {8, "merge", [&] { return KFS_MergeStream(goodStream, nullptr, &stream); }},
-        {16, "set imask", [&] { return KFS_SetStreamIMask(stream, 1); }},
-        {47, "set spatial imask", [&] { return KFS_SetStreamSpIMask(stream, 1); }},
-        {49, "set spatial interp", [&] { return KFS_SetStreamSpInterp(stream, 1); }},
-        {50, "set spatial interp", [&] { return KFS_SetStreamSParametrize(stream, 1); }},
-        {39, "set custom functions in", [&] { return KFS_SetCustomFuncs(stream, nullptr, nullptr); }},
-        {117, "set value description", [&] { return KFS_GetStreamAccuracy(stream, &number); }},
-        {88, "set value description", [&] { return KFS_SetStreamAccuracy(stream, &number, &number); }},
-        {118, "set value description", [&] { return KFS_GetStreamMultiplier(stream, &number); }},
-        {102, "set value description", [&] { return KFS_SetStreamMultiplier(stream, &number, &number); }},
-        {10, "alter time-varyingness of", [&] { return stream->SetConstant(1, 1); }},
-    };
-    for (const Row& row : rows) {
-        SCOPED_TRACE(row.operation);
-        EXPECT_EQ(2, row.call());
-        EXPECT_EQ(reports.Take(), std::vector<Reported>{DamagedReport(row.operation, row.action)});
-    }
-    EXPECT_TRUE(damaged.Untouched());
-    EXPECT_EQ(77.0, number);
+    stream.Key(0, {0.0, 0.0}).Key(100, {10.0, 40.0}).Key(200, {50.0, 0.0});
 }
 
 TEST_F(Attributes, MergingLeavesBothStreamsAlone)
 {
-    TestStream a;
-    TestStream b;
+    TestStream a, b;
     a.Key(0, {1.0});
     b.Key(5, {2.0}).Key(9, {3.0});
     const auto bytes = a.Bytes();
@@ -89,11 +40,10 @@ TEST_F(Attributes, ASpatialSettingIsPermittedByTheTemporalMask)
         for (unsigned code = 0; code < 20; ++code) {
             SCOPED_TRACE(testing::Message() << "mask " << mask << " code " << code);
             ASSERT_EQ(0, KFS_SetStreamSpIMask(stream, code % 2 ? 0 : 0xFFFF)) << "which has no say";
-            const auto setting = static_cast<unsigned short>(code);
             const bool permitted = code == 0 || ((mask << 1 >> code) & 1) != 0;
-            const unsigned short before = stream->GetSpInterp();
-            EXPECT_EQ(permitted ? 0 : 7431, KFS_SetStreamSpInterp(stream, setting));
-            EXPECT_EQ(permitted ? setting : before, stream->GetSpInterp());
+            const unsigned expected = permitted ? code : stream->GetSpInterp();
+            EXPECT_EQ(permitted ? 0 : 7431, KFS_SetStreamSpInterp(stream, static_cast<unsigned short>(code)));
+            EXPECT_EQ(expected, stream->GetSpInterp());
             if (!permitted) {
                 EXPECT_REPORT(reports, 15,
                               "spatial interpolation method not allowed for this stream (" + std::to_string(code) +
@@ -109,16 +59,13 @@ TEST_F(Attributes, AccuracyIsKeptSquared)
 {
     const TestStream stream;
     double accuracy = 0.0;
-    EXPECT_EQ(0, KFS_GetStreamAccuracy(stream, &accuracy));
-    EXPECT_DOUBLE_EQ(0.01, accuracy);
     const double half = -0.5;
     EXPECT_EQ(0, KFS_SetStreamAccuracy(stream, &half, &accuracy));
     EXPECT_DOUBLE_EQ(0.01, accuracy);
-    EXPECT_EQ(0.25, stream->GetAccuracy());
-    EXPECT_EQ(0, KFS_SetStreamAccuracy(stream, nullptr, &accuracy));
-    EXPECT_EQ(0.5, accuracy);
     EXPECT_EQ(0, KFS_SetStreamAccuracy(stream, nullptr, nullptr));
     EXPECT_EQ(0.25, stream->GetAccuracy());
+    EXPECT_EQ(0, KFS_GetStreamAccuracy(stream, &accuracy));
+    EXPECT_EQ(0.5, accuracy);
 }
 
 TEST_F(Attributes, DimensionsShareTheFourComponentsOfTheMultiplier)
@@ -132,18 +79,14 @@ TEST_F(Attributes, DimensionsShareTheFourComponentsOfTheMultiplier)
     double now[6];
     ASSERT_EQ(0, KFS_GetStreamMultiplier(six, now));
     EXPECT_EQ((std::vector{6.0, 7.0, 4.0, 5.0, 6.0, 7.0}), std::vector(now, now + 6));
-
     const TestStream two(Spatial2D);
     ASSERT_EQ(0, KFS_SetStreamMultiplier(two, first, nullptr));
     EXPECT_EQ((M_Vector4T<double>{{2.0, 3.0, 1.0, 1.0}}), two->GetMultiplier());
-    ASSERT_EQ(0, KFS_SetStreamMultiplier(two, nullptr, now));
-    EXPECT_EQ(3.0, now[1]);
 }
 
 TEST_F(Attributes, OnlyASpatialStreamHasAMultiplierAndArcs)
 {
-    TestStream plain({.dimension = 2});
-    plain.Key(0, {1.0, 2.0});
+    const TestStream plain({.dimension = 2});
     double number = 77.0;
     EXPECT_EQ(7434, KFS_GetStreamMultiplier(plain, &number));
     EXPECT_REPORT(reports, 102, "attempt to set multiplier of a non-spatial stream.");
@@ -159,34 +102,21 @@ TEST_F(Attributes, OnlyASpatialStreamHasAMultiplierAndArcs)
 TEST_F(Attributes, AReadAfterAChangeIsThatOfAStreamThatAlwaysWasSo)
 {
     const double multiplier[2] = {1.0, 20.0};
-    struct Row {
-        char const* why;
-        std::function<int(KFS_Stream*)> change;
+    const std::function<int(KFS_Stream*)> changes[] = {
+        [&](KFS_Stream* stream) { return KFS_SetStreamMultiplier(stream, multiplier, nullptr); },
+        [](KFS_Stream* stream) { return KFS_SetStreamSParametrize(stream, 0); },
+        [](KFS_Stream* stream) { return KFS_RescaleStream(stream, 1200) + KFS_RescaleStream(stream, 600); },
     };
-    const Row rows[] = {
-        {"multiplier", [&](KFS_Stream* stream) { return KFS_SetStreamMultiplier(stream, multiplier, nullptr); }},
-        {"arc length off", [](KFS_Stream* stream) { return KFS_SetStreamSParametrize(stream, 0); }},
-        {"another scale",
-         [](KFS_Stream* stream) {
-             const int code = KFS_RescaleStream(stream, 1200);
-             return code ? code : KFS_RescaleStream(stream, 600);
-         }},
-    };
-    for (const Row& row : rows) {
-        SCOPED_TRACE(row.why);
-        TestStream changed(Spatial2D);
+    for (const auto& change : changes) {
+        TestStream changed(Spatial2D), fresh(Spatial2D);
         FillCurvedPath(changed);
-        TestStream fresh(Spatial2D);
-        ASSERT_EQ(0, row.change(fresh));
+        ASSERT_EQ(0, change(fresh));
         FillCurvedPath(fresh);
-        const std::vector<double> truth = Samples(fresh);
-        static_cast<void>(Samples(changed));
-        for (int time = 5; time <= 195; time += 95) {  // reads that leave a computed value behind
-            const std::vector<double> before = changed.At(time);
-            ASSERT_EQ(0, row.change(changed));
-            EXPECT_EQ(fresh.At(time), changed.At(time)) << time;
+        for (int time = 5; time <= 195; time += 10) {
+            changed.At(time);  // leaves a computed value behind
+            ASSERT_EQ(0, change(changed));
+            EXPECT_EQ(fresh.At(time), changed.At(time)) << "change " << &change - changes << " at " << time;
         }
-        EXPECT_EQ(truth, Samples(changed));
     }
 }
 
@@ -226,9 +156,7 @@ TEST_F(Attributes, AChangedParametrizationMarksAllKeysAndAlwaysNotifies)
 TEST_F(Attributes, ALongStreamIsMarkedFromEndToEnd)
 {
     TestStream stream(Spatial2D);
-    for (int i = 0; i < 70000; ++i) {
-        stream.Key(i, {1.0 * i, 0.0}, KFS_Interp_Linear);
-    }
+    for (int i = 0; i < 70000; ++i) stream.Key(i, {1.0 * i, 0.0});
     stream->SetKFSFlags(stream->GetKFSFlags() & ~KFS_StreamFlag_SParametrize);  // chords: quick to repair
     ASSERT_EQ(0, stream->UpdateStream());
     EXPECT_EQ(0, KFS_SetStreamSParametrize(stream, 1));
@@ -256,48 +184,6 @@ TEST_F(Attributes, AListenersExceptionBecomesTheResult)
     ValueListener listener([] { throw std::runtime_error("a listener"); });
     EXPECT_EQ(Q_Err_Exception, KFS_SetStreamSParametrize(stream, 1));
     ASSERT_EQ(1u, reports.Take().size());
-}
-
-int copies;
-
-int CountingCopy(KFS_Stream const* stream, long, short, void const* source, void* destination)
-{
-    ++copies;
-    std::memmove(destination, source, stream->GetValueDesc()->itemSize);
-    return 0;
-}
-
-int disposals;
-
-int CountingDispose(KFS_Stream const*, long, short, void*)
-{
-    ++disposals;
-    return 0;
-}
-
-TEST_F(Attributes, TheKeyListFollowsTheClientsFunctions)
-{
-    KFS_ValueDesc desc{1, 8, 42, [](KFS_Stream const*, long, int, int) { return 0; }};
-    KFS_Stream stream(1, 600, 0, 0, KFS_InterpMask_Hold, 0, desc, nullptr, nullptr, false);
-    const long value = 5;
-    for (int time = 0; time < 3; ++time) {
-        const T_Time at{time, 600};
-        ASSERT_EQ(0, KFS_InsertKey(&stream, &at, 0, &value, KFS_Interp_Hold, KFS_Interp_Hold));
-    }
-    ASSERT_EQ(0, KFS_SetCustomFuncs(&stream, CountingCopy, CountingDispose));
-    alignas(16) unsigned char record[128];
-    copies = disposals = 0;
-    ASSERT_EQ(0, SEQ_GetItemCopy(stream.GetKeys(), 0, 1, record));
-    EXPECT_EQ(1, copies);
-    ASSERT_EQ(0, SEQ_Remove(1, stream.GetKeys(), 0, nullptr));
-    stream.SetKeys(stream.GetKeys());
-    EXPECT_EQ(1, disposals);
-    ASSERT_EQ(0, KFS_SetCustomFuncs(&stream, nullptr, nullptr));
-    ASSERT_EQ(0, SEQ_GetItemCopy(stream.GetKeys(), 0, 1, record));
-    ASSERT_EQ(0, SEQ_Remove(1, stream.GetKeys(), 0, nullptr));
-    stream.SetKeys(stream.GetKeys());
-    EXPECT_EQ(1, copies);
-    EXPECT_EQ(1, disposals);
 }
 
 }  // namespace

@@ -2,18 +2,13 @@
 #include "keystore/cachestate.h"
 #include "keystore/lookup.h"
 #include "tests/support/listening.h"
+#include "tests/support/notifications.h"
 #include "tests/support/ownedvalues.h"
-#include "tests/support/streams.h"
+#include "tests/support/text.h"
 
 #include <random>
-#include <string>
 
 namespace {
-
-u16str Text(char const* text)
-{
-    return Q_MBToUTF16String(text);
-}
 
 class Cloning : public StreamTest {};
 class Swapping : public StreamTest {};
@@ -22,9 +17,7 @@ class Swapping : public StreamTest {};
 TestStream DressedStream()
 {
     TestStream stream({.dimension = 2, .timeScale = 30, .spatial = true, .spInterpMask = 0xF});
-    stream.Key(0, {0.0, 0.0}, KFS_Interp_Spline)
-        .Key(60, {3.0, 4.0}, KFS_Interp_Spline)
-        .Key(90, {9.0, 1.0}, KFS_Interp_Spline);
+    stream.Key(0, {0.0, 0.0}).Key(60, {3.0, 4.0}, KFS_Interp_Spline).Key(90, {9.0, 1.0});
     stream->SetInterpMask(5);
     stream->SetAccuracy(0.25);
     *stream->GetMultiplierForModify() = {{1.0, 0.5, 1.0, 1.0}};
@@ -41,6 +34,7 @@ TEST_F(Cloning, TakesKeysAndExpressionAsAskedAndTheRestAlways)
 {
     const TestStream source = DressedStream();
     const std::vector<double> middle = source.At(45);
+    ASSERT_NE(nullptr, source.Record(0)->remapTable);
     source->SetDisabledUpdateStream(true);
     source->DisableLegalizeValue(true);
     source->SetExpressionErrorsAreQuiet(true);
@@ -62,11 +56,13 @@ TEST_F(Cloning, TakesKeysAndExpressionAsAskedAndTheRestAlways)
             EXPECT_TRUE(clone->CanUpdateStream()) << "temporary blocks stay behind";
             EXPECT_TRUE(clone->CanLegalizeValue());
             EXPECT_FALSE(clone->ExpressionErrorsAreQuiet());
-
             ASSERT_EQ(keys, clone->GetKeys() != nullptr);
             if (keys) {
                 EXPECT_EQ(3, clone->GetKeyCount());
                 EXPECT_EQ(clone.get(), (*clone->GetKeys())->refcon);
+                void const* item = nullptr;
+                ASSERT_EQ(0, SEQ_GetConstAddress(clone->GetKeys(), 0, &item));
+                EXPECT_EQ(nullptr, static_cast<KFS_KeyScalar const*>(item)->remapTable);
             }
             KFS_ExprInfo const& info = clone->GetExprInfo();
             EXPECT_EQ(Text(expression ? "time * 2" : ""), info.GetExpression());
@@ -90,15 +86,13 @@ TEST_F(Cloning, MarksAllKeysStaleHoweverManyThereAre)
 {
     TestStream source;
     constexpr int Count = 33000;
-    for (int i = 0; i < Count; ++i) {
-        source.Key(i, {1.0 * i});
-    }
+    for (int i = 0; i < Count; ++i) source.Key(i, {1.0 * i});
     source.At(5);
     const std::unique_ptr<KFS_Stream> clone(source->CloneLeaf({true, false}));
-    EXPECT_EQ(0, clone->GetInvalidKeyIndex()[0]);
-    EXPECT_EQ(Count - 1, clone->GetInvalidKeyIndex()[1]);
-    EXPECT_EQ(0, clone->GetArcInvalidKeyIndex()[0]);
-    EXPECT_EQ(Count - 1, clone->GetArcInvalidKeyIndex()[1]);
+    for (int const* const range : {clone->GetInvalidKeyIndex(), clone->GetArcInvalidKeyIndex()}) {
+        EXPECT_EQ(0, range[0]);
+        EXPECT_EQ(Count - 1, range[1]);
+    }
 }
 
 TEST_F(Cloning, ACloneMadeByARenderIsWholeEverywhere)
@@ -106,18 +100,29 @@ TEST_F(Cloning, ACloneMadeByARenderIsWholeEverywhere)
     TestStream source({.dimension = 2, .spatial = true});
     source.Key(0, {0.0, 0.0}, KFS_Interp_Spline).Key(600, {3.0, 4.0}, KFS_Interp_Spline);
     const std::vector<double> expected = source.At(200);
-    const boost::shared_ptr<Q_RenderContext> render = kfshost::MakeRenderContext(true);
     std::unique_ptr<KFS_Stream> clone;
     {
-        const Q_ScSetCurrentRenderContext current(render);
+        const Q_ScSetCurrentRenderContext current(kfshost::MakeRenderContext(true));
         clone.reset(source->CloneLeaf({true, true}));
     }
     EXPECT_EQ(0, clone->GetArcInvalidKeyIndex()[0]) << "marked in its own key data, not in the render's";
     EXPECT_EQ(1, clone->GetArcInvalidKeyIndex()[1]);
+    ASSERT_EQ(0, KFS_RemoveKey(source, 1, nullptr));
     double value[2] = {};
     const T_Time at{200, 600};
     ASSERT_EQ(0, KFS_GetValueFPlus(clone.get(), &at, 0, value, nullptr, nullptr));
-    EXPECT_EQ(expected, (std::vector{value[0], value[1]}));
+    EXPECT_EQ(expected, (std::vector{value[0], value[1]})) << "with keys of its own";
+}
+
+TEST_F(Cloning, WithoutMemoryThrows4AndLeaksNothing)
+{
+    const TestStream source = DressedStream();
+    source.At(30);
+    const int failures =
+        FailEveryAllocation([] { return std::make_unique<int>(); }, [&](int&) { return delete source->Clone(true), 0; },
+                            [](int&, int, Q_MemoryCount const& before) { EXPECT_EQ(before, Q_MemoryLive(nullptr)); });
+    EXPECT_GE(failures, 3);
+    reports.Take();  // std::bad_alloc is reported where it is translated
 }
 
 // Lets that many copies through and then fails.
@@ -128,44 +133,28 @@ int CopySome(KFS_Stream const* stream, long refcon, short kind, void const* sour
     return --S_copiesLeft < 0 ? 77 : OwnedValues::Copy(stream, refcon, kind, source, destination);
 }
 
-TEST_F(Cloning, AFailureAtAnyValueLeavesNothingBehind)
+TEST_F(Cloning, AFailureAtAnyValueLeavesNothingBehindAndNobodyHearsOfIt)
 {
-    OwnedValues::Reset();
-    {
-        const std::unique_ptr<KFS_Stream> source = OwnedValues::MakeStream(false);
-        for (const int time : {0, 100, 200}) {
-            const T_Time at{time, 600};
-            const OwnedValues::Ticket ticket = OwnedValues::Make(time);
-            ASSERT_EQ(0, KFS_InsertKey(source.get(), &at, 1, &ticket, KFS_Interp_Hold, KFS_Interp_Hold));
-            OwnedValues::Free(ticket);
-        }
-        OwnedValues::Ticket out{};
-        const T_Time at{100, 600};
-        ASSERT_EQ(0, KFS_GetValue(source.get(), &at, 0, &out, nullptr, nullptr));  // fills the cache record
-        OwnedValues::Free(out);
-        ASSERT_EQ(0, KFS_SetCustomFuncs(source.get(), CopySome, OwnedValues::Dispose));
-        const int live = OwnedValues::Live();
-        for (int copies = 0;; ++copies) {
-            S_copiesLeft = copies;
-            int const code = KFSp_Boundary([&] { delete source->Clone(true); });
-            EXPECT_EQ(live, OwnedValues::Live()) << copies << " copies let through";
-            if (code == 0) {
-                EXPECT_EQ(4, copies) << "the cache record and three keys";
-                break;
-            }
-            EXPECT_EQ(77, code);
-            ASSERT_LT(copies, 10);
-        }
+    const OwnedValues::Scope owned;
+    HeardRoot root;
+    const std::unique_ptr<KFS_Stream> source = OwnedValues::MakeStream(false);
+    for (const int time : {0, 100, 200}) OwnedValues::InsertKey(source.get(), time, time);
+    OwnedValues::Read(source.get(), 100);  // fills the cache record
+    ASSERT_EQ(0, KFS_SetCustomFuncs(source.get(), CopySome, OwnedValues::Dispose));
+    root.Store(source.get());
+    ASSERT_EQ(KFS_ListenerState_Heard, source->ProbeListenerState()) << "a clone hears with its source's ears";
+    NotificationRecorder recorder;
+    const int live = OwnedValues::Live();
+    for (int copies = 0; copies < 4; ++copies) {
+        S_copiesLeft = copies;
+        EXPECT_EQ(77, KFSp_Boundary([&] { delete source->Clone(true); }));
+        EXPECT_EQ(live, OwnedValues::Live()) << copies << " copies let through";
+        EXPECT_EQ(Notifications{}, recorder.Take());
     }
-    EXPECT_EQ(0, OwnedValues::Live());
-}
-
-TEST_F(Cloning, ADamagedStreamIsRefusedUntouched)
-{
-    const DamagedStream damaged;
-    EXPECT_EQ(2, KFSp_Boundary([&] { KFS_Stream(*damaged.get(), KFS_CloneStreamParams{true, true}); }));
-    EXPECT_TRUE(damaged.Untouched());
-    EXPECT_EQ(std::vector{DamagedReport(5, "duplicate")}, reports.Take());
+    S_copiesLeft = 4;  // the cache record and three keys
+    delete source->Clone(true);
+    EXPECT_EQ(live, OwnedValues::Live());
+    EXPECT_EQ(Notifications{"destroyed "}, recorder.Take());
 }
 
 // ---- swap
@@ -174,25 +163,23 @@ TEST_F(Cloning, ADamagedStreamIsRefusedUntouched)
 struct Content {
     std::vector<unsigned char> bytes;
     std::vector<std::vector<double>> values;
+    KFS_MatchName matchName;
     u16str name, expression;
     unsigned int flags;
     unsigned int timeScale;
     std::array<int, 2> stale, arcStale;
 
     explicit Content(TestStream const& stream)
-        : name(stream->GetDisplayName()),
+        : matchName(stream->GetMatchName()),
+          name(stream->GetDisplayName()),
           expression(stream->GetExprInfo().GetExpression()),
           flags(stream->GetStreamBaseFlags()),
           timeScale(stream->GetTimeScale()),
           stale(stream.Stale()),
           arcStale(stream.ArcStale())
     {
-        if (stream->GetKeys()) {
-            bytes = stream.Bytes();
-        }
-        for (int time = -10; time < 700; time += 71) {
-            values.push_back(stream.At(time));
-        }
+        if (stream->GetKeys()) bytes = stream.Bytes();
+        for (int time = -10; time < 700; time += 71) values.push_back(stream.At(time));
     }
     bool operator==(Content const&) const = default;
 };
@@ -205,12 +192,11 @@ TestStream RandomStream(std::mt19937& random, bool noKeys)
         {.dimension = static_cast<short>(spatial ? 2 : 1 + upTo(3)), .noKeys = noKeys, .spatial = spatial});
     std::vector<double> value(static_cast<std::size_t>(stream->GetDimension()));
     for (int i = noKeys ? 1 : 1 + upTo(6); i > 0; --i) {
-        for (double& number : value) {
-            number = upTo(100);
-        }
+        for (double& number : value) number = upTo(100);
         stream.Key(noKeys ? 0 : upTo(600), value, static_cast<char>(1 + upTo(3)));
     }
-    stream->SetDisplayName(Text(std::to_string(upTo(1000)).c_str()));
+    stream->SetDisplayName(Text(std::to_string(upTo(1000))));
+    stream->SetMatchName(KFS_MatchName(std::to_string(upTo(1000)).c_str(), true));
     stream->SetElided(upTo(2) == 1);
     if (upTo(2)) {
         stream->GetExprInfoForModify().SetExpression(Text("a"));
@@ -234,9 +220,8 @@ TEST_F(Swapping, MovesTheWholeContentAndBackAgain)
         EXPECT_EQ(ofB, Content(a));
         EXPECT_EQ(ofA, Content(b));
         for (TestStream const* const stream : {&a, &b}) {
-            if ((*stream)->GetKeys()) {
-                EXPECT_EQ(stream->get(), (*(*stream)->GetKeys())->refcon) << "a list names its owner";
-            }
+            KFS_Stream* const leaf = *stream;
+            EXPECT_TRUE(!leaf->GetKeys() || (*leaf->GetKeys())->refcon == leaf) << "a list names its owner";
         }
         b->swap(*a);
         EXPECT_EQ(ofA, Content(a));
@@ -287,37 +272,22 @@ TEST_F(Swapping, LeavesWhatBelongsToThePlace)
     EXPECT_EQ(nullptr, b->GetRefCon());
 }
 
-class SwapListener : public ValueListener {
-public:
-    void StreamValueChanged(KFS_Stream* stream) override { heard_.push_back(Name(stream) + " value"); }
-    void StreamFlagsChanged(KFS_StreamBase* stream, unsigned int oldFlags, unsigned int newFlags) override
-    {
-        heard_.push_back(Name(stream) + " flags " + std::to_string(oldFlags) + " to " + std::to_string(newFlags));
-    }
-    std::vector<std::string> Heard() { return std::exchange(heard_, {}); }
-    KFS_StreamBase const* first = nullptr;
-
-private:
-    std::string Name(KFS_StreamBase const* stream) const { return stream == first ? "first" : "second"; }
-    std::vector<std::string> heard_;
-};
-
 TEST_F(Swapping, TellsOfTheFirstStreamOnly)
 {
     HeardRoot root;
     const TestStream a, b;
     root.Store(a);
     root.Store(b);
-    SwapListener listener;
-    listener.first = a.get();
+    NotificationRecorder recorder;
+    recorder.Label(a, "first");
     a->swap(*b);
-    EXPECT_EQ(std::vector<std::string>{"first value"}, listener.Heard());
+    EXPECT_EQ(Notifications{"value first"}, recorder.Take());
     b->SetElided(true);
-    listener.Heard();
+    recorder.Take();
     a->swap(*b);
-    EXPECT_EQ((std::vector<std::string>{"first value", "first flags 1 to 33"}), listener.Heard());
+    EXPECT_EQ((Notifications{"value first", "flags first 1 33"}), recorder.Take());
     a->swap(*b);
-    EXPECT_EQ((std::vector<std::string>{"first value", "first flags 33 to 1"}), listener.Heard());
+    EXPECT_EQ((Notifications{"value first", "flags first 33 1"}), recorder.Take());
 }
 
 TEST_F(Swapping, WithoutMemoryExchangesNothingOrAll)
@@ -325,7 +295,7 @@ TEST_F(Swapping, WithoutMemoryExchangesNothingOrAll)
     struct Pair {
         TestStream a, b;
     };
-    const u16str longText = Text(std::string(300, 'x').c_str());
+    const u16str longText = Text(std::string(300, 'x'));
     const auto make = [&] {
         auto pair = std::make_unique<Pair>();
         pair->a.Key(0, {1.0});

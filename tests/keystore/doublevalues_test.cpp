@@ -34,10 +34,6 @@ TEST_F(DoubleValues, ADoubleFormLeavesNothingBehindInTheList)
     for (bool const doublesFirst : {false, true}) {
         SCOPED_TRACE(doublesFirst ? "a list that a double form has made" : "a list that an external form has made");
         LimitedStream stream(desc);
-        auto const insert = [&](int i, bool doubles) {
-            return doubles ? KFS_InsertKeyF(&stream, &times[i], 0, &value, Linear, Linear)
-                           : KFS_InsertKey(&stream, &times[i], 0, &value, Linear, Linear);
-        };
         auto const stored = [&](int index) {
             void const* item = nullptr;
             EXPECT_EQ(0, SEQ_GetConstAddress(stream.GetKeys(), index, &item));
@@ -45,7 +41,8 @@ TEST_F(DoubleValues, ADoubleFormLeavesNothingBehindInTheList)
         };
         for (int i = 0; i < 4; ++i) {
             bool const doubles = (i % 2 == 0) == doublesFirst;
-            ASSERT_EQ(0, insert(i, doubles));
+            ASSERT_EQ(0, doubles ? KFS_InsertKeyF(&stream, &times[i], 0, &value, Linear, Linear)
+                                 : KFS_InsertKey(&stream, &times[i], 0, &value, Linear, Linear));
             EXPECT_EQ(doubles ? 10.0 : 50.0, stored(i));
             ASSERT_EQ(0, KFS_SetKey(&stream, i, &value, None, None));
             EXPECT_EQ(50.0, stored(i));
@@ -57,25 +54,18 @@ TEST_F(DoubleValues, ADoubleFormLeavesNothingBehindInTheList)
 
 TEST_F(DoubleValues, DoublesGoIntoACustomStreamThatHasRoom)
 {
-    struct Row {
-        unsigned short itemSize;
-        bool fits;
-    };
-    for (Row const& row : {Row{8, true}, Row{24, true}, Row{7, false}, Row{1, false}}) {
+    for (unsigned short const itemSize : {8, 24, 7, 1}) {
         for (bool const noKeys : {false, true}) {
-            SCOPED_TRACE(testing::Message() << row.itemSize << (noKeys ? ", constant" : ", keys"));
-            KFS_ValueDesc desc;
-            desc.isCustom = 1;
-            desc.itemSize = row.itemSize;
-            desc.dataType = 4711;
-            desc.interpFunc = OwnedValues::Interpolate;
+            SCOPED_TRACE(testing::Message() << itemSize << (noKeys ? ", constant" : ", keys"));
+            bool const fits = itemSize >= 8;
+            KFS_ValueDesc const desc{1, itemSize, 4711, OwnedValues::Interpolate};
             KFS_Stream stream(1, 600, noKeys, 0, KFS_InterpMask_All, 0, desc, nullptr, nullptr, false);
             T_Time const at{10, 600};
             double const value = 2.5;
-            int const code = row.fits ? 0 : 7441;
+            int const code = fits ? 0 : 7441;
             EXPECT_EQ(code, KFS_InsertKeyF(&stream, &at, 0, &value, Spline, Spline));
             EXPECT_EQ(code, KFS_InsertKeyF(&stream, &at, 1, &value, None, None));
-            if (row.fits) {
+            if (fits) {
                 double out[3] = {};
                 ASSERT_EQ(0, KFS_RemoveKey(&stream, 0, out));
                 EXPECT_EQ(2.5, out[0]);
@@ -84,7 +74,7 @@ TEST_F(DoubleValues, DoublesGoIntoACustomStreamThatHasRoom)
                           (std::vector<Reported>(2, KfsReport(81, "can#{rsquo}t convert to custom value"))));
             }
             EXPECT_EQ(1, stream.GetValueDesc()->isCustom);
-            EXPECT_EQ(row.itemSize, stream.GetValueDesc()->itemSize);
+            EXPECT_EQ(itemSize, stream.GetValueDesc()->itemSize);
             EXPECT_EQ(4711, stream.GetValueDesc()->dataType);
             EXPECT_EQ(OwnedValues::Interpolate, stream.GetInterpFunc());
             EXPECT_FALSE(stream.IsTemporarilyNonCustom());

@@ -6,15 +6,11 @@
 #include "overrides/parambag.h"
 #include "tests/support/baregroup.h"
 #include "tests/support/streams.h"
+#include "tests/support/text.h"
 
 #include <stdexcept>
 
 namespace {
-
-u16str Text(char const* text)
-{
-    return Q_MBToUTF16String(text);
-}
 
 // An engine whose expression is a lambda.
 class Engine : public KFS_ExpState {
@@ -49,9 +45,7 @@ public:
     void ResolveExprTarget(KFS_Stream const** stream, int*, KFS_ParamBag const*, KFS_ParamBag*) override
     {
         ++asked;
-        if (target) {
-            *stream = target;
-        }
+        if (target) *stream = target;
     }
     boost::shared_ptr<KFS_ExprContext> GetExprContext(KFS_Stream const*) override
     {
@@ -66,9 +60,7 @@ public:
 private:
     void Run(KFS_Stream const* stream, int time, double* value)
     {
-        if (const int code = expression(stream, time, value)) {
-            throw int{code};
-        }
+        if (const int code = expression(stream, time, value)) throw int{code};
     }
 };
 
@@ -154,16 +146,23 @@ TEST_F(Evaluate, ExternalFormConvertsAndDoubleFormDoesNot)
     TestStream stream({.dimension = 2, .type = KFS_Type_U8});
     stream.Key(0, {0.0, 10.0}).Key(100, {3.0, 300.0});
     const T_Time at{50, 600};
-    unsigned char bytes[2] = {};
-    ASSERT_EQ(0, KFS_GetValue(stream, &at, 1, bytes, nullptr, nullptr)) << "the third argument has no say";
-    EXPECT_EQ(2, bytes[0]) << "halves round away from zero";
-    EXPECT_EQ(155, bytes[1]);
+    std::array<unsigned char, 2> bytes{};
+    ASSERT_EQ(0, KFS_GetValue(stream, &at, 1, bytes.data(), nullptr, nullptr)) << "the third argument has no say";
+    EXPECT_EQ((std::array<unsigned char, 2>{2, 155}), bytes) << "halves round away from zero";
     EXPECT_EQ((std::vector{1.5, 155.0}), stream.At(50));
+    std::array<unsigned char, 4> four{};
+    const M_Vector4T<double> vector{{1.0, 2.0, 3.4, 254.6}};
+    const TestStream wide({.dimension = 4, .type = KFS_Type_U8});
+    KFS_PostCacheVector4Value(wide, 0, vector, nullptr, four.data());
+    EXPECT_EQ((std::array<unsigned char, 4>{1, 2, 3, 255}), four) << "a vector goes into a value buffer";
+    void* pointer = nullptr;
+    KFS_PostCacheVector4Value(wide, 0, vector, four.data(), &pointer);
+    EXPECT_EQ(four.data(), pointer);
 }
 
 TEST_F(Evaluate, TimesComeInAnyScale)
 {
-    TestStream stream({.timeScale = 600});
+    TestStream stream;
     stream.Key(0, {0.0}).Key(600, {6.0});
     double value = 0.0;
     for (const T_Time at : {T_Time{1, 2}, T_Time{300, 600}, T_Time{15, 30}}) {
@@ -172,9 +171,8 @@ TEST_F(Evaluate, TimesComeInAnyScale)
     }
     ASSERT_EQ(0, KFS_GetValueFPlus(stream, nullptr, 0, &value, nullptr, nullptr));
     EXPECT_EQ(0.0, value) << "no time is the origin";
-    const T_Time beyond{2000000000, 1};
+    const T_Time beyond{2000000000, 1}, noScale{1, 0};
     EXPECT_EQ(T_Err_Overflow, KFS_GetValueFPlus(stream, &beyond, 0, &value, nullptr, nullptr));
-    const T_Time noScale{1, 0};
     EXPECT_NE(0, KFS_GetValuePlus(stream, &noScale, 0, &value, nullptr, nullptr, nullptr, 0));
 }
 
@@ -186,67 +184,30 @@ TEST_F(Evaluate, WhatHasNoValueSaysSo)
     double value = -1.0;
     for (KFS_Stream* const stream : {keyed.get(), constant.get()}) {
         EXPECT_EQ(7427, KFS_GetValueFPlus(stream, &at, 0, &value, nullptr, nullptr));
-        EXPECT_REPORT(reports, 36, "attempt to get a value from a time stream with no key values.");
         EXPECT_EQ(7427, KFS_GetValuePlus(stream, &at, 0, &value, nullptr, nullptr, nullptr, 0));
-        EXPECT_REPORT(reports, 36, "attempt to get a value from a time stream with no key values.");
+        const Q_MemoryCount before = Q_MemoryLive(nullptr);
+        EXPECT_THROW(stream->ForceInterpolateAtTime({0, 600}), int);
+        EXPECT_EQ(before, Q_MemoryLive(nullptr));
+        EXPECT_EQ(
+            std::vector<Reported>(3, KfsReport(36, "attempt to get a value from a time stream with no key values.")),
+            reports.Take());
     }
     EXPECT_EQ(-1.0, value);
 }
 
 TEST_F(Evaluate, DoublesAreRefusedForCustomValues)
 {
-    KFS_ValueDesc desc;
-    desc.isCustom = 1;
-    desc.itemSize = 8;
-    desc.interpFunc = [](KFS_Stream const*, long, int, int) { return 0; };
+    const KFS_ValueDesc desc{1, 8, 0, [](KFS_Stream const*, long, int, int) { return 0; }};
     KFS_Stream stream(1, 600, 0, 0, 7, 0, desc, nullptr, nullptr, false);
+    const std::string text = "can#{rsquo}t compute floating point value(s) for a custom value";
     const T_Time at{0, 600};
     double value = -1.0;
     char** handle = nullptr;
     EXPECT_EQ(7441, KFS_GetValueF(&stream, &at, 0, &value, nullptr, nullptr));
-    EXPECT_REPORT(reports, 115, "can#{rsquo}t compute floating point value(s) for a custom value");
     EXPECT_EQ(7441, KFS_GetValuesFPlus(&stream, &at, &at, 1, 0, &handle));
-    EXPECT_REPORT(reports, 78, "can#{rsquo}t compute floating point value(s) for a custom value");
     EXPECT_EQ(7441, KFSp_Boundary([&] { KFS_GetValueFNoExpr(&stream, 0, 0, &value, nullptr, nullptr); }));
-    EXPECT_REPORT(reports, 78, "can#{rsquo}t compute floating point value(s) for a custom value");
+    EXPECT_EQ((std::vector{KfsReport(115, text), KfsReport(78, text), KfsReport(78, text)}), reports.Take());
     EXPECT_EQ(-1.0, value);
-}
-
-TEST_F(Evaluate, DamagedStreamsAreRefusedUntouched)
-{
-    const DamagedStream damaged;
-    const T_Time at{0, 600};
-    double value = -1.0;
-    unsigned char atKey = 9;
-    char** handle = nullptr;
-    KFS_Stream* const stream = damaged.get();
-    struct Row {
-        int operation;
-        char const* action;
-        std::function<int()> call;
-    };
-    const Row rows[] = {
-        {113, "get a value from", [&] { return KFS_GetValue(stream, &at, 0, &value, &atKey, nullptr); }},
-        {113, "get a value from",
-         [&] { return KFS_GetValuePlus(stream, &at, 0, &value, &atKey, nullptr, nullptr, 0); }},
-        {113, "get a value from", [&] { return KFS_GetValueF(stream, &at, 0, &value, &atKey, nullptr); }},
-        {113, "get a value from", [&] { return KFS_GetValueFPlus(stream, &at, 0, &value, &atKey, nullptr); }},
-        {36, "get a value from",
-         [&] { return KFSp_Boundary([&] { KFS_GetValueNoExpr(stream, 0, 0, &value, &atKey, nullptr, nullptr, 0); }); }},
-        {36, "get a value from",
-         [&] { return KFSp_Boundary([&] { KFS_GetValueFNoExpr(stream, 0, 0, &value, &atKey, nullptr); }); }},
-        {115, "get a value from", [&] { return KFS_GetValuesFPlus(stream, &at, &at, 1, 0, &handle); }},
-        {105, "dispose", [&] { return KFS_DisposeValue(stream, &value); }},
-        {9, "set value description", [&] { return KFS_SetValueDescription(stream, nullptr, nullptr); }},
-    };
-    for (const Row& row : rows) {
-        SCOPED_TRACE(row.operation);
-        EXPECT_EQ(2, row.call());
-        EXPECT_EQ(std::vector{DamagedReport(row.operation, row.action)}, reports.Take());
-    }
-    EXPECT_TRUE(damaged.Untouched());
-    EXPECT_EQ(-1.0, value);
-    EXPECT_EQ(9, atKey);
 }
 
 TEST_F(Evaluate, WithoutAStateThatSaysHowThereIsACodeAndNoCrash)
@@ -268,7 +229,7 @@ TEST_F(Evaluate, WithoutAStateThatSaysHowThereIsACodeAndNoCrash)
     EXPECT_EQ(1.0, value);
 }
 
-TEST_F(Evaluate, AnOverridesValueTakesThePlaceOfTheKeys)
+TEST_F(Evaluate, AnOverridesValueTakesThePlaceOfTheKeysAndForcedOnesStandInTheCache)
 {
     TestStream stream;
     stream.Key(0, {1.0}).Key(100, {2.0});
@@ -279,6 +240,12 @@ TEST_F(Evaluate, AnOverridesValueTakesThePlaceOfTheKeys)
     EXPECT_EQ(42.0, value);
     EXPECT_EQ(1, atKey);
     EXPECT_EQ(2.0, stream.At1(100));
+    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    stream->ValidateCacheAtTime({50, 600});
+    EXPECT_EQ(50, stream->GetCache()->time);
+    stream->ForceInterpolateAtTime({20, 600});
+    EXPECT_EQ(20, stream->GetCache()->time);
+    EXPECT_EQ(before, Q_MemoryLive(nullptr));
 }
 
 TEST_F(Evaluate, SamplesComeInOneHandle)
@@ -295,7 +262,6 @@ TEST_F(Evaluate, SamplesComeInOneHandle)
     ASSERT_EQ(0, KFS_GetValuesFPlus(stream, &start, &step, 0, 0, &handle));
     EXPECT_EQ(0u, Q_GetHandleSize(handle));
     Q_FreeHandle(handle);
-
     handle = nullptr;
     const Q_MemoryCount before = Q_MemoryLive(nullptr);
     const T_Time hugeStep{1000000000, 600};
@@ -332,20 +298,18 @@ TEST_F(Evaluate, SeparatedDimensionsAnswerFromTheirFollowers)
     y.Key(0, {5.0});
     leader.followers = {x.get(), y.get()};
     const double own[3] = {1.0, 2.0, 3.0};
-    const T_Time zero{0, 600}, at{50, 600};
-    ASSERT_EQ(0, KFS_InsertKeyF(&leader, &zero, 1, own, KFS_Interp_Linear, KFS_Interp_Linear));
+    const T_Time at{50, 600};
+    ASSERT_EQ(0, KFS_InsertKeyF(&leader, nullptr, 1, own, KFS_Interp_Linear, KFS_Interp_Linear));
     leader.SetDimensionsSeparated(true);
-    double value[3] = {-1.0, -1.0, -1.0};
-    unsigned char atKey = 9;
-    ASSERT_EQ(0, KFS_GetValueFPlus(&leader, &at, 0, value, &atKey, nullptr));
+    std::array<double, 3> value{};
+    ASSERT_EQ(0, KFS_GetValueFPlus(&leader, &at, 0, value.data(), nullptr, nullptr));
     EXPECT_EQ(1.0, value[0]) << "without a parent it reads its own keys";
     BareGroup root;
     leader.SetParent(&root);
-    double separated[3] = {-1.0, -1.0, -1.0};
-    atKey = 9;
-    ASSERT_EQ(0, KFS_GetValueFPlus(&leader, &at, 0, separated, &atKey, nullptr));
-    EXPECT_EQ((std::vector{15.0, 5.0, -1.0}), std::vector(separated, separated + 3))
-        << "without a follower a place stays";
+    value = {-1.0, -1.0, -1.0};
+    unsigned char atKey = 9;
+    ASSERT_EQ(0, KFS_GetValueFPlus(&leader, &at, 0, value.data(), &atKey, nullptr));
+    EXPECT_EQ((std::array{15.0, 5.0, -1.0}), value) << "without a follower a place stays";
     EXPECT_EQ(9, atKey);
     leader.ForceInterpolateAtTime(at);  // whose buffer has to hold the followers' doubles, and not three bytes
     char** handle = nullptr;
@@ -353,35 +317,6 @@ TEST_F(Evaluate, SeparatedDimensionsAnswerFromTheirFollowers)
     auto const* const values = reinterpret_cast<double const*>(*handle);
     EXPECT_EQ((std::vector{15.0, 5.0, 0.0, 20.0, 5.0, 0.0}), std::vector(values, values + 6));
     Q_FreeHandle(handle);
-}
-
-TEST_F(Evaluate, ForcedValuesStandInTheCache)
-{
-    TestStream stream;
-    stream.Key(0, {0.0}).Key(100, {1.0});
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
-    stream->ValidateCacheAtTime({50, 600});
-    EXPECT_EQ(50, stream->GetCache()->time);
-    stream->ForceInterpolateAtTime({20, 600});
-    EXPECT_EQ(20, stream->GetCache()->time);
-    EXPECT_EQ(before, Q_MemoryLive(nullptr));
-    const TestStream empty;
-    const Q_MemoryCount withEmpty = Q_MemoryLive(nullptr);
-    EXPECT_THROW(empty->ForceInterpolateAtTime({0, 600}), int);
-    EXPECT_REPORT(reports, 36, "attempt to get a value from a time stream with no key values.");
-    EXPECT_EQ(withEmpty, Q_MemoryLive(nullptr));
-}
-
-TEST_F(Evaluate, AVectorGoesIntoAValueBuffer)
-{
-    const TestStream bytes({.dimension = 4, .type = KFS_Type_U8});
-    const M_Vector4T<double> vector{{1.0, 2.0, 3.4, 254.6}};
-    unsigned char value[4] = {};
-    KFS_PostCacheVector4Value(bytes, 0, vector, nullptr, value);
-    EXPECT_EQ((std::vector<unsigned char>{1, 2, 3, 255}), std::vector(value, value + 4));
-    void* pointer = nullptr;
-    KFS_PostCacheVector4Value(bytes, 0, vector, value, &pointer);
-    EXPECT_EQ(value, pointer);
 }
 
 TEST_F(Evaluate, ReadsAllocateNothing)

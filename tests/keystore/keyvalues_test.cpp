@@ -13,29 +13,24 @@ TEST_F(KeyValues, KeysAreReadInTheStreamsExternalForm)
     TestStream stream({.dimension = 3, .type = KFS_Type_S16});
     stream.Key(0, {0.0, 0.0, 0.0}, KFS_Interp_Hold)
         .Key(10, {-1.5, 2.25, 40000.0}, KFS_Interp_Linear, KFS_Interp_Spline);
-    short value[4] = {77, 77, 77, 77};
+    std::array<short, 4> value{77, 77, 77, 77};
     char in = 77;
     char out = 77;
-    EXPECT_EQ(0, KFS_GetKey(stream, 1, value, &in, &out));
-    EXPECT_EQ(-2, value[0]) << "halves away from zero";
-    EXPECT_EQ(2, value[1]);
-    EXPECT_EQ(static_cast<short>(40000), value[2]) << "nothing is clamped";
-    EXPECT_EQ(77, value[3]);
+    EXPECT_EQ(0, KFS_GetKey(stream, 1, value.data(), &in, &out));
+    EXPECT_EQ((std::array<short, 4>{-2, 2, 40000 - 65536, 77}), value) << "halves away from zero, nothing is clamped";
     EXPECT_EQ(KFS_Interp_Linear, in);
     EXPECT_EQ(KFS_Interp_Spline, out);
-    double numbers[4] = {77.0, 77.0, 77.0, 77.0};
-    EXPECT_EQ(0, KFS_GetKeyF(stream, -1, numbers, &in, &out)) << "-1 names the last key";
-    EXPECT_EQ(-1.5, numbers[0]);
-    EXPECT_EQ(40000.0, numbers[2]);
-    EXPECT_EQ(77.0, numbers[3]);
+    std::array<double, 4> numbers{77.0, 77.0, 77.0, 77.0};
+    EXPECT_EQ(0, KFS_GetKeyF(stream, -1, numbers.data(), &in, &out)) << "-1 names the last key";
+    EXPECT_EQ((std::array{-1.5, 2.25, 40000.0, 77.0}), numbers);
     unsigned short flags = 0;
     stream.Record(1)->flags |= KFS_KeyFlag_Continuous;
     EXPECT_EQ(0, KFS_GetKeyFlags(stream, 1, &flags));
     EXPECT_EQ(stream.Record(1)->flags, flags);
     for (const int bad : {2, -2}) {
         EXPECT_EQ(SEQ_Err_BadIndex, KFS_GetKeyFlags(stream, bad, &flags));
-        EXPECT_EQ(SEQ_Err_BadIndex, KFS_GetKey(stream, bad, value, &in, &out));
-        EXPECT_EQ(SEQ_Err_BadIndex, KFS_GetKeyF(stream, bad, numbers, &in, &out));
+        EXPECT_EQ(SEQ_Err_BadIndex, KFS_GetKey(stream, bad, value.data(), &in, &out));
+        EXPECT_EQ(SEQ_Err_BadIndex, KFS_GetKeyF(stream, bad, numbers.data(), &in, &out));
         EXPECT_EQ(KFS_Interp_None, in);
     }
 }
@@ -49,10 +44,9 @@ TEST_F(KeyValues, TheRecordSaysWhereItsValueIs)
     key->flags = static_cast<unsigned short>(key->flags & ~KFS_KeyFlag_SpatialBlock);
     KFSp_Numbers(key)[0] = 8.0;
     KFSp_Numbers(key)[1] = 9.0;
-    double numbers[2];
-    EXPECT_EQ(0, KFS_GetKeyF(stream, 0, numbers, nullptr, nullptr));
-    EXPECT_EQ(8.0, numbers[0]);
-    EXPECT_EQ(9.0, numbers[1]);
+    std::array<double, 2> numbers{};
+    EXPECT_EQ(0, KFS_GetKeyF(stream, 0, numbers.data(), nullptr, nullptr));
+    EXPECT_EQ((std::array{8.0, 9.0}), numbers);
     key->flags |= KFS_KeyFlag_SpatialBlock;
     key->remapTable = nullptr;
 }

@@ -23,15 +23,9 @@ struct Visitor {
         visitor->times.push_back(key->time);
         visitor->indices.push_back(index);
         EXPECT_EQ(KFS_StreamValidStamp, stream->GetStamp());
-        if (key->time != visitor->stopAt) {
-            return 0;
-        }
-        if (visitor->answer == -1) {
-            throw 815;
-        }
-        if (visitor->answer == -2) {
-            throw std::runtime_error("from inside");
-        }
+        if (key->time != visitor->stopAt) return 0;
+        if (visitor->answer == -1) throw 815;
+        if (visitor->answer == -2) throw std::runtime_error("from inside");
         return visitor->answer;
     }
     long Word() { return reinterpret_cast<long>(this); }
@@ -50,27 +44,10 @@ TEST_F(KeyWalk, WalksTheKeysOfARangeOfTimes)
         int first, last;
         std::vector<int> times;
     };
+    // What lies between two times is the random test's.
     const Row rows[] = {
-        {Null, Null, {10, 20, 30}},
-        {Null, 20, {10, 20}},
-        {20, Null, {20, 30}},
-        {10, 30, {10, 20, 30}},
-        {30, 10, {30, 20, 10}},
-        {15, 25, {20}},
-        {25, 15, {20}},
-        {11, 19, {}},
-        {19, 11, {}},
-        {20, 20, {20}},
-        {5, 99, {10, 20, 30}},
-        {99, 5, {30, 20, 10}},
-        {31, 99, {}},
-        {99, 31, {}},
-        {-5, 9, {}},
-        {9, -5, {}},
-        {Null, 9, {}},
-        {31, Null, {}},
-        {30, 30, {30}},
-        {30, 15, {30, 20}},
+        {Null, Null, {10, 20, 30}}, {Null, 20, {10, 20}}, {20, Null, {20, 30}}, {Null, 9, {}}, {31, Null, {}},
+        {10, 30, {10, 20, 30}},     {30, 15, {30, 20}},   {11, 19, {}},
     };
     for (const Row& row : rows) {
         for (const unsigned finer : {1u, 5u}) {
@@ -91,29 +68,19 @@ TEST_F(KeyWalk, WalksTheKeysOfARangeOfTimes)
     }
 }
 
-// Two ways to say which keys are meant: by their times, and by the times of a random range.
 TEST_F(KeyWalk, AgreesWithAFilterOverRandomKeys)
 {
     std::mt19937 random(34);
     for (int round = 0; round < 30; ++round) {
         TestStream keys;
-        for (int i = 0; i < 20; ++i) {
-            keys.Key(static_cast<int>(random() % 100), {0.0});
-        }
+        for (int i = 0; i < 20; ++i) keys.Key(static_cast<int>(random() % 100), {0.0});
         for (int ask = 0; ask < 20; ++ask) {
             const int a = static_cast<int>(random() % 120) - 10;
             const int b = static_cast<int>(random() % 120) - 10;
-            std::vector<int> expected;
-            for (const int time : keys.Times()) {
-                if (time >= std::min(a, b) && time <= std::max(a, b)) {
-                    expected.push_back(time);
-                }
-            }
-            if (a > b) {
-                std::reverse(expected.begin(), expected.end());
-            }
-            const T_Time first = keys.Time(a);
-            const T_Time last = keys.Time(b);
+            std::vector<int> expected = keys.Times();
+            std::erase_if(expected, [&](int time) { return time < std::min(a, b) || time > std::max(a, b); });
+            if (a > b) std::reverse(expected.begin(), expected.end());
+            const T_Time first = keys.Time(a), last = keys.Time(b);
             Visitor visitor;
             EXPECT_EQ(0, KFS_ForRange(keys, &first, &last, visitor.Word(), Visitor::Visit, nullptr));
             EXPECT_EQ(expected, visitor.times) << a << " to " << b;
@@ -144,23 +111,20 @@ TEST_F(KeyWalk, WalksTheKeysOfARangeOfIndices)
 
 TEST_F(KeyWalk, TheFunctionEndsTheWalk)
 {
-    struct Row {
-        int answer, code;
-    };
-    for (const Row& row : {Row{4711, 4711}, Row{-1, 815}, Row{-2, Q_Err_Exception}}) {
-        SCOPED_TRACE(row.code);
+    for (const auto& [answer, code] : {std::pair{4711, 4711}, {-1, 815}, {-2, static_cast<int>(Q_Err_Exception)}}) {
+        SCOPED_TRACE(code);
         Visitor visitor;
         visitor.stopAt = 20;
-        visitor.answer = row.answer;
+        visitor.answer = answer;
         T_Time lastTime{77, 77};
-        EXPECT_EQ(row.code, KFS_ForRange(stream, nullptr, nullptr, visitor.Word(), Visitor::Visit, &lastTime));
+        EXPECT_EQ(code, KFS_ForRange(stream, nullptr, nullptr, visitor.Word(), Visitor::Visit, &lastTime));
         EXPECT_EQ((std::vector{10, 20}), visitor.times);
         EXPECT_EQ(20, lastTime.value) << "the last key handed out";
         int lastIndex = 77;
-        EXPECT_EQ(row.code, KFS_ForIndexRange(stream, 2, 0, visitor.Word(), Visitor::Visit, &lastIndex));
+        EXPECT_EQ(code, KFS_ForIndexRange(stream, 2, 0, visitor.Word(), Visitor::Visit, &lastIndex));
         EXPECT_EQ(1, lastIndex);
         EXPECT_EQ(0, stream.Pins());
-        EXPECT_EQ(row.answer == -2 ? 2u : 0u, reports.Take().size());
+        EXPECT_EQ(answer == -2 ? 2u : 0u, reports.Take().size());
     }
 }
 
@@ -196,9 +160,7 @@ TEST_F(KeyWalk, NothingToWalkOverIsReported)
         EXPECT_EQ(0u, lastTime.scale);
         EXPECT_EQ(None, lastIndex);
     }
-    EXPECT_TRUE(visitor.times.empty());
-    const T_Time noScale{0, 0};
-    const T_Time fine{0, 600};
+    const T_Time noScale{0, 0}, fine{0, 600};
     EXPECT_NE(0, KFS_ForRange(stream, &noScale, &fine, visitor.Word(), Visitor::Visit, nullptr));
     EXPECT_NE(0, KFS_ForRange(stream, nullptr, &noScale, visitor.Word(), Visitor::Visit, nullptr));
     EXPECT_TRUE(visitor.times.empty());

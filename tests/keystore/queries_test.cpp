@@ -2,16 +2,12 @@
 
 #include "tests/support/listening.h"
 #include "tests/support/streams.h"
+#include "tests/support/text.h"
 
 #include <cmath>
 #include <limits>
 
 namespace {
-
-u16str Text(char const* text)
-{
-    return Q_MBToUTF16String(text);
-}
 
 class Queries : public StreamTest {};
 
@@ -66,22 +62,19 @@ TEST_F(Queries, MasksAndParameterFlagsSayHowItMayBeAnimated)
 
 TEST_F(Queries, WhichKindsCanHaveAnExpression)
 {
-    KFS_ValueDesc desc;
-    desc.dataType = KFS_Type_Double;
-    const KFS_MatchName name("a kind", true);
-    KFS_Stream stream(1, 600, 0, 0, KFS_InterpMask_All, 0, desc, &name, nullptr, false);
-    const TestStream nameless;
+    const TestStream stream, nameless;
+    stream->SetMatchName(KFS_MatchName("a kind", true));
     for (int kind = -1; kind < 20; ++kind) {
         FX_ParamDef def{};
         def.paramType = kind;
-        stream.SetParamDef(def);
+        stream->SetParamDef(def);
         nameless->SetParamDef(def);
         const bool cannot = kind == 0 || kind == 8 || kind == 9 || (kind >= 12 && kind <= 14);
-        EXPECT_EQ(!cannot, stream.CanHaveExpression()) << kind;
+        EXPECT_EQ(!cannot, stream->CanHaveExpression()) << kind;
         EXPECT_TRUE(nameless->CanHaveExpression()) << kind;
     }
-    stream.SetInterpMask(0);
-    EXPECT_FALSE(stream.CanHaveExpression()) << "what can't be animated";
+    stream->SetInterpMask(0);
+    EXPECT_FALSE(stream->CanHaveExpression()) << "what can't be animated";
 }
 
 TEST_F(Queries, SameHoldSameValue)
@@ -126,7 +119,6 @@ TEST_F(Queries, ASetValueFindsAKeyAtItsTime)
     EXPECT_EQ((std::vector{0, 25, 100}), stream.Times());
     EXPECT_DOUBLE_EQ(2.5, stream.Numbers(1)[0]) << "with the value that the stream has there";
     EXPECT_EQ(T_Err_Overflow, KFSp_Boundary([&] { stream->PrepareSetValue({2000000000, 1}); }));
-
     TestStream constant({.noKeys = true});
     constant.Key(0, {1.0});
     constant->PrepareSetValue(constant.Time(50));
@@ -217,8 +209,7 @@ TEST_F(Queries, LimitsComeFromTheParameterRecord)
         EXPECT_EQ(row.uiMin, limited.GetUIMinValue());
         EXPECT_EQ(row.uiMax, limited.GetUIMaxValue());
         EXPECT_EQ(row.precision, limited.GetPrecision());
-        const bool isSlider =
-            row.kind == FX_Param_INT_SLIDER || row.kind == FX_Param_FIXED_SLIDER || row.kind == FX_Param_FLOAT_SLIDER;
+        const bool isSlider = row.uiMin != row.min;
         limited.SetUIMinValue(-4.0);
         limited.SetUIMaxValue(2.0);
         EXPECT_EQ(isSlider ? -4.0 : row.uiMin, limited.GetUIMinValue());
@@ -255,10 +246,9 @@ TEST_F(Queries, ALegalValueLiesWithinTheLimitsThatThereAre)
             EXPECT_EQ(legal, result);
             std::vector<double> nans(5, nan);
             stream.LegalizeValue(nans.data());
+            EXPECT_EQ(!hasMin && !hasMax, std::isnan(nans[0]));
             if (hasMin || hasMax) {
-                EXPECT_EQ(std::vector<double>(5, hasMin ? -0.5 : 8.25), nans) << "a NaN becomes a limit";
-            } else {
-                EXPECT_TRUE(std::isnan(nans[0]));
+                EXPECT_EQ(std::vector<double>(5, hasMin ? -0.5 : 8.25), nans) << "a NaN is a limit";
             }
             stream.DisableLegalizeValue(true);
             stream.DisableLegalizeValue(true);
@@ -270,62 +260,54 @@ TEST_F(Queries, ALegalValueLiesWithinTheLimitsThatThereAre)
     }
 }
 
+// The flags of a fixed slider are looked for in two places, of which one is the integer part of its minimum.
 TEST_F(Queries, UnitsAndComponentsHaveNames)
 {
     struct Row {
         int kind;
         short dimension;
-        unsigned short displayFlags;  // of the float slider's place in the record
+        int wholeMin;  // of a fixed slider
+        unsigned short displayFlags;
         char const* units;
         std::vector<char const*> components;
     };
     const Row rows[] = {
-        {FX_Param_FIXED_ANGLE, 1, 0, "degrees", {"", ""}},
-        {FX_Param_POINT_2D, 2, 0, "pixels", {"X", "Y", "Z", "", ""}},
-        {FX_Param_POINT_3D, 3, 0, "pixels", {"X", "Y", "Z", ""}},
-        {FX_Param_FLOAT_SLIDER, 1, 0, "", {"", ""}},
-        {FX_Param_FLOAT_SLIDER, 2, 1, "percent", {"X", "Y"}},
-        {FX_Param_FLOAT_SLIDER, 1, 4, "pixels", {""}},
-        {FX_Param_FLOAT_SLIDER, 1, 5, "percent", {""}},
-        {FX_Param_COLOR, 4, 0, "", {"alpha", "red", "green", "blue", ""}},
-        {FX_Param_BOOL, 2, 0, "", {"", ""}},
-        {FX_Param_NotFilledIn, 2, 0, "", {"", ""}},
+        {FX_Param_FIXED_ANGLE, 1, 0, 0, "degrees", {"", ""}},
+        {FX_Param_POINT_2D, 2, 0, 0, "pixels", {"X", "Y", "Z", "", ""}},
+        {FX_Param_POINT_3D, 3, 0, 0, "pixels", {"X", "Y", "Z", ""}},
+        {FX_Param_FLOAT_SLIDER, 1, 0, 0, "", {"", ""}},
+        {FX_Param_FLOAT_SLIDER, 2, 0, 1, "percent", {"X", "Y"}},
+        {FX_Param_FLOAT_SLIDER, 1, 0, 4, "pixels", {""}},
+        {FX_Param_FLOAT_SLIDER, 1, 0, 5, "percent", {""}},
+        {FX_Param_FIXED_SLIDER, 1, 0, 1, "percent", {""}},
+        {FX_Param_FIXED_SLIDER, 1, 3, 0, "percent", {""}},
+        {FX_Param_FIXED_SLIDER, 1, 4, 0, "pixels", {""}},
+        {FX_Param_FIXED_SLIDER, 1, 2, 4, "", {""}},
+        {FX_Param_FIXED_SLIDER, 1, -2, 0, "pixels", {""}},
+        {FX_Param_COLOR, 4, 0, 0, "", {"alpha", "red", "green", "blue", ""}},
+        {FX_Param_BOOL, 2, 0, 0, "", {"", ""}},
+        {FX_Param_NotFilledIn, 2, 0, 0, "", {"", ""}},
     };
     for (const Row& row : rows) {
-        SCOPED_TRACE(testing::Message() << "kind " << row.kind << " flags " << row.displayFlags);
+        SCOPED_TRACE(testing::Message() << row.kind << " min " << row.wholeMin << " flags " << row.displayFlags);
         const TestStream stream({.dimension = row.dimension});
         FX_ParamDef def{};
         def.paramType = row.kind;
-        def.value.floatSlider.displayFlags = row.displayFlags;
+        if (row.kind == FX_Param_FIXED_SLIDER) {
+            def.value.fixedSlider.validMin = row.wholeMin * 65536;
+            def.value.fixedSlider.displayFlags = row.displayFlags;
+        } else {
+            def.value.floatSlider.displayFlags = row.displayFlags;
+        }
         stream->SetParamDef(def);
         EXPECT_EQ(Text(row.units), stream->GetUnitsName());
         EXPECT_EQ(Text(row.units), stream->GetEnglishUnitsName());
-        for (std::size_t i = 0; i < row.components.size(); ++i) {
-            EXPECT_EQ(Text(row.components[i]), stream->GetDimensionName(static_cast<short>(i))) << i;
-            EXPECT_EQ(Text(row.components[i]), stream->GetEnglishDimensionName(static_cast<short>(i))) << i;
+        for (short i = 0; i < static_cast<short>(row.components.size()); ++i) {
+            const u16str name = Text(row.components[static_cast<std::size_t>(i)]);
+            EXPECT_EQ(name, stream->GetDimensionName(i)) << i;
+            EXPECT_EQ(name, stream->GetEnglishDimensionName(i)) << i;
         }
         EXPECT_EQ(u16str(), stream->GetDimensionName(-1));
-    }
-}
-
-// The flags of a fixed slider are looked for in two places, of which one is the integer part of its minimum.
-TEST_F(Queries, AFixedSlidersMinimumReadsAsUnits)
-{
-    struct Row {
-        int wholeMin;
-        unsigned short displayFlags;
-        char const* units;
-    };
-    for (const Row& row : {Row{0, 0, ""}, Row{0, 1, "percent"}, Row{3, 0, "percent"}, Row{4, 0, "pixels"},
-                           Row{2, 4, ""}, Row{-2, 0, "pixels"}}) {
-        const TestStream stream;
-        FX_ParamDef def{};
-        def.paramType = FX_Param_FIXED_SLIDER;
-        def.value.fixedSlider.validMin = row.wholeMin * 65536;
-        def.value.fixedSlider.displayFlags = row.displayFlags;
-        stream->SetParamDef(def);
-        EXPECT_EQ(Text(row.units), stream->GetUnitsName()) << row.wholeMin << " " << row.displayFlags;
-        EXPECT_EQ(Text(row.units), stream->GetEnglishUnitsName());
     }
 }
 

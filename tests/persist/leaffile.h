@@ -93,7 +93,7 @@ inline int ReadLeaf(KFS_Stream* stream, std::string const& file)
 {
     CKF_File open;
     EXPECT_EQ(0, open.Open(Span(file))) << open.LastErrorText();
-    return KFSp_Boundary([&] { stream->Read(&open, nullptr); });
+    return Thrown([&] { stream->Read(&open, nullptr); });
 }
 
 // What Write makes of a stream, in the version that `prepare` asks for.
@@ -103,7 +103,7 @@ inline MemoryFile Written(KFS_Stream const* stream, std::function<void(CKF_File*
         if (prepare) {
             prepare(file);
         }
-        EXPECT_EQ(0, KFSp_Boundary([&] { stream->Write(file); }));
+        EXPECT_EQ(0, Thrown([&] { stream->Write(file); }));
     });
 }
 

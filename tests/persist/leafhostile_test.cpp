@@ -56,7 +56,7 @@ void ReadAny(KFS_Stream* stream, std::string const& bytes)
 {
     CKF_File file;
     if (file.Open(Span(bytes)) == 0) {
-        static_cast<void>(KFSp_Boundary([&] { stream->Read(&file, nullptr); }));
+        static_cast<void>(Thrown([&] { stream->Read(&file, nullptr); }));
     }
 }
 

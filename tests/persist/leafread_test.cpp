@@ -83,6 +83,25 @@ TEST_F(LeafRead, AConstantByHand)
     EXPECT_EQ(2.5, stream.At1(0));
 }
 
+TEST_F(LeafRead, ASpatialConstantByHand)
+{
+    LeafRecord record;
+    record.Dimension(2).Flags(KFS_StreamFlag_NoKeys | KFS_StreamFlag_Spatial).Put(72, Long(5)).Put(78, Short(0x18));
+    record.Put(80, Long(0x0A0B0C0D)).Put(84, Doubles({1.5, 0.25, 2.5, 0.75}));
+    TestStream stream;
+    ASSERT_EQ(0, ReadLeaf(stream, Form(Leaf(record, Value({3, 4, 5, 6, 7, 8})))));
+    KFS_KeyScalar const* const cache = stream->GetCache();
+    EXPECT_EQ(0x18 | KFS_KeyFlag_SpatialBlock, cache->flags);
+    EXPECT_EQ(0x0A0B0C0Du, cache->spFlags);
+    EXPECT_EQ(1.5, cache->inSpeed);
+    EXPECT_EQ(0.25, cache->inInfluence);
+    EXPECT_EQ(2.5, cache->outSpeed);
+    EXPECT_EQ(0.75, cache->outInfluence);
+    EXPECT_EQ(nullptr, cache->remapTable);
+    EXPECT_EQ((std::vector<double>{3, 4, 5, 6, 7, 8}),
+              (std::vector<double>{KFSp_Numbers(cache), KFSp_Numbers(cache) + 6}));
+}
+
 TEST_F(LeafRead, KeysByHand)
 {
     TestStream stream;
@@ -100,7 +119,7 @@ TEST_F(LeafRead, KeysByHand)
 TEST_F(LeafRead, RecordsOfOtherLengths)
 {
     LeafRecord record;
-    record.HasExpression(6);
+    record.HasExpression(0x80000006);
     for (std::size_t const size : {12u, 16u, 60u, 61u, 72u, 119u}) {
         SCOPED_TRACE(size);
         TestStream stream;
@@ -114,7 +133,7 @@ TEST_F(LeafRead, RecordsOfOtherLengths)
     ASSERT_EQ(0,
               ReadLeaf(stream, Form(Leaf(record.Bytes() + std::string(33, 'x'), OneValue + Atom("Utf8", "wiggle")))));
     EXPECT_EQ(Text("wiggle"), KFS_GetStreamExpression(stream));
-    EXPECT_EQ(6u, KFS_GetStreamExprFlags(stream));
+    EXPECT_EQ(0x80000006u, KFS_GetStreamExprFlags(stream));
     EXPECT_EQ(2.5, stream.At1(0));
 }
 
@@ -243,6 +262,20 @@ TEST_F(LeafRead, APropertyThatDoesNotAnimateBecomesConstant)
     }
 }
 
+// The value of a constant that the file turns into keys is gone, also where there is no key.
+TEST_F(LeafRead, KeysOfWhichThereAreNone)
+{
+    for (bool const hasList : {false, true}) {
+        SCOPED_TRACE(hasList);
+        FixedLeaf stream;
+        LeafRecord record;
+        record.Flags(0).Put(68, hasList ? "\x01" : std::string(1, '\0'));
+        ASSERT_EQ(0, ReadLeaf(&stream, Form(Leaf(record, hasList ? Keys(48, {}) : ""))));
+        EXPECT_EQ(KFS_INVALID_INDEX, stream.GetCache()->time);
+        EXPECT_TRUE(stream.HasNoValue());
+    }
+}
+
 TEST_F(LeafRead, SkippedLeavesTakeNothing)
 {
     FixedLeaf stream;
@@ -250,10 +283,10 @@ TEST_F(LeafRead, SkippedLeavesTakeNothing)
     CKF_File open;
     std::string const file = Form(Leaf(LeafRecord(), OneValue));
     ASSERT_EQ(0, open.Open(Span(file)));
-    EXPECT_EQ(0, KFSp_Boundary([&] { stream.Read(&open, nullptr); }));
+    EXPECT_EQ(0, Thrown([&] { stream.Read(&open, nullptr); }));
     EXPECT_EQ(42.0, stream.Value());
     stream.SetStreamBaseFlags(0, KFS_BaseFlag_SkipLeafRead);
-    EXPECT_EQ(0, KFSp_Boundary([&] { stream.Read(&open, nullptr); })) << "the chunk is still there";
+    EXPECT_EQ(0, Thrown([&] { stream.Read(&open, nullptr); })) << "the chunk is still there";
     EXPECT_EQ(2.5, stream.Value());
 }
 
@@ -265,7 +298,7 @@ TEST_F(LeafRead, WhoHasEnteredTheListPassesIt)
     TestStream stream;
     {
         CKF_ScDescendList const list(&open, CKF_Id("kfbs"), nullptr, nullptr);
-        EXPECT_EQ(0, KFSp_Boundary([&] { stream->Read(&open, list.GetChunkInfo()); }));
+        EXPECT_EQ(0, Thrown([&] { stream->Read(&open, list.GetChunkInfo()); }));
     }
     EXPECT_EQ(2.5, stream.At1(0));
     EXPECT_EQ("next:4", Outline(&open));
@@ -455,8 +488,12 @@ TEST_F(LeafRead, EveryAllocationMayFail)
         [&](TestStream& stream) {
             CKF_File open;
             KFSp_ThrowIf(open.Open(Span(file)));
-            stream->Read(&open, nullptr);
-            return 0;
+            try {
+                return Thrown([&] { stream->Read(&open, nullptr); });
+            } catch (std::exception const& exception) {
+                ADD_FAILURE() << "not a code: " << exception.what();
+                return 4;
+            }
         },
         [&](TestStream& stream, int, Q_MemoryCount const&) {
             static_cast<void>(reports.Take());

@@ -5,6 +5,7 @@
 #include "overrides/streamexpression.h"
 #include "persist/oldstreamid.h"
 #include "tests/persist/leaffile.h"
+#include "tests/support/ownedvalues.h"
 #include "tree/paramstreams.h"
 
 #include <limits>
@@ -106,6 +107,15 @@ TEST_F(LeafWrite, TheCacheFieldsOfASpatialConstant)
     std::string const data = DataOf("cdat", file);
     ASSERT_EQ(48u, data.size());
     EXPECT_EQ(Doubles(value), data.substr(0, 16));
+}
+
+TEST_F(LeafWrite, TheDescriptionOfAClientsValues)
+{
+    OwnedValues::Reset();
+    auto const stream = OwnedValues::MakeStream(true);
+    stream->GetValueDescForModify()->dataType = 0x1234;  // the client's own word
+    EXPECT_EQ(Short(1) + Short(sizeof(OwnedValues::Ticket)) + std::string("\xFF\0\0\0", 4),
+              DataOf("kfb4", Written(stream.get())).substr(56, 8));
 }
 
 TEST_F(LeafWrite, AListIsWrittenWhetherOrNotItIsUsed)
@@ -218,7 +228,7 @@ TEST_F(LayerWrite, OnlyALayerStreamHasALayer)
     SetParam(stream, FX_Param_LAYER);
     CKF_File file;
     ASSERT_EQ(0, file.CreateInMemory());
-    EXPECT_EQ(3, KFSp_Boundary([&] { stream->Write(&file); }));
+    EXPECT_EQ(3, Thrown([&] { stream->Write(&file); }));
     EXPECT_EQ((std::vector<Reported>{KfsReport(11, "stream with FX_Param_LAYER isn't a KFS_ParamLayerStream")}),
               reports.Take());
     EXPECT_NE(0, file.Commit()) << "a list is still open";
@@ -243,7 +253,7 @@ TEST_F(LeafWrite, ADamagedStreamIsNotWritten)
     DamagedStream const damaged;
     CKF_File file;
     ASSERT_EQ(0, file.CreateInMemory());
-    EXPECT_EQ(2, KFSp_Boundary([&] { damaged.get()->KFS_Stream::Write(&file); }));
+    EXPECT_EQ(2, Thrown([&] { damaged.get()->KFS_Stream::Write(&file); }));
     EXPECT_EQ((std::vector<Reported>{DamagedReport(11, "write out")}), reports.Take());
     EXPECT_EQ(0, file.Commit()) << "nothing has reached the file";
     EXPECT_TRUE(damaged.Untouched());
@@ -269,7 +279,7 @@ TEST_F(LeafWrite, EveryWriteMayFail)
             {
                 CKF_File file;
                 static_cast<void>(file.CreateInMemory(&hook));  // fails for the first few
-                int const code = KFSp_Boundary([&] { stream->Write(&file); });
+                int const code = Thrown([&] { stream->Write(&file); });
                 if (!hook.Fired()) {
                     EXPECT_EQ(0, code);
                     break;
@@ -283,6 +293,41 @@ TEST_F(LeafWrite, EveryWriteMayFail)
             ASSERT_LT(failures, 100);
         }
         EXPECT_LT(10, failures);
+    }
+}
+
+// The same for memory, with the text of an expression in either form.
+TEST_F(LeafWrite, EveryAllocationMayFail)
+{
+    for (int const major : {71, 95}) {
+        SCOPED_TRACE(major);
+        auto const prepare = [=](CKF_File* file) { file->SetVersion(major, 0); };
+        std::vector<unsigned char> whole;
+        int const failures = FailEveryAllocation(
+            [&] {
+                auto stream = std::make_unique<TestStream>(StreamOptions{.dimension = 2, .spatial = true});
+                stream->Key(0, {1.0, 2.0}).Key(60, {5.0, 6.0});
+                stream->get()->SetKFSFlags(KFS_StreamFlag_NoKeys | KFS_StreamFlag_Spatial);
+                KFS_SetStreamExpression(*stream, Q_MBToUTF16String("caf\xC3\xA9, and more than a short string holds"));
+                whole = Written(*stream, prepare).Bytes();
+                return stream;
+            },
+            [&](TestStream& stream) {
+                CKF_File file;
+                prepare(&file);
+                KFSp_ThrowIf(file.CreateInMemory());
+                int const code = Thrown([&] { stream->Write(&file); });
+                int const committed = file.Commit();
+                EXPECT_TRUE(code == 0 || committed != 0) << "a save that failed isn't committed";
+                return code;
+            },
+            [&](TestStream& stream, int, Q_MemoryCount const& before) {
+                EXPECT_EQ(before, Q_MemoryLive(nullptr));
+                static_cast<void>(reports.Take());
+                EXPECT_EQ(0, stream.Pins());
+                EXPECT_EQ(whole, Written(stream, prepare).Bytes());
+            });
+        EXPECT_LT(5, failures);
     }
 }
 

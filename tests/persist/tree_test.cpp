@@ -1,108 +1,15 @@
 #include "tree/streamgroup.h"
 
-#include "tests/persist/leaffile.h"
-#include "tests/support/groups.h"
+#include "tests/persist/treefile.h"
 #include "tests/support/notifications.h"
 #include "tree/paramstreams.h"
 
 #include <limits>
-#include <random>
 #include <utility>
 
 namespace {
 
 using Lines = std::vector<std::string>;
-
-std::string MatchName(std::string name)
-{
-    name.resize(40);
-    return Atom("kfmn", name);
-}
-std::string const End = MatchName("ZQVM Group End");
-std::string const Marker = "-_0_/-";
-
-std::string BaseNamed(std::string const& name, unsigned flags = KFS_BaseFlag_Active)
-{
-    return Atom("kfsb", Long(flags)) + Atom("kfsn", name);
-}
-
-std::string Group(std::string const& name, std::string const& children)
-{
-    return List("kfgp", BaseNamed(name) + children + End);
-}
-
-std::string OneLeaf(std::string const& name, double value, int dimension = 1)
-{
-    std::vector<double> numbers(static_cast<std::size_t>(dimension) * 5, 0.0);
-    std::fill_n(numbers.begin(), dimension, value);
-    return List("kfbs",
-                BaseNamed(name) + Atom("kfb4", LeafRecord().Dimension(dimension)) + Atom("cdat", Doubles(numbers)));
-}
-
-// The match names in a file, indented by how deep they stand, a group's end left out.
-Lines NamesIn(MemoryFile const& file)
-{
-    Lines names;
-    CKF_ChunkWalk walk(file.Bytes());
-    CKF_RawChunk chunk;
-    while (walk.Next(&chunk)) {
-        if (Long(static_cast<std::uint32_t>(chunk.id)) == "kfmn") {
-            EXPECT_EQ(40u, chunk.data.size());
-            std::string const name = reinterpret_cast<char const*>(chunk.data.data());
-            if (name != "ZQVM Group End") {
-                names.push_back(std::string(static_cast<std::size_t>(chunk.depth - 2), ' ') + name);
-            }
-        }
-    }
-    return names;
-}
-
-MemoryFile WrittenGroup(KFS_StreamGroup const* group, int major = 95)
-{
-    return MemoryFile([=](CKF_File* file) {
-        file->SetVersion(major, 0);
-        EXPECT_EQ(0, KFSp_Boundary([&] { group->Write(file); }));
-    });
-}
-
-int ReadGroup(KFS_StreamGroup* group, std::string const& file)
-{
-    CKF_File open;
-    EXPECT_EQ(0, open.Open(Span(file))) << open.LastErrorText();
-    return KFSp_Boundary([&] { group->Read(&open, nullptr); });
-}
-int ReadGroup(KFS_StreamGroup* group, MemoryFile const& file)
-{
-    return ReadGroup(group, std::string(file.Bytes().begin(), file.Bytes().end()));
-}
-
-double ValueOf(KFS_StreamBase const* stream)
-{
-    return dynamic_cast<TestLeaf const*>(stream)->ValueAt(0);
-}
-
-void SetValue(KFS_StreamBase* stream, double value)
-{
-    KFS_Stream* const leaf = stream->GetAsLeaf();
-    std::vector<double> const values(static_cast<std::size_t>(leaf->GetDimension()), value);
-    T_Time const at{0, leaf->GetTimeScale()};
-    EXPECT_EQ(0, KFS_InsertKeyF(leaf, &at, 1, values.data(), 0, 0));
-}
-
-class Tree : public SceneTest {
-protected:
-    static std::unique_ptr<KFS_IndexedStreamGroup> MakeLayers()
-    {
-        return std::unique_ptr<KFS_IndexedStreamGroup>(TestKinds::Make("layers").release()->GetAsIndexedGroup());
-    }
-    static KFS_StreamBase* Append(KFS_IndexedStreamGroup* group, char const* kind)
-    {
-        Q_ScAutoPtr<KFS_StreamBase> stream = TestKinds::Make(kind);
-        KFS_StreamBase* const child = stream.get();
-        group->AppendStream(&stream);
-        return child;
-    }
-};
 
 TEST_F(Tree, AnUntouchedGroupCostsItsSubgroups)
 {
@@ -311,6 +218,43 @@ TEST_F(Tree, NamesThatAreTaken)
     EXPECT_EQ(Text("Top"), root->GetDisplayName());
 }
 
+// A leaf whose name only its file knows.
+class NamelessLeaf : public TestLeaf {
+public:
+    template <class... Arguments>
+    explicit NamelessLeaf(Arguments&&... arguments) : TestLeaf(std::forward<Arguments>(arguments)...)
+    {
+        pSetDisplayName(u16str());
+    }
+};
+
+TEST_F(Tree, NamesThatNobodyElseKnows)
+{
+    KFS_ScRegisterStreams batch(Get_VX_StreamFactory());
+    batch.Register(
+        Name("foreign"),
+        [](KFS_MatchName const& name, KFS_StreamFactory* factory, bool constant, unsigned int scale, bool canonical) {
+            return new NamelessLeaf(name, factory, constant, scale, canonical, short{1}, 0.0);
+        },
+        false);
+    {
+        TestKinds more;
+        more.Named("plug-in", {Name("foreign")});
+        for (bool const couldGoMissing : {false, true}) {
+            std::unique_ptr<KFS_NamedStreamGroup> group;
+            if (couldGoMissing) {
+                group = std::make_unique<OpenGroup>(Name("plug-in"), Get_VX_StreamFactory(), false,
+                                                    std::vector<KFS_MatchName>{});
+            } else {
+                group.reset(TestKinds::Make("plug-in").release()->GetAsNamedGroup());
+            }
+            ASSERT_EQ(0, ReadGroup(group.get(), Form(Group("", MatchName("foreign") + OneLeaf("Fade", 1.0)))));
+            EXPECT_EQ(Text(couldGoMissing ? "Fade" : ""), group->GetStream(0)->GetDisplayName());
+        }
+    }
+    batch.UnregisterAll();
+}
+
 TEST_F(Tree, ASceneThereAndBack)
 {
     auto const layers = MakeLayers();
@@ -474,89 +418,6 @@ TEST_F(Tree, ALoadIsHeard)
     EXPECT_EQ(
         (Notifications{"name root", "before-swap root opacity 0", "after-swap root opacity 0", "flags opacity 1 3"}),
         recorder.Take());
-}
-
-TEST_F(Tree, EveryWriteMayFail)
-{
-    auto const layers = MakeLayers();
-    SetValue(static_cast<KFS_NamedStreamGroup*>(Append(layers.get(), "node"))->GetEditableStream(Name("opacity")), 1.0);
-    for (int n = 1;; ++n) {
-        FailNthAppend hook(n);
-        CKF_File file;
-        static_cast<void>(file.CreateInMemory(&hook));  // fails for the first few
-        int const code = KFSp_Boundary([&] { layers->Write(&file); });
-        if (!hook.Fired()) {
-            EXPECT_EQ(0, code);
-            EXPECT_LT(20, n);
-            break;
-        }
-        EXPECT_NE(0, code) << n;
-        EXPECT_NE(0, file.Commit()) << n;
-    }
-}
-
-TEST_F(Tree, BrokenFilesLeaveAWholeTree)
-{
-    auto const layers = MakeLayers();
-    auto* const node = static_cast<KFS_NamedStreamGroup*>(Append(layers.get(), "node"));
-    SetValue(node->GetEditableStream(Name("opacity")), 1.0);
-    SetValue(Append(layers.get(), "opacity"), 2.0);
-    MemoryFile const whole = WrittenGroup(layers.get());
-    Q_MemoryCount const before = Q_MemoryLive(nullptr);
-    for (std::size_t size = 32; size < whole.Bytes().size(); ++size) {
-        SCOPED_TRACE(size);
-        {
-            CKF_File file;
-            auto const other = MakeLayers();
-            int const opened = file.Open(std::span(whole.Bytes()).first(size));
-            if (opened == 0) {
-                EXPECT_NE(0, KFSp_Boundary([&] { other->Read(&file, nullptr); }));
-                WrittenGroup(other.get());
-            }
-            static_cast<void>(reports.Take());
-        }
-        ASSERT_EQ(before, Q_MemoryLive(nullptr));
-    }
-}
-
-// Whatever stands in a file, reading it gives a tree that can be written, and nothing is left of it afterwards.
-TEST_F(Tree, FilesThatNobodyWrote)
-{
-    auto const layers = MakeLayers();
-    auto* const node = static_cast<KFS_NamedStreamGroup*>(Append(layers.get(), "node"));
-    SetValue(node->GetEditableStream(Name("opacity")), 1.0);
-    SetValue(Append(Append(layers.get(), "layers")->GetAsIndexedGroup(), "opacity"), 2.0);
-    std::vector<unsigned char> const whole = WrittenGroup(layers.get()).Bytes();
-    std::mt19937 random(5);
-    Q_MemoryCount const before = Q_MemoryLive(nullptr);
-    for (int round = 0; round < 1500; ++round) {
-        std::vector<unsigned char> bytes = whole;
-        for (int i = 0; i < 1 + round % 6; ++i) {
-            bytes[32 + random() % (bytes.size() - 32)] =
-                static_cast<unsigned char>(random() % 3 == 0 ? random() : random() % 4);
-        }
-        auto const other = MakeLayers();
-        CKF_File file;
-        if (file.Open(bytes) == 0 && KFSp_Boundary([&] { other->Read(&file, nullptr); }) == 0) {
-            WrittenGroup(other.get());
-        }
-        static_cast<void>(reports.Take());
-    }
-    // Names that files bring are kept for good, texts of reports too.
-    EXPECT_LT(Q_MemoryLive(nullptr).bytes - before.bytes, 1 << 20);
-}
-
-TEST_F(Tree, GroupsInGroupsHaveAnEnd)
-{
-    auto const nested = [](int depth) {
-        std::string file = Group(Marker, "");
-        for (int i = 1; i < depth; ++i) {
-            file = Group(Marker, MatchName("layers") + file);
-        }
-        return Form(file);
-    };
-    EXPECT_EQ(0, ReadGroup(MakeLayers().get(), nested(CKF_MaxDepth / 2)));
-    EXPECT_EQ(CKF_Err_TooDeep, ReadGroup(MakeLayers().get(), nested(2 * CKF_MaxDepth)));
 }
 
 }  // namespace

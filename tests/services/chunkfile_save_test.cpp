@@ -1,5 +1,6 @@
 // Saving to disk: the target is the old file or the new one, whole, and nothing stays beside it.
 #include "tests/services/chunkbytes.h"
+#include "tests/support/scratchfolder.h"
 
 #include "frame/services/memory.h"
 #include "frame/services/sequence.h"
@@ -10,7 +11,6 @@
 #include <cerrno>
 #include <cstring>
 #include <filesystem>
-#include <fstream>
 #include <set>
 #include <string>
 #include <vector>
@@ -19,41 +19,9 @@ namespace {
 
 namespace fs = std::filesystem;
 
-// A folder of its own for one test.
-class Folder {
-public:
-    Folder()
-    {
-        std::string name = testing::TempDir() + "chunkfile_save_XXXXXX";
-        path_ = ::mkdtemp(name.data());
-    }
-    ~Folder() { fs::remove_all(path_); }
-
-    std::string Path(char const* name = "project.kfs") const { return (path_ / name).string(); }
-    std::set<std::string> Names() const
-    {
-        std::set<std::string> names;
-        for (fs::directory_entry const& entry : fs::directory_iterator(path_))
-            names.insert(entry.path().filename().string());
-        return names;
-    }
-
-private:
-    fs::path path_;
-};
+char const* const Project = "project.kfs";
 
 using Names = std::set<std::string>;
-
-std::string Content(std::string const& path)
-{
-    std::ifstream in(path, std::ios::binary);
-    return {std::istreambuf_iterator<char>(in), {}};
-}
-
-void Put(std::string const& path, std::string const& content)
-{
-    std::ofstream(path, std::ios::binary) << content;
-}
 
 // A save with every kind of write. Looks at no result, as the library does in places; the commit has to know.
 int WriteEverything(CKF_File* file)
@@ -111,15 +79,15 @@ struct FailNth : CKF_IoHook {
 
 TEST(ChunkFileSave, ReplacesTheTargetWhole)
 {
-    const Folder folder;
+    const ScratchFolder folder;
     for (bool const exists : {false, true}) {
-        if (exists) Put(folder.Path(), "the old file");
+        if (exists) folder.Write(Project, "the old file");
         CKF_File file;
-        ASSERT_EQ(0, file.Create(folder.Path().c_str()));
+        ASSERT_EQ(0, file.Create(folder.Path(Project).c_str()));
         EXPECT_EQ(exists ? 2u : 1u, folder.Names().size()) << "what is written is beside the target";
         ASSERT_EQ(0, WriteEverything(&file)) << file.LastErrorText();
-        EXPECT_EQ(Names{"project.kfs"}, folder.Names());
-        EXPECT_EQ(Expected(), Content(folder.Path()));
+        EXPECT_EQ(Names{Project}, folder.Names());
+        EXPECT_EQ(Expected(), FileContent(folder.Path(Project)));
         EXPECT_TRUE(file.GetBytes().empty());
         EXPECT_EQ(CKF_Err_NotOpen, CKF_WriteAtom(&file, CKF_Id("late"), 0, nullptr));
     }
@@ -127,49 +95,33 @@ TEST(ChunkFileSave, ReplacesTheTargetWhole)
 
 TEST(ChunkFileSave, EveryCallThatFailsLeavesTheOldFile)
 {
-    int n = 1;
     std::set<CKF_IoCall> failed;
-    for (;; ++n) {
-        SCOPED_TRACE(n);
-        ASSERT_LT(n, 1000);
-        const Folder folder;
-        Put(folder.Path(), "the old file");
-        FailNth hook(n);
-        CKF_File file;
-        int code = file.Create(folder.Path().c_str(), &hook);
-        if (code == 0) code = WriteEverything(&file);
-        if (!hook.Fired()) {
-            EXPECT_EQ(0, code);
-            EXPECT_EQ(Expected(), Content(folder.Path()));
-            break;
+    for (bool const disk : {true, false})
+        for (int n = 1;; ++n) {
+            SCOPED_TRACE(testing::Message() << (disk ? "disk " : "memory ") << n);
+            ASSERT_LT(n, 1000);
+            const ScratchFolder folder;
+            folder.Write(Project, "the old file");
+            FailNth hook(n);
+            CKF_File file;
+            int code = disk ? file.Create(folder.Path(Project).c_str(), &hook) : file.CreateInMemory(&hook);
+            if (code == 0) code = WriteEverything(&file);
+            if (!hook.Fired()) {
+                EXPECT_EQ(0, code);
+                EXPECT_EQ(Expected(), disk ? FileContent(folder.Path(Project)) : Bytes(file));
+                break;
+            }
+            failed.insert(hook.last);
+            EXPECT_EQ(CKF_Err_Io, code) << "the failure came out";
+            EXPECT_EQ(CKF_Err_Io, file.LastError());
+            EXPECT_TRUE(file.GetBytes().empty());
+            EXPECT_NE(nullptr, std::strstr(file.LastErrorText(), "No space left")) << file.LastErrorText();
+            EXPECT_EQ(Names{Project}, folder.Names()) << "nothing stays beside it";
+            // Behind the renaming the new file is in place, whatever the folder says.
+            EXPECT_EQ(hook.last == CKF_IoCall::SyncFolder ? Expected() : "the old file",
+                      FileContent(folder.Path(Project)));
         }
-        failed.insert(hook.last);
-        EXPECT_EQ(CKF_Err_Io, code) << "the failure came out";
-        EXPECT_EQ(CKF_Err_Io, file.LastError());
-        EXPECT_NE(nullptr, std::strstr(file.LastErrorText(), "No space left")) << file.LastErrorText();
-        EXPECT_EQ(Names{"project.kfs"}, folder.Names()) << "nothing stays beside it";
-        // Behind the renaming the new file is in place, whatever the folder says.
-        EXPECT_EQ(hook.last == CKF_IoCall::SyncFolder ? Expected() : "the old file", Content(folder.Path()));
-    }
     EXPECT_EQ(7u, failed.size()) << "each kind of call was made to fail";
-}
-
-TEST(ChunkFileSave, EveryWriteThatFailsInMemoryIsTold)
-{
-    for (int n = 1;; ++n) {
-        SCOPED_TRACE(n);
-        ASSERT_LT(n, 1000);
-        FailNth hook(n);
-        CKF_File file;
-        int code = file.CreateInMemory(&hook);
-        if (code == 0) code = WriteEverything(&file);
-        if (!hook.Fired()) {
-            EXPECT_EQ(Expected(), Bytes(file));
-            return;
-        }
-        EXPECT_EQ(CKF_Err_Io, code);
-        EXPECT_TRUE(file.GetBytes().empty());
-    }
 }
 
 TEST(ChunkFileSave, EveryAllocationThatFailsIsTold)
@@ -179,15 +131,15 @@ TEST(ChunkFileSave, EveryAllocationThatFailsIsTold)
         for (int n = 1;; ++n) {
             SCOPED_TRACE(testing::Message() << (disk ? "disk " : "memory ") << n);
             ASSERT_LT(n, 1000);
-            const Folder folder;
-            Put(folder.Path(), "the old file");
+            const ScratchFolder folder;
+            folder.Write(Project, "the old file");
             bool fired = false;
             {
                 CKF_File file;
                 int code = 0;
                 Q_FailAllocation(n);
                 try {
-                    code = disk ? file.Create(folder.Path().c_str()) : file.CreateInMemory();
+                    code = disk ? file.Create(folder.Path(Project).c_str()) : file.CreateInMemory();
                     if (code == 0) code = WriteEverything(&file);
                 } catch (std::bad_alloc const&) {  // the texts that are made here, not the file
                     code = Q_Err_OutOfMemory;
@@ -198,10 +150,10 @@ TEST(ChunkFileSave, EveryAllocationThatFailsIsTold)
                     EXPECT_EQ(Q_Err_OutOfMemory, code);
                 } else {
                     EXPECT_EQ(0, code);
-                    EXPECT_EQ(Expected(), disk ? Content(folder.Path()) : Bytes(file));
+                    EXPECT_EQ(Expected(), disk ? FileContent(folder.Path(Project)) : Bytes(file));
                 }
             }
-            EXPECT_EQ(Names{"project.kfs"}, folder.Names());
+            EXPECT_EQ(Names{Project}, folder.Names());
             if (!fired) break;
         }
     EXPECT_EQ(before, Q_MemoryLive(nullptr));
@@ -209,10 +161,10 @@ TEST(ChunkFileSave, EveryAllocationThatFailsIsTold)
 
 TEST(ChunkFileSave, WhatIsNotCommittedLeavesNothing)
 {
-    const Folder folder;
-    Put(folder.Path(), "the old file");
+    const ScratchFolder folder;
+    folder.Write(Project, "the old file");
     const auto begin = [&](CKF_File& file) {
-        ASSERT_EQ(0, file.Create(folder.Path().c_str()));
+        ASSERT_EQ(0, file.Create(folder.Path(Project).c_str()));
         ASSERT_EQ(0, CKF_WriteAtom(&file, CKF_Id("cdat"), 3, "abc"));
         ASSERT_EQ(2u, folder.Names().size());
     };
@@ -220,54 +172,54 @@ TEST(ChunkFileSave, WhatIsNotCommittedLeavesNothing)
         CKF_File file;
         begin(file);
     }
-    EXPECT_EQ(Names{"project.kfs"}, folder.Names()) << "destroyed";
+    EXPECT_EQ(Names{Project}, folder.Names()) << "destroyed";
     CKF_File file;
     begin(file);
     file.Close();
-    EXPECT_EQ(Names{"project.kfs"}, folder.Names()) << "closed";
+    EXPECT_EQ(Names{Project}, folder.Names()) << "closed";
     begin(file);
-    EXPECT_EQ(CKF_Err_NotAChunkFile, file.Open(folder.Path().c_str()));
-    EXPECT_EQ(Names{"project.kfs"}, folder.Names()) << "opened for something else";
+    EXPECT_EQ(CKF_Err_NotAChunkFile, file.Open(folder.Path(Project).c_str()));
+    EXPECT_EQ(Names{Project}, folder.Names()) << "opened for something else";
     begin(file);
     CKF_WriteAtom(&file, 0, 0, nullptr);
     EXPECT_EQ(CKF_Err_BadArgument, file.Commit());
-    EXPECT_EQ(Names{"project.kfs"}, folder.Names()) << "failed";
-    EXPECT_EQ("the old file", Content(folder.Path()));
+    EXPECT_EQ(Names{Project}, folder.Names()) << "failed";
+    EXPECT_EQ("the old file", FileContent(folder.Path(Project)));
 }
 
 TEST(ChunkFileSave, TwoSavesToOnePlaceDontMeet)
 {
-    const Folder folder;
+    const ScratchFolder folder;
     CKF_File first, second;
-    ASSERT_EQ(0, first.Create(folder.Path().c_str()));
-    ASSERT_EQ(0, second.Create(folder.Path().c_str()));
+    ASSERT_EQ(0, first.Create(folder.Path(Project).c_str()));
+    ASSERT_EQ(0, second.Create(folder.Path(Project).c_str()));
     CKF_WriteAtom(&first, CKF_Id("who_"), 5, "first");
     CKF_WriteAtom(&second, CKF_Id("who_"), 6, "second");
     EXPECT_EQ(0, second.Commit());
-    EXPECT_EQ(Form(Atom("who_", "second")), Content(folder.Path()));
+    EXPECT_EQ(Form(Atom("who_", "second")), FileContent(folder.Path(Project)));
     EXPECT_EQ(0, first.Commit());
-    EXPECT_EQ(Form(Atom("who_", "first")), Content(folder.Path()));
-    EXPECT_EQ(Names{"project.kfs"}, folder.Names());
+    EXPECT_EQ(Form(Atom("who_", "first")), FileContent(folder.Path(Project)));
+    EXPECT_EQ(Names{Project}, folder.Names());
 }
 
 TEST(ChunkFileSave, ALinkStaysALinkAndRightsStay)
 {
-    const Folder folder;
-    Put(folder.Path("real.kfs"), "the old file");
+    const ScratchFolder folder;
+    folder.Write("real.kfs", "the old file");
     ASSERT_EQ(0, ::chmod(folder.Path("real.kfs").c_str(), 0640));
     fs::create_symlink("real.kfs", folder.Path("link.kfs"));
     CKF_File file;
     ASSERT_EQ(0, file.Create(folder.Path("link.kfs").c_str()));
     ASSERT_EQ(0, file.Commit());
     EXPECT_TRUE(fs::is_symlink(folder.Path("link.kfs")));
-    EXPECT_EQ(Form(""), Content(folder.Path("real.kfs")));
+    EXPECT_EQ(Form(""), FileContent(folder.Path("real.kfs")));
     EXPECT_EQ(fs::perms(0640), fs::status(folder.Path("real.kfs")).permissions());
     EXPECT_EQ((Names{"link.kfs", "real.kfs"}), folder.Names());
 }
 
 TEST(ChunkFileSave, APlaceThatCantBeWrittenIsRefusedAtOnce)
 {
-    const Folder folder;
+    const ScratchFolder folder;
     for (std::string const& path : {folder.Path("no/such/folder.kfs"), folder.Path("new/"), folder.Path("."),
                                     std::string("/dev/null"), std::string()}) {
         CKF_File file;
@@ -281,26 +233,21 @@ TEST(ChunkFileSave, APlaceThatCantBeWrittenIsRefusedAtOnce)
 
 TEST(ChunkFileSave, OnlyRegularProjectFilesAreOpened)
 {
-    const Folder folder;
-    Put(folder.Path("text"), "KFS is not KFSF");
-    Put(folder.Path("empty"), "");
-    Put(folder.Path("cut"), Form("").substr(0, 20));
+    const ScratchFolder folder;
+    folder.Write("text", "KFS is not KFSF");
+    folder.Write("empty", "");
+    folder.Write("cut", Form("").substr(0, 20));
     ASSERT_EQ(0, ::mkfifo(folder.Path("pipe").c_str(), 0600));
-    const struct {
-        char const* name;
-        int code;
-    } rows[] = {
-        {"text", CKF_Err_NotAChunkFile},
-        {"empty", CKF_Err_NotAChunkFile},
-        {"cut", CKF_Err_Corrupt},
-        {"pipe", CKF_Err_Io},
-        {".", CKF_Err_Io},
-        {"missing", CKF_Err_Io},
-    };
+    const std::pair<char const*, int> rows[] = {{"text", CKF_Err_NotAChunkFile},
+                                                {"empty", CKF_Err_NotAChunkFile},
+                                                {"cut", CKF_Err_Corrupt},
+                                                {"pipe", CKF_Err_Io},
+                                                {".", CKF_Err_Io},
+                                                {"missing", CKF_Err_Io}};
     const Q_MemoryCount before = Q_MemoryLive("project file");
-    for (auto const& row : rows) {
+    for (auto const& [name, code] : rows) {
         CKF_File file;
-        EXPECT_EQ(row.code, file.Open(folder.Path(row.name).c_str())) << row.name;
+        EXPECT_EQ(code, file.Open(folder.Path(name).c_str())) << name;
         EXPECT_STRNE("", file.LastErrorText());
         EXPECT_EQ(before, Q_MemoryLive("project file")) << "a file that didn't open holds nothing";
     }
@@ -308,14 +255,14 @@ TEST(ChunkFileSave, OnlyRegularProjectFilesAreOpened)
 
 TEST(ChunkFileSave, AFileThatIsOpenDoesNotNeedThePathAnyMore)
 {
-    const Folder folder;
-    Put(folder.Path(), NestedSample());
+    const ScratchFolder folder;
+    folder.Write(Project, NestedSample());
     const Q_MemoryCount before = Q_MemoryLive("project file");
     {
         CKF_File file;
-        ASSERT_EQ(0, file.Open(folder.Path().c_str()));
+        ASSERT_EQ(0, file.Open(folder.Path(Project).c_str()));
         EXPECT_EQ(static_cast<long long>(NestedSample().size()), Q_MemoryLive("project file").bytes - before.bytes);
-        ASSERT_EQ(0, ::truncate(folder.Path().c_str(), 10));
+        ASSERT_EQ(0, ::truncate(folder.Path(Project).c_str(), 10));
         EXPECT_EQ(NestedOutline, Outline(&file));
     }
     EXPECT_EQ(before, Q_MemoryLive("project file"));

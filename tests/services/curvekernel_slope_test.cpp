@@ -142,20 +142,18 @@ TEST(CurveKernelSlopePoints, RowsThatCanBeCheckedByEye)
         double slope;
         Xs xs;
     } rows[] = {
-        {"one hill", Graph(3, 1.0 / 3, 1.0 / 3, 0, 1, 1, 0), 0, {1.5}},
         {"hill and valley, symmetric",
          Graph(3, 1.0 / 3, 1.0 / 3, 0, 2, -2, 0),
          0,
          {3 * (0.5 - std::sqrt(3.0) / 6), 3 * (0.5 + std::sqrt(3.0) / 6)}},
         {"eased at both keys: the keys themselves", Graph(2, 0.4, 0.4, 10, 10, 20, 20), 0, {0, 2}},
-        {"eased at the start only", Graph(2, 0.4, 0.4, 10, 10, 16, 20), 0, {0}},
         {"eased at the end only", Graph(2, 0.4, 0.4, 10, 14, 20, 20), 0, {2}},
         {"a constant has no distinct point", Graph(2, 0.4, 0.7, 5, 5, 5, 5), 0, {}},
         {"a constant never climbs", Graph(2, 0.4, 0.7, 5, 5, 5, 5), 1, {}},
         {"a line has no distinct point", Graph(2, 0.25, 0.25, 10, 12.5, 17.5, 20), 5, {}},
         {"a line without handles has none either", Graph(2, 0, 0, 10, 10, 20, 20), 5, {}},
         {"nor another slope", Graph(2, 0, 0, 10, 10, 20, 20), 0, {}},
-        {"steadily up", Graph(2, 0.3, 0.3, 10, 12, 18, 20), 0, {}},
+        {"x turns back, and y has its hill where nobody comes by", Graph(1, 2, 2, 0, 1, 1, 0), 0, {}},
         {"the slope touches 0 once", Graph(3, 1.0 / 3, 1.0 / 3, 0, 1, 0, 1), 0, {1.5}},
         {"a slope other than 0", Graph(3, 1.0 / 3, 1.0 / 3, 0, 2, 2, 3), 1, {1, 3}},
         {"no out handle: the start isn't flat", Graph(2, 0, 0.5, 10, 10, 16, 20), 0, {}},
@@ -190,13 +188,6 @@ TEST(CurveKernelSlopePoints, EveryCrossingIsFoundAndHasTheSlope)
         for (const double x : found)
             EXPECT_NEAR(slope, Slope(curve, x), 1e-6 * (1 + std::fabs(Bend(curve, x)))) << "at " << x;
     }
-}
-
-TEST(CurveKernelSlopePoints, PartsThatAreNeverVisitedHaveNoPoints)
-{
-    // x turns back between its two turns, and y has its hill there.
-    const Curve folded = Graph(1, 2, 2, 0, 1, 1, 0);
-    EXPECT_TRUE(Points(folded, 0).empty());
 }
 
 TEST(CurveKernelSlopePoints, RefusalsLeaveACountOfZero)

@@ -3,8 +3,6 @@
 #include "frame/services/memory.h"
 #include "frame/services/sequence.h"
 
-#include <vector>
-
 namespace {
 
 SEQ_Head** MakeList(int itemSize, int count)

@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <cstring>
 #include <random>
+#include <utility>
 #include <vector>
 
 namespace {
@@ -75,9 +76,13 @@ public:
     }
     TokenList(TokenList const&) = delete;
     TokenList& operator=(TokenList const&) = delete;
-    ~TokenList() { SEQ_Dispose(list_, 0); }
+    ~TokenList()
+    {
+        if (list_) SEQ_Dispose(list_, 0);
+    }
 
     SEQ_Head** get() const { return list_; }
+    SEQ_Head** release() { return std::exchange(list_, nullptr); }
     std::vector<int> Values() const { return ValuesOf(list_); }
     std::vector<int> ValuesOf(SEQ_Head** list) const
     {
@@ -162,16 +167,11 @@ TEST(SequenceEdits, FollowAVectorThroughSuccessAndFailure)
                     wanted.erase(wanted.begin() + index);
                     break;
                 }
-                case 6: {
-                    if (count > 12) {
-                        tokens.failDisposeIn = 0;
-                        code = SEQ_SetNumItems(count / 2, list.get(), 0);
-                        wanted.resize(static_cast<std::size_t>(count / 2));
-                    } else {
-                        code = SEQ_Compact(list.get());
-                    }
+                case 6:
+                    tokens.failDisposeIn = 0;
+                    if (count > 12) wanted.resize(static_cast<std::size_t>(count / 2));
+                    code = count > 12 ? SEQ_SetNumItems(count / 2, list.get(), 0) : SEQ_Compact(list.get());
                     break;
-                }
                 }
                 Q_FailAllocation(0);
                 tokens.failCopyIn = tokens.failDisposeIn = 0;
@@ -236,30 +236,16 @@ TEST(SequenceDuplicate, HasCopiesOfItsOwnOrLeavesNothingBehind)
 TEST(SequenceDispose, DisposesAllItemsAndAnswersTheFirstFailure)
 {
     Tokens tokens;
-    SEQ_Head** list = nullptr;
-    ASSERT_EQ(0, SEQ_New(0, 4, 4, 1, &list));
-    const SEQ_Funcs funcs{nullptr, Tokens::Dispose, nullptr};
-    SEQ_SetFuncs(list, 3, &funcs);
-    SEQ_SetRefcon(&tokens, list);
-    for (int value = 0; value < 5; ++value) {
-        const int token = tokens.Make(value);
-        SEQ_Insert(&token, -1, list);
-    }
+    TokenList list(4, tokens);
+    for (int value = 0; value < 5; ++value) SEQ_Insert(list.ItemOf(tokens.Make(value)).data(), -1, list.get());
+    const SEQ_Funcs withoutCopy{SEQ_RemoveFunc, nullptr, nullptr};
+    ASSERT_EQ(0, SEQ_SetFuncs(list.get(), 3, &withoutCopy));
+    int copy = 77;
+    EXPECT_EQ(0, SEQ_GetItemCopy(list.get(), 0, 3, &copy));
+    EXPECT_EQ(3, copy) << "without a copy function bytes are copied: the token itself";
     tokens.failDisposeIn = 2;
-    EXPECT_EQ(Tokens::DisposeFailed, SEQ_Dispose(list, 0));
+    EXPECT_EQ(Tokens::DisposeFailed, SEQ_Dispose(list.release(), 0));
     EXPECT_EQ(1, tokens.Alive()) << "only the item that refused is left";
 }
 
-TEST(SequenceFuncs, WithoutCopyFunctionBytesAreCopied)
-{
-    Tokens tokens;
-    TokenList list(4, tokens);
-    const int token = tokens.Make(7);
-    ASSERT_EQ(0, SEQ_Insert(&token, -1, list.get()));
-    const SEQ_Funcs funcs{SEQ_RemoveFunc, nullptr, nullptr};
-    ASSERT_EQ(0, SEQ_SetFuncs(list.get(), 3, &funcs));
-    int copy = 0;
-    EXPECT_EQ(0, SEQ_GetItemCopy(list.get(), 0, 0, &copy));
-    EXPECT_EQ(token, copy);
-}
 }  // namespace

@@ -113,50 +113,37 @@ struct Way {
     bool (*succeeds)();  // tries once and cleans up
 };
 
+// The answer of a call, or false if it was refused memory.
+bool Gets(bool (*call)())
+{
+    try {
+        return call();
+    } catch (std::bad_alloc const&) {
+        return false;
+    }
+}
+
+template <auto Allocate, auto Free>
+bool GetsBlock()
+{
+    auto* const block = Allocate(1, "tests: n-th", 8);
+    Free(block);
+    return block != nullptr;
+}
+
+bool GetsObject()
+{
+    delete new Tracked;
+    return true;
+}
+
 const Way Ways[] = {
-    {"block",
-     [] {
-         void* const block = Q_AllocatePtr(1, "tests: n-th", 8);
-         Q_FreePtr(block);
-         return block != nullptr;
-     }},
-    {"zeroed block",
-     [] {
-         void* const block = Q_AllocatePtrClear(1, "tests: n-th", 8);
-         Q_FreePtr(block);
-         return block != nullptr;
-     }},
-    {"handle",
-     [] {
-         char** const handle = Q_AllocateHandleClear(1, "tests: n-th", 8);
-         Q_FreeHandle(handle);
-         return handle != nullptr;
-     }},
-    {"object",
-     [] {
-         try {
-             delete new Tracked;
-             return true;
-         } catch (std::bad_alloc const&) {
-             return false;
-         }
-     }},
-    {"container",
-     [] {
-         try {
-             return std::vector<int, Q_Allocator<int>>(5).size() == 5;
-         } catch (std::bad_alloc const&) {
-             return false;
-         }
-     }},
-    {"string",
-     [] {
-         try {
-             return u16str(100, 'x').size() == 100;
-         } catch (std::bad_alloc const&) {
-             return false;
-         }
-     }},
+    {"block", GetsBlock<Q_AllocatePtr, Q_FreePtr>},
+    {"zeroed block", GetsBlock<Q_AllocatePtrClear, Q_FreePtr>},
+    {"handle", GetsBlock<Q_AllocateHandleClear, Q_FreeHandle>},
+    {"object", GetsObject},
+    {"container", [] { return std::vector<int, Q_Allocator<int>>(5).size() == 5; }},
+    {"string", [] { return u16str(100, 'x').size() == 100; }},
 };
 
 TEST(Memory, TheNthAllocationFailsAndOnlyThatOne)
@@ -168,11 +155,11 @@ TEST(Memory, TheNthAllocationFailsAndOnlyThatOne)
             Q_FailAllocation(n);
             for (int i = 1; i <= 5; ++i) {
                 EXPECT_EQ(i >= n + 1, Q_FailAllocationFired()) << "before allocation " << i;
-                EXPECT_EQ(i != n, way.succeeds()) << "allocation " << i;
+                EXPECT_EQ(i != n, Gets(way.succeeds)) << "allocation " << i;
             }
             Q_FailAllocation(0);
             EXPECT_FALSE(Q_FailAllocationFired());
-            EXPECT_TRUE(way.succeeds());
+            EXPECT_TRUE(Gets(way.succeeds));
             EXPECT_EQ(before, Q_MemoryLive(nullptr));
         }
 }
@@ -180,9 +167,9 @@ TEST(Memory, TheNthAllocationFailsAndOnlyThatOne)
 TEST(Memory, AFailureIsTheBusinessOfOneThread)
 {
     Q_FailAllocation(1);
-    std::thread([] { EXPECT_TRUE(Ways[0].succeeds()); }).join();
+    std::thread([] { EXPECT_TRUE(Gets(Ways[0].succeeds)); }).join();
     EXPECT_FALSE(Q_FailAllocationFired());
-    EXPECT_FALSE(Ways[0].succeeds());
+    EXPECT_FALSE(Gets(Ways[0].succeeds));
     Q_FailAllocation(0);
 }
 

@@ -22,18 +22,7 @@ namespace {
 
 // ---- byte order
 
-TEST(ByteOrder, PutsTheMostSignificantByteFirst)
-{
-    const unsigned short word = Q_ShortSwap(0x0102);
-    const unsigned int longWord = Q_LongSwap(0x01020304u);
-    double number = -2.0;  // 0xC000000000000000
-    Q_FpLongSwap(&number);
-    EXPECT_EQ(0, std::memcmp("\x01\x02", &word, 2));
-    EXPECT_EQ(0, std::memcmp("\x01\x02\x03\x04", &longWord, 4));
-    EXPECT_EQ(0, std::memcmp("\xC0\0\0\0\0\0\0\0", &number, 8));
-}
-
-TEST(ByteOrder, SwapsEveryBitPatternThereAndBackAtAnyAlignment)
+TEST(ByteOrder, PutsTheMostSignificantByteFirstOfEveryBitPatternAtAnyAlignment)
 {
     std::mt19937_64 random(1);
     alignas(8) unsigned char bytes[24];
@@ -49,23 +38,14 @@ TEST(ByteOrder, SwapsEveryBitPatternThereAndBackAtAnyAlignment)
         ASSERT_EQ(0, std::memcmp(wanted, &number, 8)) << std::hex << bits;
         Q_FpLongSwap(&number);
         ASSERT_EQ(0, std::memcmp(&bits, &number, 8)) << std::hex << bits;
-        const unsigned short word = static_cast<unsigned short>(bits);
-        const unsigned int longWord = static_cast<unsigned int>(bits);
-        ASSERT_EQ(word, Q_ShortSwap(Q_ShortSwap(word)));
-        ASSERT_EQ(longWord, Q_LongSwap(Q_LongSwap(longWord)));
+        const unsigned short word = Q_ShortSwap(static_cast<unsigned short>(bits));
+        const unsigned int longWord = Q_LongSwap(static_cast<unsigned int>(bits));
+        ASSERT_EQ(0, std::memcmp(wanted + 6, &word, 2)) << std::hex << bits;
+        ASSERT_EQ(0, std::memcmp(wanted + 4, &longWord, 4)) << std::hex << bits;
     }
 }
 
 // ---- pointers in 32 bits
-
-TEST(PointerValues, FlatNumbersAreThemselves)
-{
-    for (const int number : {0, 1, -1, 7, INT_MAX, INT_MIN, 123456}) {
-        void* const pointer = Q_IntPtrToPointer(number);
-        EXPECT_EQ(number, Q_PointerToInt32(pointer));
-        EXPECT_EQ(pointer, Q_Int32ToPointer(number));
-    }
-}
 
 TEST(PointerValues, AddressesComeBackAndAreTakenForNoNumber)
 {
@@ -91,6 +71,10 @@ TEST(PointerValues, AddressesComeBackAndAreTakenForNoNumber)
     for (const int flat : {next + 2, next + 4}) {
         EXPECT_FALSE(different.contains(flat));
         EXPECT_EQ(Q_IntPtrToPointer(flat), Q_Int32ToPointer(flat));
+    }
+    for (const int number : {0, 1, -1, 7, INT_MAX, INT_MIN, 123456}) {
+        EXPECT_EQ(number, Q_PointerToInt32(Q_IntPtrToPointer(number)));
+        EXPECT_EQ(Q_IntPtrToPointer(number), Q_Int32ToPointer(number));
     }
     // A number that only turns up now, and is taken already, must not become an address.
     void* const late = Q_IntPtrToPointer(*different.begin());

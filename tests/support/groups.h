@@ -139,14 +139,7 @@ public:
     void Named(char const* name, std::vector<KFS_MatchName> const& kinds) { Group<TestNamedGroup>(name, kinds); }
     void Indexed(char const* name, std::vector<KFS_MatchName> const& kinds) { Group<TestIndexedGroup>(name, kinds); }
 
-    // A new real stream of a kind, a leaf being constant.
-    static Q_ScAutoPtr<KFS_StreamBase> Make(char const* name)
-    {
-        return Q_ScAutoPtr<KFS_StreamBase>(Get_VX_StreamFactory()->CreateStream(Name(name), true, 600, true, false));
-    }
-
-private:
-    // The layout is deferred, so that a group may hold its own kind.
+    // A group of a class of the test's own. The layout is deferred, so that it may hold its own kind.
     template <class G>
     void Group(char const* name, std::vector<KFS_MatchName> const& kinds)
     {
@@ -159,6 +152,13 @@ private:
         Get_VX_StreamFactory()->SetupCanonicalStream(Name(name));
     }
 
+    // A new real stream of a kind, a leaf being constant.
+    static Q_ScAutoPtr<KFS_StreamBase> Make(char const* name)
+    {
+        return Q_ScAutoPtr<KFS_StreamBase>(Get_VX_StreamFactory()->CreateStream(Name(name), true, 600, true, false));
+    }
+
+private:
     KFS_ScRegisterStreams batch_;
 };
 
@@ -192,6 +192,11 @@ protected:
     static std::unique_ptr<KFS_NamedStreamGroup> MakeNode()
     {
         return std::unique_ptr<KFS_NamedStreamGroup>(TestKinds::Make("node").release()->GetAsNamedGroup());
+    }
+    static KFS_NamedStreamGroup* AddNode(KFS_IndexedStreamGroup& layers)
+    {
+        Q_ScAutoPtr<KFS_StreamBase> node = TestKinds::Make("node");
+        return layers.GetEditableStream(layers.AppendStream(&node))->GetAsNamedGroup();
     }
     static KFS_StreamBase const* Canonical(char const* name)
     {

@@ -21,6 +21,15 @@ public:
     // The notification that is being told. To be called from `look`.
     std::string const& Current() const { return heard_.back(); }
 
+    // Every notification that begins so throws 77 from now on.
+    void ThrowAt(std::string const& start)
+    {
+        look = [this, start](KFS_StreamGroup*, KFS_StreamBase const*) -> std::string {
+            if (Current().starts_with(start)) throw int{77};
+            return {};
+        };
+    }
+
     void StreamAboutToBeInserted(KFS_StreamGroup* g, KFS_StreamBase const* s, unsigned int i) override
     {
         Child("before-insert", g, s, i);

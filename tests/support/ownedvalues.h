@@ -1,6 +1,8 @@
 #pragma once
 
 #include "keystore/attributes.h"
+#include "keystore/edit.h"
+#include "keystore/evaluate.h"
 #include "keystore/stream.h"
 #include "keystore/valuedata_private.h"
 
@@ -27,6 +29,13 @@ public:
         disposeCode = 0;
     }
     static int Live() { return static_cast<int>(tickets_.size()); }
+    // Begins anew, and expects that nothing is left at its end. To be made before the streams.
+    struct Scope {
+        Scope() { Reset(); }
+        ~Scope() { EXPECT_EQ(0, Live()); }
+        Scope(Scope const&) = delete;
+        Scope& operator=(Scope const&) = delete;
+    };
 
     // A ticket that the test owns.
     static Ticket Make(double value)
@@ -56,8 +65,10 @@ public:
         std::memcpy(destination, &made, sizeof made);
         return 0;
     }
-    static int Dispose(KFS_Stream const*, long, short, void* block)
+    static int Dispose(KFS_Stream const* stream, long, short, void* block)
     {
+        EXPECT_EQ(KFS_StreamValidStamp, stream->GetStamp())
+            << "a dying stream is whole until its values are given back";
         if (disposeCode != 0) {
             return disposeCode;
         }
@@ -88,8 +99,37 @@ public:
         EXPECT_EQ(0, KFS_SetCustomFuncs(stream.get(), Copy, Dispose));
         return stream;
     }
+    static void InsertKey(KFS_Stream* stream, int time, double value, char interp = KFS_Interp_Hold)
+    {
+        T_Time const at{time, 600};
+        Ticket const mine = Make(value);
+        EXPECT_EQ(0, KFS_InsertKey(stream, &at, 0, &mine, interp, interp));
+        Free(mine);
+    }
+    // The value that was at an index.
+    static double RemoveKey(KFS_Stream* stream, int index)
+    {
+        Ticket out{};
+        EXPECT_EQ(0, KFS_RemoveKey(stream, index, &out));
+        return Take(stream, out);
+    }
+    // The value at a time, which is in the cache record afterwards.
+    static double Read(KFS_Stream* stream, int time)
+    {
+        T_Time const at{time, 600};
+        Ticket out{};
+        EXPECT_EQ(0, KFS_GetValue(stream, &at, 0, &out, nullptr, nullptr));
+        return Take(stream, out);
+    }
 
 private:
+    static double Take(KFS_Stream* stream, Ticket ticket)
+    {
+        double const value = Value(ticket);
+        EXPECT_EQ(0, KFS_DisposeValue(stream, &ticket));
+        return value;
+    }
+
     static inline std::map<int, double> tickets_;
     static inline int next_ = 1;
 };

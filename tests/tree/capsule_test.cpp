@@ -1,4 +1,5 @@
 #include "tests/support/groups.h"
+#include "tests/support/text.h"
 
 #include <atomic>
 #include <thread>
@@ -7,21 +8,10 @@
 
 namespace {
 
-u16str Text(char const* text)
-{
-    return Q_MBToUTF16String(text);
-}
-
 class Capsule : public SceneTest {
 protected:
     TestRoot<TestIndexedGroup> root_{"layers"};
 
-    KFS_NamedStreamGroup* AddNode(KFS_IndexedStreamGroup* layers)
-    {
-        Q_ScAutoPtr<KFS_StreamBase> node = TestKinds::Make("node");
-        unsigned int const index = layers->AppendStream(&node);
-        return layers->GetEditableStream(index)->GetAsNamedGroup();
-    }
     static KFS_NamedStreamGroup* Transform(KFS_NamedStreamGroup* node)
     {
         return node->GetEditableStream(Name("transform"))->GetAsNamedGroup();
@@ -37,28 +27,25 @@ protected:
 
 TEST_F(Capsule, IdsAreTheRootsFollowedByThePath)
 {
-    AddNode(&root_);
-    KFS_NamedStreamGroup* const node = AddNode(&root_);
+    AddNode(root_);
+    KFS_NamedStreamGroup* const node = AddNode(root_);
     KFS_StreamBase* const scale = Transform(node)->GetEditableStream(Name("scale"));
     EXPECT_EQ(Text(R"(layers{"0":{"index":1,"matchName":"node"},"1":{"index":4294967295,"matchName":"transform"},)"
                    R"("2":{"index":4294967295,"matchName":"scale"}})"),
               scale->GetStreamCapsuleData().id);
     EXPECT_EQ(Text(R"(layers{"0":{"index":1,"matchName":"node"}})"), node->GetStreamCapsuleData().id);
     EXPECT_EQ(Text("layers{}"), root_.GetStreamCapsuleData().id);
-
     KFS_StreamGroup const* root = nullptr;
     KFS_StreamIDPath path(3);
     static_cast<KFS_StreamBase const*>(scale)->SlowGetPathFromRootToMe(&root, &path);
     EXPECT_EQ(&root_, root);
     EXPECT_EQ(path, scale->GetStreamCapsuleData().path);
     EXPECT_EQ(3u, path.GetLength());
-
     const Q_ScAutoPtr<KFS_StreamBase> alone = TestKinds::Make("opacity");
     EXPECT_EQ(Text("{}"), alone->GetStreamCapsuleData().id);
     alone->SlowGetPathFromRootToMe(&root, &path);
     EXPECT_EQ(nullptr, root) << "a leaf is no group";
     EXPECT_TRUE(path.IsEmpty());
-
     KFS_StreamCapsuleData const& canonical = Canonical("opacity")->GetStreamCapsuleData();
     EXPECT_EQ(Text("opacity"), canonical.id);
     EXPECT_TRUE(canonical.path.IsEmpty());
@@ -66,8 +53,8 @@ TEST_F(Capsule, IdsAreTheRootsFollowedByThePath)
 
 TEST_F(Capsule, IdsStayWhatTheyWereWhenFirstAsked)
 {
-    KFS_NamedStreamGroup* const first = AddNode(&root_);
-    KFS_NamedStreamGroup* const second = AddNode(&root_);
+    KFS_NamedStreamGroup* const first = AddNode(root_);
+    KFS_NamedStreamGroup* const second = AddNode(root_);
     const u16str id = second->GetStreamCapsuleData().id;
     root_.ReorderStreams(1, 0);
     EXPECT_EQ(id, second->GetStreamCapsuleData().id);
@@ -84,7 +71,7 @@ TEST_F(Capsule, APathLeadsBackToItsStream)
         Q_ScAutoPtr<KFS_StreamBase> inner = TestKinds::Make("layers");
         KFS_IndexedStreamGroup* const layers = root_.GetEditableStream(root_.AppendStream(&inner))->GetAsIndexedGroup();
         for (int j = 0; j <= i; ++j) {
-            KFS_NamedStreamGroup* const node = AddNode(layers);
+            KFS_NamedStreamGroup* const node = AddNode(*layers);
             node->GetEditableStream(Name(j % 2 ? "position" : "opacity"));
             Transform(node)->GetEditableStream(Name("anchor"));
         }
@@ -109,11 +96,10 @@ TEST_F(Capsule, APathLeadsBackToItsStream)
 
 TEST_F(Capsule, ManyThreadsMayAskFirst)
 {
-    KFS_NamedStreamGroup* const node = AddNode(&root_);
-    KFS_StreamBase const* const scale = Transform(node)->GetEditableStream(Name("scale"));
-    std::vector<KFS_StreamCapsuleData const*> seen(8);
-    std::vector<u16str> ids(seen.size());
-    std::atomic<int> waiting{static_cast<int>(seen.size())};
+    KFS_StreamBase const* const scale = Transform(AddNode(root_))->GetEditableStream(Name("scale"));
+    std::array<KFS_StreamCapsuleData const*, 8> seen{};
+    std::array<u16str, 8> ids;
+    std::atomic<int> waiting{8};
     std::vector<std::thread> threads;
     for (std::size_t i = 0; i < seen.size(); ++i) {
         threads.emplace_back([&, i] {
@@ -122,16 +108,12 @@ TEST_F(Capsule, ManyThreadsMayAskFirst)
             ids[i] = seen[i]->id;
         });
     }
-    for (std::thread& thread : threads) {
-        thread.join();
-    }
+    for (std::thread& thread : threads) thread.join();
     for (std::size_t i = 0; i < seen.size(); ++i) {
         EXPECT_EQ(seen[0], seen[i]);
         EXPECT_EQ(scale->GetStreamCapsuleData().id, ids[i]);
     }
 }
-
-// ---- the host's value
 
 TEST_F(Capsule, TheHostsValueIsInheritedOnDemandAndKept)
 {
@@ -151,8 +133,6 @@ TEST_F(Capsule, TheHostsValueIsInheritedOnDemandAndKept)
     EXPECT_TRUE(withoutFactory->GetSMDataPath().empty());
 }
 
-// ---- what a node asks its factory
-
 TEST_F(Capsule, ANodeAsksItsOwnFactory)
 {
     KFS_StreamFactory other;
@@ -165,53 +145,6 @@ TEST_F(Capsule, ANodeAsksItsOwnFactory)
     EXPECT_EQ(1, keyed->GetAsLeaf()->GetKeyCount());
     EXPECT_EQ(30u, keyed->GetAsLeaf()->GetTimeScale());
     EXPECT_EQ(nullptr, stream->CreateStream(Name("opacity"), true, 600, false, false));
-}
-
-// Replaces an old "blur" by "strength" and "quality", whose strength was the old value.
-class BlurGroup : public TestNamedGroup {
-public:
-    using TestNamedGroup::TestNamedGroup;
-    BlurGroup(BlurGroup const& source, KFS_CloneStreamParams const& params) : TestNamedGroup(source, params) {}
-    KFS_StreamBase* CloneStream(KFS_CloneStreamParams const& params) const override
-    {
-        return new BlurGroup(*this, params);
-    }
-    void UpgradeChildStream(KFS_StreamBase* obsolete) override
-    {
-        KFS_Stream* const strength = GetEditableLeafStream(Name("strength"));
-        double const value = static_cast<TestLeaf*>(obsolete)->ValueAt(0);
-        T_Time const zero{0, 1};
-        KFSp_ThrowIf(KFS_InsertKeyF(strength, &zero, 1, &value, 0, 0));
-    }
-};
-
-TEST_F(Capsule, AnObsoleteStreamIsReplacedByItsKindsSuccessors)
-{
-    kinds.Leaf("blur", 1, 42.0);
-    kinds.Leaf("strength", 1, 1.0);
-    kinds.Leaf("quality", 1, 2.0);
-    KFS_ScRegisterStreams batch(Get_VX_StreamFactory());
-    batch.Register(
-        Name("new blur"),
-        [](KFS_MatchName const& kind, KFS_StreamFactory* factory, bool, unsigned int, bool canonical) {
-            return new BlurGroup(kind, factory, canonical, {Name("quality"), Name("strength")});
-        },
-        false);
-    {
-        const Q_ScAutoPtr<KFS_StreamBase> old = TestKinds::Make("blur"), other = TestKinds::Make("quality");
-        old->RegisterObsoleteStreamParent(Name("blur"), Name("new blur"));
-        old->RegisterObsoleteStreamParent(Name("blur"), Name("node"));
-        std::vector<KFS_Stream*> replacements{nullptr};
-        EXPECT_FALSE(other->GatherObsoleteReplacementStreams(replacements));
-        EXPECT_EQ(1u, replacements.size()) << "as it was";
-        EXPECT_TRUE(old->GatherObsoleteReplacementStreams(replacements)) << "the first registration stands";
-        ASSERT_EQ(1u, replacements.size()) << "what the conversion didn't touch is the default";
-        const std::unique_ptr<KFS_Stream> strength(replacements[0]);
-        EXPECT_EQ("strength", NameOf(strength.get()));
-        EXPECT_EQ(42.0, static_cast<TestLeaf*>(strength.get())->ValueAt(0));
-        EXPECT_EQ(nullptr, strength->GetParent());
-    }
-    batch.UnregisterAll();
 }
 
 }  // namespace

@@ -13,22 +13,6 @@ namespace {
 
 using Names = std::vector<std::string>;
 
-// Collects what goes to the log for its scope.
-class LogRecorder {
-public:
-    LogRecorder()
-        : previous_(Q_SetLogSink([this](int level, char const* tag, char const* topic, char const* text) {
-              lines_.push_back(std::to_string(level) + " " + tag + " " + topic + ": " + text);
-          }))
-    {}
-    ~LogRecorder() { Q_SetLogSink(previous_); }
-    Names Take() { return std::exchange(lines_, {}); }
-
-private:
-    Names lines_;
-    Q_LogSink previous_;
-};
-
 class Factory : public StreamTest {
 protected:
     KFS_StreamFactory& factory = *Get_VX_StreamFactory();
@@ -48,6 +32,7 @@ KFS_FactoryFunc LeafFunc(double value, int* calls = nullptr)
 TEST_F(Factory, TheFirstRegistrationOfANameStands)
 {
     int first = 0, second = 0;
+    const Q_MemoryCount empty = Q_MemoryLive(nullptr);
     EXPECT_TRUE(factory.RegisterFactoryFunc(Name("blur"), LeafFunc(1.0, &first), false));
     KFS_StreamBase* const canonical = factory.GetCanonicalStream(Name("blur"));
     EXPECT_FALSE(factory.RegisterFactoryFunc(Name("blur"), LeafFunc(2.0, &second), false));
@@ -58,19 +43,23 @@ TEST_F(Factory, TheFirstRegistrationOfANameStands)
     EXPECT_EQ(nullptr, canonical->GetParent());
     EXPECT_EQ(600u, canonical->GetAsLeaf()->GetTimeScale());
     EXPECT_EQ(1.0, static_cast<TestLeaf*>(canonical)->ValueAt(0));
-
     const Q_MemoryCount before = Q_MemoryLive(nullptr);
     auto* const late = new TestLeaf(Name("blur"), &factory, true, 600, false, 1, 3.0);
     EXPECT_EQ(canonical, factory.RegisterCanonicalInstance(late));
     EXPECT_EQ(before, Q_MemoryLive(nullptr)) << "the late one is deleted";
     EXPECT_EQ(canonical, factory.RegisterCanonicalInstance(canonical)) << "the registered one itself isn't";
     EXPECT_EQ(1.0, static_cast<TestLeaf*>(canonical)->ValueAt(0));
-    EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("blur")));
+    EXPECT_TRUE(factory.UnregisterFactoryFunc_NullOK(Name("blur"), false));
+    EXPECT_EQ(empty, Q_MemoryLive(nullptr));
+    EXPECT_EQ(nullptr, factory.GetCanonicalStream(Name("blur")));
 }
 
 TEST_F(Factory, AnUnknownKindIsNothing)
 {
-    LogRecorder log;
+    Names log;
+    const auto previous = Q_SetLogSink([&](int level, char const* tag, char const* topic, char const* text) {
+        log.push_back(std::to_string(level) + " " + tag + " " + topic + ": " + text);
+    });
     EXPECT_EQ(nullptr, factory.GetCanonicalInstance(Name("no such")));
     EXPECT_EQ(nullptr, factory.GetCanonicalStream(Name("no such")));
     EXPECT_EQ(nullptr, factory.CreateStream(Name("no such"), true, 600, false, false));
@@ -79,11 +68,11 @@ TEST_F(Factory, AnUnknownKindIsNothing)
     EXPECT_EQ((std::vector<Reported>{{0x1D0000, 8, "asked to create unknown property of type #{ldquo}no such#{rdquo}",
                                       KFS_Err_UnknownStream}}),
               reports.Take());
-    EXPECT_EQ(Names{}, log.Take());
     EXPECT_FALSE(factory.UnregisterFactoryFunc_NullOK(Name("no such"), true));
-    EXPECT_EQ(Names{}, log.Take());
+    EXPECT_EQ(Names{}, log);
     EXPECT_FALSE(factory.UnregisterFactoryFunc(Name("no such")));
-    EXPECT_EQ(Names{"0 KFS UnregisterFactoryFunc: no such"}, log.Take());
+    EXPECT_EQ(Names{"0 KFS UnregisterFactoryFunc: no such"}, log);
+    Q_SetLogSink(previous);
 }
 
 TEST_F(Factory, AKindWhoseFunctionGivesNothingIsUnknownAndDoesntRegister)
@@ -101,26 +90,21 @@ TEST_F(Factory, AKindWhoseFunctionGivesNothingIsUnknownAndDoesntRegister)
 TEST_F(Factory, ALeafIsMadeWithItsDefault)
 {
     kinds.Leaf("blur", 1, 7.0);
-    struct Row {
-        bool constant;
-        unsigned int timeScale;
-    };
-    for (const Row& row : {Row{true, 600}, Row{false, 600}, Row{false, 24}}) {
-        SCOPED_TRACE(testing::Message() << row.constant << " " << row.timeScale);
-        const Q_ScAutoPtr<KFS_StreamBase> made(
-            factory.CreateStream(Name("blur"), row.constant, row.timeScale, true, false));
+    for (const bool constant : {true, false}) {
+        const unsigned int timeScale = constant ? 600 : 24;
+        const Q_ScAutoPtr<KFS_StreamBase> made(factory.CreateStream(Name("blur"), constant, timeScale, true, false));
         auto const* const leaf = static_cast<TestLeaf*>(made.get());
         EXPECT_FALSE(leaf->IsCanonical());
         EXPECT_EQ(&factory, leaf->GetFactory());
-        EXPECT_EQ(row.timeScale, leaf->GetTimeScale());
-        EXPECT_EQ(row.constant, leaf->HasNoKeys());
+        EXPECT_EQ(timeScale, leaf->GetTimeScale());
+        EXPECT_EQ(constant, leaf->HasNoKeys());
         EXPECT_EQ(7.0, leaf->ValueAt(100));
-        EXPECT_EQ(row.constant ? 0 : 1, leaf->GetKeys() ? (*leaf->GetKeys())->count : 0);
-        if (!row.constant) {
-            void const* key = nullptr;
-            ASSERT_EQ(0, SEQ_GetConstAddress(leaf->GetKeys(), 0, &key));
-            EXPECT_EQ(0, static_cast<KFS_KeyScalar const*>(key)->time);
-        }
+        EXPECT_EQ(constant, leaf->GetKeys() == nullptr);
+        if (constant) continue;
+        ASSERT_EQ(1, leaf->GetKeyCount());
+        void const* key = nullptr;
+        ASSERT_EQ(0, SEQ_GetConstAddress(leaf->GetKeys(), 0, &key));
+        EXPECT_EQ(0, static_cast<KFS_KeyScalar const*>(key)->time);
     }
 }
 
@@ -138,6 +122,7 @@ TEST_F(Factory, AKindRegisteredAsAnObjectIsClonedFromIt)
         EXPECT_EQ(30u, made->GetAsLeaf()->GetTimeScale());
         EXPECT_EQ(7.0, static_cast<TestLeaf*>(made.get())->ValueAt(0));
         EXPECT_EQ(Q_MBToUTF16String("Glow"), made->GetDisplayName());
+        object->SetSMDataPath(std::string("later data"));
         EXPECT_EQ("glow data", boost::any_cast<std::string>(made->GetSMDataPath()));
         const Q_ScAutoPtr<KFS_StreamBase> keyed(factory.MakeInstanceFromCanonical(Name("glow"), false, 30));
         EXPECT_TRUE(keyed->GetAsLeaf()->HasKeys());
@@ -157,7 +142,7 @@ TEST_F(Factory, ADeferredLayoutMayNameWhatComesLaterAndItself)
     EXPECT_TRUE(factory.RegisterFactoryFunc(Name("late"), LeafFunc(0.0), false));
     factory.SetupCanonicalStream(Name("nest"));
     {
-        const Q_ScAutoPtr<KFS_StreamBase> made(factory.CreateStream(Name("nest"), true, 600, true, false));
+        const auto made = TestKinds::Make("nest");
         KFS_StreamGroup const* level = made->GetAsGroup();
         for (int depth = 0; depth < 5; ++depth) {
             ASSERT_EQ(2u, level->GetNumStreams());
@@ -168,16 +153,6 @@ TEST_F(Factory, ADeferredLayoutMayNameWhatComesLaterAndItself)
     }
     EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("late"))) << "before the group that names it";
     EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("nest")));
-}
-
-TEST_F(Factory, UnregisteringDestroysTheCanonicalInstance)
-{
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
-    factory.RegisterFactoryFunc(Name("blur"), LeafFunc(0.0), false);
-    EXPECT_NE(before, Q_MemoryLive(nullptr));
-    EXPECT_TRUE(factory.UnregisterFactoryFunc_NullOK(Name("blur"), false));
-    EXPECT_EQ(before, Q_MemoryLive(nullptr));
-    EXPECT_EQ(nullptr, factory.GetCanonicalStream(Name("blur")));
 }
 
 TEST_F(Factory, ABatchUnregistersBackwardsAndOnlyWhatItRegistered)
@@ -240,21 +215,15 @@ TEST_F(Factory, DataFileGroupsGoWithTheirChildren)
     for (const Row& row : rows) {
         SCOPED_TRACE(row.why);
         TestKinds local;
-        local.Leaf("shared", 1, 0.0);
-        local.Leaf("deep", 1, 0.0);
-        local.Leaf("own", 1, 0.0);
+        for (char const* const name : {"shared", "deep", "own"}) local.Leaf(name, 1, 0.0);
         local.Named("inner", {Name("shared"), Name("deep")});
         local.Named("outer", {Name("shared"), Name("inner"), Name("own")});
-        for (char const* const name : row.containers) {
-            factory.RegisterDataFileContainer(Name(name));
-        }
+        for (char const* const name : row.containers) factory.RegisterDataFileContainer(Name(name));
         EXPECT_LE(row.containers.size(), factory.GetDataFileMatchNames().size());
         row.act(factory);
         Names left;
         for (char const* const name : {"deep", "inner", "outer", "own", "shared"}) {
-            if (factory.GetCanonicalInstance(Name(name))) {
-                left.push_back(name);
-            }
+            if (factory.GetCanonicalInstance(Name(name))) left.push_back(name);
         }
         EXPECT_EQ(row.left, left);
     }
@@ -287,15 +256,9 @@ public:
 
 TEST_F(Factory, AnObsoleteStreamIsReplacedByItsGroupsNewChildren)
 {
-    kinds.Leaf("amount", 1, 0.0);
-    kinds.Leaf("red", 1, 0.0);
-    kinds.Leaf("green", 1, 0.0);
-    kinds.Leaf("blue", 1, 0.0);
+    for (char const* const name : {"amount", "red", "green", "blue"}) kinds.Leaf(name, 1, 0.0);
     kinds.Named("part", {Name("green")});
-    const auto make = [](KFS_MatchName const& name, KFS_StreamFactory* f, bool, unsigned int, bool canonical) {
-        return new Tint(name, f, canonical, {Name("red"), Name("part"), Name("green"), Name("blue")});
-    };
-    ASSERT_TRUE(factory.RegisterFactoryFunc(Name("tint"), make, false));
+    kinds.Group<Tint>("tint", {Name("red"), Name("part"), Name("green"), Name("blue")});
     factory.GetCanonicalStream(Name("part"))->GetAsNamedGroup()->EnsureUILayoutComplete();
     const Q_MemoryCount before = Q_MemoryLive(nullptr);
     {
@@ -303,11 +266,11 @@ TEST_F(Factory, AnObsoleteStreamIsReplacedByItsGroupsNewChildren)
         old.InsertDefaultKey(T_Time{0, 1});
         KFS_Stream* const untouched = &old;
         std::vector<KFS_Stream*> result{untouched};
-        EXPECT_FALSE(factory.GatherObsoleteReplacementStreams(&old, result));
+        EXPECT_FALSE(old.GatherObsoleteReplacementStreams(result));
         EXPECT_EQ(std::vector<KFS_Stream*>{untouched}, result);
-        factory.RegisterObsoleteStreamParent(Name("amount"), Name("tint"));
+        old.RegisterObsoleteStreamParent(Name("amount"), Name("tint"));
         factory.RegisterObsoleteStreamParent(Name("amount"), Name("part"));  // the first stands
-        EXPECT_TRUE(factory.GatherObsoleteReplacementStreams(&old, result));
+        EXPECT_TRUE(old.GatherObsoleteReplacementStreams(result));
         ASSERT_EQ(2u, result.size()) << "those that the conversion made real, in display order";
         EXPECT_EQ("red", NameOf(result[0]));
         EXPECT_EQ("blue", NameOf(result[1]));
@@ -322,7 +285,6 @@ TEST_F(Factory, AnObsoleteStreamIsReplacedByItsGroupsNewChildren)
         EXPECT_TRUE(result.empty()) << "a leaf replaces nothing";
     }
     EXPECT_EQ(before, Q_MemoryLive(nullptr));
-    EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("tint")));
 }
 
 TEST_F(Factory, DecanonicalizingMakesTheWholeTreeReal)
@@ -386,17 +348,42 @@ TEST_F(Factory, TheDevelopmentSwitchMakesEverythingRealAtOnce)
 TEST_F(Factory, NoFailedAllocationLeavesAHalfRegisteredKind)
 {
     struct Nothing {};
-    FailEveryAllocation([] { return std::make_unique<Nothing>(); },
-                        [&](Nothing&) { return factory.RegisterFactoryFunc(Name("blur"), LeafFunc(0.0), false), 0; },
-                        [&](Nothing&, int code, Q_MemoryCount const& before) {
-                            reports.Take();
-                            if (code != 0) {
-                                EXPECT_EQ(before, Q_MemoryLive(nullptr));
-                                EXPECT_EQ(nullptr, factory.GetCanonicalInstance(Name("blur")));
-                            }
-                            factory.UnregisterFactoryFunc_NullOK(Name("blur"), true);
-                        });
-    EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("blur")));
+    const KFS_FactoryFunc group = [](KFS_MatchName const& name, KFS_StreamFactory* f, bool, unsigned int,
+                                     bool canonical) { return new TestNamedGroup(name, f, canonical, {Name("part")}); };
+    kinds.Leaf("part", 1, 0.0);
+    for (KFS_FactoryFunc const& func : {LeafFunc(0.0), group}) {
+        FailEveryAllocation([] { return std::make_unique<Nothing>(); },
+                            [&](Nothing&) { return factory.RegisterFactoryFunc(Name("kind"), func, false), 0; },
+                            [&](Nothing&, int code, Q_MemoryCount const& before) {
+                                reports.Take();
+                                if (code != 0) {
+                                    EXPECT_EQ(before, Q_MemoryLive(nullptr));
+                                    EXPECT_EQ(nullptr, factory.GetCanonicalInstance(Name("kind")));
+                                    EXPECT_EQ(nullptr, factory.GetCanonicalStream(Name("kind")));
+                                }
+                                factory.UnregisterFactoryFunc_NullOK(Name("kind"), true);
+                            });
+        EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("kind")));
+    }
+}
+
+TEST_F(Factory, ALayoutOfUnknownKindsIsRefusedWithItsGroup)
+{
+    bool defer = false;
+    const auto make = [](KFS_MatchName const& name, KFS_StreamFactory* f, bool, unsigned int, bool canonical) {
+        return new TestNamedGroup(name, f, canonical, {Name("early"), Name("late")});
+    };
+    const auto tryIt = [&] { factory.RegisterFactoryFunc(Name("group"), make, defer); };
+    kinds.Leaf("early", 1, 0.0);
+    ExpectBroken(reports, "UI layout has an unregistered child", tryIt);
+    EXPECT_EQ(nullptr, factory.GetCanonicalStream(Name("group")));
+    defer = true;
+    tryIt();
+    ExpectBroken(reports, "UI layout has an unregistered child", [&] { factory.SetupCanonicalStream(Name("group")); });
+    kinds.Leaf("late", 1, 0.0);
+    factory.SetupCanonicalStream(Name("group"));
+    EXPECT_EQ("late", NameOf(factory.GetCanonicalStream(Name("group"))->GetAsGroup()->GetStream(1)));
+    EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("group")));
 }
 
 }  // namespace

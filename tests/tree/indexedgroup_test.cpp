@@ -1,7 +1,8 @@
 #include "tree/indexedgroup.h"
 
+#include "tests/support/chunklines.h"
 #include "tests/support/groups.h"
-#include "tests/support/notifications.h"
+#include "tree/listener.h"
 
 #include <functional>
 #include <random>
@@ -22,9 +23,7 @@ protected:
         std::string Letters() const
         {
             std::string letters;
-            for (unsigned int i = 0; i < group->GetNumStreams(); ++i) {
-                letters += LetterOf(group->GetStream(i));
-            }
+            for (unsigned int i = 0; i < group->GetNumStreams(); ++i) letters += LetterOf(group->GetStream(i));
             return letters;
         }
         KFS_IndexedStreamGroup* operator->() const { return group.get(); }
@@ -45,82 +44,6 @@ protected:
         return static_cast<char>(static_cast<TestLeaf const*>(stream)->ValueAt(0));
     }
 };
-
-TEST_F(IndexedGroup, EditsMoveTheLaterChildren)
-{
-    struct Row {
-        const char* what;
-        std::function<void(List&)> edit;
-        const char* after;  // of "abc"
-    };
-    const Row rows[] = {
-        {"insert in front",
-         [](List& l) {
-             auto x = Letter('x');
-             l->InsertStream(0, &x);
-         },
-         "xabc"},
-        {"insert between",
-         [](List& l) {
-             auto x = Letter('x');
-             l->InsertStream(2, &x);
-         },
-         "abxc"},
-        {"insert at the end",
-         [](List& l) {
-             auto x = Letter('x');
-             l->InsertStream(3, &x);
-         },
-         "abcx"},
-        {"append",
-         [](List& l) {
-             auto x = Letter('x');
-             EXPECT_EQ(3u, l->AppendStream(&x));
-         },
-         "abcx"},
-        {"duplicate the first", [](List& l) { EXPECT_EQ('a', LetterOf(l->DuplicateStream(0))); }, "aabc"},
-        {"duplicate the last", [](List& l) { EXPECT_EQ('c', LetterOf(l->DuplicateStream(2))); }, "abcc"},
-        {"swap",
-         [](List& l) {
-             auto x = Letter('x');
-             const Q_ScAutoPtr<KFS_StreamBase> left(l->SwapStream(1, &x));
-             EXPECT_EQ('b', LetterOf(left.get()));
-             EXPECT_EQ(nullptr, left->GetParent());
-             EXPECT_EQ(nullptr, x.get());
-         },
-         "axc"},
-        {"remove",
-         [](List& l) {
-             const Q_ScAutoPtr<KFS_StreamBase> left(l->RemoveStream(0));
-             EXPECT_EQ('a', LetterOf(left.get()));
-             EXPECT_EQ(nullptr, left->GetParent());
-         },
-         "bc"},
-        {"remove a child",
-         [](List& l) {
-             const Q_ScAutoPtr<KFS_StreamBase> child(l->GetEditableStream(2u));
-             EXPECT_TRUE(l->RemoveChild(child.get()));
-             EXPECT_EQ(nullptr, child->GetParent());
-             EXPECT_FALSE(l->RemoveChild(child.get()));
-         },
-         "ab"},
-        {"reorder to the end", [](List& l) { l->ReorderStreams(0, 2); }, "bca"},
-        {"reorder to the front", [](List& l) { l->ReorderStreams(2, 0); }, "cab"},
-        {"reorder on the spot", [](List& l) { l->ReorderStreams(1, 1); }, "abc"},
-    };
-    for (const Row& row : rows) {
-        SCOPED_TRACE(row.what);
-        List list("abc");
-        row.edit(list);
-        EXPECT_EQ(row.after, list.Letters());
-        for (unsigned int i = 0; i < list->GetNumStreams(); ++i) {
-            EXPECT_EQ(list.group.get(), list->GetStream(i)->GetParent());
-            const KFS_StreamID id = list->SlowGetIDOfChild(list->GetStream(i));
-            EXPECT_EQ(i, id.GetIndex());
-            EXPECT_EQ(Name("opacity"), id.GetMatchName());
-        }
-    }
-}
 
 TEST_F(IndexedGroup, BadPlacesAndNamesAreRefusedAndLeaveTheListAlone)
 {
@@ -177,25 +100,19 @@ TEST_F(IndexedGroup, AKindThatCantStandHereMeansACorruptProject)
     EXPECT_EQ(1u, reports.Take().size());
 }
 
-TEST_F(IndexedGroup, LeavesAreToldFromGroups)
-{
-    List list("a");
-    auto node = TestKinds::Make("node");
-    list->AppendStream(&node);
-    EXPECT_EQ(list->GetStream(0), list->GetLeafStream(0));
-    EXPECT_EQ(list->GetStream(0), list->GetEditableLeafStream(0));
-    EXPECT_EQ(nullptr, list->GetLeafStream(1));
-    EXPECT_EQ(nullptr, list->GetEditableLeafStream(1));
-}
-
-TEST_F(IndexedGroup, AnyChildMakesItModified)
+TEST_F(IndexedGroup, LeavesAreToldFromGroupsAndAnyChildMakesItModified)
 {
     List list("");
     EXPECT_FALSE(list->IsModified());
-    auto node = TestKinds::Make("node");
-    list->AppendStream(&node);
+    AddNode(*list.group);
     EXPECT_FALSE(list->GetStream(0)->IsModified());
     EXPECT_TRUE(list->IsModified());
+    EXPECT_EQ(nullptr, list->GetLeafStream(0));
+    EXPECT_EQ(nullptr, list->GetEditableLeafStream(0));
+    auto leaf = Letter('a');
+    list->AppendStream(&leaf);
+    EXPECT_EQ(list->GetStream(1), list->GetLeafStream(1));
+    EXPECT_EQ(list->GetStream(1), list->GetEditableLeafStream(1));
 }
 
 TEST_F(IndexedGroup, WhatComesInTakesTheScaleOfItsPlace)
@@ -214,38 +131,28 @@ TEST_F(IndexedGroup, WhatComesInTakesTheScaleOfItsPlace)
     EXPECT_EQ(600u, Canonical("opacity")->GetAsLeaf()->GetTimeScale());
 }
 
-TEST_F(IndexedGroup, ADuplicateIsAWholeSubtreeOfItsOwn)
+TEST_F(IndexedGroup, ADuplicateAndACloneAreWholeSubtreesOfTheirOwn)
 {
-    List list("");
-    auto made = TestKinds::Make("node");
-    auto* const node = made->GetAsNamedGroup();
-    list->AppendStream(&made);
-    auto* const opacity = node->GetEditableLeafStream(Name("opacity"));
+    List list("ab");
+    auto* const opacity = AddNode(*list.group)->GetEditableLeafStream(Name("opacity"));
     ASSERT_EQ(0, opacity->SetConstant(false, true));
-    auto* const copy = list->DuplicateStream(0)->GetAsNamedGroup();
-    EXPECT_EQ(copy, list->GetStream(1));
-    EXPECT_EQ(list.group.get(), copy->GetParent());
-    auto* const its = copy->GetEditableLeafStreamNullOK(Name("opacity"));
-    ASSERT_NE(nullptr, its);
-    EXPECT_NE(opacity, its);
-    EXPECT_TRUE(its->IsAnimated(false)) << "with its keys";
-    EXPECT_EQ(Canonical("position"), copy->GetStream(2));
-}
-
-TEST_F(IndexedGroup, ACloneCopiesTheListInOrder)
-{
-    const List list("abc");
     const Q_ScAutoPtr<KFS_StreamBase> made(list->CloneStream(KFS_CloneStreamParams{true, true}));
     auto* const copy = made->GetAsIndexedGroup();
-    ASSERT_EQ(3u, copy->GetNumStreams());
-    for (unsigned int i = 0; i < 3; ++i) {
-        EXPECT_NE(list->GetStream(i), copy->GetStream(i));
-        EXPECT_EQ("abc"[i], LetterOf(copy->GetStream(i)));
-        EXPECT_EQ(copy, copy->GetStream(i)->GetParent());
+    KFS_StreamBase const* const duplicate = list->DuplicateStream(2);
+    EXPECT_EQ(duplicate, list->GetStream(3));
+    for (auto const& [group, index] : {std::pair{list.group.get(), 3u}, {copy, 2u}}) {
+        auto* const node = group->GetEditableStream(index)->GetAsNamedGroup();
+        EXPECT_EQ(group, node->GetParent());
+        auto* const its = node->GetEditableLeafStreamNullOK(Name("opacity"));
+        ASSERT_NE(nullptr, its);
+        EXPECT_NE(opacity, its);
+        EXPECT_TRUE(its->IsAnimated(false)) << "with its keys";
+        EXPECT_EQ(Canonical("position"), node->GetStream(2));
     }
-    auto more = Letter('d');
-    copy->AppendStream(&more);
-    EXPECT_EQ("abc", list.Letters());
+    ASSERT_EQ(3u, copy->GetNumStreams());
+    EXPECT_NE(list->GetStream(0), copy->GetStream(0));
+    EXPECT_EQ('a', LetterOf(copy->GetStream(0)));
+    EXPECT_EQ('b', LetterOf(copy->GetStream(1)));
 }
 
 TEST_F(IndexedGroup, ACanonicalEntryStaysTheFactorys)
@@ -260,21 +167,42 @@ TEST_F(IndexedGroup, ACanonicalEntryStaysTheFactorys)
         EXPECT_EQ(list.group.get(), canonical->GetParent());
         const Q_ScAutoPtr<KFS_StreamBase> copy(list->CloneStream(KFS_CloneStreamParams{true, true}));
         EXPECT_EQ(canonical, copy->GetAsIndexedGroup()->GetStream(1)) << "a clone shares it";
+        const Q_MemoryCount before = Q_MemoryLive(nullptr);
+        EXPECT_FALSE(list->DuplicateStream(1)->IsCanonical());
+        delete list->RemoveStream(2);
+        EXPECT_EQ(before.blocks, Q_MemoryLive(nullptr).blocks) << "a duplicate is the list's own";
     }
     EXPECT_EQ(nullptr, canonical->GetParent()) << "it outlives the list, and forgets it";
     EXPECT_TRUE(canonical->IsCanonical());
 }
 
-TEST_F(IndexedGroup, AStreamMovedPastTheEndIsLost)
+TEST_F(IndexedGroup, AStreamMovedPastTheEndIsLostUnlessItIsTheFactorys)
 {
-    List list("abc");
+    auto* const canonical = Get_VX_StreamFactory()->GetCanonicalStream(Name("opacity"));
+    List list("ab");
+    Q_ScAutoPtr<KFS_StreamBase> entry(canonical);
+    list->AppendStream(&entry);
+    ExpectBroken(reports, "invalid index for insert in indexed group", [&] { list->ReorderStreams(2, 3); });
+    EXPECT_EQ("ab", list.Letters());
+    EXPECT_EQ(100.0, static_cast<TestLeaf*>(canonical)->ValueAt(0));
     const Q_MemoryCount before = Q_MemoryLive(nullptr);
-    ExpectBroken(reports, "invalid index for insert in indexed group", [&] { list->ReorderStreams(0, 3); });
-    EXPECT_EQ("bc", list.Letters());
+    ExpectBroken(reports, "invalid index for insert in indexed group", [&] { list->ReorderStreams(0, 2); });
+    EXPECT_EQ("b", list.Letters());
     EXPECT_LT(Q_MemoryLive(nullptr).bytes, before.bytes) << "and deleted";
     bool wasPaused = true;
     KFS_PauseMainListener(false, wasPaused);
     EXPECT_FALSE(wasPaused) << "the pause ends with the failure";
+}
+
+TEST_F(IndexedGroup, AGroupWithoutAFactoryReadsNoChildren)
+{
+    const MemoryFile file([](CKF_File* out) { List("a")->Write(out); });
+    TestIndexedGroup group(Name("layers"), nullptr, false, {});
+    file.Read([&](CKF_File* in) {
+        ExpectBroken(reports, "asked a property without a factory for a property type",
+                     [&] { group.Read(in, nullptr); });
+    });
+    EXPECT_EQ(0u, group.GetNumStreams());
 }
 
 // Any run of edits against a plain string.
@@ -288,94 +216,57 @@ TEST_F(IndexedGroup, RandomEditsFollowAPlainList)
         std::string model;
         for (int step = 0; step < 60; ++step) {
             const char letter = static_cast<char>('a' + random() % 26);
-            const unsigned int kind = upTo(4);
-            if (kind == 0 || model.empty()) {
-                const unsigned int at = upTo(model.size());
-                auto made = Letter(letter);
+            const unsigned int kind = model.empty() ? upTo(1) : upTo(6);
+            const unsigned int at = upTo(kind == 0 ? model.size() : std::max<std::size_t>(model.size(), 1) - 1);
+            auto made = Letter(letter);
+            Q_ScAutoPtr<KFS_StreamBase> left;
+            if (kind == 0) {
                 list->InsertStream(at, &made);
                 model.insert(at, 1, letter);
-                continue;
-            }
-            const unsigned int at = upTo(model.size() - 1), to = upTo(model.size() - 1);
-            if (kind == 1) {
-                delete list->RemoveStream(at);
-                model.erase(at, 1);
+            } else if (kind == 1) {
+                EXPECT_EQ(model.size(), list->AppendStream(&made));
+                model += letter;
             } else if (kind == 2) {
-                auto made = Letter(letter);
-                delete list->SwapStream(at, &made);
+                left.reset(list->SwapStream(at, &made));
+                EXPECT_EQ(model[at], LetterOf(left.get()));
                 model[at] = letter;
             } else if (kind == 3) {
-                list->DuplicateStream(at);
+                EXPECT_EQ(model[at], LetterOf(list->DuplicateStream(at)));
                 model.insert(at + 1, 1, model[at]);
-            } else {
+            } else if (kind == 4) {
+                const unsigned int to = upTo(model.size() - 1);
                 list->ReorderStreams(at, to);
                 const char moved = model[at];
                 model.erase(at, 1);
                 model.insert(to, 1, moved);
+            } else {
+                left.reset(kind == 5 ? list->RemoveStream(at) : list->GetEditableStream(at));
+                EXPECT_EQ(model[at], LetterOf(left.get()));
+                EXPECT_EQ(kind == 6, list->RemoveChild(left.get()));
+                model.erase(at, 1);
             }
+            EXPECT_EQ(kind < 3, !made.get());
+            EXPECT_TRUE(!left.get() || !left->GetParent());
             ASSERT_EQ(model, list.Letters()) << "run " << run << " step " << step;
+            for (unsigned int i = 0; i < list->GetNumStreams(); ++i) {
+                EXPECT_EQ(list.group.get(), list->GetStream(i)->GetParent());
+                const KFS_StreamID id = list->SlowGetIDOfChild(list->GetStream(i));
+                EXPECT_EQ((std::pair{i, Name("opacity")}), (std::pair{id.GetIndex(), id.GetMatchName()}));
+            }
         }
     }
     EXPECT_EQ(before, Q_MemoryLive(nullptr));
 }
 
-// What a listener throws stops the edit where it is; no stream is lost or deleted twice.
-TEST_F(IndexedGroup, AListenersFailureLosesNoStream)
-{
-    struct Row {
-        const char* at;  // the record at which the listener throws
-        std::function<void(KFS_IndexedStreamGroup&)> edit;
-        unsigned int children;  // afterwards, of two
-    };
-    const auto insert = [](KFS_IndexedStreamGroup& list) {
-        auto x = Letter('x');
-        list.InsertStream(0, &x);
-    };
-    const auto swap = [](KFS_IndexedStreamGroup& list) {
-        auto x = Letter('x');
-        delete list.SwapStream(0, &x);
-    };
-    const auto remove = [](KFS_IndexedStreamGroup& list) { delete list.RemoveStream(0); };
-    const Row rows[] = {
-        {"before-insert", insert, 2}, {"after-insert", insert, 3},  {"before-swap", swap, 2},
-        {"after-swap", swap, 2},      {"before-remove", remove, 2}, {"after-remove", remove, 1},
-    };
-    for (const Row& row : rows) {
-        SCOPED_TRACE(row.at);
-        const Q_MemoryCount before = Q_MemoryLive(nullptr);
-        {
-            TestRoot<TestIndexedGroup> root("layers");
-            auto a = Letter('a'), b = Letter('b');
-            root.AppendStream(&a);
-            root.AppendStream(&b);
-            {
-                NotificationRecorder listener;
-                listener.look = [&](KFS_StreamGroup*, KFS_StreamBase const*) -> std::string {
-                    if (listener.Current().starts_with(row.at)) throw int{77};
-                    return {};
-                };
-                EXPECT_EQ(77, KFSp_Boundary([&] { row.edit(root); }));
-            }
-            EXPECT_EQ(row.children, root.GetNumStreams());
-        }
-        EXPECT_EQ(before, Q_MemoryLive(nullptr));
-    }
-}
-
 TEST_F(IndexedGroup, NoFailedAllocationLeavesAnythingBehind)
 {
     struct Fixture {
-        Fixture()
-        {
-            auto node = TestKinds::Make("node");
-            node->GetAsNamedGroup()->GetEditableStream(Name("opacity"));
-            list->AppendStream(&node);
-        }
+        Fixture() { AddNode(*list.group)->GetEditableStream(Name("opacity")); }
         List list{"a"};
     };
     const std::function<void(List&)> edits[] = {
         [](List& l) {
-            const Q_ScAutoPtr<KFS_StreamBase> copy(l->CloneStream(KFS_CloneStreamParams{true, true}));
+            delete l->CloneStream(KFS_CloneStreamParams{true, true});
         },
         [](List& l) { delete (l->DuplicateStream(1), l->RemoveStream(2)); },
         [](List& l) { l->ReorderStreams(0, 1); },

@@ -12,19 +12,19 @@ using Names = std::vector<std::string>;
 
 class NamedGroup : public SceneTest {};
 
+const Names SceneOrder{"opacity", "transform", "position", "rotation"};
+
 Names NamesOf(KFS_StreamGroup const& group)
 {
     Names names;
-    for (unsigned int i = 0; i < group.GetNumStreams(); ++i) {
-        names.push_back(NameOf(group.GetStream(i)));
-    }
+    for (unsigned int i = 0; i < group.GetNumStreams(); ++i) names.push_back(NameOf(group.GetStream(i)));
     return names;
 }
 
 TEST_F(NamedGroup, ANewOneHasAllItsChildrenInDisplayOrder)
 {
     auto const node = MakeNode();
-    EXPECT_EQ((Names{"opacity", "transform", "position", "rotation"}), NamesOf(*node));
+    EXPECT_EQ(SceneOrder, NamesOf(*node));
     for (unsigned int i = 0; i < 4; ++i) {
         KFS_StreamBase const* const child = node->GetStream(i);
         SCOPED_TRACE(NameOf(child));
@@ -55,19 +55,18 @@ TEST_F(NamedGroup, LookingNeverMakesAStreamAndAskingForAnEditableOneMakesItOnce)
     EXPECT_EQ(nullptr, node->GetLeafStream(Name("transform")));
     EXPECT_EQ(nullptr, node->FindEditableLeafStreamNullOK(KFS_StreamIDPath(KFS_StreamID(Name("opacity")))));
     EXPECT_EQ(before, Q_MemoryLive(nullptr));
-
     KFS_Stream* const opacity = node->GetEditableLeafStream(Name("opacity"));
     ASSERT_NE(nullptr, opacity);
     EXPECT_FALSE(opacity->IsCanonical());
     EXPECT_EQ(node.get(), opacity->GetParent());
     EXPECT_EQ(100.0, static_cast<TestLeaf*>(opacity)->ValueAt(0));
     EXPECT_TRUE(opacity->HasNoKeys());
-    EXPECT_EQ(opacity, node->GetEditableStream(0u));
-    EXPECT_EQ(opacity, node->GetEditableStream(Name("opacity")));
-    EXPECT_EQ(opacity, node->GetEditableStreamNullOK(0u));
+    for (KFS_StreamBase* const again :
+         {node->GetEditableStream(0u), node->GetEditableStream(Name("opacity")), node->GetEditableStreamNullOK(0u)}) {
+        EXPECT_EQ(opacity, again);
+    }
     EXPECT_EQ(opacity, node->GetEditableLeafStreamNullOK(Name("opacity")));
-    EXPECT_EQ((Names{"opacity", "transform", "position", "rotation"}), NamesOf(*node));
-    EXPECT_EQ(Canonical("rotation"), node->GetStream(3));
+    EXPECT_EQ(SceneOrder, NamesOf(*node));
 }
 
 TEST_F(NamedGroup, AStreamMadeRealHasItsGroupsTimeScale)
@@ -95,31 +94,21 @@ TEST_F(NamedGroup, AKindThatWantsItGetsItsDefaultAgainOnceItIsStored)
 TEST_F(NamedGroup, IdentifiersGoByIndexAndCheckTheName)
 {
     auto const node = MakeNode();
-    struct Row {
-        const char* why;
-        KFS_StreamID id;
-        const char* found;  // or what is broken
-        bool broken;
+    for (KFS_StreamID const& id :
+         {KFS_StreamID(Name("position")), KFS_StreamID(2), KFS_StreamID(2, Name("position"))}) {
+        EXPECT_EQ("position", NameOf(std::as_const(*node).GetStream(id)));
+        EXPECT_EQ("position", NameOf(node->GetEditableStream(id)));
+    }
+    const std::pair<KFS_StreamID, char const*> bad[] = {
+        {KFS_StreamID(2, Name("rotation")), "stream at index has wrong matchname"},
+        {KFS_StreamID(4), "invalid index in named group"},
+        {KFS_StreamID(0xFFFFFFFE, Name("position")), "invalid index in named group"},
+        {KFS_StreamID(Name("scale")), "unexpected match name searched for in group"},
+        {KFS_StreamID(), "unexpected match name searched for in group"},
     };
-    const Row rows[] = {
-        {"a name", KFS_StreamID(Name("position")), "position", false},
-        {"an index counts in display order", KFS_StreamID(2), "position", false},
-        {"both", KFS_StreamID(2, Name("position")), "position", false},
-        {"both, at odds", KFS_StreamID(2, Name("rotation")), "stream at index has wrong matchname", true},
-        {"an index at the end", KFS_StreamID(4), "invalid index in named group", true},
-        {"an index far out", KFS_StreamID(0xFFFFFFFE, Name("position")), "invalid index in named group", true},
-        {"a name of another group", KFS_StreamID(Name("scale")), "unexpected match name searched for in group", true},
-        {"nothing at all", KFS_StreamID(), "unexpected match name searched for in group", true},
-    };
-    for (const Row& row : rows) {
-        SCOPED_TRACE(row.why);
-        if (row.broken) {
-            ExpectBroken(reports, row.found, [&] { return std::as_const(*node).GetStream(row.id); });
-            ExpectBroken(reports, row.found, [&] { return node->GetEditableStream(row.id); });
-        } else {
-            EXPECT_EQ(row.found, NameOf(std::as_const(*node).GetStream(row.id)));
-            EXPECT_EQ(row.found, NameOf(node->GetEditableStream(row.id)));
-        }
+    for (auto const& [id, text] : bad) {
+        ExpectBroken(reports, text, [&, &id = id] { return std::as_const(*node).GetStream(id); });
+        ExpectBroken(reports, text, [&, &id = id] { return node->GetEditableStream(id); });
     }
     EXPECT_EQ(nullptr, node->GetStream(Name("scale"), false)) << "an unknown name may be asked for";
     ExpectBroken(reports, "invalid index in named group", [&] { return node->GetStream(4); });
@@ -136,8 +125,7 @@ TEST_F(NamedGroup, ASwapGivesBackWhatWasReal)
 {
     auto const node = MakeNode();
     auto first = TestKinds::Make("rotation"), second = TestKinds::Make("rotation");
-    KFS_StreamBase* const a = first.get();
-    KFS_StreamBase* const b = second.get();
+    KFS_StreamBase *const a = first.get(), *const b = second.get();
     EXPECT_EQ(nullptr, node->SwapStream(&first)) << "a canonical stream stays the factory's";
     EXPECT_EQ(nullptr, first.get());
     EXPECT_EQ(node.get(), a->GetParent());
@@ -146,11 +134,9 @@ TEST_F(NamedGroup, ASwapGivesBackWhatWasReal)
     EXPECT_EQ(a, left.get());
     EXPECT_EQ(nullptr, a->GetParent());
     EXPECT_EQ(b, node->GetStream(3));
-
     auto foreign = TestKinds::Make("scale");
     ExpectBroken(reports, "invalid name for storing in this named group", [&] { return node->SwapStream(&foreign); });
     EXPECT_NE(nullptr, foreign.get());
-
     TestNamedGroup bare(Name("no kind"), Get_VX_StreamFactory(), false, {});
     EXPECT_EQ(nullptr, bare.SwapStream(&foreign)) << "without a layout nothing can be stored";
     EXPECT_NE(nullptr, foreign.get());
@@ -167,7 +153,6 @@ TEST_F(NamedGroup, ASlotCanBeMadeCanonicalAgain)
     EXPECT_EQ(nullptr, opacity->GetParent());
     EXPECT_EQ(Canonical("opacity"), node->GetStream(0));
     EXPECT_EQ(nullptr, Canonical("opacity")->GetParent());
-
     const Q_ScAutoPtr<KFS_StreamBase> transform(node->SwapCanonicalForStream(Name("transform")));
     EXPECT_EQ(Canonical("transform"), node->GetStream(1));
     EXPECT_FALSE(node->GetEditableStream(Name("transform"))->IsCanonical());
@@ -207,7 +192,6 @@ TEST_F(NamedGroup, ACloneOfADeepCanonicalGroupStaysSharedUntilItIsAskedFor)
     EXPECT_FALSE(outer->IsCanonical());
     EXPECT_EQ(Canonical("node"), outer->GetStream(0)) << "two levels down a group is shared";
     EXPECT_EQ(4u, outer->GetStream(0)->GetAsGroup()->GetNumStreams()) << "and complete for whoever looks";
-
     const KFS_StreamIDPath path(KFS_StreamID(0), KFS_StreamID(Name("node")), KFS_StreamID(Name("opacity")));
     EXPECT_EQ(Canonical("opacity"), outermost->FindStream(path));
     EXPECT_EQ(nullptr, outermost->FindEditableLeafStreamNullOK(path));
@@ -242,9 +226,7 @@ TEST_F(NamedGroup, TheWalkMeetsRealLeavesDepthFirstWithTheirPaths)
         KFS_StreamIDPath path(KFS_StreamID(7));  // what was there stays in front
         auto note = [&](KFS_Stream* leaf) {
             std::string line = NameOf(leaf);
-            for (KFS_StreamID const& id : path.GetPathConst()) {
-                line += " " + std::to_string(id.GetIndex());
-            }
+            for (KFS_StreamID const& id : path.GetPathConst()) line += " " + std::to_string(id.GetIndex());
             EXPECT_TRUE(path.GetLength() == 1 || path.GetTail().GetMatchName() == leaf->GetMatchName());
             met.push_back(line);
         };
@@ -305,8 +287,7 @@ TEST_F(NamedGroup, AResetGoesBackToTheDefaults)
     node->ResetAllStreamsToCanonical(false);
     EXPECT_EQ(nullptr, node->GetEditableStreamNullOK(0u));
     EXPECT_EQ(Canonical("scale"), node->GetStream(1)->GetAsGroup()->GetStream(0));
-    EXPECT_EQ((Names{"opacity", "transform", "position", "rotation"}), NamesOf(*node));
-
+    EXPECT_EQ(SceneOrder, NamesOf(*node));
     auto* const canonical = Get_VX_StreamFactory()->GetCanonicalStream(Name("node"))->GetAsNamedGroup();
     canonical->EnsureUILayoutComplete();
     KFS_StreamBase const* const before = canonical->GetStream(0);
@@ -374,61 +355,74 @@ TEST_F(NamedGroup, ManyThreadsFindACanonicalGroupComplete)
                 mine += crowd->GetNumStreams() != names.size();
             });
         }
-        for (std::thread& thread : threads) {
-            thread.join();
-        }
+        for (std::thread& thread : threads) thread.join();
         EXPECT_EQ(std::vector<int>(4, 0), wrong);
     }
 }
 
 // What a listener throws stops the edit where it is; no stream is lost or deleted twice, the canonical ones least of
-// all.
+// all. The list holds an opacity, and a node with one of its own.
 TEST_F(NamedGroup, AListenersFailureLosesNoStream)
 {
+    using List = KFS_IndexedStreamGroup;
+    using Node = KFS_NamedStreamGroup;
     struct Row {
         const char* at;  // the notification from which the listener throws
         const char* edit;
-        std::function<void(KFS_NamedStreamGroup&)> act;
-        bool real;  // whether "opacity", which is real before, is so afterwards
+        std::function<void(List&, Node&)> act;
+        unsigned int children;  // of the list, afterwards
+        bool real;              // whether the node's "opacity" is so afterwards
     };
-    const auto upgrade = [](KFS_NamedStreamGroup& n) { n.GetEditableStream(Name("rotation")); };
-    const auto swap = [](KFS_NamedStreamGroup& n) {
+    const auto insert = [](List& l, Node&) {
+        auto made = TestKinds::Make("opacity");
+        l.InsertStream(0, &made);
+    };
+    const auto swapInList = [](List& l, Node&) {
+        auto made = TestKinds::Make("opacity");
+        delete l.SwapStream(0, &made);
+    };
+    const auto remove = [](List& l, Node&) { delete l.RemoveStream(0); };
+    const auto upgrade = [](List&, Node& n) { n.GetEditableStream(Name("rotation")); };
+    const auto swap = [](List&, Node& n) {
         auto made = TestKinds::Make("opacity");
         delete n.SwapStream(&made);
     };
-    const auto downgrade = [](KFS_NamedStreamGroup& n) { delete n.SwapCanonicalForStream(Name("opacity")); };
-    const auto reset = [](KFS_NamedStreamGroup& n) { n.ResetAllStreamsToCanonical(true); };
+    const auto downgrade = [](List&, Node& n) { delete n.SwapCanonicalForStream(Name("opacity")); };
+    const auto reset = [](List&, Node& n) { n.ResetAllStreamsToCanonical(true); };
     const Row rows[] = {
-        {"before-swap", "upgrade", upgrade, true},
-        {"after-swap", "upgrade", upgrade, true},
-        {"before-swap", "swap", swap, true},
-        {"after-swap", "swap", swap, true},
-        {"before-swap", "downgrade", downgrade, true},
-        {"after-swap", "downgrade", downgrade, false},
-        {"before-remove node opacity", "reset", reset, true},
-        {"after-remove node opacity", "reset", reset, true},
+        {"before-insert", "insert", insert, 2, true},
+        {"after-insert", "insert", insert, 3, true},
+        {"before-swap", "swap in the list", swapInList, 2, true},
+        {"after-swap", "swap in the list", swapInList, 2, true},
+        {"before-remove", "remove", remove, 2, true},
+        {"after-remove", "remove", remove, 1, true},
+        {"before-swap", "upgrade", upgrade, 2, true},
+        {"after-swap", "upgrade", upgrade, 2, true},
+        {"before-swap", "swap", swap, 2, true},
+        {"after-swap", "swap", swap, 2, true},
+        {"before-swap", "downgrade", downgrade, 2, true},
+        {"after-swap", "downgrade", downgrade, 2, false},
+        {"before-remove node opacity", "reset", reset, 2, true},
+        {"after-remove node opacity", "reset", reset, 2, true},
     };
     auto* const canonical = Get_VX_StreamFactory()->GetCanonicalStream(Name("opacity"));
     MakeNode();  // fills canonical groups in
     for (const Row& row : rows) {
-        SCOPED_TRACE(row.edit);
-        SCOPED_TRACE(row.at);
+        SCOPED_TRACE(testing::Message() << row.edit << ", " << row.at);
         const Q_MemoryCount before = Q_MemoryLive(nullptr);
         {
             TestRoot<TestIndexedGroup> root("layers");
-            auto made = TestKinds::Make("node");
-            auto* const node = made->GetAsNamedGroup();
-            root.AppendStream(&made);
+            auto opacity = TestKinds::Make("opacity");
+            root.AppendStream(&opacity);
+            auto* const node = AddNode(root);
             node->GetEditableStream(Name("opacity"));
             {
                 NotificationRecorder listener;
-                listener.look = [&](KFS_StreamGroup*, KFS_StreamBase const*) -> std::string {
-                    if (listener.Current().starts_with(row.at)) throw int{77};
-                    return {};
-                };
-                EXPECT_EQ(77, KFSp_Boundary([&] { row.act(*node); }));
+                listener.ThrowAt(row.at);
+                EXPECT_EQ(77, KFSp_Boundary([&] { row.act(root, *node); }));
             }
-            EXPECT_EQ((Names{"opacity", "transform", "position", "rotation"}), NamesOf(*node));
+            EXPECT_EQ(row.children, root.GetNumStreams());
+            EXPECT_EQ(SceneOrder, NamesOf(*node));
             EXPECT_EQ(row.real, node->GetEditableStreamNullOK(0u) != nullptr);
             EXPECT_EQ(canonical, Get_VX_StreamFactory()->GetCanonicalStream(Name("opacity")));
             EXPECT_EQ(100.0, static_cast<TestLeaf*>(canonical)->ValueAt(0));
@@ -437,48 +431,116 @@ TEST_F(NamedGroup, AListenersFailureLosesNoStream)
     }
 }
 
-TEST_F(NamedGroup, NoFailedAllocationLeavesAnythingBehind)
+TEST_F(NamedGroup, NoFailedAllocationLeavesAnythingBehindOrASlotEmpty)
 {
-    struct Case {
-        const char* what;
-        std::function<void(KFS_NamedStreamGroup&)> edit;
-    };
-    const Case cases[] = {
-        {"a new group", [](KFS_NamedStreamGroup&) { MakeNode(); }},
+    using Node = KFS_NamedStreamGroup;
+    const std::pair<char const*, std::function<void(Node&)>> edits[] = {
+        {"a new group", [](Node&) { MakeNode(); }},
         {"a clone",
-         [](KFS_NamedStreamGroup& node) {
-             const Q_ScAutoPtr<KFS_StreamBase> copy(node.CloneStream(KFS_CloneStreamParams{true, true}));
+         [](Node& n) {
+             delete n.CloneStream(KFS_CloneStreamParams{true, true});
          }},
+        {"an upgrade", [](Node& n) { n.GetEditableStream(Name("position")); }},
+        {"a reset", [](Node& n) { n.ResetAllStreamsToCanonical(true); }},
     };
-    for (const Case& row : cases) {
-        SCOPED_TRACE(row.what);
-        const int failures = FailEveryAllocation(
-            [] {
-                auto node = MakeNode();
-                node->GetEditableStream(Name("opacity"));
-                node->GetEditableStream(Name("transform"))->GetAsNamedGroup()->GetEditableStream(Name("anchor"));
-                return node;
-            },
-            [&row](KFS_NamedStreamGroup& node) { return row.edit(node), 0; },
-            [&](KFS_NamedStreamGroup&, int, Q_MemoryCount const& before) {
-                EXPECT_EQ(before, Q_MemoryLive(nullptr));
-                reports.Take();
-            });
-        EXPECT_GE(failures, 5);
+    for (auto const& [what, edit] : edits) {
+        SCOPED_TRACE(what);
+        const auto make = [] {
+            auto node = MakeNode();
+            node->GetEditableStream(Name("opacity"));
+            node->GetEditableStream(Name("transform"))->GetAsNamedGroup()->GetEditableStream(Name("anchor"));
+            return node;
+        };
+        const auto check = [&](Node& node, int, Q_MemoryCount const& before) {
+            if (!node.GetEditableStreamNullOK(Name("position"))) {
+                EXPECT_LE(Q_MemoryLive(nullptr).bytes, before.bytes);
+                EXPECT_LE(Q_MemoryLive(nullptr).blocks, before.blocks);
+            }
+            reports.Take();
+            EXPECT_EQ(SceneOrder, NamesOf(node));
+            EXPECT_FALSE(node.GetEditableStream(Name("transform"))->IsCanonical()) << "what is missing comes on demand";
+            EXPECT_EQ(0u, reports.Take().size());
+        };
+        EXPECT_GE(FailEveryAllocation(
+                      make, [&edit = edit](Node& n) { return edit(n), 0; }, check),
+                  3);
     }
 }
 
-TEST_F(NamedGroup, AnUpgradeThatRunsOutOfMemoryLeavesTheSlotCanonical)
+// The host may rename what it has; the end of the group doesn't stumble over it.
+TEST_F(NamedGroup, ARenamedChildIsRemovedLikeTheOthers)
 {
-    FailEveryAllocation([] { return MakeNode(); },
-                        [](KFS_NamedStreamGroup& node) { return node.GetEditableStream(Name("position")), 0; },
-                        [&](KFS_NamedStreamGroup& node, int, Q_MemoryCount const& before) {
-                            reports.Take();
-                            if (node.GetEditableStreamNullOK(Name("position")) == nullptr) {
-                                EXPECT_EQ(before, Q_MemoryLive(nullptr));
-                            }
-                            EXPECT_EQ(4u, node.GetNumStreams());
-                        });
+    MakeNode();  // fills canonical groups in
+    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    {
+        NotificationRecorder recorder;
+        TestRoot<TestIndexedGroup> root("layers");
+        auto* const node = AddNode(root);
+        for (char const* const name : {"opacity", "position", "rotation"}) {
+            recorder.Label(node->GetEditableStream(Name(name)), name);
+        }
+        node->GetEditableStream(Name("opacity"))->SetMatchName(Name("position"));
+        node->GetEditableStream(Name("rotation"))->SetMatchName(Name("no kind"));
+        recorder.Take();
+        node->ResetAllStreamsToCanonical(false);
+        EXPECT_EQ(SceneOrder, NamesOf(*node));
+        const Notifications heard = recorder.Take();
+        EXPECT_EQ(4, std::count_if(heard.begin(), heard.end(),
+                                   [](std::string const& line) { return line.starts_with("after-remove node "); }));
+    }
+    EXPECT_EQ(0u, reports.Take().size());
+    EXPECT_EQ(before, Q_MemoryLive(nullptr));
+}
+
+TEST_F(NamedGroup, WhatAListenerMakesRealInADyingGroupDiesWithIt)
+{
+    MakeNode();  // fills canonical groups in
+    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    {
+        TestRoot<TestIndexedGroup> root("layers");
+        auto* const node = AddNode(root);
+        for (char const* const name : {"opacity", "position", "rotation"}) node->GetEditableStream(Name(name));
+        NotificationRecorder listener;
+        listener.look = [&](KFS_StreamGroup* group, KFS_StreamBase const*) -> std::string {
+            if (group == node && listener.Current().starts_with("before-remove")) {
+                node->GetEditableStream(Name("opacity"));
+                node->GetEditableStream(Name("rotation"));
+            }
+            return {};
+        };
+        delete root.RemoveStream(0);
+        listener.look = {};
+    }
+    EXPECT_EQ(before, Q_MemoryLive(nullptr));
+}
+
+// A group type whose kinds of children become more while it is registered.
+class Growing : public TestNamedGroup {
+public:
+    using TestNamedGroup::TestNamedGroup;
+    void FillCanonicalLayout(KFS_CanonicalLayout* layout) override
+    {
+        for (char const* const kind : {"opacity", "rotation", "scale"}) {
+            if (layout->size() < kindCount) layout->push_back(GetFactory()->GetCanonicalStream(Name(kind)));
+        }
+    }
+    static inline std::size_t kindCount = 0;
+};
+
+TEST_F(NamedGroup, ACanonicalGroupFollowsEachNewLayout)
+{
+    KFS_StreamFactory& factory = *Get_VX_StreamFactory();
+    Growing::kindCount = 1;
+    kinds.Group<Growing>("growing", {});
+    auto* const group = factory.GetCanonicalStream(Name("growing"))->GetAsNamedGroup();
+    group->EnsureUILayoutComplete();
+    EXPECT_EQ(Names{"opacity"}, NamesOf(*group));
+    // Nobody looks at the layouts between, so the last one may lie where the first did.
+    for (Growing::kindCount = 2; Growing::kindCount < 4; ++Growing::kindCount)
+        factory.SetupCanonicalStream(Name("growing"));
+    EXPECT_EQ(0u, group->GetNumStreams()) << "filled in when somebody looks";
+    EXPECT_EQ("scale", NameOf(group->GetStream(2)));
+    EXPECT_EQ((Names{"opacity", "rotation", "scale"}), NamesOf(*group));
 }
 
 }  // namespace

@@ -1,17 +1,11 @@
 #include "tree/paramdef.h"
 
 #include "frame/services/memory.h"
+#include "tests/support/text.h"
 
 #include <gtest/gtest.h>
 
-#include <cstddef>
-
 namespace {
-
-u16str Text(char const* text)
-{
-    return Q_MBToUTF16String(text);
-}
 
 FX_ParamDef OfKind(int kind)
 {
@@ -24,9 +18,8 @@ TEST(ParamDef, OnlyThreeKindsOwnAName)
 {
     for (int kind = -1; kind < 40; ++kind) {
         const FX_ParamDef def = OfKind(kind);
-        EXPECT_EQ(kind == FX_Param_BOOL || kind == FX_Param_CHOICE || kind == FX_Param_LABEL,
-                  FX_ParamDef_HasParamName(&def))
-            << kind;
+        const bool owns = kind == FX_Param_BOOL || kind == FX_Param_CHOICE || kind == FX_Param_LABEL;
+        EXPECT_EQ(owns, FX_ParamDef_HasParamName(&def)) << kind;
     }
 }
 
@@ -73,18 +66,13 @@ TEST(ParamDef, WithoutMemoryTheFieldStaysNull)
     EXPECT_EQ(nullptr, def.value.named.paramName);
 }
 
-TEST(ParamDef, NamesAreCutToTheirPlace)
+// The integer sliders' minimum and the float slider's precision and display flags share four bytes; unit names rely on
+// it.
+TEST(ParamDef, SlidersOverlayAndNamesAreCutToTheirPlace)
 {
     FX_ParamDef def{};
     FX_ParamDef_SetName(&def, Text("0123456789012345678901234567890123456789"));
     EXPECT_EQ(Text("0123456789012345678901234567890"), FX_ParamDef_GetName(&def));
-}
-
-// The integer sliders' minimum and the float slider's precision and display flags share four bytes; unit names rely on
-// it.
-TEST(ParamDef, SlidersOverlay)
-{
-    FX_ParamDef def{};
     def.value.fixedSlider.validMin = 0x00050003;
     EXPECT_EQ(3, def.value.floatSlider.precision);
     EXPECT_EQ(5, def.value.floatSlider.displayFlags);

@@ -132,18 +132,14 @@ TEST(Longs, AreSignedAndBigEndian)
     constexpr int Id = CKF_Id("long");
     const int values[] = {0, 1, -1, 0x01020304, INT_MIN, INT_MAX};
     const MemoryFile file([&](CKF_File* out) {
-        for (int const value : values) {
-            KFSp_WriteLong(out, Id, value);
-        }
+        for (int const value : values) KFSp_WriteLong(out, Id, value);
         CKF_WriteAtom(out, Id, 2, "\x7f\x01");
     });
     EXPECT_EQ((std::vector<std::string>{"long 00000000", "long 00000001", "long ffffffff", "long 01020304",
                                         "long 80000000", "long 7fffffff", "long 7f01"}),
               file.Lines());
     file.Read([&](CKF_File* in) {
-        for (int const value : values) {
-            EXPECT_EQ(value, KFSp_ReadLong(in, nullptr, Id));
-        }
+        for (int const value : values) EXPECT_EQ(value, KFSp_ReadLong(in, nullptr, Id));
         EXPECT_EQ(0x7f010000, KFSp_ReadLong(in, nullptr, Id)) << "what a shorter atom doesn't say is zero";
         EXPECT_EQ(CKF_Err_NoSuchChunk, KFSp_Boundary([&] { KFSp_ReadLong(in, nullptr, Id); }));
     });
@@ -151,41 +147,25 @@ TEST(Longs, AreSignedAndBigEndian)
 
 TEST(MatchNameAtoms, ANameThatFillsItsAtomEndsThere)
 {
-    const MemoryFile file([](CKF_File* out) {
+    std::string unknown = "known to no code";
+    unknown.resize(40, '\0');
+    const MemoryFile file([&](CKF_File* out) {
         CKF_WriteAtom(out, CKF_Id("kfmn"), 40, std::string(40, 'q').data());
         CKF_WriteAtom(out, CKF_Id("kfmn"), 3, "abc");
         CKF_WriteAtom(out, CKF_Id("kfmn"), 8, "ab\0stale");
+        CKF_WriteAtom(out, CKF_Id("kfmn"), 40, unknown.data());
+        KFS_MatchName::WriteEndOfGroupMarker(out);
     });
+    EXPECT_EQ("kfmn " + AtomHex("ZQVM Group End"), file.Lines().back());
     file.Read([](CKF_File* in) {
         KFS_MatchName name;
-        name.Read(in, nullptr);
-        EXPECT_EQ(Name(std::string(40, 'q').c_str()), name) << "the hash is of all that was there";
-        name.Read(in, nullptr);
-        EXPECT_EQ(Name("abc"), name);
-        name.Read(in, nullptr);
-        EXPECT_EQ(Name("ab"), name);
-    });
-}
-
-TEST(MatchNameAtoms, ANameThatNobodyEverMentionedComesIn)
-{
-    std::string text = "known to no code";
-    text.resize(40, '\0');
-    const MemoryFile file([&](CKF_File* out) { CKF_WriteAtom(out, CKF_Id("kfmn"), 40, text.data()); });
-    file.Read([](CKF_File* in) {
-        KFS_MatchName name;
+        for (std::string const& text : {std::string(40, 'q'), std::string("abc"), std::string("ab")}) {
+            name.Read(in, nullptr);
+            EXPECT_EQ(Name(text.c_str()), name) << "the hash is of all that was there";
+        }
         name.Read(in, nullptr);
         EXPECT_STREQ("known to no code", reinterpret_cast<char const*>(name.GetName()));
         EXPECT_FALSE(name.IsEndOfGroupMarker());
-    });
-}
-
-TEST(MatchNameAtoms, TheGroupsEndIsMarked)
-{
-    const MemoryFile file([](CKF_File* out) { KFS_MatchName::WriteEndOfGroupMarker(out); });
-    EXPECT_EQ(std::vector<std::string>{"kfmn " + AtomHex("ZQVM Group End")}, file.Lines());
-    file.Read([](CKF_File* in) {
-        KFS_MatchName name;
         name.Read(in, nullptr);
         EXPECT_TRUE(name.IsEndOfGroupMarker());
     });

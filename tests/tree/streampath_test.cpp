@@ -7,6 +7,7 @@
 #include "persist/longs_private.h"
 #include "tests/support/chunklines.h"
 #include "tests/support/reports.h"
+#include "tests/support/text.h"
 
 #include <random>
 
@@ -17,20 +18,13 @@ KFS_MatchName Name(char const* text)
     return KFS_MatchName(text, true);
 }
 
-u16str Text(std::string const& text)
-{
-    return Q_MBToUTF16String(text);
-}
-
 using ID = KFS_StreamID;
 
 // A path of names, one a letter.
 KFS_StreamIDPath Names(std::string const& letters)
 {
     KFS_StreamIDPath path;
-    for (char const letter : letters) {
-        path.AddTail(Name(std::string(1, letter).c_str()));
-    }
+    for (char const letter : letters) path.AddTail(Name(std::string(1, letter).c_str()));
     return path;
 }
 
@@ -63,16 +57,6 @@ class StreamPath : public testing::Test {
 protected:
     kfshost::Session session_;
     ReportRecorder reports_;
-
-    // The one report of a component that isn't there.
-    void ExpectInvalidComponent(std::function<void()> const& ask)
-    {
-        EXPECT_EQ(3, KFSp_Boundary(ask));
-        const std::vector<Reported> seen = reports_.Take();
-        ASSERT_EQ(1u, seen.size());
-        EXPECT_EQ("asked for invalid component of property path", seen[0].text);
-        EXPECT_EQ(8, seen[0].severity);
-    }
 };
 
 TEST_F(StreamPath, GrowsAndShrinksAtBothEnds)
@@ -126,12 +110,21 @@ TEST_F(StreamPath, MovesSwap)
 TEST_F(StreamPath, AskedForWhatIsNotThereReportsAndThrows3)
 {
     const KFS_StreamIDPath empty, path = Names("ab");
-    ExpectInvalidComponent([&] { path.GetComponent(2); });
-    ExpectInvalidComponent([&] { path.GetComponent(0xFFFFFFFF); });
-    ExpectInvalidComponent([&] { empty.GetHead(); });
-    ExpectInvalidComponent([&] { empty.GetTail(); });
-    ExpectInvalidComponent([&] { path.HasTargetParent(Name("a"), 0); });
-    ExpectInvalidComponent([&] { empty.HasTargetParent(Name("a"), 0); });
+    const std::function<void()> questions[] = {
+        [&] { path.GetComponent(2); },
+        [&] { path.GetComponent(0xFFFFFFFF); },
+        [&] { empty.GetHead(); },
+        [&] { empty.GetTail(); },
+        [&] { path.HasTargetParent(Name("a"), 0); },
+        [&] { empty.HasTargetParent(Name("a"), 0); },
+    };
+    for (auto const& ask : questions) {
+        EXPECT_EQ(3, KFSp_Boundary(ask));
+        const std::vector<Reported> seen = reports_.Take();
+        ASSERT_EQ(1u, seen.size());
+        EXPECT_EQ("asked for invalid component of property path", seen[0].text);
+        EXPECT_EQ(8, seen[0].severity);
+    }
 }
 
 TEST_F(StreamPath, ComparesComponentByComponent)
@@ -148,9 +141,7 @@ TEST_F(StreamPath, ComparesComponentByComponent)
     // Lexicographic, a prefix first.
     const Path ordered[] = {Path(), Path(1), Path(1, 1), Path(1, 2), Path(1, 2, 0), Path(2), Path(10)};
     for (std::size_t i = 0; i < std::size(ordered); ++i) {
-        for (std::size_t j = 0; j < std::size(ordered); ++j) {
-            EXPECT_EQ(i < j, ordered[i] < ordered[j]) << i << ' ' << j;
-        }
+        for (std::size_t j = 0; j < std::size(ordered); ++j) EXPECT_EQ(i < j, ordered[i] < ordered[j]) << i << ' ' << j;
     }
 }
 
@@ -195,14 +186,12 @@ TEST_F(StreamPath, FindsNamesFromBothEnds)
     // Unset names are names here.
     EXPECT_TRUE(KFS_StreamIDPath(Name("a"), 3).FindFirstInstanceOfMatchName(KFS_MatchName(), &where));
     EXPECT_EQ(1u, where);
-
     EXPECT_EQ("abcb", Letters(KFS_FindFromReverse(Name("b"), path)));
     EXPECT_EQ("abcbd", Letters(KFS_FindFromReverse(Name("d"), path)));
     EXPECT_EQ("a", Letters(KFS_FindFromReverse(Name("a"), path)));
     EXPECT_TRUE(KFS_FindFromReverse(Name("x"), path).IsEmpty());
     EXPECT_TRUE(KFS_FindFromReverse(KFS_MatchName(), KFS_StreamIDPath(3)).IsEmpty()) << "an unset name is no name";
     EXPECT_EQ(9u, KFS_FindFromReverse(Name("a"), KFS_StreamIDPath(ID(9, Name("a")), 4)).GetHead().GetIndex());
-
     EXPECT_TRUE(path.HasTargetParent(Name("c"), 3));
     EXPECT_FALSE(path.HasTargetParent(Name("c"), 2));
     EXPECT_TRUE(path.HasTargetParent(Name("d"), 5));
@@ -221,8 +210,6 @@ TEST_F(StreamPath, UidsAreTheSameEverywhere)
     EXPECT_NE(UidHex(Path(ID(1, Name("a")))), UidHex(Path(ID(1, Name("b"))))) << "both fields count";
 }
 
-// ---- JSON
-
 TEST_F(StreamPath, JsonIsThisText)
 {
     using Path = KFS_StreamIDPath;
@@ -231,9 +218,7 @@ TEST_F(StreamPath, JsonIsThisText)
     EXPECT_EQ(Text(R"({"0":{"index":4294967295,"matchName":"say \"hi\"\\"},"1":{"index":0,"matchName":""}})"),
               Path(Name("say \"hi\"\\"), 0).GetAs_JSON());
     Path ten;
-    for (unsigned int i = 0; i < 10; ++i) {
-        ten.AddTail(i);
-    }
+    for (unsigned int i = 0; i < 10; ++i) ten.AddTail(i);
     const std::string text = Q_UTF16ToMBString(ten.GetAs_JSON());
     EXPECT_EQ(0u, text.find(R"({"00":{"index":0,)")) << text;
     EXPECT_NE(std::string::npos, text.find(R"("09":{"index":9,)")) << "keys of equal width";
@@ -268,18 +253,18 @@ TEST_F(StreamPath, JsonIsAppendedInTheOrderOfItsEntries)
 
 TEST_F(StreamPath, JsonThatIsNoPathLeavesThePathAlone)
 {
-    char const* const good = R"("0": {"index": 1, "matchName": "z"}, )";
+    std::string const good = R"({"0": {"index": 1, "matchName": "z"}, )";
     std::string const bad[] = {
         "",
         "7",
         "{",
-        std::string("{") + good,
-        std::string("{") + good + R"("1": {"index": 1}})",
-        std::string("{") + good + R"("1": {"matchName": "x"}})",
-        std::string("{") + good + R"("1": {"index": "one", "matchName": "x"}})",
-        std::string("{") + good + R"("1": {"index": -1, "matchName": "x"}})",
-        std::string("{") + good + R"("1": {"index": 4294967296, "matchName": "x"}})",
-        std::string("{") + good + R"("1": 3})",
+        good,
+        good + R"("1": {"index": 1}})",
+        good + R"("1": {"matchName": "x"}})",
+        good + R"("1": {"index": "one", "matchName": "x"}})",
+        good + R"("1": {"index": -1, "matchName": "x"}})",
+        good + R"("1": {"index": 4294967296, "matchName": "x"}})",
+        good + R"("1": 3})",
         std::string(100000, '['),
         std::string(100000, '{'),
     };
@@ -291,8 +276,6 @@ TEST_F(StreamPath, JsonThatIsNoPathLeavesThePathAlone)
         EXPECT_NO_REPORT(reports_);
     }
 }
-
-// ---- chunks
 
 TEST_F(StreamPath, ChunksAreTheseBytes)
 {
@@ -326,9 +309,7 @@ TEST_F(StreamPath, ARunOfPathsEndsWithTheSentinel)
         std::vector<std::string> read;
         for (KFS_StreamIDPath path;;) {
             path.Read(in, nullptr);
-            if (path.IsSentinel()) {
-                break;
-            }
+            if (path.IsSentinel()) break;
             read.push_back(Letters(path));
         }
         EXPECT_EQ((std::vector<std::string>{"", "abc"}), read);
@@ -356,32 +337,26 @@ MemoryFile FileWithHead(int oldType, int length, std::string const& names)
         const CKF_ScWriteList list(out, CKF_Id("kfsp"), 0);
         KFSp_WriteLong(out, CKF_Id("kfot"), oldType);
         KFSp_WriteLong(out, CKF_Id("kfpl"), length);
-        for (KFS_StreamID const& id : path.GetPathConst()) {
-            id.Write(out);
-        }
+        for (KFS_StreamID const& id : path.GetPathConst()) id.Write(out);
     });
 }
 
 TEST_F(StreamPath, AnOldTypeNumberGoesToTheApplication)
 {
-    struct Row {
-        int oldType;
-        bool asked;
-    };
-    for (const Row& row : {Row{-1, false}, Row{-2, false}, Row{0, true}, Row{12, true}}) {
+    for (const int oldType : {-1, -2, 0, 12}) {
         for (const bool hasCallback : {true, false}) {
-            SCOPED_TRACE(testing::Message() << row.oldType << ' ' << hasCallback);
+            SCOPED_TRACE(testing::Message() << oldType << ' ' << hasCallback);
+            const bool asked = oldType >= 0 && hasCallback;
             KFS_AppCallbacks callbacks;
             callbacks.oldPathFixupFunc = hasCallback ? FixUp : nullptr;
             KFS_SetCallbacks(callbacks);
             S_fixedUpType = -1;
+            S_fixedUpPath.clear();
             KFS_StreamIDPath path;
-            FileWithHead(row.oldType, 2, "ab").Read([&](CKF_File* in) { path.Read(in, nullptr); });
-            EXPECT_EQ(row.asked && hasCallback ? "fixed" : "ab", Letters(path));
-            if (row.asked && hasCallback) {
-                EXPECT_EQ(row.oldType, S_fixedUpType);
-                EXPECT_EQ("ab", S_fixedUpPath) << "the stored components were read before";
-            }
+            FileWithHead(oldType, 2, "ab").Read([&](CKF_File* in) { path.Read(in, nullptr); });
+            EXPECT_EQ(asked ? "fixed" : "ab", Letters(path));
+            EXPECT_EQ(asked ? oldType : -1, S_fixedUpType);
+            EXPECT_EQ(asked ? "ab" : "", S_fixedUpPath) << "the stored components were read before";
             KFS_ClearCallbacks();
         }
     }
@@ -437,12 +412,8 @@ TEST_F(StreamPath, AWriteThatFailsAnywhereThrows)
         FailNthAppend hook(n);
         CKF_File file;
         int code = file.CreateInMemory(&hook);
-        if (code == 0) {
-            code = KFSp_Boundary([&] { Names("abc").Write(&file); });
-        }
-        if (code == 0) {
-            code = file.Commit();  // the last list's length is put right behind its scope
-        }
+        if (code == 0) code = KFSp_Boundary([&] { Names("abc").Write(&file); });
+        if (code == 0) code = file.Commit();  // the last list's length is put right behind its scope
         EXPECT_EQ(hook.Fired() ? CKF_Err_Io : 0, code) << n;
         if (!hook.Fired()) {
             EXPECT_GT(n, 10);
