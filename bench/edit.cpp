@@ -1,8 +1,8 @@
 // Inserting keys, and the read that repairs what one edit left stale.
 
 #include "keystore/edit.h"
+#include "bench/common.h"
 #include "frame/services/memory.h"
-#include "host/session.h"
 #include "keystore/evaluate.h"
 
 #include <benchmark/benchmark.h>
@@ -20,13 +20,6 @@ struct Record {
     int time;
     double numbers[5];  // 48 bytes in all: the size of a one-dimensional key
 };
-
-// Never ended: streams and what is current on a thread go in an order of their own at exit.
-kfshost::Session& Library()
-{
-    static kfshost::Session* const session = new kfshost::Session;
-    return *session;
-}
 
 std::vector<int> TimesInOrder(int count)
 {

@@ -1,8 +1,8 @@
 // Reads of plain streams through the public door, beside a bare search and a bare solve over the same segments.
 
+#include "bench/common.h"
 #include "curves/tangents.h"
 #include "frame/services/curvekernel.h"
-#include "host/session.h"
 #include "keystore/edit.h"
 #include "keystore/evaluate.h"
 
@@ -20,13 +20,6 @@ namespace {
 constexpr unsigned int Scale = 600;
 constexpr int Gap = 100;
 constexpr int Asked = 4096;
-
-// Never ended: streams and what is current on a thread go in an order of their own at exit.
-kfshost::Session& Library()
-{
-    static kfshost::Session* const session = new kfshost::Session;
-    return *session;
-}
 
 enum class Order { Random, Frames };
 
@@ -99,20 +92,6 @@ Fixture const& Get(int keys, short dimension, char interp)
         fixture = std::make_unique<Fixture>(keys, dimension, interp);
     }
     return *fixture;
-}
-
-// Branchless, over times packed side by side. The first time is before the one asked for.
-int Search(std::vector<int> const& times, int time)
-{
-    int const* base = times.data();
-    auto count = static_cast<unsigned int>(times.size());
-    while (count > 1) {
-        unsigned int const half = count / 2;
-        unsigned int const before = (static_cast<unsigned int>(base[half - 1]) - static_cast<unsigned int>(time)) >> 31;
-        base += half & (0U - before);
-        count -= half;
-    }
-    return static_cast<int>(base - times.data()) + (*base < time ? 1 : 0);
 }
 
 void Read(benchmark::State& state, Fixture const& fixture, Order order)

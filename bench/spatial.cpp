@@ -1,10 +1,10 @@
 // Points that move along paths: reads beside a bare search, speed-graph solve and table lookup; the repair after an
 // edit; a drag.
 
+#include "bench/common.h"
 #include "curves/spacetangents.h"
 #include "frame/services/curvekernel.h"
 #include "frame/services/sequence.h"
-#include "host/session.h"
 #include "keystore/edit.h"
 #include "keystore/evaluate.h"
 
@@ -21,13 +21,6 @@ constexpr unsigned int Scale = 600;
 constexpr int Gap = 100;
 constexpr int Asked = 4096;
 constexpr short Dimension = 3;
-
-// Never ended: streams and what is current on a thread go in an order of their own at exit.
-kfshost::Session& Library()
-{
-    static kfshost::Session* const session = new kfshost::Session;
-    return *session;
-}
 
 std::unique_ptr<KFS_Stream> MakePath(int keys, unsigned int seed)
 {
@@ -135,19 +128,6 @@ std::vector<int> RandomTimes(int keys)
         asked.push_back(time % Gap == 0 ? time + 1 : time);
     }
     return asked;
-}
-
-int Search(std::vector<int> const& times, int time)
-{
-    int const* base = times.data();
-    auto count = static_cast<unsigned int>(times.size());
-    while (count > 1) {
-        unsigned int const half = count / 2;
-        unsigned int const before = (static_cast<unsigned int>(base[half - 1]) - static_cast<unsigned int>(time)) >> 31;
-        base += half & (0U - before);
-        count -= half;
-    }
-    return static_cast<int>(base - times.data()) + (*base < time ? 1 : 0);
 }
 
 void ReadOurs(benchmark::State& state)

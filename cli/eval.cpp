@@ -33,13 +33,18 @@ std::vector<Rational> SampleTimes(EvalOptions const& options, Rational const& fp
     TimeSpan const keys = span.value_or(TimeSpan{});
     Rational const from = options.from.empty() ? keys.first : ParseTime(options.from, "--from", fps);
     Rational const to = options.to.empty() ? std::max(keys.last, from) : ParseTime(options.to, "--to", fps);
+    if (options.to.empty() && span && from > keys.last) {
+        throw UserError("--from", TimeText(from) + " s is after the last key, " + TimeText(keys.last) +
+                                      " s; --to says how far to go then");
+    }
     if (to < from) {
         throw UserError("--to", TimeText(to) + " s is before --from, " + TimeText(from) + " s");
     }
     Rational const steps = (to - from) * fps;
     std::int64_t const last = steps.Numerator() / steps.Denominator();
     if (last >= MaxSamples) {
-        throw UserError("--fps", fmt::format("asks for more than {} times", MaxSamples));
+        throw UserError("--fps", fmt::format("asks for more than {} times from {} s to {} s", MaxSamples,
+                                             TimeText(from), TimeText(to)));
     }
     std::vector<Rational> times;
     for (std::int64_t i = 0; i <= last; ++i) {

@@ -11,11 +11,6 @@ using kfshost::StreamItem;
 
 namespace {
 
-std::string Plural(std::size_t count, std::string_view one, std::string_view many)
-{
-    return fmt::format("{} {}", count, count == 1 ? one : many);
-}
-
 std::string Summary(kfshost::Scene const& scene, std::vector<StreamItem const*> const& items)
 {
     std::size_t keys = 0;
@@ -28,7 +23,7 @@ std::string Summary(kfshost::Scene const& scene, std::vector<StreamItem const*> 
         text += fmt::format(", {} s to {} s", TimeText(span->first), TimeText(span->last));
     }
     text += fmt::format("\ntimes in 1/{} s: ", scene.timeScale);
-    return text + (scene.exactTimes ? "every key time is exactly what the file says\n"
+    return text + (scene.exactTimes ? "every key time of the file is one of these, or the nearest float to one\n"
                                     : fmt::format("key times are rounded by up to {:.2g} s\n", scene.worstTimeError));
 }
 

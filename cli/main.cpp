@@ -1,4 +1,5 @@
 #include "cli/commands.h"
+#include "cli/output.h"
 #include "cli/project.h"
 #include "cli/usererror.h"
 
@@ -39,7 +40,7 @@ void AddSelection(CLI::App& command, Selection& selection)
     command
         .add_option("--time-scale", selection.timeScale,
                     "hold times in this many units a second (default: chosen so that key times are exact)")
-        ->check(CLI::PositiveNumber)
+        ->check(TimeScaleCheck())
         ->type_name("N");
     command
         .add_option_function<std::string>(
@@ -82,13 +83,14 @@ void AddEval(CLI::App& app, EvalOptions& options)
         ->check(CLI::IsMember({"table", "csv", "json"}))
         ->type_name("FORMAT");
     command->footer(
-        "Numbers are printed with as many digits as it takes to read the same number back. In tables times are exact\n"
-        "fractions; JSON gives them as [numerator, denominator] in seconds.");
+        "Numbers are printed with as many digits as it takes to read the same number back. JSON gives times as\n"
+        "[numerator, denominator] in seconds, which is exact; tables print them as fractions or decimals.");
     command->callback([&options] { RunEval(options); });
 }
 
 void RunEitherPlot(PlotOptions& options, bool formGiven)
 {
+    RefuseToOverwrite(options.selection.file, options.output);
     if (!options.motion) {
         RunPlot(options);
         return;
@@ -136,9 +138,20 @@ int Fail(std::string const& message)
     return FailureCode;
 }
 
-// Runs what the words ask for. Help ends with 0; a word that isn't understood is told like any other error, with a hint.
+// One line as for any other error, with a hint. What stands where a command should is told by its name.
+std::string TellUsageError(CLI::App const* app, CLI::Error const& error)
+{
+    std::vector<std::string> const rest = app->remaining();
+    bool const lacksCommand = error.get_name() == "RequiredError" && app->get_subcommands().empty();
+    std::string const what =
+        lacksCommand && !rest.empty() ? "there is no command \"" + rest.front() + '"' : error.what();
+    return "kfs: " + what + " (kfs --help tells what there is)\n";
+}
+
+// Runs what the words ask for. Help ends with 0.
 int Parse(CLI::App& app, int argc, char** argv)
 {
+    app.failure_message(TellUsageError);
     try {
         app.parse(argc, argv);
     } catch (CLI::RuntimeError const& answer) {  // how a command answers with a code of its own
@@ -175,6 +188,7 @@ try {
     CLI::App app{
         "Takes the animation out of a file, holds it in streams of keys, and answers with values and drawings.", "kfs"};
     app.require_subcommand(1);
+    app.set_version_flag("--version", KFS_VERSION_TEXT);
     app.footer("Examples:\n"
                "  kfs info walk.glb\n"
                "  kfs eval walk.glb --stream '*/Hips/*' --fps 30 --format csv\n"

@@ -2,6 +2,8 @@
 
 #include "cli/usererror.h"
 
+#include <fmt/format.h>
+
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
@@ -23,6 +25,19 @@ bool WriteAndClose(std::FILE* file, std::string_view text)
 }
 
 }  // namespace
+
+std::string Plural(std::size_t count, std::string_view one, std::string_view many)
+{
+    return fmt::format("{} {}", count, count == 1 ? one : many);
+}
+
+void RefuseToOverwrite(std::string const& input, std::string const& output)
+{
+    std::error_code ignored;
+    if (output != "-" && std::filesystem::equivalent(input, output, ignored)) {
+        throw UserError("-o", '"' + output + "\" is the file that is read");
+    }
+}
 
 void WriteToStandardOutput(std::string_view text)
 {

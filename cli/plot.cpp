@@ -90,6 +90,7 @@ public:
             DrawStream(*item, top);
             top += StreamHeight;
         }
+        DrawMarkLegend();
         return svg_.Finish(DrawingWidth, top);
     }
 
@@ -103,12 +104,23 @@ private:
                 fmt::format("the first {} of {} streams with keys; --stream chooses others", shown_.size(), selected),
                 {13.0, "#666666"});
         }
+    }
+
+    // What the marks mean that are there, and why there are none.
+    void DrawMarkLegend()
+    {
         double const y = 33;
-        svg_.Diamond({Right - 170, y}, 5.5, "#555555", {"#ffffff", 1.2});
-        svg_.Text({Right - 158, y + 4.5}, "key", {13.0, "#444444"});
-        svg_.Line({Right - 100, y}, {Right - 66, y}, {"#555555", 1.2});
-        svg_.Circle({Right - 66, y}, 3.5, "#ffffff", {"#555555", 1.4});
-        svg_.Text({Right - 54, y + 4.5}, "handle", {13.0, "#444444"});
+        if (drewKeys_) {
+            svg_.Diamond({Right - 170, y}, 5.5, "#555555", {"#ffffff", 1.2});
+            svg_.Text({Right - 158, y + 4.5}, "key", {13.0, "#444444"});
+        } else {
+            svg_.Text({Right, y + 4.5}, "keys stand too close to be drawn", {13.0, "#666666", Anchor::End});
+        }
+        if (drewHandles_) {
+            svg_.Line({Right - 100, y}, {Right - 66, y}, {"#555555", 1.2});
+            svg_.Circle({Right - 66, y}, 3.5, "#ffffff", {"#555555", 1.4});
+            svg_.Text({Right - 54, y + 4.5}, "handle", {13.0, "#444444"});
+        }
     }
 
     void DrawStream(StreamItem const& item, double top)
@@ -218,12 +230,14 @@ private:
                 std::string_view const color = ColorOf(item, handle.component);
                 svg_.Line(Place(panel, handle.key), Place(panel, handle.end), {color, 1.2, "", 0.75});
                 svg_.Circle(Place(panel, handle.end), 3.5, "#ffffff", {color, 1.4});
+                drewHandles_ = true;
             }
         }
         double const spacing = PixelsPerKey(curves);
         if (spacing < 4.0) {
             return;
         }
+        drewKeys_ = true;
         double const radius = std::clamp(spacing / 5, 2.5, 5.5);
         for (std::size_t d = 0; d < curves.components.size(); ++d) {
             for (Point const& key : curves.components[d].keys) {
@@ -254,6 +268,8 @@ private:
     std::vector<StreamItem const*> shown_;
     Svg svg_;
     Axis time_;
+    bool drewKeys_ = false;
+    bool drewHandles_ = false;
 };
 
 }  // namespace

@@ -11,6 +11,9 @@
 
 #include <fmt/format.h>
 
+#include <charconv>
+#include <climits>
+
 namespace {
 
 // What a command answers that looked at its files and found something.
@@ -21,6 +24,7 @@ void RunImport(ProjectOptions const& options)
     if (options.output == "-") {
         throw UserError("-o", "a project goes into a file, not to the standard output");
     }
+    RefuseToOverwrite(options.file, options.output);
     try {
         kfshost::Scene scene = kfshost::ImportFile(options.file, {options.timeScale});
         std::size_t keys = 0;
@@ -28,7 +32,8 @@ void RunImport(ProjectOptions const& options)
             keys += static_cast<std::size_t>(kfshost::KeyCount(*item.stream));
         }
         std::string const summary =
-            fmt::format("{}: {} streams, {} keys\n", options.output, scene.streams.size(), keys);
+            fmt::format("{}: {}, {}\n", options.output, Plural(scene.streams.size(), "stream", "streams"),
+                        Plural(keys, "key", "keys"));
         kfshost::SaveProject(*kfshost::MakeTree(std::move(scene)), options.output);
         WriteToStandardOutput(summary);
     } catch (kfshost::ImportError const& error) {
@@ -76,6 +81,18 @@ void RunDiff(ProjectOptions const& options)
 
 }  // namespace
 
+CLI::Validator TimeScaleCheck()
+{
+    return CLI::Validator(
+        [](std::string const& text) -> std::string {
+            unsigned int scale = 0;
+            auto const [end, error] = std::from_chars(text.data(), text.data() + text.size(), scale);
+            bool const isScale = error == std::errc() && end == text.data() + text.size() && scale > 0;
+            return isScale ? "" : fmt::format("{} isn't a whole number from 1 to {}", text, UINT_MAX);
+        },
+        "");
+}
+
 void AddProjectCommands(CLI::App& app, ProjectOptions& options)
 {
     CLI::App* const importer = app.add_subcommand("import", "Save the animation of a file as a project");
@@ -84,7 +101,7 @@ void AddProjectCommands(CLI::App& app, ProjectOptions& options)
     importer
         ->add_option("--time-scale", options.timeScale,
                      "hold times in this many units a second (default: chosen so that key times are exact)")
-        ->check(CLI::PositiveNumber)
+        ->check(TimeScaleCheck())
         ->type_name("N");
     importer->callback([&options] { RunImport(options); });
 
@@ -102,8 +119,9 @@ void AddProjectCommands(CLI::App& app, ProjectOptions& options)
     CLI::App* const diff = app.add_subcommand("diff", "Tell how the streams of two files differ");
     diff->add_option("BEFORE", options.file, "a project, or a .gltf, .glb or .bvh file")->required();
     diff->add_option("AFTER", options.other, "another one")->required();
-    diff->footer("A line for each stream: - only in BEFORE, + only in AFTER, ~ in both, with what differs first.\n"
-                 "Keys show their values and the codes of the interpolation before and after them.\n"
-                 "The exit code is 0 if nothing differs and 1 if something does.");
+    diff->footer(
+        "A line for each stream that differs: - only in BEFORE, + only in AFTER, ~ in both, with what differs first.\n"
+        "Keys show their values and, like (2/1), how the curve comes in and goes out: 1 linear, 2 spline, 3 hold.\n"
+        "The exit code is 0 if nothing differs and 1 if something does.");
     diff->callback([&options] { RunDiff(options); });
 }

@@ -11,5 +11,8 @@ struct ProjectOptions {
     unsigned int timeScale = 0;
 };
 
+// What --time-scale may be.
+CLI::Validator TimeScaleCheck();
+
 // The commands that make project files and look into them: import, save-as, dump and diff.
 void AddProjectCommands(CLI::App& app, ProjectOptions& options);

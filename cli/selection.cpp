@@ -22,10 +22,12 @@ bool Matches(StreamItem const& item, Selection const& selection)
 void HoldAsPath(StreamItem& item, Selection const& selection)
 {
     if (kfshost::KeyCount(*item.stream) > kfshost::MaxPathKeys) {
-        throw UserError(item.path, fmt::format("has more than {} keys, too many for a path", kfshost::MaxPathKeys));
+        throw UserError(selection.file + ": " + item.path,
+                        fmt::format("has more than {} keys, too many for a path", kfshost::MaxPathKeys));
     }
     if (selection.roving && item.interpolation == kfshost::SourceInterpolation::Step) {
-        throw UserError(item.path, "steps from key to key, so there is no way on which keys could rove");
+        throw UserError(selection.file + ": " + item.path,
+                        "steps from key to key, so there is no way on which keys could rove");
     }
     if (!item.stream->IsSpatial()) {  // a project may hold it as a path already
         item.stream = kfshost::MakePath(item);
@@ -67,8 +69,10 @@ void HoldAsPaths(kfshost::Scene& scene, Selection const& selection)
         }
     }
     if (!any) {
-        throw UserError(selection.file,
-                        fmt::format("none of the {} chosen streams is a position in 2 or 3 dimensions", selected));
+        throw UserError(
+            selection.file,
+            selected == 1 ? "the chosen stream isn't a position in 2 or 3 dimensions"
+                          : fmt::format("none of the {} chosen streams is a position in 2 or 3 dimensions", selected));
     }
 }
 

@@ -93,19 +93,20 @@ int EvaluateCurves(KFS_Stream const* stream, CurvedSegment const& segment, int f
                           [](CRV_Curve const* curve, double* y, double x) { return CRV_EvaluateYFromX(curve, y, x); });
 }
 
-// What isn't ordinary takes the long way, from the component on that isn't.
+// What isn't ordinary takes the long way, from the component on that isn't; so does what a treatment would change.
 int EvaluateCurved(KFS_Stream const* stream, Segment keys, int time, double* result)
 {
-    if (stream->GetKFSFlags() & KFS_StreamFlag_NonDecreasing) [[unlikely]] {
-        return EvaluateCurvedSlow(stream, keys, time, 0, result);
-    }
+    bool const mayNotFall = (stream->GetKFSFlags() & KFS_StreamFlag_NonDecreasing) != 0;
     CurvedSegment const segment(stream, keys, time);
     double const u = Fraction(keys, time);
     int const dimension = stream->GetDimension();
     for (int i = 0; i < dimension; ++i) {
         KFSp_TemporalEnd const a = segment.First(i);
         KFSp_TemporalEnd const b = segment.Last(i);
-        if (!KFSp_SolveSegment(a, b, KFSp_GetTemporalHandles(a, b, segment.dt), u, &result[i])) [[unlikely]] {
+        KFSp_TemporalHandles const handles = KFSp_GetTemporalHandles(a, b, segment.dt);
+        bool const stands = !mayNotFall || CRVp_IsInside(a.value, handles.y1, handles.y2, b.value) ||
+                            CRVp_IsInside(b.value, handles.y2, handles.y1, a.value);
+        if (!stands || !KFSp_SolveSegment(a, b, handles, u, &result[i])) [[unlikely]] {
             return EvaluateCurvedSlow(stream, keys, time, i, result);
         }
     }

@@ -10,6 +10,8 @@
 #include "keystore/keylist_private.h"
 #include "keystore/valuedata_private.h"
 
+#include <cstdint>
+
 // A read is a chain of small steps that three functions share. Left to the compiler, the calls between them are a tenth
 // of what a read costs, so the longer ones are inlined by force.
 
@@ -138,12 +140,12 @@ SEQ_Head** TableOf(KFS_KeyScalar const* key)
 // as long as memory does. The kernel makes a table in one piece, of some 600 bytes, of which the far end isn't read.
 void PrefetchTable(KFS_KeyScalar const* key)
 {
-    constexpr int line = 64;
-    constexpr int lines = 8;
-    char const* const table = reinterpret_cast<char const*>(TableOf(key));
+    constexpr std::uintptr_t line = 64;
+    constexpr std::uintptr_t lines = 8;
+    auto const table = reinterpret_cast<std::uintptr_t>(TableOf(key));
     if (!table) return;
-    for (int i = 0; i < lines; ++i) {
-        __builtin_prefetch(table + i * line);
+    for (std::uintptr_t i = 0; i < lines; ++i) {
+        __builtin_prefetch(reinterpret_cast<void const*>(table + i * line));
     }
 }
 

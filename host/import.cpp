@@ -1,6 +1,8 @@
 #include "host/import.h"
 
+#include "host/filebytes_private.h"
 #include "host/import_error.h"
+#include "host/projectfile.h"
 
 #include <algorithm>
 #include <cctype>
@@ -18,7 +20,9 @@ Scene ImportFile(std::string const& fileName, ImportOptions const& options)
     if (ending == ".bvh") {
         return ImportBvh(fileName, options);
     }
-    throw ImportError("", "the name doesn't end in .gltf, .glb or .bvh");
+    ReadFileBytes(fileName, "", 1);  // a file that isn't there has no other fault
+    throw ImportError("", IsProjectFile(fileName) ? "this is a project already"
+                                                  : "isn't a project, and its name doesn't end in .gltf, .glb or .bvh");
 }
 
 }  // namespace kfshost

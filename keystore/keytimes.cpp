@@ -3,6 +3,18 @@
 #include "keystore/keytypes.h"
 
 #include <new>
+#include <span>
+
+namespace {
+
+// 1 where the time at an index isn't above the one before it, else 0; an index beside the list is fine.
+int FallsTo(std::span<int const> times, int index)
+{
+    auto const at = static_cast<std::size_t>(index);
+    return index > 0 && at < times.size() && times[at - 1] >= times[at] ? 1 : 0;
+}
+
+}  // namespace
 
 bool KFS_KeyTimes::Build(SEQ_Head const* const* keys)
 {
@@ -20,6 +32,9 @@ bool KFS_KeyTimes::Build(SEQ_Head const* const* keys)
         }
         times_[static_cast<std::size_t>(i)] = static_cast<KFS_KeyScalar const*>(item)->time;
     }
+    for (int i = 1; i < count; ++i) {
+        falls_ += FallsTo(times_, i);
+    }
     mirrors_ = true;
     Changed();
     return true;
@@ -29,15 +44,17 @@ void KFS_KeyTimes::Drop() noexcept
 {
     mirrors_ = false;
     times_.clear();
+    falls_ = 0;
     Changed();
 }
 
 // The times of a list that spans less than half of the 32-bit circle ascend as numbers too; of a longer one nothing is
-// foretold, since which key comes first depends on where one looks from.
+// foretold, since which key comes first depends on where one looks from. Nor of one that is out of order for a while,
+// as lists are in which float keys get their times.
 void KFS_KeyTimes::Changed() noexcept
 {
     walking_ = false;
-    ordered_ = !times_.empty() && times_.front() <= times_.back() &&
+    ordered_ = !times_.empty() && falls_ == 0 &&
                static_cast<unsigned int>(times_.back()) - static_cast<unsigned int>(times_.front()) < 1U << 31;
 }
 
@@ -46,8 +63,10 @@ void KFS_KeyTimes::Inserted(int index, int time) noexcept
     if (!mirrors_) {
         return;
     }
+    int const fall = FallsTo(times_, index);
     try {
         times_.insert(times_.begin() + index, time);
+        falls_ += FallsTo(times_, index) + FallsTo(times_, index + 1) - fall;
     } catch (std::bad_alloc const&) {
         Drop();
     }
@@ -57,7 +76,9 @@ void KFS_KeyTimes::Inserted(int index, int time) noexcept
 void KFS_KeyTimes::Removed(int index) noexcept
 {
     if (mirrors_) {
+        falls_ -= FallsTo(times_, index) + FallsTo(times_, index + 1);
         times_.erase(times_.begin() + index);
+        falls_ += FallsTo(times_, index);
         Changed();
     }
 }
@@ -65,7 +86,9 @@ void KFS_KeyTimes::Removed(int index) noexcept
 void KFS_KeyTimes::Retimed(int index, int time) noexcept
 {
     if (mirrors_) {
+        falls_ -= FallsTo(times_, index) + FallsTo(times_, index + 1);
         times_[static_cast<std::size_t>(index)] = time;
+        falls_ += FallsTo(times_, index) + FallsTo(times_, index + 1);
         Changed();
     }
 }

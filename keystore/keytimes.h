@@ -36,6 +36,7 @@ private:
     void Changed() noexcept;
 
     std::vector<int, Q_Allocator<int>> times_;
+    int falls_ = 0;  // how many times, as numbers, aren't above the one before
     bool mirrors_ = false;
     bool ordered_ = false;          // ascending also without wrap-around, so that neighbours enclose a time for sure
     mutable bool walking_ = false;  // the last search ended where the one before did, or one key on

@@ -162,7 +162,8 @@ KFS_SERVICE_API int SEQ_ForRange(SEQ_Head** list, int first, int last, long refc
 // memory and move no block.
 KFS_SERVICE_API int SEQ_ReserveSpace(int count, SEQ_Head** list);
 
-// Gives spare capacity back. A pinned list is left as it is, which isn't an error.
+// Gives spare capacity back. A pinned list is left as it is, and so is a small duplicate that hasn't grown, whose items
+// lie in one block with it: neither is an error.
 KFS_SERVICE_API int SEQ_Compact(SEQ_Head** list);
 
 // Sets the count. New items are zero; items beyond the count are disposed, last first, down to one that refuses.

@@ -190,6 +190,7 @@ private:
     static constexpr int kKeptBack = 8;                                // pieces for the stretches that come
     static constexpr int kMostTrials = 4 * kMostPieces;
     static constexpr double kSharp = 0.05;
+    static constexpr double kAside = 1e-3;  // 3e-4 of the speed from some ten-thousandth of the path on
 
     // The end of a curved piece and the start of a straight one are two knots.
     bool IsKeptTwice(int i) const { return straight_[i] && !straight_[i - 1]; }
@@ -199,9 +200,14 @@ private:
         const double square = speed_.At(t);
         const double halfSlope = speed_.HalfSlope(t);
         const double halfBend = speed_.HalfBend(t);
-        // Near its minimum the speed is sqrt(square + halfBend tau^2), which is slow over square / sqrt(halfBend).
+        // Near its minimum the speed is sqrt(square + halfBend tau^2), which is slow over square / sqrt(halfBend). At an
+        // end of the path the minimum may lie aside, twice the way to it being halfSlope^2 / halfBend^1.5. What the
+        // standstill is off by that way falls only with the distance's square root, so it has to be far shorter.
         const double slow = 0.25 * negligible_;
-        if (halfBend > 0.0 && square * square <= slow * slow * halfBend) {
+        const double aside = kAside * slow;
+        const double squaredSlope = halfSlope * halfSlope;
+        if (halfBend > 0.0 && square * square <= slow * slow * halfBend &&
+            squaredSlope * squaredSlope <= aside * aside * halfBend * halfBend * halfBend) {
             const double first = std::sqrt(halfBend);
             const double sixthJerk = speed_.SixthJerk(t);
             const double second = sixthJerk / first;

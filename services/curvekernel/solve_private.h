@@ -113,7 +113,9 @@ inline bool CRVp_SteepRoot(double a, double b, double u, double& root)
 // CRVp_ReachSlow can tell: `t` has no meaning then. A NaN passes no comparison.
 inline bool CRVp_UnitRoot(double a, double b, double u, double& t)
 {
-    const bool ordered = (CRVp_Min(CRVp_Min(a, b), u) >= 0.0) & (CRVp_Max(a, b) <= 1.0) & (u < 1.0);
+    const double least = CRVp_Min(CRVp_Min(a, b), u);
+    const double most = CRVp_Max(a, b);
+    const bool ordered = (least >= 0.0) & (most <= 1.0) & (u < 1.0);
     if (!ordered) return false;
     const CRVp_UnitCubic cubic = CRVp_UnitCubic::FromHandles(a, b);
 

@@ -61,12 +61,28 @@ void CopyRefconAndFuncs(SEQ_Head const& from, SEQ_Head& copy) noexcept
     copy.sort = from.sort;
 }
 
+// In the head's block items can't be given back as long as the list lives, also where it has outgrown them: only a few
+// may lie there.
+constexpr std::size_t MostBytesBehindHead = 1 << 14;
+
 // The copy of a list whose items are plain bytes.
 int DuplicateBytes(SEQ_Head const& from, SEQ_Head*** out)
 {
-    if (const int code = SEQp_NewInOneBlock(from.itemSize, from.count, out)) return code;
-    CopyRefconAndFuncs(from, ***out);
-    std::memcpy((**out)->items, from.items, SEQp_Bytes(from, from.count));
+    const std::size_t bytes = SEQp_Bytes(from, from.count);
+    SEQ_Head** made = nullptr;
+    if (bytes <= MostBytesBehindHead) {
+        if (const int code = SEQp_NewInOneBlock(from.itemSize, from.count, &made)) return code;
+    } else {
+        if (const int code = SEQ_New(0, static_cast<short>(from.itemSize), 4, 1, &made)) return code;
+        if (const int code = SEQp_SetCapacity(**made, from.count)) {
+            SEQ_Dispose(made, 0);
+            return code;
+        }
+        (*made)->count = from.count;
+    }
+    CopyRefconAndFuncs(from, **made);
+    std::memcpy((*made)->items, from.items, bytes);
+    *out = made;
     return 0;
 }
 

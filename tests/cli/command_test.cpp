@@ -53,7 +53,7 @@ TEST(Kfs, InfoListsWhatIsAnimated)
     EXPECT_EQ(0, outcome.code);
     EXPECT_EQ("", outcome.errors);
     EXPECT_EQ("bouncing_ball: 3 streams, 20 keys, 0 s to 5/2 s\n"
-              "times in 1/120000 s: every key time is exactly what the file says\n"
+              "times in 1/120000 s: every key time of the file is one of these, or the nearest float to one\n"
               "\n"
               "stream                   kind         dimension  components  keys  first  last  interpolation\n"
               "bounce/ball/translation  translation          3  x y z          6      0   5/2  spline\n"
@@ -218,7 +218,7 @@ TEST(Kfs, BadFilesAreOneLineAndCodeTwo)
         {"nothing.gltf", R"({"asset": {"version": "2.0"}})", "nothing is animated"},
         {"old.gltf", R"({"asset": {"version": "1.0"}})", "asset.version: is \"1.0\"; versions 2.x are supported"},
         {"walk.bvh", "HIERARCHY\nROOT a\n{\n}\nMOTION\nFrames: x", "line 6: \"x\" isn't a count of frames"},
-        {"walk.txt", "HIERARCHY", "the name doesn't end in .gltf, .glb or .bvh"},
+        {"walk.txt", "HIERARCHY", "isn't a project, and its name doesn't end in .gltf, .glb or .bvh"},
     };
     for (Row const& row : rows) {
         std::string const file = folder.Write(row.name, row.bytes);
@@ -241,12 +241,13 @@ TEST(Kfs, BadTimesAreOneLineAndCodeTwo)
                   "--fps: \"0\" isn't a number of frames a second like 24 or 30000/1001");
     ExpectFailure(RunKfs({"eval", Sample(), "--fps", "9223372036854775807"}),
                   "a rational number that doesn't fit 64 bits");
-    ExpectFailure(RunKfs({"eval", Sample(), "--fps", "1000000"}), "--fps: asks for more than 1000000 times");
+    ExpectFailure(RunKfs({"eval", Sample(), "--fps", "1000000"}),
+                  "--fps: asks for more than 1000000 times from 0 s to 5/2 s");
 }
 
 TEST(Kfs, AnUnknownFormatIsAnsweredWithThoseThatExist)
 {
-    EXPECT_EQ("--format: xml not in {table,csv,json}\nRun with --help for more information.\n",
+    EXPECT_EQ("kfs: --format: xml not in {table,csv,json} (kfs --help tells what there is)\n",
               RunKfs({"eval", Sample(), "--format", "xml"}).errors);
 }
 
@@ -263,8 +264,11 @@ TEST(Kfs, UsageErrorsPointToTheHelp)
         Outcome const outcome = RunKfs(command);
         EXPECT_EQ(2, outcome.code);
         EXPECT_EQ("", outcome.output);
+        EXPECT_TRUE(outcome.errors.starts_with("kfs: ")) << outcome.errors;
+        EXPECT_EQ(outcome.errors.size() - 1, outcome.errors.find('\n')) << outcome.errors;
         EXPECT_NE(std::string::npos, outcome.errors.find("--help")) << outcome.errors;
     }
+    EXPECT_EQ("kfs: there is no command \"draw\" (kfs --help tells what there is)\n", RunKfs({"draw"}).errors);
 }
 
 TEST(Kfs, HelpTellsTheCommandsAndTheirOptions)

@@ -166,13 +166,13 @@ TEST(KfsMotion, CombinationsThatMeanNothingAreRefused)
     ScratchFolder const folder;
     std::string const drawing = folder.Path("x.svg");
     ExpectFailure(RunKfs({"eval", Sample(), "--as", "spatial", "--stream", "*/scale"}),
-                  Sample() + ": none of the 1 chosen streams is a position in 2 or 3 dimensions");
+                  Sample() + ": the chosen stream isn't a position in 2 or 3 dimensions");
     ExpectFailure(RunKfs({"eval", Sample(), "--rove"}),
                   "--rove: only paths have keys that can float: add --as spatial");
     ExpectFailure(RunKfs({"plot", "--motion", Sample(), "--as", "plain", "-o", drawing}),
                   "--motion: draws paths, so it can't go with --as plain");
     ExpectFailure(RunKfs({"plot", "--motion", Sample(), "--stream", "*/rotation", "-o", drawing}),
-                  Sample() + ": none of the 1 chosen streams is a position in 2 or 3 dimensions");
+                  Sample() + ": the chosen stream isn't a position in 2 or 3 dimensions");
     ExpectFailure(RunKfs({"plot", "--motion", folder.Write("a.bvh", Motion({})), "-o", drawing}),
                   folder.Path("a.bvh") + ": the chosen streams have no keys to draw");
     ExpectFailure(
@@ -180,5 +180,5 @@ TEST(KfsMotion, CombinationsThatMeanNothingAreRefused)
         folder.Path("a.bvh") + ": joints[0]: positions are too far apart for a path");
     EXPECT_FALSE(std::filesystem::exists(drawing));
     Outcome const outcome = RunKfs({"eval", Sample(), "--as", "curves"});
-    EXPECT_EQ("--as: curves not in {plain,spatial}\nRun with --help for more information.\n", outcome.errors);
+    EXPECT_EQ("kfs: --as: curves not in {plain,spatial} (kfs --help tells what there is)\n", outcome.errors);
 }

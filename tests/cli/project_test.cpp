@@ -131,8 +131,13 @@ TEST_F(KfsProject, ImportingTwiceGivesTheSameBytes)
 TEST_F(KfsProject, WhatCannotBeDoneIsOneLine)
 {
     ExpectFailure(RunKfs({"import", Sample, "-o", "-"}), "-o: a project goes into a file, not to the standard output");
-    ExpectFailure(RunKfs({"import", project_, "-o", folder_.Path("new")}),
-                  project_ + ": the name doesn't end in .gltf, .glb or .bvh");
+    std::string const copy = folder_.Write("copy.gltf", FileContent(Sample));
+    ExpectFailure(RunKfs({"import", project_, "-o", folder_.Path("new")}), project_ + ": this is a project already");
+    ExpectFailure(RunKfs({"import", copy, "-o", copy}), "-o: \"" + copy + "\" is the file that is read");
+    ExpectFailure(RunKfs({"plot", copy, "-o", copy}), "-o: \"" + copy + "\" is the file that is read");
+    EXPECT_TRUE(FileContent(Sample) == FileContent(copy));
+    ExpectFailure(RunKfs({"info", folder_.Path("absent.kfs")}),
+                  folder_.Path("absent.kfs") + ": can't be opened: No such file or directory");
     ExpectFailure(RunKfs({"info", project_, "--time-scale", "25"}),
                   "--time-scale: a project has the times with which it was imported");
     ExpectFailure(RunKfs({"dump", folder_.Path("absent")}),

@@ -269,7 +269,7 @@ TEST_F(GltfInput, SaysWhereTextIsNotJson)
     EXPECT_EQ("the JSON is nested more than 64 deep", ErrorOf("a.gltf", std::string(100000, '[')));
     EXPECT_EQ("the JSON has a number that is out of range", ErrorOf("a.gltf", "{\"asset\":1e999}"));
     EXPECT_EQ("isn't an object", ErrorOf("a.gltf", "[]"));
-    EXPECT_EQ("the name doesn't end in .gltf, .glb or .bvh", ErrorOf("a.fbx", "{}"));
+    EXPECT_EQ("isn't a project, and its name doesn't end in .gltf, .glb or .bvh", ErrorOf("a.fbx", "{}"));
 }
 
 // Channels may share data, so that a file of some kilobytes asks for any number of keys.

@@ -93,4 +93,27 @@ TEST_F(KeyTimesTest, AListAroundHalfTheCircleIsSearchedWhole)
     }
 }
 
+// Keys all around the circle, and keys of which a float key has got its time before those behind it: first and last look
+// like those of a short list in order.
+TEST_F(KeyTimesTest, AListOutOfOrderHasNoMemory)
+{
+    std::vector<std::vector<int>> const lists{{INT_MIN + 19, 10, INT_MAX - 3, INT_MIN + 21}, {0, 50, 40, 41, 42, 60}};
+    for (std::vector<int> const& times : lists) {
+        auto const fill = [&](KFS_KeyTimes& index) {
+            ASSERT_TRUE(index.Build(list_));
+            for (std::size_t i = 0; i < times.size(); ++i) index.Inserted(static_cast<int>(i), times[i]);
+        };
+        for (int const before : times)
+            for (int const time : times)
+                for (int const beside : {-1, 0, 1}) {
+                    KFS_KeyTimes fresh;
+                    fill(fresh);
+                    fill(times_);
+                    for (int const off : {1, 2, 3}) times_.LowerBound(before + off);
+                    EXPECT_EQ(times_.LowerBound(time + beside), fresh.LowerBound(time + beside))
+                        << time + beside << " after " << before;
+                }
+    }
+}
+
 }  // namespace

@@ -332,6 +332,33 @@ TEST(SequenceRoom, ADuplicateOfPlainBytesIsOneBlockAndGrowsLikeAnyList)
     EXPECT_EQ(before, Q_MemoryLive(nullptr));
 }
 
+TEST(SequenceRoom, ALargeDuplicateThatGrowsKeepsNoRoomThatItLeft)
+{
+    const IntList source(1000);
+    for (int i = 0; i < 100; ++i) ASSERT_EQ(0, SEQ_Insert(source.Item(i).data(), -1, source.get()));
+    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    SEQ_Head** made = nullptr;
+    ASSERT_EQ(0, SEQ_Duplicate(source.get(), 0, &made));
+    const IntList copy(made);
+    const auto head = Q_MemoryLive(nullptr).bytes - before.bytes - 100 * 1000;
+    ASSERT_EQ(0, SEQ_Insert(copy.Item(100).data(), -1, made));
+    ASSERT_EQ(0, SEQ_Compact(made));
+    EXPECT_EQ(before.bytes + head + 101 * 1000, Q_MemoryLive(nullptr).bytes);
+    for (int i = 100; i > 0; --i) ASSERT_EQ(0, SEQ_Remove(i, made, 0, nullptr));
+    ASSERT_EQ(0, SEQ_Compact(made));
+    EXPECT_EQ(before.bytes + head + 1000, Q_MemoryLive(nullptr).bytes);
+
+    for (int n = 1; n <= 2; ++n) {
+        SEQ_Head** none = nullptr;
+        const Q_MemoryCount between = Q_MemoryLive(nullptr);
+        Q_FailAllocation(n);
+        EXPECT_EQ(4, SEQ_Duplicate(source.get(), 0, &none));
+        EXPECT_TRUE(Q_FailAllocationFired());
+        EXPECT_EQ(nullptr, none);
+        EXPECT_EQ(between, Q_MemoryLive(nullptr));
+    }
+}
+
 TEST(SequenceRoom, NumbersInItemsAreAlignedAndWholeSizesLeaveNoGaps)
 {
     for (const short itemSize : {1, 4, 8, 9, 16, 24, 61, 104, 600}) {
