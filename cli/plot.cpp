@@ -133,15 +133,17 @@ private:
 
         Axis const values = ValueAxis(curves, showHandles);
         Panel const valuePanel({Left, valueTop, Right - Left, ValueHeight}, time_, values);
-        valuePanel.DrawFrame(svg_, std::string(NameOf(item.kind)) + ", " + std::string(NameOf(item.interpolation)) +
-                                       (item.stream->IsSpatial() ? " along a path" : ""));
+        valuePanel.DrawFrame(
+            svg_, std::string(NameOf(item.kind)) + (item.kind == kfshost::StreamKind::Angles ? " in degrees, " : ", ") +
+                      std::string(NameOf(item.interpolation)) + (item.stream->IsSpatial() ? " along a path" : ""));
         DrawCurves(valuePanel, item, curves, &ComponentCurve::value);
         DrawKeys(valuePanel, item, curves, showHandles);
         DrawLegend(item, curves, valueTop);
 
         Axis const speeds = SpeedAxis(curves, values);
         Panel const speedPanel({Left, valuePanel.Bottom() + PanelGap, Right - Left, SpeedHeight}, time_, speeds);
-        speedPanel.DrawFrame(svg_, "speed, units a second");
+        speedPanel.DrawFrame(svg_, item.kind == kfshost::StreamKind::Angles ? "speed, degrees a second"
+                                                                            : "speed, units a second");
         DrawCurves(speedPanel, item, curves, &ComponentCurve::speed);
         speedPanel.DrawLabelsBelow(svg_, unit_.name);
     }

@@ -11,21 +11,23 @@
 // Common to all: `time` is converted to the stream's scale, and null is value 0 there. `value` is the caller's buffer
 // for one value, in external form (`dimension` elements of the data type, or a custom block) or as `dimension` doubles
 // in the F forms; null asks only for `atKey` and the side effects. `atKey`, out or null, gets whether a key stands at
-// the time; it stays untouched where followers answer. They
-// answer doubles whatever the data type, `dimension` of them, and a place without a follower stays as it is: initialise it. `bag` holds overrides, may be null. A value that owns memory
-// goes to KFS_DisposeValue.
+// the time. Where followers answer they answer `dimension` doubles whatever the data type: `atKey` stays untouched then,
+// and so does the place of a missing follower, so initialise `value`. `bag` holds overrides, may be null. A value that
+// owns memory goes to KFS_DisposeValue.
 //
 // Results: 0, or
 //   2                        the stream is damaged
 //   7427 KFS_Err_NoKeys      the stream has no key, or is a constant without a value (operation 36)
 //   7441 KFS_Err_CustomValue an F form on a custom stream
-//   the services', the expression's and the interpolation function's codes
+//   the services', the expression's and the interpolation function's codes; a client's stream without such a function
+//   answers KFS_Err_InterpNotAllowed between keys (a file can make one)
 // On an error `value` is as the failing stage left it.
 //
 // Threads: any thread that has a render context, on its own key data: a read writes the cache record and may repair
 // stale keys. On a temporary clone context that is the render's private copy. No lock, and no allocation without an
 // expression.
-// Cost: one binary search, and one curve solve a component; reading one time again costs the search alone.
+// Cost: one binary search, or two compares while reads walk along the time line, and one curve solve a component;
+// reading one time again costs a compare.
 
 // Bit of `flags`: go straight to the keys. All other bits are handed on to the host.
 inline constexpr int KFS_EvalFlag_NoExpression = 0x1;
