@@ -10,6 +10,7 @@
 #include "keystore/keylist_private.h"
 #include "keystore/valuedata_private.h"
 
+#include <algorithm>
 #include <cstdint>
 
 // A read is a chain of small steps that three functions share. Left to the compiler, the calls between them are a tenth
@@ -36,11 +37,12 @@ struct Place {
 };
 
 // Whether the hint is right: the time lies strictly between the key at `keyIndex` and the one behind it.
-bool TakeHint(KFS_StreamKeyData const* data, int time, int keyIndex, Run* run)
+[[gnu::always_inline]] inline bool TakeHint(KFS_StreamKeyData const* data, int time, int keyIndex, Run* run)
 {
     if (keyIndex < 0 || keyIndex >= KFSp_ItemCount(data) - 1) return false;
-    if (KFSp_GetConstKey(data, keyIndex, &run->a) != 0 || KFSp_GetConstKey(data, keyIndex + 1, &run->b) != 0)
-        return false;
+    auto const [a, b] = KFSp_GetKeyPair(data, keyIndex);
+    run->a = a;
+    run->b = b;
     run->aIndex = keyIndex;
     run->bIndex = keyIndex + 1;
     return run->a->time < time && time < run->b->time;
@@ -183,6 +185,21 @@ void WriteStraight(KFS_Stream const* stream, Run const& run, double t, double* r
     }
 }
 
+// What CRV_EvaluatePoint answers. It is asked only about a point that isn't finite, and says what is wrong then.
+[[gnu::always_inline]] inline int EvaluatePoint(CRV_Curve const& curve, double t, double* result)
+{
+    double const at = CRVp_LimitToUnit(t);
+    double point[KFSp_SegmentCurve::MaxDimension];
+    for (int i = 0; i < curve.dimension; ++i) {
+        double const value = CRVp_Blend(curve.p0[i], curve.p1[i], curve.p2[i], curve.p3[i], at);
+        if (!CRVp_IsFinite(value)) [[unlikely]]
+            return CRV_EvaluatePoint(&curve, result, t);
+        point[i] = CRVp_LimitToHull(curve.p0[i], curve.p1[i], curve.p2[i], curve.p3[i], value);
+    }
+    std::copy_n(point, curve.dimension, result);
+    return 0;
+}
+
 [[gnu::always_inline]] inline int FindRun(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time,
                                           int keyIndex, Run* run)
 {
@@ -221,7 +238,7 @@ int KFSp_InterpolateSpatial(KFS_Stream const* stream, long, int time, int keyInd
         WriteStraight(stream, run, t, result);
         return 0;
     }
-    if (int const code = CRV_EvaluatePoint(&curve.curve, result, t); code != 0) return code;
+    if (int const code = EvaluatePoint(curve.curve, t, result); code != 0) return code;
     result[stream->GetDimension()] = t;
     return 0;
 }

@@ -281,6 +281,22 @@ void KFS_GetValueNoExpr(KFS_Stream const* stream, int time, unsigned char keyOnl
     KFSp_ThrowIf(copy(stream, stream->GetItemRefcon(), KFS_Item_CacheValue, from, value));
 }
 
+namespace {
+
+// What nearly all streams are read for: a few doubles, without a call for some bytes. False where there are more.
+inline bool CopyFewDoubles(int count, void const* from, double* to)
+{
+    switch (count) {
+    case 1: std::memcpy(to, from, sizeof *to); return true;
+    case 2: std::memcpy(to, from, 2 * sizeof *to); return true;
+    case 3: std::memcpy(to, from, 3 * sizeof *to); return true;
+    case 4: std::memcpy(to, from, 4 * sizeof *to); return true;
+    default: return false;
+    }
+}
+
+}  // namespace
+
 void KFS_GetValueFNoExpr(KFS_Stream const* stream, int time, unsigned char keyOnly, double* value, unsigned char* atKey,
                          void const* source)
 {
@@ -293,8 +309,7 @@ void KFS_GetValueFNoExpr(KFS_Stream const* stream, int time, unsigned char keyOn
         return;
     }
     void const* const from = source ? source : KFSp_ValueData(data->cache);
-    if (stream->GetDimension() == 1 && !stream->IsFloatBased()) {  // the common read, without a call for eight bytes
-        std::memcpy(value, from, sizeof *value);
+    if (!stream->IsFloatBased() && CopyFewDoubles(stream->GetDimension(), from, value)) {
         return;
     }
     KFSp_ThrowIf(KFSp_FakeCopyItemFunc(stream, 0, KFS_Item_CacheValue, from, value));

@@ -36,12 +36,6 @@ inline bool CRVp_AllFinite(CRV_Curve const* curve)
     return true;
 }
 
-// NaN stays NaN.
-inline double CRVp_LimitToUnit(double t)
-{
-    return t < 0.0 ? 0.0 : t > 1.0 ? 1.0 : t;
-}
-
 // Between a and b at share t, exact at both ends and where the two are equal, without overflow.
 inline double CRVp_Between(double a, double b, double t)
 {

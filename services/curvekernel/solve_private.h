@@ -71,6 +71,12 @@ inline double CRVp_Max(double a, double b)
     return a < b ? b : a;
 }
 
+// NaN stays NaN.
+inline double CRVp_LimitToUnit(double t)
+{
+    return t < 0.0 ? 0.0 : t > 1.0 ? 1.0 : t;
+}
+
 // Rounding may carry a blend an ulp past its control coordinates; a held coordinate must come back as it is.
 inline double CRVp_LimitToHull(double c0, double c1, double c2, double c3, double value)
 {
