@@ -1,6 +1,6 @@
 # tests/<folder>/*.cpp make test_<folder>, whose tests carry the folder's name as their ctest label. They link the
-# library's objects, so hidden functions can be tested. Two don't: test_services links the services alone, since they
-# know nothing of the library, and test_shared links libkfs itself and sees what a host sees.
+# library's objects, so hidden functions can be tested. Only test_services links the services alone, since they know
+# nothing of the library. What a host sees of libkfs itself is tested by tests/consumer.
 
 find_package(GTest REQUIRED)
 include(GoogleTest)
@@ -12,12 +12,6 @@ set(testDefinitions
 add_library(kfs_test_base INTERFACE)
 target_compile_definitions(kfs_test_base INTERFACE ${testDefinitions})
 target_link_libraries(kfs_test_base INTERFACE GTest::gtest_main GTest::gtest)
-
-kfs_sources(supportSources tests/support)
-if(supportSources)
-    add_library(kfs_test_support OBJECT ${supportSources})
-    target_link_libraries(kfs_test_support PUBLIC kfs_test_base kfs_services)
-endif()
 
 # The targets with label `threads`, for builds that need nothing else.
 add_custom_target(thread_tests)
@@ -32,13 +26,8 @@ function(kfs_add_test_folder name)
     endif()
     if(name STREQUAL "services")
         target_link_libraries(${target} PRIVATE kfs_services)
-    elseif(name STREQUAL "shared")
-        target_link_libraries(${target} PRIVATE kfs)
     else()
         target_link_libraries(${target} PRIVATE kfs_objects kfs_services Boost::thread Threads::Threads)
-        if(TARGET kfs_test_support)
-            target_link_libraries(${target} PRIVATE kfs_test_support)
-        endif()
     endif()
     if(name STREQUAL "cli" AND TARGET kfs_cli)
         target_compile_definitions(${target} PRIVATE "KFS_TEST_COMMAND=\"$<TARGET_FILE:kfs_cli>\"")
