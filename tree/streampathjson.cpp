@@ -33,8 +33,9 @@ public:
     explicit CCreatePath(KFS_StreamIDPath* path) : path_(path) {}
     bool operator()(int, u16str const&, Q_AnyTree const& component, Q_Any const&)
     {
+        unsigned int const index = Index(Entry(component, IndexKey));  // first: a name stays in the pool for good
         KFS_MatchName const name(Q_UTF16To8String(Entry(component, MatchNameKey).GetAs_Str()), true);
-        path_->AddTail(KFS_StreamID(Index(Entry(component, IndexKey)), name));
+        path_->AddTail(KFS_StreamID(index, name));
         return false;
     }
 

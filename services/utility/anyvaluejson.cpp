@@ -146,6 +146,8 @@ u16str Q_AnyTreeWrapper::GetAs_JSON() const
 
 void Q_AnyTreeWrapper::SetFrom_JSON_HackRecoverMagicMixed(u16str const& text)
 {
+    // The parser takes a NUL for the end of the text.
+    if (text.find(u16str::value_type{0}) != u16str::npos) throw Q_Err_BadJson;
     Q_AnyTree tree;
     TreeBuilder builder(tree);
     if (!Json::sax_parse(Q_UTF16ToMBString(text), &builder)) throw Q_Err_BadJson;

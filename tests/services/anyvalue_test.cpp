@@ -130,6 +130,7 @@ TEST(AnyTree, RefusesEverythingElseAndStaysAsItWas)
                              "99999999999999999999999999", "\"\n\"", "tru"})
         expectRefused("[" + std::string(item) + "]");
     expectRefused("[\"open");
+    expectRefused(std::string("{}\0x", 4));
     const std::string deepest = std::string(Q_MaxJsonDepth, '[') + std::string(Q_MaxJsonDepth, ']');
     expectRefused("[" + deepest + "]");
     expectRefused(std::string(1000000, '['));

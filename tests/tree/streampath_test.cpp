@@ -275,6 +275,9 @@ TEST_F(StreamPath, JsonThatIsNoPathLeavesThePathAlone)
         EXPECT_EQ("ab", Letters(path));
         EXPECT_NO_REPORT(reports_);
     }
+    // The index is read first, so that a component that is refused for it leaves no name behind.
+    KFS_StreamIDPath path;
+    EXPECT_EQ(Q_Err_NotANumber, KFSp_Boundary([&] { path.SetFrom_JSON(Text(R"({"0": {"index": "one"}})")); }));
 }
 
 TEST_F(StreamPath, ChunksAreTheseBytes)
