@@ -28,7 +28,7 @@ struct Segment {
     CRV_Curve Curve() { return {2, points[0].data(), points[1].data(), points[2].data(), points[3].data()}; }
     std::array<double, 2> At(double t) const
     {
-        const double s = 1.0 - t;
+        double const s = 1.0 - t;
         std::array<double, 2> point;
         for (std::size_t i = 0; i < 2; ++i)
             point[i] = s * s * s * points[0][i] + 3.0 * s * s * t * points[1][i] + 3.0 * s * t * t * points[2][i] +
@@ -44,39 +44,39 @@ struct Segment {
     }
 };
 
-enum Family { kGentle, kRandom, kWithoutHandles, kNasty, kScreen };
+enum Family { Gentle, Random, WithoutHandles, Nasty, Screen };
 
 std::vector<Segment> Segments(int family, int count)
 {
     std::mt19937_64 engine(1);
-    const auto unit = [&engine] { return static_cast<double>(engine() >> 11) * 0x1p-53; };
+    auto const unit = [&engine] { return static_cast<double>(engine() >> 11) * 0x1p-53; };
     std::vector<Segment> segments(static_cast<std::size_t>(count));
     for (Segment& segment : segments)
         for (std::size_t i = 0; i < 2; ++i) {
             auto& p = segment.points;
             for (auto& point : p) point[i] = unit();
-            if (family == kGentle || family == kScreen) {
+            if (family == Gentle || family == Screen) {
                 p[1][i] = p[0][i] + (p[3][i] - p[0][i]) / 3.0 + 0.2 * (unit() - 0.5);
                 p[2][i] = p[3][i] - (p[3][i] - p[0][i]) / 3.0 + 0.2 * (unit() - 0.5);
-            } else if (family == kWithoutHandles) {
+            } else if (family == WithoutHandles) {
                 p[1][i] = p[0][i];
                 p[2][i] = p[3][i];
-            } else if (family == kNasty) {
+            } else if (family == Nasty) {
                 p[3][i] = p[0][i] + 1e-3 * unit();
             }
-            if (family == kScreen)
+            if (family == Screen)
                 for (auto& point : p) point[i] *= 1000.0;
         }
     return segments;
 }
 
-constexpr std::size_t kSteps = 64;
-using UniformTable = std::array<double, kSteps + 1>;
+constexpr std::size_t Steps = 64;
+using UniformTable = std::array<double, Steps + 1>;
 
 double Chord(std::array<double, 2> const& a, std::array<double, 2> const& b)
 {
-    const double dx = b[0] - a[0];
-    const double dy = b[1] - a[1];
+    double const dx = b[0] - a[0];
+    double const dy = b[1] - a[1];
     return std::sqrt(dx * dx + dy * dy);
 }
 
@@ -84,8 +84,8 @@ void BuildUniform(Segment const& segment, UniformTable& table)
 {
     auto before = segment.At(0.0);
     table[0] = 0.0;
-    for (std::size_t i = 1; i <= kSteps; ++i) {
-        const auto point = segment.At(static_cast<double>(i) / kSteps);
+    for (std::size_t i = 1; i <= Steps; ++i) {
+        auto const point = segment.At(static_cast<double>(i) / Steps);
         table[i] = table[i - 1] + Chord(before, point);
         before = point;
     }
@@ -93,10 +93,10 @@ void BuildUniform(Segment const& segment, UniformTable& table)
 
 double UniformT(UniformTable const& table, double s)
 {
-    const auto next = std::upper_bound(table.begin() + 1, table.end() - 1, s);
-    const double low = next[-1];
-    const double share = *next > low ? (s - low) / (*next - low) : 0.0;
-    return (static_cast<double>(next - table.begin() - 1) + share) / kSteps;
+    auto const next = std::upper_bound(table.begin() + 1, table.end() - 1, s);
+    double const low = next[-1];
+    double const share = *next > low ? (s - low) / (*next - low) : 0.0;
+    return (static_cast<double>(next - table.begin() - 1) + share) / Steps;
 }
 
 struct OurTable {
@@ -119,26 +119,26 @@ struct OurTable {
 template <class T>
 double WorstError(Segment const& segment, double length, T&& tOf)
 {
-    constexpr int kChords = 20000;
-    std::vector<double> sums(kChords + 1, 0.0);
+    constexpr int Chords = 20000;
+    std::vector<double> sums(Chords + 1, 0.0);
     auto before = segment.At(0.0);
-    for (int i = 1; i <= kChords; ++i) {
-        const auto point = segment.At(static_cast<double>(i) / kChords);
+    for (int i = 1; i <= Chords; ++i) {
+        auto const point = segment.At(static_cast<double>(i) / Chords);
         sums[static_cast<std::size_t>(i)] = sums[static_cast<std::size_t>(i) - 1] + Chord(before, point);
         before = point;
     }
     double worst = 0.0;
     for (int i = 0; i <= 200; ++i) {
-        const double s = length * i / 200;
-        const double place = std::min(tOf(s) * kChords, kChords - 1e-9);
-        const std::size_t k = static_cast<std::size_t>(place);
-        const double reached = sums[k] + (place - static_cast<double>(k)) * (sums[k + 1] - sums[k]);
+        double const s = length * i / 200;
+        double const place = std::min(tOf(s) * Chords, Chords - 1e-9);
+        std::size_t const k = static_cast<std::size_t>(place);
+        double const reached = sums[k] + (place - static_cast<double>(k)) * (sums[k + 1] - sums[k]);
         worst = std::max(worst, std::fabs(reached - s));
     }
     return worst / segment.Polygon();
 }
 
-constexpr int kBesideKnots = 2;  // items of a table that aren't knots
+constexpr int BesideKnots = 2;  // items of a table that aren't knots
 
 template <bool fresh>
 void BuildOurs(benchmark::State& state)
@@ -154,15 +154,15 @@ void BuildOurs(benchmark::State& state)
     }
     table.Clear();
 
-    const long long empty = Q_MemoryLive(nullptr).bytes;
+    long long const empty = Q_MemoryLive(nullptr).bytes;
     double knots = 0.0;
     double bytes = 0.0;
     double worst = 0.0;
     for (std::size_t k = 0; k < segments.size(); ++k) {
-        const CRV_Curve curve = segments[k].Curve();
+        CRV_Curve const curve = segments[k].Curve();
         table.Clear();
         table.Build(curve);
-        knots += (*table.list)->count - kBesideKnots;
+        knots += (*table.list)->count - BesideKnots;
         bytes += static_cast<double>(Q_MemoryLive(nullptr).bytes - empty);
         if (k < 100)
             worst = std::max(worst, WorstError(segments[k], table.length, [&](double s) {
@@ -178,7 +178,7 @@ void BuildOurs(benchmark::State& state)
 
 void BuildYardstick(benchmark::State& state)
 {
-    const std::vector<Segment> segments = Segments(static_cast<int>(state.range(0)), 1 << 10);
+    std::vector<Segment> const segments = Segments(static_cast<int>(state.range(0)), 1 << 10);
     std::size_t i = 0;
     UniformTable table;
     for (auto _ : state) {
@@ -189,7 +189,7 @@ void BuildYardstick(benchmark::State& state)
     double worst = 0.0;
     for (std::size_t k = 0; k < 100; ++k) {
         BuildUniform(segments[k], table);
-        worst = std::max(worst, WorstError(segments[k], table[kSteps], [&](double s) { return UniformT(table, s); }));
+        worst = std::max(worst, WorstError(segments[k], table[Steps], [&](double s) { return UniformT(table, s); }));
     }
     state.counters["bytes"] = sizeof table;
     state.counters["worst"] = worst;
@@ -206,10 +206,10 @@ std::vector<double> Distances(double length)
 void LookupOurs(benchmark::State& state)
 {
     Segment segment = Segments(static_cast<int>(state.range(0)), 1)[0];
-    const CRV_Curve curve = segment.Curve();
+    CRV_Curve const curve = segment.Curve();
     OurTable table;
     table.Build(curve);
-    const std::vector<double> distances = Distances(table.length);
+    std::vector<double> const distances = Distances(table.length);
     std::size_t i = 0;
     for (auto _ : state) {
         double t = 0.0;
@@ -221,10 +221,10 @@ void LookupOurs(benchmark::State& state)
 
 void LookupYardstick(benchmark::State& state)
 {
-    const Segment segment = Segments(static_cast<int>(state.range(0)), 1)[0];
+    Segment const segment = Segments(static_cast<int>(state.range(0)), 1)[0];
     UniformTable table;
     BuildUniform(segment, table);
-    const std::vector<double> distances = Distances(table[kSteps]);
+    std::vector<double> const distances = Distances(table[Steps]);
     std::size_t i = 0;
     for (auto _ : state) {
         benchmark::DoNotOptimize(UniformT(table, distances[i]));
@@ -232,11 +232,11 @@ void LookupYardstick(benchmark::State& state)
     }
 }
 
-BENCHMARK(BuildOurs<true>)->Name("build/ours")->ArgName("family")->DenseRange(kGentle, kScreen);
-BENCHMARK(BuildYardstick)->Name("build/yardstick")->ArgName("family")->DenseRange(kGentle, kScreen);
-BENCHMARK(BuildOurs<false>)->Name("rebuild/ours")->ArgName("family")->DenseRange(kGentle, kScreen);
-BENCHMARK(BuildYardstick)->Name("rebuild/yardstick")->ArgName("family")->DenseRange(kGentle, kScreen);
-BENCHMARK(LookupOurs)->Name("lookup/ours")->ArgName("family")->DenseRange(kGentle, kScreen);
-BENCHMARK(LookupYardstick)->Name("lookup/yardstick")->ArgName("family")->DenseRange(kGentle, kScreen);
+BENCHMARK(BuildOurs<true>)->Name("build/ours")->ArgName("family")->DenseRange(Gentle, Screen);
+BENCHMARK(BuildYardstick)->Name("build/yardstick")->ArgName("family")->DenseRange(Gentle, Screen);
+BENCHMARK(BuildOurs<false>)->Name("rebuild/ours")->ArgName("family")->DenseRange(Gentle, Screen);
+BENCHMARK(BuildYardstick)->Name("rebuild/yardstick")->ArgName("family")->DenseRange(Gentle, Screen);
+BENCHMARK(LookupOurs)->Name("lookup/ours")->ArgName("family")->DenseRange(Gentle, Screen);
+BENCHMARK(LookupYardstick)->Name("lookup/yardstick")->ArgName("family")->DenseRange(Gentle, Screen);
 
 }  // namespace

@@ -24,9 +24,7 @@ struct Record {
 std::vector<int> TimesInOrder(int count)
 {
     std::vector<int> times(static_cast<std::size_t>(count));
-    for (int i = 0; i < count; ++i) {
-        times[static_cast<std::size_t>(i)] = i * 10;
-    }
+    for (int i = 0; i < count; ++i) times[static_cast<std::size_t>(i)] = i * 10;
     return times;
 }
 

@@ -23,25 +23,25 @@ struct Question {
     CRV_Curve Curve() { return {2, points[0].data(), points[1].data(), points[2].data(), points[3].data()}; }
 };
 
-enum Family { kRandom, kZeroAndOne, kModerate, kThirds };
+enum Family { Random, ZeroAndOne, Moderate, Thirds };
 
 std::vector<Question> Questions(Family family, int count)
 {
     std::mt19937_64 engine(1);
-    const auto unit = [&engine] { return static_cast<double>(engine() >> 11) * 0x1p-53; };
+    auto const unit = [&engine] { return static_cast<double>(engine() >> 11) * 0x1p-53; };
     std::vector<Question> questions(static_cast<std::size_t>(count));
     for (Question& question : questions) {
-        const double dt = 0.1 + 4.0 * unit();
+        double const dt = 0.1 + 4.0 * unit();
         double out = unit();
         double in = unit();
-        if (family == kZeroAndOne) {
-            const double choices[] = {0.0, 1.0, out};
+        if (family == ZeroAndOne) {
+            double const choices[] = {0.0, 1.0, out};
             out = choices[engine() % 3];
             in = choices[engine() % 3];
-        } else if (family == kModerate) {
+        } else if (family == Moderate) {
             out = 0.1 + 0.5 * out;
             in = 0.1 + 0.5 * in;
-        } else if (family == kThirds) {
+        } else if (family == Thirds) {
             out = in = 1.0 / 3.0;
         }
         question.points[0] = {0.0, unit()};
@@ -56,24 +56,24 @@ std::vector<Question> Questions(Family family, int count)
 template <class Real>
 Real Blend(Question const& question, std::size_t i, Real t)
 {
-    const Real s = 1 - t;
+    Real const s = 1 - t;
     return s * s * s * question.points[0][i] + 3 * s * s * t * question.points[1][i] +
            3 * s * t * t * question.points[2][i] + t * t * t * question.points[3][i];
 }
 
 double TextbookT(Question const& question)
 {
-    const double x1 = question.points[1][0];
-    const double x2 = question.points[2][0];
-    const double x3 = question.points[3][0];
+    double const x1 = question.points[1][0];
+    double const x2 = question.points[2][0];
+    double const x3 = question.points[3][0];
     double low = 0.0;
     double high = 1.0;
     double t = question.x / x3;
     for (int step = 0; step < 100; ++step) {
-        const double s = 1.0 - t;
-        const double f = 3.0 * s * s * t * x1 + 3.0 * s * t * t * x2 + t * t * t * x3 - question.x;
+        double const s = 1.0 - t;
+        double const f = 3.0 * s * s * t * x1 + 3.0 * s * t * t * x2 + t * t * t * x3 - question.x;
         (f < 0.0 ? low : high) = t;
-        const double slope = 3.0 * (s * s * x1 + 2.0 * s * t * (x2 - x1) + t * t * (x3 - x2));
+        double const slope = 3.0 * (s * s * x1 + 2.0 * s * t * (x2 - x1) + t * t * (x3 - x2));
         double next = t - f / slope;
         if (!(next >= low && next <= high)) next = 0.5 * (low + high);
         if (std::fabs(next - t) < 1e-12) return next;
@@ -89,7 +89,7 @@ double TextbookY(Question& question)
 
 double OurT(Question& question)
 {
-    const CRV_Curve curve = question.Curve();
+    CRV_Curve const curve = question.Curve();
     double t = 0.0;
     CRV_TFromX(&curve, &t, question.x);
     return t;
@@ -97,7 +97,7 @@ double OurT(Question& question)
 
 double OurY(Question& question)
 {
-    const CRV_Curve curve = question.Curve();
+    CRV_Curve const curve = question.Curve();
     double y = 0.0;
     CRV_EvaluateYFromX(&curve, &y, question.x);
     return y;
@@ -110,21 +110,21 @@ void CountErrors(benchmark::State& state, T&& tOf, Y&& yOf)
     double worstX = 0.0;
     double worstY = 0.0;
     for (Question& question : Questions(static_cast<Family>(state.range(0)), 1000000)) {
-        const long double t = tOf(question);
-        const double dt = question.points[3][0];
-        const long double residual = std::fabs(Blend(question, 0, t) - question.x) / dt;
+        long double const t = tOf(question);
+        double const dt = question.points[3][0];
+        long double const residual = std::fabs(Blend(question, 0, t) - question.x) / dt;
         worstX = std::max(worstX, static_cast<double>(residual));
-        if (state.range(0) != kModerate) continue;
+        if (state.range(0) != Moderate) continue;
         long double low = 0;
         long double high = 1;
         for (int half = 0; half < 64; ++half) {
-            const long double middle = (low + high) / 2;
+            long double const middle = (low + high) / 2;
             (Blend(question, 0, middle) < question.x ? low : high) = middle;
         }
         worstY = std::max(worstY, static_cast<double>(std::fabs(Blend(question, 1, low) - yOf(question))));
     }
     state.counters["worst_x"] = worstX;
-    if (state.range(0) == kModerate) state.counters["worst_y"] = worstY;
+    if (state.range(0) == Moderate) state.counters["worst_y"] = worstY;
 }
 
 template <class Solve>
@@ -152,26 +152,30 @@ void SolveYardstick(benchmark::State& state)
 
 void SlopeOurs(benchmark::State& state)
 {
-    Run(state, [](Question& question) {
-        const CRV_Curve curve = question.Curve();
-        double slope = 0.0;
-        CRV_Evaluate1dDerivFromX(&curve, &slope, question.x);
-        return slope;
-    });
+    Run(
+        state,
+        [](Question& question) {
+            CRV_Curve const curve = question.Curve();
+            double slope = 0.0;
+            CRV_Evaluate1dDerivFromX(&curve, &slope, question.x);
+            return slope;
+        });
 }
 
 void SlopeYardstick(benchmark::State& state)
 {
-    Run(state, [](Question& question) {
-        const double t = TextbookT(question);
-        const double s = 1.0 - t;
-        double slopes[2];
-        for (std::size_t i = 0; i < 2; ++i)
-            slopes[i] = s * s * (question.points[1][i] - question.points[0][i]) +
-                        2.0 * s * t * (question.points[2][i] - question.points[1][i]) +
-                        t * t * (question.points[3][i] - question.points[2][i]);
-        return slopes[1] / slopes[0];
-    });
+    Run(
+        state,
+        [](Question& question) {
+            double const t = TextbookT(question);
+            double const s = 1.0 - t;
+            double slopes[2];
+            for (std::size_t i = 0; i < 2; ++i)
+                slopes[i] = s * s * (question.points[1][i] - question.points[0][i]) +
+                            2.0 * s * t * (question.points[2][i] - question.points[1][i]) +
+                            t * t * (question.points[3][i] - question.points[2][i]);
+            return slopes[1] / slopes[0];
+        });
 }
 
 // The treatment on curves of which all, or none, are already as they should be. The yardstick copies the points, which
@@ -179,7 +183,7 @@ void SlopeYardstick(benchmark::State& state)
 template <bool Treat>
 void NonDecreasing(benchmark::State& state)
 {
-    std::vector<Question> questions = Questions(kRandom, 1 << 14);
+    std::vector<Question> questions = Questions(Random, 1 << 14);
     for (Question& question : questions) {
         auto& p = question.points;
         p[3][1] = p[0][1] + 1.0;
@@ -196,10 +200,10 @@ void NonDecreasing(benchmark::State& state)
     }
 }
 
-BENCHMARK(SolveOurs)->Name("solve/ours")->ArgName("family")->DenseRange(kRandom, kThirds);
-BENCHMARK(SolveYardstick)->Name("solve/yardstick")->ArgName("family")->DenseRange(kRandom, kThirds);
-BENCHMARK(SlopeOurs)->Name("slope/ours")->ArgName("family")->DenseRange(kRandom, kZeroAndOne);
-BENCHMARK(SlopeYardstick)->Name("slope/yardstick")->ArgName("family")->DenseRange(kRandom, kZeroAndOne);
+BENCHMARK(SolveOurs)->Name("solve/ours")->ArgName("family")->DenseRange(Random, Thirds);
+BENCHMARK(SolveYardstick)->Name("solve/yardstick")->ArgName("family")->DenseRange(Random, Thirds);
+BENCHMARK(SlopeOurs)->Name("slope/ours")->ArgName("family")->DenseRange(Random, ZeroAndOne);
+BENCHMARK(SlopeYardstick)->Name("slope/yardstick")->ArgName("family")->DenseRange(Random, ZeroAndOne);
 BENCHMARK(NonDecreasing<true>)->Name("nondecreasing/ours")->ArgName("work")->DenseRange(0, 1);
 BENCHMARK(NonDecreasing<false>)->Name("nondecreasing/yardstick")->ArgName("work")->DenseRange(0, 1);
 

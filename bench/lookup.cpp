@@ -61,13 +61,10 @@ void PathOurs(benchmark::State& state)
 {
     Root const& root = Tree();
     std::vector<KFS_StreamIDPath> paths;
-    for (auto const& [panel, slot] : AskedPlaces()) {
+    for (auto const& [panel, slot] : AskedPlaces())
         paths.emplace_back(KFS_StreamID(panel, PanelName()), KFS_StreamID(LeafName(slot)));
-    }
     std::size_t i = 0;
-    for (auto _ : state) {
-        benchmark::DoNotOptimize(root.FindStream(paths[i++ % Asked]));
-    }
+    for (auto _ : state) benchmark::DoNotOptimize(root.FindStream(paths[i++ % Asked]));
 }
 void PathYardstick(benchmark::State& state)
 {
@@ -81,13 +78,9 @@ void PathYardstick(benchmark::State& state)
         }
     }
     std::vector<std::pair<unsigned int, KFS_MatchName>> keys;
-    for (auto const& [panel, slot] : AskedPlaces()) {
-        keys.emplace_back(panel, LeafName(slot));
-    }
+    for (auto const& [panel, slot] : AskedPlaces()) keys.emplace_back(panel, LeafName(slot));
     std::size_t i = 0;
-    for (auto _ : state) {
-        benchmark::DoNotOptimize(map.find(keys[i++ % Asked])->second);
-    }
+    for (auto _ : state) benchmark::DoNotOptimize(map.find(keys[i++ % Asked])->second);
 }
 BENCHMARK(PathOurs)->Name("tree_find_by_path/ours");
 BENCHMARK(PathYardstick)->Name("tree_find_by_path/yardstick");
@@ -98,30 +91,21 @@ void NameOurs(benchmark::State& state)
     Root const& root = Tree();
     KFS_NamedStreamGroup const* const panel = root.GetStream(3U)->GetAsNamedGroup();
     std::vector<KFS_MatchName> names;
-    for (auto const& place : AskedPlaces()) {
-        names.push_back(LeafName(place.second));
-    }
+    for (auto const& place : AskedPlaces()) names.push_back(LeafName(place.second));
     std::size_t i = 0;
-    for (auto _ : state) {
-        benchmark::DoNotOptimize(panel->GetStream(names[i++ % Asked], true));
-    }
+    for (auto _ : state) benchmark::DoNotOptimize(panel->GetStream(names[i++ % Asked], true));
 }
 void NameYardstick(benchmark::State& state)
 {
     Root const& root = Tree();
     KFS_NamedStreamGroup const* const panel = root.GetStream(3U)->GetAsNamedGroup();
     std::unordered_map<KFS_MatchName, KFS_StreamBase const*, PathHash::NameHash> map;
-    for (unsigned int slot = 0; slot < Slots; ++slot) {
+    for (unsigned int slot = 0; slot < Slots; ++slot)
         map.emplace(panel->GetStream(slot)->GetMatchName(), panel->GetStream(slot));
-    }
     std::vector<KFS_MatchName> names;
-    for (auto const& place : AskedPlaces()) {
-        names.push_back(LeafName(place.second));
-    }
+    for (auto const& place : AskedPlaces()) names.push_back(LeafName(place.second));
     std::size_t i = 0;
-    for (auto _ : state) {
-        benchmark::DoNotOptimize(map.find(names[i++ % Asked])->second);
-    }
+    for (auto _ : state) benchmark::DoNotOptimize(map.find(names[i++ % Asked])->second);
 }
 BENCHMARK(NameOurs)->Name("tree_find_by_match_name/ours");
 BENCHMARK(NameYardstick)->Name("tree_find_by_match_name/yardstick");
@@ -130,9 +114,7 @@ BENCHMARK(NameYardstick)->Name("tree_find_by_match_name/yardstick");
 std::vector<std::string> AskedTexts()
 {
     std::vector<std::string> texts;
-    for (auto const& place : AskedPlaces()) {
-        texts.push_back("Bench Leaf " + std::to_string(place.second));
-    }
+    for (auto const& place : AskedPlaces()) texts.push_back("Bench Leaf " + std::to_string(place.second));
     return texts;
 }
 void TextOurs(benchmark::State& state)
@@ -148,13 +130,9 @@ void TextYardstick(benchmark::State& state)
 {
     std::vector<std::string> const texts = AskedTexts();
     std::unordered_map<std::string_view, KFS_MatchName> map;
-    for (std::string const& text : texts) {
-        map.try_emplace(text, text.c_str(), true);
-    }
+    for (std::string const& text : texts) map.try_emplace(text, text.c_str(), true);
     std::size_t i = 0;
-    for (auto _ : state) {
-        benchmark::DoNotOptimize(map.find(std::string_view(texts[i++ % Asked].c_str()))->second);
-    }
+    for (auto _ : state) benchmark::DoNotOptimize(map.find(std::string_view(texts[i++ % Asked].c_str()))->second);
 }
 BENCHMARK(TextOurs)->Name("tree_match_name_of_text/ours");
 BENCHMARK(TextYardstick)->Name("tree_match_name_of_text/yardstick");

@@ -30,9 +30,7 @@ inline constexpr unsigned int Scale = 600;
 }
 inline void Check(int code)
 {
-    if (code != 0) {
-        Stop("error " + std::to_string(code));
-    }
+    if (code != 0) Stop("error " + std::to_string(code));
 }
 
 // ---- the kinds of the tree
@@ -65,9 +63,7 @@ public:
     KFS_StreamBase* CloneStream(KFS_CloneStreamParams const& params) const override { return new Panel(*this, params); }
     void FillCanonicalLayout(KFS_CanonicalLayout* layout) override
     {
-        for (int slot = 0; slot < Slots; ++slot) {
-            layout->push_back(GetFactory()->GetCanonicalStream(LeafName(slot)));
-        }
+        for (int slot = 0; slot < Slots; ++slot) layout->push_back(GetFactory()->GetCanonicalStream(LeafName(slot)));
     }
 
 private:
@@ -102,9 +98,7 @@ inline void StartLibrary()
     static kfshost::Session* const session = [] {
         auto* const started = new kfshost::Session;
         KFS_StreamFactory* const factory = Get_VX_StreamFactory();
-        for (int slot = 0; slot < Slots; ++slot) {
-            factory->RegisterFactoryFunc(LeafName(slot), MakeLeaf, false);
-        }
+        for (int slot = 0; slot < Slots; ++slot) factory->RegisterFactoryFunc(LeafName(slot), MakeLeaf, false);
         factory->RegisterFactoryFunc(
             PanelName(),
             [](KFS_MatchName const&, KFS_StreamFactory* of, bool, unsigned int, bool canonical) {

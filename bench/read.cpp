@@ -88,9 +88,7 @@ Fixture const& Get(int keys, short dimension, char interp)
 {
     static std::map<std::tuple<int, short, char>, std::unique_ptr<Fixture>> made;
     std::unique_ptr<Fixture>& fixture = made[{keys, dimension, interp}];
-    if (!fixture) {
-        fixture = std::make_unique<Fixture>(keys, dimension, interp);
-    }
+    if (!fixture) fixture = std::make_unique<Fixture>(keys, dimension, interp);
     return *fixture;
 }
 
@@ -173,12 +171,11 @@ void Spline3Ours(benchmark::State& state)
 }
 void Spline3Yardstick(benchmark::State& state)
 {
-    Bare(state, Get(static_cast<int>(state.range(0)), 3, KFS_Interp_Spline), Order::Random,
-         [](Fixture const& fixture, int segment, double x, double* y) {
-             for (int d = 0; d < 3; ++d) {
-                 SolveCurve(fixture, (segment + d * 7) % (fixture.count - 1), x, y);
-             }
-         });
+    Bare(
+        state, Get(static_cast<int>(state.range(0)), 3, KFS_Interp_Spline), Order::Random,
+        [](Fixture const& fixture, int segment, double x, double* y) {
+            for (int d = 0; d < 3; ++d) SolveCurve(fixture, (segment + d * 7) % (fixture.count - 1), x, y);
+        });
 }
 BENCHMARK(Spline3Ours)->Name("read_spline_3_components/ours")->Arg(1000);
 BENCHMARK(Spline3Yardstick)->Name("read_spline_3_components/yardstick")->Arg(1000);

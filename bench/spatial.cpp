@@ -33,9 +33,7 @@ std::unique_ptr<KFS_Stream> MakePath(int keys, unsigned int seed)
     std::uniform_real_distribution<double> step(-50.0, 50.0);
     double point[Dimension] = {};
     for (int i = 0; i < keys; ++i) {
-        for (double& coordinate : point) {
-            coordinate += step(random);
-        }
+        for (double& coordinate : point) coordinate += step(random);
         T_Time const at{i * Gap, Scale};
         KFS_InsertKey(stream.get(), &at, 1, point, KFS_Interp_Spline, KFS_Interp_Spline);
     }
@@ -63,15 +61,12 @@ struct Fixture {
             records.push_back(static_cast<KFS_KeyScalar const*>(item));
             times.push_back(records.back()->time);
         }
-        for (std::size_t i = 0; i + 1 < records.size(); ++i) {
+        for (std::size_t i = 0; i + 1 < records.size(); ++i)
             segments.push_back(MakeSegment(*records[i], *records[i + 1]));
-        }
     }
     ~Fixture()
     {
-        for (Segment const& segment : segments) {
-            SEQ_Dispose(segment.table, 0);
-        }
+        for (Segment const& segment : segments) SEQ_Dispose(segment.table, 0);
     }
     Fixture(Fixture const&) = delete;
     Fixture& operator=(Fixture const&) = delete;
@@ -113,9 +108,7 @@ Fixture& Get(int keys)
 {
     static std::map<int, std::unique_ptr<Fixture>> made;
     std::unique_ptr<Fixture>& fixture = made[keys];
-    if (!fixture) {
-        fixture = std::make_unique<Fixture>(keys);
-    }
+    if (!fixture) fixture = std::make_unique<Fixture>(keys);
     return *fixture;
 }
 
@@ -205,9 +198,7 @@ void Drag(benchmark::State& state)
     KFS_GetValueFPlus(stream.get(), &start, 0, point, nullptr, nullptr);  // the tangents that are left alone
     for (auto _ : state) {
         tangent[1] += step;
-        if (tangent[1] < -50.0 || tangent[1] > 50.0) {
-            step = -step;
-        }
+        if (tangent[1] < -50.0 || tangent[1] > 50.0) step = -step;
         KFS_SetKeySpaceTangents(stream.get(), 10, -1, nullptr, tangent);
         for (int i = 0; i < reads; ++i) {
             T_Time const at{9 * Gap + 1 + 2 * i, Scale};  // no key

@@ -67,9 +67,7 @@ PlainTree BuildPlain(int nodes)
         tree.push_back(std::make_unique<PlainPanel>());
         auto& leaf = tree.back()->slots[static_cast<std::size_t>(SlotOf(i))];
         leaf = std::make_unique<PlainLeaf>();
-        for (int key = 0; key < Keys; ++key) {
-            leaf->keys.push_back({key * 25, 0, {i * 0.5 + key * 0.375}});
-        }
+        for (int key = 0; key < Keys; ++key) leaf->keys.push_back({key * 25, 0, {i * 0.5 + key * 0.375}});
     }
     return tree;
 }
@@ -85,9 +83,7 @@ struct Fixture {
         memory = Q_MemoryLive(nullptr).bytes - before.bytes;
         bytes = BytesOf(*root);
         std::string pattern = (std::filesystem::temp_directory_path() / "kfs_bench_XXXXXX").string();
-        if (!mkdtemp(pattern.data())) {
-            Stop("no folder for the benchmark");
-        }
+        if (!mkdtemp(pattern.data())) Stop("no folder for the benchmark");
         folder = pattern;
         WritePlainly(Path("plain"));
     }
@@ -107,9 +103,8 @@ struct Fixture {
         std::string const temporary = target + ".tmp";
         int const file = open(temporary.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0666);
         bool const written = write(file, bytes.data(), bytes.size()) == static_cast<ssize_t>(bytes.size());
-        if (!written || fsync(file) != 0 || close(file) != 0 || rename(temporary.c_str(), target.c_str()) != 0) {
+        if (!written || fsync(file) != 0 || close(file) != 0 || rename(temporary.c_str(), target.c_str()) != 0)
             Stop("can't write " + target);
-        }
         int const place = open(folder.c_str(), O_RDONLY | O_DIRECTORY);
         fsync(place);
         close(place);
@@ -118,9 +113,7 @@ struct Fixture {
     {
         std::vector<unsigned char> read_(bytes.size());
         int const file = open(Path("plain").c_str(), O_RDONLY);
-        if (read(file, read_.data(), read_.size()) != static_cast<ssize_t>(read_.size())) {
-            Stop("can't read");
-        }
+        if (read(file, read_.data(), read_.size()) != static_cast<ssize_t>(read_.size())) Stop("can't read");
         close(file);
         return read_;
     }
@@ -136,9 +129,7 @@ Fixture const& Get(benchmark::State const& state)
 {
     static std::unordered_map<int, std::unique_ptr<Fixture>> made;
     std::unique_ptr<Fixture>& fixture = made[static_cast<int>(state.range(0))];
-    if (!fixture) {
-        fixture = std::make_unique<Fixture>(static_cast<int>(state.range(0)));
-    }
+    if (!fixture) fixture = std::make_unique<Fixture>(static_cast<int>(state.range(0)));
     return *fixture;
 }
 
@@ -194,9 +185,7 @@ void SaveOurs(benchmark::State& state)
 void SaveYardstick(benchmark::State& state)
 {
     Fixture const& fixture = Get(state);
-    for (auto _ : state) {
-        fixture.WritePlainly(fixture.Path("plain"));
-    }
+    for (auto _ : state) fixture.WritePlainly(fixture.Path("plain"));
 }
 BENCHMARK(SaveOurs)->Name("tree_save/ours")->Apply(Sizes)->UseRealTime();
 BENCHMARK(SaveYardstick)->Name("tree_save/yardstick")->Apply(Sizes)->UseRealTime();
@@ -255,9 +244,7 @@ void LoadOurs(benchmark::State& state)
 void LoadYardstick(benchmark::State& state)
 {
     Fixture const& fixture = Get(state);
-    for (auto _ : state) {
-        benchmark::DoNotOptimize(fixture.ReadPlainly().data());
-    }
+    for (auto _ : state) benchmark::DoNotOptimize(fixture.ReadPlainly().data());
 }
 BENCHMARK(LoadOurs)->Name("tree_load/ours")->Apply(Sizes);
 BENCHMARK(LoadYardstick)->Name("tree_load/yardstick")->Apply(Sizes);

@@ -25,9 +25,7 @@ Axis::Axis(double low, double high, int ticks, double leastStep)
 std::vector<double> Axis::Ticks() const
 {
     std::vector<double> ticks;
-    for (double index = std::ceil(low_ / step_); index * step_ <= high_; index += 1.0) {
-        ticks.push_back(index * step_);
-    }
+    for (double index = std::ceil(low_ / step_); index * step_ <= high_; index += 1.0) ticks.push_back(index * step_);
     return ticks;
 }
 

@@ -32,9 +32,7 @@ public:
         int const keys = kfshost::KeyCount(stream_);
         for (int i = 0; i < keys; ++i) {
             AddKey(i);
-            if (i + 1 < keys) {
-                AddSegment(i);
-            }
+            if (i + 1 < keys) AddSegment(i);
         }
         return std::move(curves_);
     }
@@ -66,9 +64,8 @@ private:
             curves_.components[d].keys.push_back(key);
             curves_.components[d].value.push_back(key);
         }
-        if (!stream_.IsSpatial()) {  // a path's handles belong to the graph of its distance, not to these
+        if (!stream_.IsSpatial())  // a path's handles belong to the graph of its distance, not to these
             AddHandles(index, seconds, inInterp, outInterp);
-        }
     }
 
     void AddHandles(int index, double seconds, char inInterp, char outInterp)
@@ -77,12 +74,10 @@ private:
         ThrowIfFailed(KFS_GetKeyTangentsF(&stream_, index, inX.data(), inY.data(), outX.data(), outY.data()));
         for (std::size_t d = 0; d < dimension_; ++d) {
             Point const key{seconds, row_[d]};
-            if (inInterp == KFS_Interp_Spline && inX[d] < 0.0) {
+            if (inInterp == KFS_Interp_Spline && inX[d] < 0.0)
                 curves_.handles.push_back({d, key, {key.x + inX[d], key.y + inY[d]}});
-            }
-            if (outInterp == KFS_Interp_Spline && outX[d] > 0.0) {
+            if (outInterp == KFS_Interp_Spline && outX[d] > 0.0)
                 curves_.handles.push_back({d, key, {key.x + outX[d], key.y + outY[d]}});
-            }
         }
     }
 
@@ -129,13 +124,9 @@ private:
             for (std::size_t d = 0; d < dimension_; ++d) {
                 ComponentCurve& curve = curves_.components[d];
                 double const slope = (nextRow_[d] - row_[d]) / Seconds(after - before);
-                if (i == 1) {
-                    curve.speed.push_back({Seconds(start), slope});
-                }
+                if (i == 1) curve.speed.push_back({Seconds(start), slope});
                 curve.speed.push_back({(Seconds(before) + Seconds(after)) / 2, slope});
-                if (i == pieces) {
-                    curve.speed.push_back({Seconds(end), slope});
-                }
+                if (i == pieces) curve.speed.push_back({Seconds(end), slope});
                 curve.value.push_back({Seconds(after), nextRow_[d]});
             }
             before = after;

@@ -56,17 +56,14 @@ std::string FirstDifferenceOfKeys(KFS_Stream const& before, KFS_Stream const& af
         Rational const time = kfshost::KeyTime(before, i);
         std::string const key = fmt::format("key {}", i);
         std::string text = With(key, Against(TimeText(time) + " s", TimeText(kfshost::KeyTime(after, i)) + " s"));
-        if (text.empty()) {
+        if (text.empty())
             text = With(key + " at " + TimeText(time) + " s", Against(KeyText(before, i), KeyText(after, i)));
-        }
         if (text.empty() && i > 0) {
             Rational const middle = (kfshost::KeyTime(before, i - 1) + time) * Rational(1, 2);
             text = With("between keys at " + TimeText(middle) + " s",
                         Against(ValueText(before, middle), ValueText(after, middle)));
         }
-        if (!text.empty()) {
-            return text;
-        }
+        if (!text.empty()) return text;
     }
     return "";
 }
@@ -78,9 +75,8 @@ std::string FirstDifference(StreamItem const& before, StreamItem const& after)
         text = Against(fmt::format("{} keys", kfshost::KeyCount(*before.stream)),
                        fmt::format("{} keys", kfshost::KeyCount(*after.stream)));
     }
-    if (text.empty() && before.stream->HasNoKeys()) {
+    if (text.empty() && before.stream->HasNoKeys())
         text = Against(ValueText(*before.stream, Rational(0, 1)), ValueText(*after.stream, Rational(0, 1)));
-    }
     return text.empty() ? FirstDifferenceOfKeys(*before.stream, *after.stream) : text;
 }
 
@@ -89,23 +85,17 @@ std::string FirstDifference(StreamItem const& before, StreamItem const& after)
 std::string DifferencesOf(kfshost::Scene const& before, kfshost::Scene const& after)
 {
     std::unordered_map<std::string, StreamItem const*> others;
-    for (StreamItem const& item : after.streams) {
-        others.emplace(item.path, &item);
-    }
+    for (StreamItem const& item : after.streams) others.emplace(item.path, &item);
     std::string text;
     for (StreamItem const& item : before.streams) {
         auto const other = others.extract(item.path);
         std::string const difference = other ? FirstDifference(item, *other.mapped()) : "";
-        if (!other) {
+        if (!other)
             text += "- " + item.path + '\n';
-        } else if (!difference.empty()) {
+        else if (!difference.empty())
             text += "~ " + item.path + ": " + difference + '\n';
-        }
     }
-    for (StreamItem const& item : after.streams) {
-        if (others.contains(item.path)) {
-            text += "+ " + item.path + '\n';
-        }
-    }
+    for (StreamItem const& item : after.streams)
+        if (others.contains(item.path)) text += "+ " + item.path + '\n';
     return text;
 }

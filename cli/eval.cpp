@@ -22,9 +22,7 @@ Rational ParseTime(std::string const& text, char const* option, Rational const& 
 {
     bool const inFrames = text.ends_with('f');
     auto const number = Rational::Parse(std::string_view(text).substr(0, text.size() - (inFrames ? 1 : 0)));
-    if (!number) {
-        throw UserError(option, '"' + text + "\" isn't a time: seconds like 0.5 or 1/24, or frames like 12f");
-    }
+    if (!number) throw UserError(option, '"' + text + "\" isn't a time: seconds like 0.5 or 1/24, or frames like 12f");
     return inFrames ? *number / fps : *number;
 }
 
@@ -37,9 +35,7 @@ std::vector<Rational> SampleTimes(EvalOptions const& options, Rational const& fp
         throw UserError("--from", TimeText(from) + " s is after the last key, " + TimeText(keys.last) +
                                       " s; --to says how far to go then");
     }
-    if (to < from) {
-        throw UserError("--to", TimeText(to) + " s is before --from, " + TimeText(from) + " s");
-    }
+    if (to < from) throw UserError("--to", TimeText(to) + " s is before --from, " + TimeText(from) + " s");
     Rational const steps = (to - from) * fps;
     std::int64_t const last = steps.Numerator() / steps.Denominator();
     if (last >= MaxSamples) {
@@ -47,9 +43,7 @@ std::vector<Rational> SampleTimes(EvalOptions const& options, Rational const& fp
                                              TimeText(from), TimeText(to)));
     }
     std::vector<Rational> times;
-    for (std::int64_t i = 0; i <= last; ++i) {
-        times.push_back(from + Rational(i, 1) / fps);
-    }
+    for (std::int64_t i = 0; i <= last; ++i) times.push_back(from + Rational(i, 1) / fps);
     return times;
 }
 
@@ -65,20 +59,16 @@ struct Samples {
 std::vector<Samples> TakeSamples(std::vector<StreamItem const*> const& items, std::vector<Rational> const& times)
 {
     std::size_t numbers = 0;
-    for (StreamItem const* item : items) {
-        numbers += item->components.size() * times.size();
-    }
-    if (numbers > MaxNumbers) {
+    for (StreamItem const* item : items) numbers += item->components.size() * times.size();
+    if (numbers > MaxNumbers)
         throw UserError("--fps", fmt::format("asks for {} numbers, more than {}", numbers, MaxNumbers));
-    }
     std::vector<Samples> all;
     for (StreamItem const* item : items) {
         Samples samples{item, {}};
         if (kfshost::KeyCount(*item->stream) != 0) {
             samples.numbers.resize(item->components.size() * times.size());
-            for (std::size_t i = 0; i < times.size(); ++i) {
+            for (std::size_t i = 0; i < times.size(); ++i)
                 kfshost::ReadAt(*item->stream, times[i], samples.numbers.data() + i * item->components.size());
-            }
         }
         all.push_back(std::move(samples));
     }
@@ -101,16 +91,12 @@ std::string ToTables(Evaluation const& evaluation)
             continue;
         }
         std::vector<Column> columns{{"frame", Align::Right}, {"seconds", Align::Right}};
-        for (std::string const& name : samples.item->components) {
-            columns.push_back({name, Align::Right});
-        }
+        for (std::string const& name : samples.item->components) columns.push_back({name, Align::Right});
         Table table(std::move(columns));
         for (std::size_t i = 0; i < evaluation.times.size(); ++i) {
             std::vector<std::string> cells{TimeText(evaluation.times[i] * evaluation.fps),
                                            TimeText(evaluation.times[i])};
-            for (std::size_t d = 0; d < samples.Dimension(); ++d) {
-                cells.push_back(fmt::format("{}", samples.Row(i)[d]));
-            }
+            for (std::size_t d = 0; d < samples.Dimension(); ++d) cells.push_back(fmt::format("{}", samples.Row(i)[d]));
             table.AddRow(std::move(cells));
         }
         text += table.ToText();
@@ -120,15 +106,11 @@ std::string ToTables(Evaluation const& evaluation)
 
 std::string CsvCell(std::string const& text)
 {
-    if (text.find_first_of(",\"") == std::string::npos) {
-        return text;
-    }
+    if (text.find_first_of(",\"") == std::string::npos) return text;
     std::string quoted = "\"";
     for (char const c : text) {
         quoted += c;
-        if (c == '"') {
-            quoted += c;
-        }
+        if (c == '"') quoted += c;
     }
     return quoted + '"';
 }
@@ -136,20 +118,15 @@ std::string CsvCell(std::string const& text)
 std::string ToCsv(Evaluation const& evaluation)
 {
     std::string text = "frame,seconds";
-    for (Samples const& samples : evaluation.samples) {
-        for (std::string const& name : samples.item->components) {
-            text += ',' + CsvCell(samples.item->path + '.' + name);
-        }
-    }
+    for (Samples const& samples : evaluation.samples)
+        for (std::string const& name : samples.item->components) text += ',' + CsvCell(samples.item->path + '.' + name);
     text += '\n';
     for (std::size_t i = 0; i < evaluation.times.size(); ++i) {
         text += fmt::format("{},{}", (evaluation.times[i] * evaluation.fps).ToString(), evaluation.times[i].ToDouble());
         for (Samples const& samples : evaluation.samples) {
             for (std::size_t d = 0; d < samples.Dimension(); ++d) {
                 text += ',';
-                if (!samples.numbers.empty()) {
-                    fmt::format_to(std::back_inserter(text), "{}", samples.Row(i)[d]);
-                }
+                if (!samples.numbers.empty()) fmt::format_to(std::back_inserter(text), "{}", samples.Row(i)[d]);
             }
         }
         text += '\n';
@@ -167,9 +144,7 @@ std::string ToJson(Evaluation const& evaluation)
     nlohmann::ordered_json document;
     document["fps"] = Pair(evaluation.fps);
     document["times"] = nlohmann::ordered_json::array();
-    for (Rational const& time : evaluation.times) {
-        document["times"].push_back(Pair(time));
-    }
+    for (Rational const& time : evaluation.times) document["times"].push_back(Pair(time));
     document["streams"] = nlohmann::ordered_json::array();
     for (Samples const& samples : evaluation.samples) {
         nlohmann::ordered_json stream;
@@ -178,9 +153,8 @@ std::string ToJson(Evaluation const& evaluation)
         stream["interpolation"] = NameOf(samples.item->interpolation);
         stream["components"] = samples.item->components;
         stream["values"] = nlohmann::ordered_json::array();
-        for (std::size_t i = 0; i < samples.numbers.size() / samples.Dimension(); ++i) {
+        for (std::size_t i = 0; i < samples.numbers.size() / samples.Dimension(); ++i)
             stream["values"].push_back(std::vector<double>(samples.Row(i), samples.Row(i) + samples.Dimension()));
-        }
         document["streams"].push_back(std::move(stream));
     }
     return document.dump() + '\n';
@@ -201,9 +175,8 @@ std::string ToText(Evaluation const& evaluation, Format format)
 Rational ParseFps(std::string const& text)
 {
     auto const fps = Rational::Parse(text);
-    if (!fps || *fps <= Rational()) {
+    if (!fps || *fps <= Rational())
         throw UserError("--fps", '"' + text + "\" isn't a number of frames a second like 24 or 30000/1001");
-    }
     return *fps;
 }
 

@@ -14,14 +14,11 @@ namespace {
 std::string Summary(kfshost::Scene const& scene, std::vector<StreamItem const*> const& items)
 {
     std::size_t keys = 0;
-    for (StreamItem const* item : items) {
-        keys += static_cast<std::size_t>(kfshost::KeyCount(*item->stream));
-    }
+    for (StreamItem const* item : items) keys += static_cast<std::size_t>(kfshost::KeyCount(*item->stream));
     std::string text =
         fmt::format("{}: {}, {}", scene.name, Plural(items.size(), "stream", "streams"), Plural(keys, "key", "keys"));
-    if (auto const span = SpanOf(items)) {
+    if (auto const span = SpanOf(items))
         text += fmt::format(", {} s to {} s", TimeText(span->first), TimeText(span->last));
-    }
     text += fmt::format("\ntimes in 1/{} s: ", scene.timeScale);
     return text + (scene.exactTimes ? "every key time of the file is one of these, or the nearest float to one\n"
                                     : fmt::format("key times are rounded by up to {:.2g} s\n", scene.worstTimeError));
@@ -31,9 +28,7 @@ std::string Summary(kfshost::Scene const& scene, std::vector<StreamItem const*> 
 std::string Interpolation(StreamItem const& item)
 {
     std::string const name(NameOf(item.interpolation));
-    if (!item.stream->IsSpatial()) {
-        return name;
-    }
+    if (!item.stream->IsSpatial()) return name;
     std::size_t const floating = kfshost::FloatKeyCount(*item.stream);
     return name + (floating == 0 ? " path" : fmt::format(" path, {}", Plural(floating, "float key", "float keys")));
 }
@@ -42,9 +37,7 @@ std::string Joined(std::vector<std::string> const& names)
 {
     constexpr std::size_t mostNames = 6;
     std::string text;
-    for (std::size_t i = 0; i < names.size() && i < mostNames; ++i) {
-        text += (i == 0 ? "" : " ") + names[i];
-    }
+    for (std::size_t i = 0; i < names.size() && i < mostNames; ++i) text += (i == 0 ? "" : " ") + names[i];
     return names.size() > mostNames ? text + " ..." : text;
 }
 

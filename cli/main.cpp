@@ -25,9 +25,7 @@ std::string firstReport;
 
 void RememberFirstReport(Q_Report const& report)
 {
-    if (firstReport.empty() && report.text) {
-        firstReport = report.text;
-    }
+    if (firstReport.empty() && report.text) firstReport = report.text;
 }
 
 void AddSelection(CLI::App& command, Selection& selection)
@@ -95,9 +93,8 @@ void RunEitherPlot(PlotOptions& options, bool formGiven)
         RunPlot(options);
         return;
     }
-    if (formGiven && !options.selection.asPaths) {
+    if (formGiven && !options.selection.asPaths)
         throw UserError("--motion", "draws paths, so it can't go with --as plain");
-    }
     options.selection.asPaths = true;
     RunMotionPlot(options);
 }
@@ -123,12 +120,8 @@ void AddPlot(CLI::App& app, PlotOptions& options)
 // A project is known by how it begins, whatever its name is.
 kfshost::Scene ReadScene(Selection const& selection)
 {
-    if (!kfshost::IsProjectFile(selection.file)) {
-        return kfshost::ImportFile(selection.file, {selection.timeScale});
-    }
-    if (selection.timeScale != 0) {
-        throw UserError("--time-scale", "a project has the times with which it was imported");
-    }
+    if (!kfshost::IsProjectFile(selection.file)) return kfshost::ImportFile(selection.file, {selection.timeScale});
+    if (selection.timeScale != 0) throw UserError("--time-scale", "a project has the times with which it was imported");
     return kfshost::TakeScene(kfshost::LoadProject(selection.file));
 }
 
@@ -166,14 +159,11 @@ int Parse(CLI::App& app, int argc, char** argv)
 
 kfshost::Scene LoadScene(Selection const& selection)
 {
-    if (selection.roving && !selection.asPaths) {
+    if (selection.roving && !selection.asPaths)
         throw UserError("--rove", "only paths have keys that can float: add --as spatial");
-    }
     try {
         kfshost::Scene scene = ReadScene(selection);
-        if (selection.asPaths) {
-            HoldAsPaths(scene, selection);
-        }
+        if (selection.asPaths) HoldAsPaths(scene, selection);
         return scene;
     } catch (kfshost::ImportError const& error) {
         throw UserError(selection.file, error.what());

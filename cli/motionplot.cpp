@@ -72,9 +72,8 @@ public:
     {
         for (MotionSegment const& segment : samples.segments) {
             hasJumps = hasJumps || segment.isJump;
-            for (std::size_t i = 1; i < segment.route.size(); ++i) {
+            for (std::size_t i = 1; i < segment.route.size(); ++i)
                 (segment.isJump ? jumped : length) += DistanceBetween(segment.route[i - 1], segment.route[i]);
-            }
         }
     }
 
@@ -116,11 +115,8 @@ Rational DotStep(Motion const& motion, Rational const& fps, double unitsPerPixel
     double const room =
         std::clamp(motion.length / unitsPerPixel / LeastDotDistance, motion.hasJumps ? MostDots : 1.0, MostDots);
     std::int64_t frames = 1;
-    for (std::int64_t const factor : {2, 5, 10, 20, 50, 100, 200, 500, 1000, 10000, 100000}) {
-        if (seconds * fps.ToDouble() / static_cast<double>(frames) > room) {
-            frames = factor;
-        }
-    }
+    for (std::int64_t const factor : {2, 5, 10, 20, 50, 100, 200, 500, 1000, 10000, 100000})
+        if (seconds * fps.ToDouble() / static_cast<double>(frames) > room) frames = factor;
     return Rational(frames, 1) / fps;
 }
 
@@ -131,9 +127,8 @@ std::vector<Place> Dots(Motion const& motion, Rational const& step)
     Rational const last = kfshost::KeyTime(stream, kfshost::KeyCount(stream) - 1);
     Rational const steps = (last - first) / step;
     std::vector<Rational> times;
-    for (std::int64_t i = 0; i <= steps.Numerator() / steps.Denominator(); ++i) {
+    for (std::int64_t i = 0; i <= steps.Numerator() / steps.Denominator(); ++i)
         times.push_back(first + Rational(i, 1) * step);
-    }
     return PlacesAt(motion.item, times);
 }
 
@@ -157,9 +152,7 @@ public:
 
     std::string Draw()
     {
-        for (StreamItem const* item : shown_) {
-            DrawMotion(*item);
-        }
+        for (StreamItem const* item : shown_) DrawMotion(*item);
         return svg_.Finish(DrawingWidth, top_);
     }
 
@@ -173,9 +166,8 @@ private:
         MotionLayout const layout = LayOutViews(motion.Box(), top_);
         Rational const step = DotStep(motion, fps_, layout.unitsPerPixel);
         std::vector<Place> const dots = Dots(motion, step);
-        for (PlacedView const& view : layout.views) {
+        for (PlacedView const& view : layout.views)
             DrawView(view, motion, dots, motion.KeyDistance(layout.unitsPerPixel));
-        }
         DrawLegend(motion, step, motion.KeyDistance(layout.unitsPerPixel));
         top_ += layout.height + SpeedGap;
         DrawSpeed(motion);
@@ -189,28 +181,19 @@ private:
         view.panel->DrawLabelsBelow(svg_, axes[view.view.right]);
         for (MotionSegment const& segment : motion.samples.segments) {
             std::vector<Point> route;
-            for (Place const& place : segment.route) {
-                route.push_back(view.At(place));
-            }
+            for (Place const& place : segment.route) route.push_back(view.At(place));
             svg_.Polyline(route, segment.isJump ? JumpPen : Pen{RouteColor, 3.0});
         }
-        if (keyDistance >= LeastTangentDistance) {
-            DrawTangents(view, motion);
-        }
-        for (Place const& dot : dots) {
-            DrawDot(svg_, view.At(dot));
-        }
+        if (keyDistance >= LeastTangentDistance) DrawTangents(view, motion);
+        for (Place const& dot : dots) DrawDot(svg_, view.At(dot));
         DrawKeys(view, motion, keyDistance);
     }
 
     void DrawTangents(PlacedView const& view, Motion const& motion)
     {
         for (MotionKey const& key : motion.samples.keys) {
-            for (Place const& end : {key.inEnd, key.outEnd}) {
-                if (end != key.place) {
-                    DrawTangent(svg_, view.At(key.place), view.At(end));
-                }
-            }
+            for (Place const& end : {key.inEnd, key.outEnd})
+                if (end != key.place) DrawTangent(svg_, view.At(key.place), view.At(end));
         }
     }
 
@@ -222,27 +205,21 @@ private:
         std::vector<Note> notes;
         for (std::size_t i = 0; i < keys.size(); ++i) {
             bool const isEnd = i == 0 || i + 1 == keys.size();
-            if (!isEnd && keyDistance < LeastKeyDistance) {
-                continue;
-            }
+            if (!isEnd && keyDistance < LeastKeyDistance) continue;
             Point const at = view.At(keys[i].place);
             DrawMark(keys[i], at, std::clamp(keyDistance / 3, 5.0, 7.0));
-            if (isEnd || timesFit) {
-                AddNote(notes, at, TimeOf(keys[i]));
-            }
+            if (isEnd || timesFit) AddNote(notes, at, TimeOf(keys[i]));
         }
-        for (Note const& note : notes) {
+        for (Note const& note : notes)
             svg_.Text({note.at.x, note.at.y + 21}, note.text, {12.0, "#333333", Anchor::Middle, false, true});
-        }
     }
 
     void DrawMark(MotionKey const& key, Point at, double radius)
     {
-        if (key.floats) {
+        if (key.floats)
             DrawFloatKey(svg_, at);
-        } else {
+        else
             DrawKey(svg_, at, radius);
-        }
     }
 
     struct Note {
@@ -278,41 +255,37 @@ private:
             svg_.Text({left + 42, y + 4.5}, text, {13.0, "#222222"});
             y += 24;
         };
-        if (motion.length > 0.0) {
+        if (motion.length > 0.0)
             line("route", [&](Point at) { svg_.Line({at.x - 16, at.y}, {at.x + 16, at.y}, {RouteColor, 3.0}); });
-        }
-        if (motion.hasJumps) {
-            line("jump", [&](Point at) { svg_.Line({at.x - 16, at.y}, {at.x + 16, at.y}, JumpPen); });
-        }
+        if (motion.hasJumps)
+            line(
+                "jump",
+                [&](Point at) {
+                    svg_.Line({at.x - 16, at.y}, {at.x + 16, at.y}, JumpPen);
+                });
         line(fmt::format("every {} s", TimeText(step)), [&](Point at) { DrawDot(svg_, at); });
         bool const drawn = keyDistance >= LeastKeyDistance;
         line(drawn ? "key" : "first, last key", [&](Point at) { DrawKey(svg_, at, 6.0); });
-        if (drawn && kfshost::FloatKeyCount(*motion.item.stream) > 0) {
+        if (drawn && kfshost::FloatKeyCount(*motion.item.stream) > 0)
             line("float key", [&](Point at) { DrawFloatKey(svg_, at); });
-        }
-        if (keyDistance >= LeastTangentDistance && std::ranges::any_of(motion.samples.keys, HasTangents)) {
+        if (keyDistance >= LeastTangentDistance && std::ranges::any_of(motion.samples.keys, HasTangents))
             line("tangent", [&](Point at) { DrawTangent(svg_, {at.x - 14, at.y}, {at.x + 14, at.y}); });
-        }
         svg_.Text({left, y + 16}, fmt::format("{} keys", motion.samples.keys.size()), {13.0, "#666666"});
-        if (motion.length > 0.0) {
+        if (motion.length > 0.0)
             svg_.Text({left, y + 36}, fmt::format("{:.4g} units long", motion.length), {13.0, "#666666"});
-        }
     }
 
     void DrawSpeed(Motion const& motion)
     {
         double highest = 0.0;
-        for (Point const& point : motion.samples.speed) {
-            highest = std::max(highest, point.y);
-        }
+        for (Point const& point : motion.samples.speed) highest = std::max(highest, point.y);
         Axis const speeds(0.0, highest == 0.0 ? 1.0 : highest * 1.1, 6);
         Panel const panel({PanelLeft, top_, PanelRight - PanelLeft, SpeedHeight}, time_, speeds);
         panel.DrawFrame(svg_, "speed along the path, distance a second");
         panel.DrawLabelsBelow(svg_, unit_.name);
         std::vector<Point> line;
-        for (Point const& point : motion.samples.speed) {
+        for (Point const& point : motion.samples.speed)
             line.push_back({panel.X(point.x * unit_.perSecond), panel.Y(point.y)});
-        }
         svg_.Polyline(line, {SpeedColor, 2.0});
         auto const& keys = motion.samples.keys;
         double const room = (PanelRight - PanelLeft) / static_cast<double>(keys.size());
@@ -339,8 +312,6 @@ void RunMotionPlot(PlotOptions const& options)
     std::erase_if(items, [](StreamItem const* item) {
         return !item->stream->IsSpatial() || kfshost::KeyCount(*item->stream) == 0;
     });
-    if (items.empty()) {
-        throw UserError(options.selection.file, "the chosen streams have no keys to draw");
-    }
+    if (items.empty()) throw UserError(options.selection.file, "the chosen streams have no keys to draw");
     WriteWholeFile(options.output, MotionPlot(options, scene, items).Draw());
 }

@@ -23,9 +23,7 @@ std::array<std::size_t, 3> AxesOf(StreamItem const& item)
     std::array<bool, 3> taken{};
     for (std::size_t d = 0; d < item.components.size(); ++d) {
         std::size_t const letter = std::string_view("xyzXYZ").find(item.components[d].front());
-        if (letter == std::string_view::npos || taken[letter % 3]) {
-            return {0, 1, 2};
-        }
+        if (letter == std::string_view::npos || taken[letter % 3]) return {0, 1, 2};
         axes[d] = letter % 3;
         taken[letter % 3] = true;
     }
@@ -41,9 +39,7 @@ public:
         int const keys = kfshost::KeyCount(stream_);
         for (int i = 0; i < keys; ++i) {
             AddKey(i);
-            if (i > 0) {
-                AddSegment(static_cast<std::size_t>(i), pointsPerSecond);
-            }
+            if (i > 0) AddSegment(static_cast<std::size_t>(i), pointsPerSecond);
         }
         return std::move(samples_);
     }
@@ -59,9 +55,7 @@ private:
     Place ToPlace(double const* row) const
     {
         Place place{};
-        for (std::size_t d = 0; d < item_.components.size(); ++d) {
-            place[axes_[d]] = row[d];
-        }
+        for (std::size_t d = 0; d < item_.components.size(); ++d) place[axes_[d]] = row[d];
         return place;
     }
 
@@ -103,15 +97,12 @@ private:
     static std::vector<Place> Route(MotionKey const& from, MotionKey const& to)
     {
         constexpr int pieces = 48;
-        if (from.outEnd == from.place && to.inEnd == to.place) {
-            return {from.place, to.place};
-        }
+        if (from.outEnd == from.place && to.inEnd == to.place) return {from.place, to.place};
         Place points[] = {from.place, from.outEnd, to.inEnd, to.place};
         CRV_Curve const curve{3, points[0].data(), points[1].data(), points[2].data(), points[3].data()};
         std::vector<Place> route(pieces + 1);
-        for (int i = 0; i <= pieces; ++i) {
+        for (int i = 0; i <= pieces; ++i)
             ThrowIfFailed(CRV_EvaluatePoint(&curve, route[static_cast<std::size_t>(i)].data(), i / double{pieces}));
-        }
         return route;
     }
 
@@ -131,13 +122,9 @@ private:
             double const from = static_cast<double>(unitsBefore) / scale;
             double const to = static_cast<double>(units) / scale;
             double const speed = DistanceBetween(before, place) / (to - from);
-            if (i == 1) {
-                samples_.speed.push_back({from, speed});
-            }
+            if (i == 1) samples_.speed.push_back({from, speed});
             samples_.speed.push_back({(from + to) / 2, speed});
-            if (i == pieces) {
-                samples_.speed.push_back({to, speed});
-            }
+            if (i == pieces) samples_.speed.push_back({to, speed});
             before = place;
             unitsBefore = units;
         }
@@ -165,17 +152,13 @@ std::vector<Place> PlacesAt(StreamItem const& item, std::vector<Rational> const&
 {
     Sampler const sampler(item);
     std::vector<Place> places;
-    for (Rational const& time : times) {
-        places.push_back(sampler.Read(time));
-    }
+    for (Rational const& time : times) places.push_back(sampler.Read(time));
     return places;
 }
 
 double DistanceBetween(Place const& a, Place const& b)
 {
     double squares = 0.0;
-    for (std::size_t i = 0; i < 3; ++i) {
-        squares += (b[i] - a[i]) * (b[i] - a[i]);
-    }
+    for (std::size_t i = 0; i < 3; ++i) squares += (b[i] - a[i]) * (b[i] - a[i]);
     return std::sqrt(squares);
 }

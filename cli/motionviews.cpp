@@ -38,9 +38,7 @@ public:
             extent_[i] = extents.high[i] - extents.low[i];
         }
         least_ = size == 0.0 ? 1.0 : size * LeastShare;
-        if (!std::isfinite(size * 4)) {
-            throw UserError("plot", "the numbers are too large to draw");
-        }
+        if (!std::isfinite(size * 4)) throw UserError("plot", "the numbers are too large to draw");
     }
 
     MotionLayout Run()
@@ -49,11 +47,10 @@ public:
         std::size_t const order[] = {2, 0, 1};
         std::size_t const smallest =
             *std::ranges::min_element(order, {}, [this](std::size_t axis) { return extent_[axis]; });
-        if (extent_[smallest] <= NotableShare * *std::ranges::max_element(extent_)) {
+        if (extent_[smallest] <= NotableShare * *std::ranges::max_element(extent_))
             PlaceOne(smallest == 2 ? Front : smallest == 0 ? Side : Above);
-        } else {
+        else
             PlaceThree();
-        }
         return std::move(layout_);
     }
 

@@ -34,16 +34,14 @@ std::string Plural(std::size_t count, std::string_view one, std::string_view man
 void RefuseToOverwrite(std::string const& input, std::string const& output)
 {
     std::error_code ignored;
-    if (output != "-" && std::filesystem::equivalent(input, output, ignored)) {
+    if (output != "-" && std::filesystem::equivalent(input, output, ignored))
         throw UserError("-o", '"' + output + "\" is the file that is read");
-    }
 }
 
 void WriteToStandardOutput(std::string_view text)
 {
-    if (std::fwrite(text.data(), 1, text.size(), stdout) != text.size() || std::fflush(stdout) != 0) {
+    if (std::fwrite(text.data(), 1, text.size(), stdout) != text.size() || std::fflush(stdout) != 0)
         Fail("standard output");
-    }
 }
 
 void WriteWholeFile(std::string const& fileName, std::string_view text)
@@ -57,15 +55,11 @@ void WriteWholeFile(std::string const& fileName, std::string_view text)
     bool const isDevice = std::filesystem::exists(status) && !std::filesystem::is_regular_file(status);
     std::string const target = isDevice ? fileName : fileName + ".part" + std::to_string(getpid());
     std::FILE* const file = std::fopen(target.c_str(), "wb");
-    if (!file) {
-        Fail(fileName);
-    }
+    if (!file) Fail(fileName);
     bool const written = WriteAndClose(file, text);
     if (isDevice ? !written : !written || std::rename(target.c_str(), fileName.c_str()) != 0) {
         int const reason = errno;
-        if (!isDevice) {
-            std::remove(target.c_str());
-        }
+        if (!isDevice) std::remove(target.c_str());
         errno = reason;
         Fail(fileName);
     }

@@ -2,9 +2,7 @@
 
 TimeUnit MakeTimeUnit(PlotOptions const& options)
 {
-    if (!options.inFrames) {
-        return {"seconds", 1.0, 0.0};
-    }
+    if (!options.inFrames) return {"seconds", 1.0, 0.0};
     auto const fps = ParseFps(options.fps);
     return {"frames at " + fps.ToString() + " a second", fps.ToDouble(), 1.0};
 }
@@ -20,13 +18,9 @@ Axis MakeTimeAxis(TimeUnit const& unit, std::vector<kfshost::StreamItem const*> 
 std::string ShortenedPath(std::string const& path)
 {
     constexpr std::size_t most = 110;
-    if (path.size() <= most) {
-        return path;
-    }
+    if (path.size() <= most) return path;
     std::size_t start = path.size() - most;
-    while ((static_cast<unsigned char>(path[start]) & 0xC0) == 0x80) {
-        ++start;
-    }
+    while ((static_cast<unsigned char>(path[start]) & 0xC0) == 0x80) ++start;
     return "..." + path.substr(start);
 }
 
@@ -53,9 +47,7 @@ void Panel::DrawFrame(Svg& svg, std::string const& caption) const
     Pen const grid{"#e4e4e4"};
     double const right = box_.left + box_.width;
     svg.Rectangle({box_.left, box_.top}, box_.width, box_.height, "#fcfcfc", {"none"});
-    for (double const tick : horizontal_.Ticks()) {
-        svg.Line({X(tick), box_.top}, {X(tick), Bottom()}, grid);
-    }
+    for (double const tick : horizontal_.Ticks()) svg.Line({X(tick), box_.top}, {X(tick), Bottom()}, grid);
     for (double const tick : vertical_.Ticks()) {
         bool const isZero = vertical_.Label(tick) == vertical_.Label(0.0);
         svg.Line({box_.left, Y(tick)}, {right, Y(tick)}, isZero ? Pen{"#b4b4b4"} : grid);

@@ -42,16 +42,15 @@ using CurvePoints = std::vector<Point> ComponentCurve::*;
 
 bool Coincide(std::vector<Point> const& a, std::vector<Point> const& b)
 {
-    return std::ranges::equal(a, b, [](Point const& p, Point const& q) { return p.x == q.x && p.y == q.y; });
+    return std::ranges::equal(
+        a, b, [](Point const& p, Point const& q) { return p.x == q.x && p.y == q.y; });
 }
 
 // The first component whose curve is the same as that of `component`, which may be itself.
 std::size_t FirstAlike(StreamCurves const& curves, std::size_t component, CurvePoints points)
 {
     std::size_t d = 0;
-    while (!Coincide(curves.components[d].*points, curves.components[component].*points)) {
-        ++d;
-    }
+    while (!Coincide(curves.components[d].*points, curves.components[component].*points)) ++d;
     return d;
 }
 
@@ -59,9 +58,8 @@ std::size_t FirstAlike(StreamCurves const& curves, std::size_t component, CurveP
 std::size_t CountAlike(StreamCurves const& curves, std::size_t component, CurvePoints points)
 {
     std::size_t count = 0;
-    for (std::size_t d = 0; d < component; ++d) {
+    for (std::size_t d = 0; d < component; ++d)
         count += Coincide(curves.components[d].*points, curves.components[component].*points) ? 1 : 0;
-    }
     return count;
 }
 
@@ -160,17 +158,11 @@ private:
     static Range Extent(StreamCurves const& curves, CurvePoints points)
     {
         Range range{HUGE_VAL, -HUGE_VAL};
-        for (ComponentCurve const& curve : curves.components) {
-            for (Point const& point : curve.*points) {
+        for (ComponentCurve const& curve : curves.components)
+            for (Point const& point : curve.*points)
                 range = {std::min(range.low, point.y), std::max(range.high, point.y)};
-            }
-        }
-        if (range.low > range.high) {
-            return {0.0, 0.0};
-        }
-        if (!std::isfinite(range.high - range.low)) {
-            throw UserError("plot", "the numbers are too large to draw");
-        }
+        if (range.low > range.high) return {0.0, 0.0};
+        if (!std::isfinite(range.high - range.low)) throw UserError("plot", "the numbers are too large to draw");
         return range;
     }
 
@@ -178,11 +170,8 @@ private:
     static Axis ValueAxis(StreamCurves const& curves, bool withHandles)
     {
         Range range = Extent(curves, &ComponentCurve::value);
-        for (Handle const& handle : curves.handles) {
-            if (withHandles) {
-                range = {std::min(range.low, handle.end.y), std::max(range.high, handle.end.y)};
-            }
-        }
+        for (Handle const& handle : curves.handles)
+            if (withHandles) range = {std::min(range.low, handle.end.y), std::max(range.high, handle.end.y)};
         double const size = std::max(std::abs(range.low), std::abs(range.high));
         range = WithAir(range, 0.07, size == 0.0 ? 1.0 : size * LeastShare);
         return {range.low, range.high, 9};
@@ -217,9 +206,7 @@ private:
         std::vector<Point> placed;
         for (std::size_t d = 0; d < curves.components.size(); ++d) {
             placed.clear();
-            for (Point const& point : curves.components[d].*points) {
-                placed.push_back(Place(panel, point));
-            }
+            for (Point const& point : curves.components[d].*points) placed.push_back(Place(panel, point));
             svg_.Polyline(placed, CurvePen(item, curves, d, points));
         }
     }
@@ -236,16 +223,12 @@ private:
             }
         }
         double const spacing = PixelsPerKey(curves);
-        if (spacing < 4.0) {
-            return;
-        }
+        if (spacing < 4.0) return;
         drewKeys_ = true;
         double const radius = std::clamp(spacing / 5, 2.5, 5.5);
-        for (std::size_t d = 0; d < curves.components.size(); ++d) {
-            for (Point const& key : curves.components[d].keys) {
+        for (std::size_t d = 0; d < curves.components.size(); ++d)
+            for (Point const& key : curves.components[d].keys)
                 svg_.Diamond(Place(panel, key), radius, ColorOf(item, d), {"#ffffff", radius / 5});
-            }
-        }
     }
 
     void DrawLegend(StreamItem const& item, StreamCurves const& curves, double top)
@@ -281,8 +264,6 @@ void RunPlot(PlotOptions const& options)
     kfshost::Scene const scene = LoadScene(options.selection);
     auto items = SelectStreams(scene, options.selection);
     std::erase_if(items, [](StreamItem const* item) { return kfshost::KeyCount(*item->stream) == 0; });
-    if (items.empty()) {
-        throw UserError(options.selection.file, "the chosen streams have no keys to draw");
-    }
+    if (items.empty()) throw UserError(options.selection.file, "the chosen streams have no keys to draw");
     WriteWholeFile(options.output, Plot(options, scene, items).Draw());
 }

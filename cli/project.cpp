@@ -21,16 +21,13 @@ constexpr int FoundCode = 1;
 
 void RunImport(ProjectOptions const& options)
 {
-    if (options.output == "-") {
-        throw UserError("-o", "a project goes into a file, not to the standard output");
-    }
+    if (options.output == "-") throw UserError("-o", "a project goes into a file, not to the standard output");
     RefuseToOverwrite(options.file, options.output);
     try {
         kfshost::Scene scene = kfshost::ImportFile(options.file, {options.timeScale});
         std::size_t keys = 0;
-        for (kfshost::StreamItem const& item : scene.streams) {
+        for (kfshost::StreamItem const& item : scene.streams)
             keys += static_cast<std::size_t>(kfshost::KeyCount(*item.stream));
-        }
         std::string const summary =
             fmt::format("{}: {}, {}\n", options.output, Plural(scene.streams.size(), "stream", "streams"),
                         Plural(keys, "key", "keys"));
@@ -58,9 +55,7 @@ void RunDump(ProjectOptions const& options)
     try {
         kfshost::ChunkDump const dump = kfshost::DumpChunks(options.file);
         WriteToStandardOutput(dump.text);
-        if (dump.problems > 0) {
-            throw CLI::RuntimeError(FoundCode);
-        }
+        if (dump.problems > 0) throw CLI::RuntimeError(FoundCode);
     } catch (kfshost::ImportError const& error) {
         throw UserError(options.file, error.what());
     }
@@ -74,9 +69,7 @@ void RunDiff(ProjectOptions const& options)
     after.file = options.other;
     std::string const text = DifferencesOf(LoadScene(before), LoadScene(after));
     WriteToStandardOutput(text);
-    if (!text.empty()) {
-        throw CLI::RuntimeError(FoundCode);
-    }
+    if (!text.empty()) throw CLI::RuntimeError(FoundCode);
 }
 
 }  // namespace

@@ -29,12 +29,9 @@ void HoldAsPath(StreamItem& item, Selection const& selection)
         throw UserError(selection.file + ": " + item.path,
                         "steps from key to key, so there is no way on which keys could rove");
     }
-    if (!item.stream->IsSpatial()) {  // a project may hold it as a path already
+    if (!item.stream->IsSpatial())  // a project may hold it as a path already
         item.stream = kfshost::MakePath(item);
-    }
-    if (selection.roving) {
-        kfshost::LetInnerKeysFloat(*item.stream);
-    }
+    if (selection.roving) kfshost::LetInnerKeysFloat(*item.stream);
 }
 
 }  // namespace
@@ -42,14 +39,9 @@ void HoldAsPath(StreamItem& item, Selection const& selection)
 std::vector<StreamItem const*> SelectStreams(kfshost::Scene const& scene, Selection const& selection)
 {
     std::vector<StreamItem const*> items;
-    for (StreamItem const& item : scene.streams) {
-        if (Matches(item, selection)) {
-            items.push_back(&item);
-        }
-    }
-    if (scene.streams.empty()) {
-        throw UserError(selection.file, "nothing is animated");
-    }
+    for (StreamItem const& item : scene.streams)
+        if (Matches(item, selection)) items.push_back(&item);
+    if (scene.streams.empty()) throw UserError(selection.file, "nothing is animated");
     if (items.empty()) {
         throw UserError(selection.file,
                         fmt::format("--stream {}: none of the {} streams has such a path (kfs info lists them)",
@@ -81,9 +73,7 @@ std::optional<TimeSpan> SpanOf(std::vector<StreamItem const*> const& items)
     std::optional<TimeSpan> span;
     for (StreamItem const* item : items) {
         int const keys = kfshost::KeyCount(*item->stream);
-        if (keys == 0) {
-            continue;
-        }
+        if (keys == 0) continue;
         TimeSpan const own{kfshost::KeyTime(*item->stream, 0), kfshost::KeyTime(*item->stream, keys - 1)};
         span = span ? TimeSpan{std::min(span->first, own.first), std::max(span->last, own.last)} : own;
     }

@@ -24,12 +24,8 @@ std::string Escape(std::string_view text)
 std::string Stroke(Pen const& pen)
 {
     std::string text = fmt::format("stroke=\"{}\" stroke-width=\"{}\"", pen.color, pen.width);
-    if (!pen.dashes.empty()) {
-        text += fmt::format(" stroke-dasharray=\"{}\"", pen.dashes);
-    }
-    if (pen.opacity < 1.0) {
-        text += fmt::format(" stroke-opacity=\"{}\"", pen.opacity);
-    }
+    if (!pen.dashes.empty()) text += fmt::format(" stroke-dasharray=\"{}\"", pen.dashes);
+    if (pen.opacity < 1.0) text += fmt::format(" stroke-opacity=\"{}\"", pen.opacity);
     return text;
 }
 
@@ -68,13 +64,9 @@ void Svg::Line(Point from, Point to, Pen const& pen)
 
 void Svg::Polyline(std::span<Point const> points, Pen const& pen)
 {
-    if (points.size() < 2) {
-        return;
-    }
+    if (points.size() < 2) return;
     text_ += "<polyline points=\"";
-    for (Point const& point : points) {
-        fmt::format_to(std::back_inserter(text_), "{:.2f},{:.2f} ", point.x, point.y);
-    }
+    for (Point const& point : points) fmt::format_to(std::back_inserter(text_), "{:.2f},{:.2f} ", point.x, point.y);
     text_.back() = '"';
     fmt::format_to(std::back_inserter(text_), " fill=\"none\" stroke-linejoin=\"round\" {}/>\n", Stroke(pen));
 }

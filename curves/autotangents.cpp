@@ -165,9 +165,8 @@ int SetPathTangents(KFS_Stream const* stream, int time, KFS_KeyScalar* key)
 {
     Surroundings around;
     if (int const code = KFSp_GetNeighborsFromTime(stream, time, 1, &around.at, &around.prev, &around.next, nullptr,
-                                                   nullptr, nullptr)) {
+                                                   nullptr, nullptr))
         return code;
-    }
     short const dimension = stream->GetDimension();
     auto const valueOf = [](KFS_KeyScalar const* source) { return source ? KFSp_Numbers(source) : nullptr; };
     double const* const farIn = around.prev ? KFSp_GetSpatialRuns(around.prev, dimension).inTangent : nullptr;
@@ -191,9 +190,8 @@ int SetTangents(KFS_Stream const* stream, KFS_StreamKeyData const* data, int tim
 {
     Surroundings around;
     if (int const code = KFSp_GetNeighborsFromTime(stream, time, 0, &around.at, &around.prev, &around.next,
-                                                   &around.prevIndex, &around.nextIndex, &around.atIndex)) {
+                                                   &around.prevIndex, &around.nextIndex, &around.atIndex))
         return code;
-    }
     bool const temporal = (mode & KFSp_Tangents_Temporal) != 0;
     if (!stream->IsSpatial()) {
         if (temporal) SetPlainHandles(stream, around, key);
@@ -207,9 +205,8 @@ int SetTangents(KFS_Stream const* stream, KFS_StreamKeyData const* data, int tim
 
 bool Coincide(int dimension, double const* a, double const* b)
 {
-    for (int i = 0; i < dimension; ++i) {
+    for (int i = 0; i < dimension; ++i)
         if (!(std::fabs(a[i] - b[i]) < Coincidence)) return false;
-    }
     return true;
 }
 
@@ -219,9 +216,8 @@ int KFSp_SetDefaultKeyframeTangents(KFS_Stream const* stream, int time, char mod
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_SetDefaultTangents, stream, KFSp_Row_SetTangents)) return code;
     KFS_StreamKeyData const* const data = stream->GetKeyData();
-    if (stream->HasNoKeys() || KFSp_ItemCount(data) == 0) {
+    if (stream->HasNoKeys() || KFSp_ItemCount(data) == 0)
         return KFSp_ReportErr(KFSp_Op_SetDefaultTangents, KFS_Err_NoKeys, KFSp_Row_SetTangents);
-    }
     // While a custom stream carries a plain description its records still hold the client's bytes.
     bool const custom = stream->IsCustom() || stream->IsTemporarilyNonCustom();
     if (custom && !stream->IsSpatial()) return 0;

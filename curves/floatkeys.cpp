@@ -61,9 +61,7 @@ bool FloatRun::Begin(int index, int* code)
     *code = KFSp_GetNeighborsFromIndex(stream_, index, 0, &prev_, &next_, &prevIndex_, &nextIndex_);
     if (*code != 0 || !prev_ || !next_ || nextIndex_ - prevIndex_ < 2) return false;
     *code = KFSp_SumArcs(data_, prevIndex_, nextIndex_, &total_);
-    if (*code == 0) {
-        *code = BuildGraph();
-    }
+    if (*code == 0) *code = BuildGraph();
     return *code == 0;
 }
 
@@ -155,9 +153,7 @@ int FloatRun::PlaceKey(int index, KFS_KeyScalar* key, double s)
     bool const isSettledBefore = settledIndex_ == index - 1;
     int const code = isSettledBefore && time <= settledTime_ ? 0 : MakeFree(index, &time);
     // Until the whole run has its times the list isn't in order, and the lookup may miss the key before.
-    if (isSettledBefore && time <= settledTime_) {
-        time = KFSp_TimeDifference(settledTime_, -1);
-    }
+    if (isSettledBefore && time <= settledTime_) time = KFSp_TimeDifference(settledTime_, -1);
     KFSp_RetimeKey(data_, index, key, time);
     settledIndex_ = index;
     settledTime_ = time;
@@ -189,11 +185,10 @@ int PlaceFloatKeys(KFS_Stream const* stream, int first, int last)
         if (!KFSp_Floats(key)) continue;
         int code = KFSp_CheckPathDimension(stream);
         FloatRun run(stream, data);
-        if (code == 0 && run.Begin(i, &code)) {
+        if (code == 0 && run.Begin(i, &code))
             code = run.Place(i, last, &i);
-        } else if (code == 0) {
+        else if (code == 0)
             i = run.Last();
-        }
         if (code != 0) return code;
     }
     return 0;

@@ -55,9 +55,8 @@ void StoreTangent(KFSp_Handles<double> const& handles, KFSp_Side side, Given con
 
 void ForbidFalling(KFSp_Handles<double> const& handles)
 {
-    for (int i = 0; i < handles.count; ++i) {
+    for (int i = 0; i < handles.count; ++i)
         if (handles.speed[i] < 0.0) handles.speed[i] = 0.0;
-    }
 }
 
 // The influence that keeps a handle's length in the graph when its speed changes.
@@ -132,9 +131,8 @@ int KFS_SetKeyTangentsF(KFS_Stream* stream, int index, double const* inX, double
                         double const* outY, double yScale)
 {
     if (int const code = KFSp_CheckHandleAccess(stream, {KFSp_Op_SetKeyTangents, KFSp_Row_GetValue},
-                                                {KFSp_Op_GetKeyTangents, KFSp_Row_GetValue})) {
+                                                {KFSp_Op_GetKeyTangents, KFSp_Row_GetValue}))
         return code;
-    }
     KFSp_FirstError error;
     if (stream->HasKeys()) {
         // Durations and the other side's handle may be derived.

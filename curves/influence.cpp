@@ -71,9 +71,8 @@ int RefuseCustom()
 int KFS_SetKeyInfluence(KFS_Stream* stream, int index, double const* inInfluence, double const* outInfluence)
 {
     if (int const code = KFSp_CheckHandleAccess(stream, {KFSp_Op_SetKeyInfluence, KFSp_Row_AlterKey},
-                                                {KFSp_Op_SetKeyInfluence, KFSp_Row_InquireKey})) {
+                                                {KFSp_Op_SetKeyInfluence, KFSp_Row_InquireKey}))
         return code;
-    }
     KFSp_FirstError error;
     if (stream->HasKeys()) {
         KFSp_SettleAutomaticKey(stream, index);

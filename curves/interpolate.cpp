@@ -89,8 +89,9 @@ int EvaluateCurves(KFS_Stream const* stream, CurvedSegment const& segment, int f
 [[gnu::noinline, gnu::cold]] int EvaluateCurvedSlow(KFS_Stream const* stream, Segment keys, int time, int first,
                                                     double* result)
 {
-    return EvaluateCurves(stream, CurvedSegment(stream, keys, time), first, result,
-                          [](CRV_Curve const* curve, double* y, double x) { return CRV_EvaluateYFromX(curve, y, x); });
+    return EvaluateCurves(
+        stream, CurvedSegment(stream, keys, time), first, result,
+        [](CRV_Curve const* curve, double* y, double x) { return CRV_EvaluateYFromX(curve, y, x); });
 }
 
 // What isn't ordinary takes the long way, from the component on that isn't; so does what a treatment would change.
@@ -106,9 +107,8 @@ int EvaluateCurved(KFS_Stream const* stream, Segment keys, int time, double* res
         KFSp_TemporalHandles const handles = KFSp_GetTemporalHandles(a, b, segment.dt);
         bool const stands = !mayNotFall || CRVp_IsInside(a.value, handles.y1, handles.y2, b.value) ||
                             CRVp_IsInside(b.value, handles.y2, handles.y1, a.value);
-        if (!stands || !KFSp_SolveSegment(a, b, handles, u, &result[i])) [[unlikely]] {
+        if (!stands || !KFSp_SolveSegment(a, b, handles, u, &result[i])) [[unlikely]]
             return EvaluateCurvedSlow(stream, keys, time, i, result);
-        }
     }
     return 0;
 }

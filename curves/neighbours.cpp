@@ -235,9 +235,8 @@ int KFSp_ConstructCurve(KFS_Stream const* stream, int keyIndex, int time, int di
     KFSp_FirstError error;
     {
         KFSp_ScConstPin const pin(stream->GetKeys(), error);
-        if (error.None()) {
+        if (error.None())
             error.Keep(ConstructPinned(stream, keyIndex, time, dimensionIndex, relativeTime, spatial, isHold, curve));
-        }
     }
     return error.Code();
 }

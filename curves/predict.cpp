@@ -67,18 +67,14 @@ int ReachOfKey(Place const& place, Span* span)
         span->from = place.prev->time;
         if (IsAutomatic(place.stream, place.prev, place.prev->inInterp)) {
             error.Keep(NeighboursOf(place.stream, place.prevIndex, &before, &behind));
-            if (before) {
-                span->from = before->time;
-            }
+            if (before) span->from = before->time;
         }
     }
     if (place.next) {
         span->to = place.next->time;
         if (IsAutomatic(place.stream, place.next, place.next->outInterp)) {
             error.Keep(NeighboursOf(place.stream, place.nextIndex, &before, &behind));
-            if (behind) {
-                span->to = behind->time;
-            }
+            if (behind) span->to = behind->time;
         }
     }
     return error.Code();
@@ -86,16 +82,10 @@ int ReachOfKey(Place const& place, Span* span)
 
 int ReachOfSide(Place const& place, Reach reach, Span* span)
 {
-    if (!place.at) {
-        return KFSp_ReportRow(KFSp_Op_PredictInvalid, KFS_Err_NoControlPoint, KFSp_Row_NoControlPoint);
-    }
+    if (!place.at) return KFSp_ReportRow(KFSp_Op_PredictInvalid, KFS_Err_NoControlPoint, KFSp_Row_NoControlPoint);
     bool const bothSides = IsContinuous(place.stream, place.at);
-    if (place.prev && (reach == Reach::InSide || bothSides)) {
-        span->from = place.prev->time;
-    }
-    if (place.next && (reach == Reach::OutSide || bothSides)) {
-        span->to = place.next->time;
-    }
+    if (place.prev && (reach == Reach::InSide || bothSides)) span->from = place.prev->time;
+    if (place.next && (reach == Reach::OutSide || bothSides)) span->to = place.next->time;
     return 0;
 }
 
@@ -104,9 +94,8 @@ int FindReach(KFS_Stream const* stream, Reach reach, int time, Span* span)
     Place place{stream};
     if (int const code = KFSp_GetNeighborsFromTime(stream, time, 0, &place.at, &place.prev, &place.next,
                                                    &place.prevIndex, &place.nextIndex, nullptr);
-        code != 0) {
+        code != 0)
         return code;
-    }
     switch (reach) {
     case Reach::Key: return ReachOfKey(place, span);
     case Reach::InSide:
@@ -124,9 +113,8 @@ int Predict(KFS_Stream const* stream, unsigned short action, T_Time const* time,
     unsigned int const timeScale = stream->GetTimeScale();
     T_Time converted{time ? time->value : 0, timeScale};
     int const conversion = time ? T_ConvTime(time, timeScale, &converted, 0) : 0;
-    if (IsSpatialAction(action) && !stream->IsSpatial()) {
+    if (IsSpatialAction(action) && !stream->IsSpatial())
         return KFSp_ReportErr(KFSp_Op_PredictInvalid, KFS_Err_NotSpatial, KFSp_Row_PredictInvalid);
-    }
     KFS_StreamKeyData const* const data = stream->GetKeyData();
     if (stream->HasNoKeys() || KFSp_ItemCount(data) == 0) {
         *from = *to = T_Time{converted.value, timeScale};
@@ -141,9 +129,7 @@ int Predict(KFS_Stream const* stream, unsigned short action, T_Time const* time,
     Span span{converted.value, converted.value};
     {
         KFSp_ScConstPin const pin(data->keys, error);
-        if (error.None()) {
-            error.Keep(FindReach(stream, GetReach(action), converted.value, &span));
-        }
+        if (error.None()) error.Keep(FindReach(stream, GetReach(action), converted.value, &span));
     }
     if (error.None()) {
         *from = T_Time{span.from, timeScale};

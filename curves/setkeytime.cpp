@@ -64,21 +64,21 @@ int Pack(Move const& move, int first, int last, PlaceHolder&& placeHolder)
     for (int i = first; i <= last; ++i) {
         KFS_KeyScalar* key = nullptr;
         if (int const code = GetKey(move, i, &key); code != 0) return code;
-        if (KFSp_Floats(key)) {
-            KFSp_RetimeKey(move.data, i, key, placeHolder(i));
-        }
+        if (KFSp_Floats(key)) KFSp_RetimeKey(move.data, i, key, placeHolder(i));
     }
     return 0;
 }
 
 int PackBehind(Move const& move, Neighbours const& around, int last)
 {
-    return Pack(move, around.prevIndex + 1, last, [&](int i) { return around.prev->time + (i - around.prevIndex); });
+    return Pack(
+        move, around.prevIndex + 1, last, [&](int i) { return around.prev->time + (i - around.prevIndex); });
 }
 
 int PackAheadOf(Move const& move, Neighbours const& around, int first)
 {
-    return Pack(move, first, around.nextIndex - 1, [&](int i) { return around.next->time - (around.nextIndex - i); });
+    return Pack(
+        move, first, around.nextIndex - 1, [&](int i) { return around.next->time - (around.nextIndex - i); });
 }
 
 // A key between two others counts as inside whatever its target is.
@@ -104,20 +104,15 @@ int MakeRoomOutside(Move* move, int present)
     KFS_KeyScalar* at = nullptr;
     if (int const code = KFSp_GetNeighborsFromTime(move->stream, move->target, 0, &at, &around.prev, &around.next,
                                                    &around.prevIndex, &around.nextIndex, nullptr);
-        code != 0) {
+        code != 0)
         return code;
-    }
     if (around.prev && around.next) {
         int const code = move->target <= present ? PackBehind(*move, around, around.nextIndex - 1)
                                                  : PackAheadOf(*move, around, around.prevIndex + 1);
         if (code != 0) return code;
     }
-    if (around.prev) {
-        move->low = std::min(move->low, around.prevIndex);
-    }
-    if (around.next) {
-        move->high = std::max(move->high, around.nextIndex);
-    }
+    if (around.prev) move->low = std::min(move->low, around.prevIndex);
+    if (around.next) move->high = std::max(move->high, around.nextIndex);
     return 0;
 }
 
@@ -126,9 +121,8 @@ int MakeRoom(Move* move)
     Neighbours around;
     if (int const code = KFSp_GetNeighborsFromIndex(move->stream, move->index, 0, &around.prev, &around.next,
                                                     &around.prevIndex, &around.nextIndex);
-        code != 0) {
+        code != 0)
         return code;
-    }
     move->low = around.prev ? around.prevIndex : move->index;
     move->high = around.next ? around.nextIndex : move->index;
     KFS_KeyScalar* key = nullptr;
@@ -151,17 +145,13 @@ int Reinsert(Move* move)
     int const removed = KFSp_TakeKeyOut(move->stream, move->index, true);
     KFS_KeyScalar* const cache = move->data->cache;
     // What the record holds after a failure is the key only if the list has given it up.
-    if (!KFSp_CacheIsEmpty(cache)) {
-        cache->time = move->target;
-    }
+    if (!KFSp_CacheIsEmpty(cache)) cache->time = move->target;
     if (removed != 0) return removed;
     KFSp_FirstError error;
     error.Keep(KFSp_PutKeyFromCache(1, 1, 1, 1, move->stream, &move->newIndex));
     bool const inserted = error.None();
     error.Keep(Notify(move->stream));
-    if (inserted && error.None()) {
-        error.Keep(Notify(move->stream));
-    }
+    if (inserted && error.None()) error.Keep(Notify(move->stream));
     return error.Code();
 }
 
@@ -170,24 +160,19 @@ int MoveInList(Move* move)
     KFSp_FirstError error;
     {
         KFSp_ScPin const pin(move->data->keys, error);
-        if (error.None()) {
-            error.Keep(MakeRoom(move));
-        }
+        if (error.None()) error.Keep(MakeRoom(move));
     }
     if (!error.None()) return error.Code();
 
     bool const moves = move->old != move->target;
-    if (moves) {
+    if (moves)
         error.Keep(Reinsert(move));
-    } else {
+    else
         move->newIndex = move->index;
-    }
     auto const count = static_cast<short>(move->high - move->low + 2);
     error.Keep(move->stream->SetInvalid(move->high + 1, count));
     error.Keep(move->stream->SetArcInvalid(move->high + 1, count));
-    if (error.None()) {
-        error.Keep(KFSp_ClearCache(move->stream));
-    }
+    if (error.None()) error.Keep(KFSp_ClearCache(move->stream));
     return error.Code();
 }
 
@@ -209,26 +194,17 @@ int KFS_SetKeyTime(KFS_Stream* stream, int index, T_Time const* newTime, int new
     return KFSp_Boundary([&] {
         if (int const code = KFSp_CheckStream(KFSp_Op_SetKeyTime, stream, KFSp_Row_AlterKey); code != 0) return code;
         KFS_StreamKeyData* const data = stream->GetKeyDataForModify();
-        if (KFSp_HasNoValue(stream, data)) {
-            return KFSp_ReportErr(KFSp_Op_SetKeyTime, KFS_Err_NoKeys, KFSp_Row_AlterKey);
-        }
+        if (KFSp_HasNoValue(stream, data)) return KFSp_ReportErr(KFSp_Op_SetKeyTime, KFS_Err_NoKeys, KFSp_Row_AlterKey);
         Move move{stream, data, index, newTimeValue};
         if (newTime) {
             if (int const code = KFSp_TimeInStream(stream, newTime, &move.target); code != 0) return code;
         }
-        if (move.target == KFS_INVALID_INDEX) {  // as a record's time it says that there is no value
+        if (move.target == KFS_INVALID_INDEX)  // as a record's time it says that there is no value
             return KFSp_ReportErr(KFSp_Op_SetKeyTime, KFS_Err_TimeNotRepresentable, KFSp_Row_AlterKey);
-        }
         int const code = SetKeyTime(&move);
-        if (oldTime) {
-            *oldTime = T_Time{move.old, stream->GetTimeScale()};
-        }
-        if (newIndex) {
-            *newIndex = move.newIndex;
-        }
-        if (code == 0) {
-            stream->NotifyValueChanged();
-        }
+        if (oldTime) *oldTime = T_Time{move.old, stream->GetTimeScale()};
+        if (newIndex) *newIndex = move.newIndex;
+        if (code == 0) stream->NotifyValueChanged();
         return code;
     });
 }

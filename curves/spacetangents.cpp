@@ -39,9 +39,7 @@ void Mirror(double const* given, double* other, int dimension)
     for (int i = 0; i < dimension; ++i) {
         other[i] = -given[i];
         // Too small to be squared: the other tangent takes the given one's length.
-        if (givenSquare != 0.0) {
-            other[i] = other[i] * (1.0 / std::sqrt(givenSquare)) * std::sqrt(otherSquare);
-        }
+        if (givenSquare != 0.0) other[i] = other[i] * (1.0 / std::sqrt(givenSquare)) * std::sqrt(otherSquare);
     }
 }
 
@@ -51,12 +49,9 @@ int StoreTangents(KFS_Stream* stream, KFS_KeyScalar* key, short kind, void const
     KFS_CopyItemFunc const copy = stream->GetCopyItemFunc() ? stream->GetCopyItemFunc() : &KFSp_ConvertItemToFloat;
     KFSp_SpatialRuns<double> const runs = KFSp_GetSpatialRuns(key, stream->GetDimension());
     KFSp_FirstError error;
-    if (inTangent) {
-        error.Keep(copy(stream, stream->GetItemRefcon(), kind, inTangent, runs.inTangent));
-    }
-    if (outTangent && error.None()) {
+    if (inTangent) error.Keep(copy(stream, stream->GetItemRefcon(), kind, inTangent, runs.inTangent));
+    if (outTangent && error.None())
         error.Keep(copy(stream, stream->GetItemRefcon(), kind, outTangent, runs.outTangent));
-    }
     key->flags |= KFS_KeyFlag_TangentsSet;
 
     bool const one = (inTangent != nullptr) != (outTangent != nullptr);
@@ -99,9 +94,8 @@ int SetTangents(KFS_Stream* stream, int index, void const* inTangent, void const
         MarkEdited(stream, index, error);
         return error.Code();
     }
-    if (KFSp_ItemCount(data) == 0) {
+    if (KFSp_ItemCount(data) == 0)
         return KFSp_ReportErr(KFSp_Op_SetKeySpaceTangents, KFS_Err_NoKeys, KFSp_Row_AlterKey);
-    }
     if (int const code = RepairTangents(stream, data, index); code != 0) return code;
     error.Keep(KFSp_ClearCache(stream));
     {
@@ -126,9 +120,7 @@ int ChangeSpFlags(KFS_Stream* stream, int index, unsigned int mask, unsigned int
 {
     auto const change = [&](KFS_KeyScalar* key) {
         // What stands there in a record without the block are numbers of its value.
-        if (KFSp_HasSpatialBlock(key)) {
-            key->spFlags = (key->spFlags & ~mask) | (values & mask);
-        }
+        if (KFSp_HasSpatialBlock(key)) key->spFlags = (key->spFlags & ~mask) | (values & mask);
     };
     KFS_StreamKeyData* const data = stream->GetKeyDataForModify();
     if (stream->HasNoKeys()) {
@@ -138,9 +130,7 @@ int ChangeSpFlags(KFS_Stream* stream, int index, unsigned int mask, unsigned int
     KFSp_FirstError error;
     {
         KFSp_ScKey const key(data->keys, index, error);
-        if (key.get()) {
-            change(key.get());
-        }
+        if (key.get()) change(key.get());
     }
     return error.Code();
 }
@@ -158,9 +148,7 @@ int ChangeBits(KFS_Stream* stream, short operation, unsigned int mask, unsigned 
     if (int const code = CheckKeys(stream, operation, KFSp_Row_AlterKey, KFSp_Op_KeyFlags); code != 0) return code;
     KFSp_FirstError error;
     error.Keep(ChangeSpFlags(stream, index, mask, values));
-    if (stream->HasKeys()) {
-        error.Keep(KFSp_ClearCache(stream));
-    }
+    if (stream->HasKeys()) error.Keep(KFSp_ClearCache(stream));
     return error.Code();
 }
 
@@ -170,9 +158,8 @@ int GetTangents(KFS_Stream const* stream, int index, double* inTangent, double* 
         return code;
     if (int const code = CheckSpatial(stream, KFSp_Op_GetKeySpaceTangents); code != 0) return code;
     KFS_StreamKeyData const* const data = stream->GetKeyData();
-    if (KFSp_HasNoValue(stream, data)) {
+    if (KFSp_HasNoValue(stream, data))
         return KFSp_ReportErr(KFSp_Op_GetKeySpaceTangents, KFS_Err_NoKeys, KFSp_Row_GetValue);
-    }
     if (int const code = RefuseCustom(stream, KFSp_Op_GetKeySpaceTangents, KFSp_Row_ConvertFrom); code != 0)
         return code;
 
@@ -185,21 +172,16 @@ int GetTangents(KFS_Stream const* stream, int index, double* inTangent, double* 
     }
     int const dimension = stream->GetDimension();
     KFSp_SpatialRuns<double const> const runs = KFSp_GetSpatialRuns(key, dimension);
-    if (inTangent) {
-        std::copy_n(runs.inTangent, dimension, inTangent);
-    }
-    if (outTangent) {
-        std::copy_n(runs.outTangent, dimension, outTangent);
-    }
+    if (inTangent) std::copy_n(runs.inTangent, dimension, inTangent);
+    if (outTangent) std::copy_n(runs.outTangent, dimension, outTangent);
     return 0;
 }
 
 int GetSpFlags(KFS_Stream const* stream, int index, unsigned int* flags)
 {
     if (int const code = CheckKeys(stream, KFSp_Op_UnsetKeySpaceFlags, KFSp_Row_InquireKey, KFSp_Op_KeyFlags);
-        code != 0) {
+        code != 0)
         return code;
-    }
     KFS_StreamKeyData const* const data = stream->GetKeyData();
     if (stream->HasNoKeys()) {
         *flags = data->cache->flags;
@@ -214,28 +196,23 @@ int GetSpFlags(KFS_Stream const* stream, int index, unsigned int* flags)
 
 int StopAutomaticTangents(KFS_Stream* stream, int index)
 {
-    if (int const code = CheckKeys(stream, KFSp_Op_UnsetKeySpaceFlags, KFSp_Row_AlterKey, KFSp_Op_KeyFlags);
-        code != 0) {
+    if (int const code = CheckKeys(stream, KFSp_Op_UnsetKeySpaceFlags, KFSp_Row_AlterKey, KFSp_Op_KeyFlags); code != 0)
         return code;
-    }
     if (int const code = RepairTangents(stream, stream->GetKeyData(), index); code != 0) return code;
     return KFSp_UnsetKeySpaceFlags(stream, KFS_KeySpFlag_Modifiable, index);
 }
 
 int SetSpFlags(KFS_Stream* stream, int index, unsigned int mask, unsigned int values)
 {
-    if (int const code = CheckKeys(stream, KFSp_Op_SetKeySpFlags, KFSp_Row_AlterKey, KFSp_Op_SetKeySpFlags);
-        code != 0) {
+    if (int const code = CheckKeys(stream, KFSp_Op_SetKeySpFlags, KFSp_Row_AlterKey, KFSp_Op_SetKeySpFlags); code != 0)
         return code;
-    }
     if ((mask & ~values & KFS_KeySpFlag_Modifiable) != 0) {
         if (int const code = RepairTangents(stream, stream->GetKeyData(), index); code != 0) return code;
     }
     int result = ChangeSpFlags(stream, index, mask, values);
     if (stream->HasNoKeys()) return result;
-    if ((mask & KFS_KeySpFlag_Modifiable) != 0 || ((mask & KFS_KeySpFlag_Continuous) != 0 && result == 0)) {
+    if ((mask & KFS_KeySpFlag_Modifiable) != 0 || ((mask & KFS_KeySpFlag_Continuous) != 0 && result == 0))
         result = stream->SetArcInvalid(IndexBehind(index), 2);
-    }
     int const cleared = KFSp_ClearCache(stream);
     return result != 0 ? result : cleared;
 }
@@ -270,15 +247,11 @@ int KFS_SetKeySpaceTangentsF(KFS_Stream* stream, int index, int, double const* i
         {
             KFSp_ScDoubleValues doubles(stream, &KFSp_FakeCopyItemFuncNoLimits);
             error.Keep(doubles.Code());
-            if (error.None()) {
-                error.Keep(CheckAndSetTangents(stream, index, inTangent, outTangent));
-            }
+            if (error.None()) error.Keep(CheckAndSetTangents(stream, index, inTangent, outTangent));
             error.Keep(doubles.Restore());
         }
         // Listeners hear of it when the stream is itself again.
-        if (error.None()) {
-            stream->NotifyValueChanged();
-        }
+        if (error.None()) stream->NotifyValueChanged();
         return error.Code();
     });
 }

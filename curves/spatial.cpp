@@ -146,9 +146,7 @@ void PrefetchTable(KFS_KeyScalar const* key)
     constexpr std::uintptr_t lines = 8;
     auto const table = reinterpret_cast<std::uintptr_t>(TableOf(key));
     if (!table) return;
-    for (std::uintptr_t i = 0; i < lines; ++i) {
-        __builtin_prefetch(reinterpret_cast<void const*>(table + i * line));
-    }
+    for (std::uintptr_t i = 0; i < lines; ++i) __builtin_prefetch(reinterpret_cast<void const*>(table + i * line));
 }
 
 // The path's parameter at a place. `path` is filled here, with the piece's points in the value's coordinates, where
@@ -177,12 +175,9 @@ void WriteStraight(KFS_Stream const* stream, Run const& run, double t, double* r
     int const dimension = stream->GetDimension();
     double const* const from = KFSp_Numbers(run.a);
     double const* const to = KFSp_Numbers(run.b);
-    for (int i = 0; i < dimension; ++i) {
-        result[i] = from[i] + (to[i] - from[i]) * t;
-    }
-    if (dimension > 0) {  // the record of a value without components has no room for it
+    for (int i = 0; i < dimension; ++i) result[i] = from[i] + (to[i] - from[i]) * t;
+    if (dimension > 0)  // the record of a value without components has no room for it
         result[2 * dimension] = t;
-    }
 }
 
 // What CRV_EvaluatePoint answers. It is asked only about a point that isn't finite, and says what is wrong then.
@@ -268,9 +263,7 @@ int KFSp_InterpTangentSpatial(KFS_Stream const* stream, long, int time, int keyI
         return 0;
     }
     if (int const code = CRV_EvaluateDeriv(&curve.curve, result, t); code != 0) return code;
-    for (int i = 0; i < dimension; ++i) {
-        result[i] /= 3.0;
-    }
+    for (int i = 0; i < dimension; ++i) result[i] /= 3.0;
     result[dimension] = t;
     return 0;
 }
@@ -324,9 +317,7 @@ int GetArcDistance(KFS_Stream const* stream, KFS_KeyScalar const* a, KFS_KeyScal
     }
     KFSp_SegmentCurve graph(2);
     KFSp_FillSpeedGraph(a, b, a->arcLength, KFSp_Seconds(b->time, a->time, stream->GetTimeScale()), graph.curve);
-    if (a->outInterp == KFS_Interp_Spline && b->inInterp == KFS_Interp_Spline) {
-        HoldInsideBox(graph.curve);
-    }
+    if (a->outInterp == KFS_Interp_Spline && b->inInterp == KFS_Interp_Spline) HoldInsideBox(graph.curve);
     return CRV_EvaluateYFromX(&graph.curve, s, KFSp_Seconds(time, a->time, stream->GetTimeScale()));
 }
 

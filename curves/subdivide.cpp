@@ -75,15 +75,12 @@ void RestHandles(Place const& place)
 int TakeValue(Place const& place)
 {
     KFS_KeyScalar const* held = place.prev ? place.prev : place.next;
-    if (!place.stream->IsSpatial() && place.IsHeld() && place.prev->outInterp != KFS_Interp_Hold) {
-        held = place.next;
-    }
+    if (!place.stream->IsSpatial() && place.IsHeld() && place.prev->outInterp != KFS_Interp_Hold) held = place.next;
     double* const value = KFSp_Numbers(place.key);
-    if (held) {
+    if (held)
         std::copy_n(KFSp_Numbers(held), place.Dimension(), value);
-    } else {
+    else
         std::fill_n(value, place.Dimension(), 0.0);
-    }
     if (!place.Between()) return 0;
     if (!place.stream->IsSpatial()) return KFSp_Interpolate(place.stream, 0, place.time, place.prevIndex);
     int const code = KFSp_InterpolateSpatial(place.stream, 0, place.time, -1);
@@ -119,14 +116,12 @@ int SplitPath(Place const& place)
     }
 
     place.key->flags |= KFS_KeyFlag_TangentsSet;
-    for (KFS_KeyScalar* const changed : {place.key, place.prev, place.next}) {
+    for (KFS_KeyScalar* const changed : {place.key, place.prev, place.next})
         changed->spFlags &= ~KFS_KeySpFlag_Modifiable;
-    }
     // On a straight run the path stays made of keys without tangents.
     auto const size = static_cast<std::size_t>(dimension);
-    if (KFSp_IsZero({prev.inTangent, size}) && KFSp_IsZero({next.outTangent, size})) {
+    if (KFSp_IsZero({prev.inTangent, size}) && KFSp_IsZero({next.outTangent, size}))
         FlattenTangents(place.key, dimension);
-    }
     return 0;
 }
 
@@ -149,11 +144,8 @@ void SetSpeedNumbers(KFS_KeyScalar* key, SpeedNumbers const& numbers)
 
 void ClearModifiable(Place const& place)
 {
-    for (KFS_KeyScalar* const changed : {place.key, place.prev, place.next}) {
-        if (changed) {
-            changed->flags &= static_cast<unsigned short>(~KFS_KeyFlag_Modifiable);
-        }
-    }
+    for (KFS_KeyScalar* const changed : {place.key, place.prev, place.next})
+        if (changed) changed->flags &= static_cast<unsigned short>(~KFS_KeyFlag_Modifiable);
 }
 
 int SplitSpeedGraph(Place const& place)
@@ -184,11 +176,10 @@ int SplitSpeedGraph(Place const& place)
 int SplitSpatial(Place const& place)
 {
     int code = 0;
-    if (place.Wants(KFSp_Tangents_Spatial) && place.Between()) {
+    if (place.Wants(KFSp_Tangents_Spatial) && place.Between())
         code = SplitPath(place);
-    } else if (place.IsNewKey()) {
+    else if (place.IsNewKey())
         code = TakeValue(place);
-    }
     if (code != 0 || !place.Wants(KFSp_Tangents_Temporal) || !place.Between()) return code;
     return SplitSpeedGraph(place);
 }
@@ -203,21 +194,15 @@ int SplitHandles(Place const& place)
         KFSp_Numbers(place.key));
     ClearModifiable(place);
     // The handles carry the line now.
-    if (prevLinear) {
-        place.prev->outInterp = KFS_Interp_Spline;
-    }
-    if (nextLinear) {
-        place.next->inInterp = KFS_Interp_Spline;
-    }
+    if (prevLinear) place.prev->outInterp = KFS_Interp_Spline;
+    if (nextLinear) place.next->inInterp = KFS_Interp_Spline;
     return code;
 }
 
 int SplitPlain(Place const& place)
 {
     int code = 0;
-    if (place.Wants(KFSp_Tangents_Temporal)) {
-        code = SplitHandles(place);
-    }
+    if (place.Wants(KFSp_Tangents_Temporal)) code = SplitHandles(place);
     // The split of a held segment is that of a curve which nobody sees.
     bool const takesValue = !place.Wants(KFSp_Tangents_Temporal) || place.IsHeld();
     return code == 0 && place.IsNewKey() && takesValue ? TakeValue(place) : code;
@@ -228,12 +213,9 @@ int Split(Place* place)
     KFS_KeyScalar* at = nullptr;
     if (int const code = KFSp_GetNeighborsFromTime(place->stream, place->time, 0, &at, &place->prev, &place->next,
                                                    &place->prevIndex, &place->nextIndex, nullptr);
-        code != 0) {
+        code != 0)
         return code;
-    }
-    if (place->IsNewKey()) {
-        RestHandles(*place);
-    }
+    if (place->IsNewKey()) RestHandles(*place);
     return place->stream->IsSpatial() ? SplitSpatial(*place) : SplitPlain(*place);
 }
 
@@ -249,23 +231,17 @@ int KFSp_SubdivideSpline(KFS_Stream* stream, int time, char mode, KFS_KeyScalar*
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_Subdivide, stream, KFSp_Row_InquireKey); code != 0) return code;
     KFS_StreamKeyData* const data = stream->GetKeyDataForModify();
-    if (stream->HasNoKeys() || KFSp_ItemCount(data) == 0) {
+    if (stream->HasNoKeys() || KFSp_ItemCount(data) == 0)
         return KFSp_ReportErr(KFSp_Op_Subdivide, KFS_Err_NoKeys, KFSp_Row_Subdivide);
-    }
     Place place{stream, data, time, mode, key};
-    if ((stream->IsCustom() || stream->IsTemporarilyNonCustom()) && NeedsPlainValue(place)) {
+    if ((stream->IsCustom() || stream->IsTemporarilyNonCustom()) && NeedsPlainValue(place))
         return KFSp_RefuseCustomValue(KFSp_Op_Subdivide, KFSp_Row_ConvertTo);
-    }
     if (int const code = stream->UpdateStream(); code != 0) return code;
-    if (!place.IsNewKey()) {
-        place.time = key->time;
-    }
+    if (!place.IsNewKey()) place.time = key->time;
     KFSp_FirstError error;
     {
         KFSp_ScPin const pin(data->keys, error);
-        if (error.None()) {
-            error.Keep(Split(&place));
-        }
+        if (error.None()) error.Keep(Split(&place));
     }
     return error.Code();
 }

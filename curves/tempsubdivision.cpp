@@ -29,9 +29,7 @@ void FillCurve(Split const& split, Runs const& prev, Runs const& next, int i, CR
     KFSp_TemporalEnd const a{prev.value[i], prev.outSpeed[i], prev.outInfluence[i], !split.prevLinear};
     KFSp_TemporalEnd const b{next.value[i], next.inSpeed[i], next.inInfluence[i], !split.nextLinear};
     KFSp_FillTemporalSegment(a, b, split.dt, curve);
-    if (split.nextLinear) {
-        curve.p2[0] = FiveSixths * split.dt;
-    }
+    if (split.nextLinear) curve.p2[0] = FiveSixths * split.dt;
 }
 
 double Slope(Point const& a, Point const& b)
@@ -103,17 +101,13 @@ int KFSp_ComputeTempSubdivision(short dimension, double x, double dt, unsigned c
         KFSp_SegmentCurve segment(2);
         FillCurve(split, prevRuns, nextRuns, i, segment.curve);
         // A component that is made non-decreasing forgets the failure of the one before.
-        if (nonDecreasing != 0) {
-            result = CRV_CurveSetNonDecreasing(&segment.curve, &changed);
-        }
+        if (nonDecreasing != 0) result = CRV_CurveSetNonDecreasing(&segment.curve, &changed);
         // Set for good by the first component that had to be changed.
         if (changed != 0) {
             prevRuns.outInfluence[i] = std::fabs((segment.p1[0] - segment.p0[0]) / dt);
             nextRuns.inInfluence[i] = std::fabs((segment.p2[0] - segment.p3[0]) / dt);
         }
-        if (result == 0) {
-            result = SplitComponent(split, segment.curve, i, prevRuns, nextRuns, outRuns);
-        }
+        if (result == 0) result = SplitComponent(split, segment.curve, i, prevRuns, nextRuns, outRuns);
     }
     return result;
 }

@@ -132,13 +132,13 @@ double Chord(KFS_KeyScalar const* a, KFS_KeyScalar const* b, int dimension)
 template <class Length>
 int MeasureStraight(Pass const& pass, Length&& length)
 {
-    return ForArcs(pass, [&](KFS_KeyScalar* a, KFS_KeyScalar* b, int next) {
-        a->arcLength = length(a, b);
-        if (next == pass.count - 1 && KFSp_HasSpatialBlock(b)) {
-            b->arcLength = 0.0;
-        }
-        return 0;
-    });
+    return ForArcs(
+        pass,
+        [&](KFS_KeyScalar* a, KFS_KeyScalar* b, int next) {
+            a->arcLength = length(a, b);
+            if (next == pass.count - 1 && KFSp_HasSpatialBlock(b)) b->arcLength = 0.0;
+            return 0;
+        });
 }
 
 bool HasCurvedPath(Pass const& pass)
@@ -149,14 +149,14 @@ bool HasCurvedPath(Pass const& pass)
 int RepairArcs(Pass const& pass)
 {
     if (pass.custom) {
-        return MeasureStraight(pass, [&](KFS_KeyScalar const* a, KFS_KeyScalar const* b) {
-            return KFSp_Seconds(b->time, a->time, pass.stream->GetTimeScale());
-        });
+        return MeasureStraight(
+            pass, [&](KFS_KeyScalar const* a,
+                      KFS_KeyScalar const* b) { return KFSp_Seconds(b->time, a->time, pass.stream->GetTimeScale()); });
     }
     if (int const code = RepairSpatialTangents(pass); code != 0) return code;
-    if (HasCurvedPath(pass)) {
-        return ForArcs(pass, [&](KFS_KeyScalar* a, KFS_KeyScalar* b, int) { return MeasurePath(pass, a, b); });
-    }
+    if (HasCurvedPath(pass))
+        return ForArcs(
+            pass, [&](KFS_KeyScalar* a, KFS_KeyScalar* b, int) { return MeasurePath(pass, a, b); });
     return MeasureStraight(
         pass, [&](KFS_KeyScalar const* a, KFS_KeyScalar const* b) { return Chord(a, b, pass.stream->GetDimension()); });
 }

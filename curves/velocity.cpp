@@ -59,9 +59,8 @@ int GetRunSpeed(AskedKey const& asked, KFSp_Side side, double* speed)
     KFS_KeyScalar const* const to = toNext ? asked.next : asked.key;
     double distance = 0.0;
     if (int const code = KFSp_SumArcs(asked.data, fromPrev ? asked.prevIndex : asked.index,
-                                      toNext ? asked.nextIndex : asked.index, &distance)) {
+                                      toNext ? asked.nextIndex : asked.index, &distance))
         return code;
-    }
     double const duration = KFSp_Seconds(to->time, from->time, asked.stream->GetTimeScale());
     if (std::fabs(duration) < NoDuration) return NoDurationError;
     *speed = distance / duration;

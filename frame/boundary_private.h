@@ -30,9 +30,7 @@ class KFSp_FirstError {
 public:
     void Keep(int code) noexcept
     {
-        if (code_ == 0) {
-            code_ = code;
-        }
+        if (code_ == 0) code_ = code;
     }
     bool None() const noexcept { return code_ == 0; }
     int Code() const noexcept { return code_; }
@@ -44,7 +42,5 @@ private:
 // The class layer's form of an error code: throws it unless it is 0.
 inline void KFSp_ThrowIf(int code)
 {
-    if (code != 0) {
-        throw code;
-    }
+    if (code != 0) throw code;
 }

@@ -19,9 +19,7 @@ void KFS_Project::InitializeContexts()
 Q_RenderContext* KFS_Project::GetRenderContext(bool useCurrent) const
 {
     if (useCurrent) {
-        if (Q_RenderContext* const current = Q_RenderContext::PeekCurrent()) {
-            return current;
-        }
+        if (Q_RenderContext* const current = Q_RenderContext::PeekCurrent()) return current;
     }
     return renderContext_.get();
 }
@@ -52,9 +50,7 @@ KFS_Project const* KFS_GetCurrentConstProject()
 KFS_Project const* KFS_GetConstProject(KFS_StreamBase const* stream, bool)
 {
     if (stream && !stream->IsCanonical()) {
-        if (KFS_Project const* const project = stream->GetProject()) {
-            return project;
-        }
+        if (KFS_Project const* const project = stream->GetProject()) return project;
     }
     return KFS_GetCurrentConstProject();
 }
@@ -62,9 +58,7 @@ KFS_Project const* KFS_GetConstProject(KFS_StreamBase const* stream, bool)
 KFS_Project* KFS_GetProject(KFS_StreamBase* stream, bool)
 {
     if (stream && !stream->IsCanonical()) {
-        if (KFS_Project* const project = stream->GetProject()) {
-            return project;
-        }
+        if (KFS_Project* const project = stream->GetProject()) return project;
     }
     return KFS_GetCurrentProject();
 }
@@ -127,7 +121,5 @@ KFS_DetectExpressionErrors::KFS_DetectExpressionErrors(boost::shared_ptr<KFS_Exp
 KFS_DetectExpressionErrors::~KFS_DetectExpressionErrors()
 {
     state_->detectingErrors = saved_;
-    if (!saved_) {
-        state_->errorCount = 0;
-    }
+    if (!saved_) state_->errorCount = 0;
 }

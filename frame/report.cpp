@@ -53,30 +53,24 @@ void FormatRow(short row, Value value)
 
 int KFSp_CheckStream(short operation, KFS_Stream const* stream, short messageIndex)
 {
-    if (stream->GetStamp() == KFS_StreamValidStamp) [[likely]] {
+    if (stream->GetStamp() == KFS_StreamValidStamp) [[likely]]
         return 0;
-    }
     return KFSp_ReportErr(operation, KFS_Err_DamagedStream, messageIndex);
 }
 
 int KFSp_ReportErr(int operation, int error, short argument)
 {
-    if (error == 0) {
-        return 0;
-    }
+    if (error == 0) return 0;
     auto const row =
         std::find_if(ErrorRows.begin(), ErrorRows.end(), [error](ErrorRow const& r) { return r.code == error; });
-    if (row != ErrorRows.end() && row->fill == Fill::Nothing) {
-        return KFSp_ReportRow(operation, error, row->row);
-    }
+    if (row != ErrorRows.end() && row->fill == Fill::Nothing) return KFSp_ReportRow(operation, error, row->row);
     Qp_SetThreadLastError(0);
-    if (row == ErrorRows.end()) {
+    if (row == ErrorRows.end())
         FormatRow(KFSp_Row_UnknownError, error);
-    } else if (row->fill == Fill::Number) {
+    else if (row->fill == Fill::Number)
         FormatRow(row->row, static_cast<int>(argument));
-    } else {
+    else
         FormatRow(row->row, KFSp_MessageText(argument));
-    }
     Qp_ReportError(KFSp_ReportId(operation), KFSp_Severity);
     return error;
 }

@@ -8,9 +8,7 @@ namespace {
 
 int ToScale(int code, unsigned int scale, T_Time* result)
 {
-    if (code != 0 || scale == 0) {
-        return code;
-    }
+    if (code != 0 || scale == 0) return code;
     int const converted = T_ShortConvTime(result->value, result->scale, scale, &result->value);
     result->scale = converted == 0 ? scale : 0;
     return converted;
@@ -25,9 +23,7 @@ int KFS_AddTime(T_Time const* a, T_Time const* b, unsigned int scale, T_Time* re
 
 int KFS_SubTime(T_Time const* a, T_Time const* b, unsigned int scale, T_Time* result)
 {
-    if (b->value == INT_MIN) {
-        return T_Err_Overflow;  // has no negative
-    }
+    if (b->value == INT_MIN) return T_Err_Overflow;  // has no negative
     T_Time const negated{-b->value, b->scale};
     return ToScale(T_AddTime(a, &negated, result), scale, result);
 }

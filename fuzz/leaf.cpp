@@ -33,9 +33,8 @@ std::unique_ptr<KFS_Stream> Load(std::span<unsigned char const> bytes)
 std::optional<std::vector<unsigned char>> Save(KFS_Stream const& stream)
 {
     CKF_File file;
-    if (file.CreateInMemory() != 0 || KFSp_Boundary([&] { stream.Write(&file); }) != 0 || file.Commit() != 0) {
+    if (file.CreateInMemory() != 0 || KFSp_Boundary([&] { stream.Write(&file); }) != 0 || file.Commit() != 0)
         return std::nullopt;
-    }
     std::span<unsigned char const> const bytes = file.GetBytes();
     return std::vector<unsigned char>(bytes.begin(), bytes.end());
 }

@@ -42,15 +42,11 @@ void ExpectRoundTrip(SceneGroup& tree, bool edited)
     try {
         first = kfshost::SaveProjectToMemory(tree, "saved");
     } catch (kfshost::ProjectError const&) {
-        if (!edited) {
-            throw;
-        }
+        if (!edited) throw;
         return;
     }
     std::unique_ptr<SceneGroup> const again = kfshost::LoadProjectFromMemory(first, "saved");
-    if (kfshost::SaveProjectToMemory(*again, "saved again") != first) {
-        std::abort();
-    }
+    if (kfshost::SaveProjectToMemory(*again, "saved again") != first) std::abort();
 }
 
 // ---- reading
@@ -63,17 +59,12 @@ void Visit(SceneGroup const& tree, KFS_StreamBase const& node)
     node.SlowGetPathFromRootToMe(&root, &path);
     KFS_StreamIDPath same;
     same.SetFrom_JSON(path.GetAs_JSON());
-    if (root != &tree || tree.FindStream(path) != &node || tree.FindStream(same) != &node) {
-        std::abort();
-    }
+    if (root != &tree || tree.FindStream(path) != &node || tree.FindStream(same) != &node) std::abort();
     if (KFS_Stream const* const leaf = node.GetAsLeaf()) {
         Ask(*leaf);
     } else if (KFS_StreamGroup const* const group = node.GetAsGroup()) {
-        for (unsigned int i = 0; i < group->GetNumStreams(); ++i) {
-            if (KFS_StreamBase const* const child = group->GetStream(i); !child->IsCanonical()) {
-                Visit(tree, *child);
-            }
-        }
+        for (unsigned int i = 0; i < group->GetNumStreams(); ++i)
+            if (KFS_StreamBase const* const child = group->GetStream(i); !child->IsCanonical()) Visit(tree, *child);
     }
 }
 
@@ -95,36 +86,30 @@ void Edit(KFS_IndexedStreamGroup& group, Choices& choices)
         }
     }
     if (count < MostChildren) {
-        if (count > 0 && choices.Yes()) {
+        if (count > 0 && choices.Yes())
             group.DuplicateStream(choices.Below(count));
-        } else if (auto* const scene = dynamic_cast<SceneGroup*>(&group)) {
+        else if (auto* const scene = dynamic_cast<SceneGroup*>(&group))
             scene->AppendAnimation("added");
-        } else if (auto* const animation = dynamic_cast<AnimationGroup*>(&group)) {
+        else if (auto* const animation = dynamic_cast<AnimationGroup*>(&group))
             animation->AppendNode("added");
-        }
     }
 }
 
 // A few edits everywhere below a group.
 void EditAll(KFS_StreamGroup& group, Choices& choices)
 {
-    if (KFS_IndexedStreamGroup* const list = group.GetAsIndexedGroup()) {
-        Edit(*list, choices);
-    }
+    if (KFS_IndexedStreamGroup* const list = group.GetAsIndexedGroup()) Edit(*list, choices);
     for (unsigned int i = 0; i < group.GetNumStreams(); ++i) {
         KFS_StreamBase* const child =
             choices.Below(4) == 0 ? group.GetEditableStream(i) : group.GetEditableStreamNullOK(i);
-        if (!child) {
-            continue;
-        }
+        if (!child) continue;
         if (KFS_Stream* const leaf = child->GetAsLeaf()) {
             for (unsigned int edits = choices.Below(4); edits > 0; --edits) {
                 EditLeaf(*leaf, choices);
                 Ask(*leaf);
             }
-            if (KFS_NamedStreamGroup* const node = group.GetAsNamedGroup(); node && choices.Below(8) == 0) {
+            if (KFS_NamedStreamGroup* const node = group.GetAsNamedGroup(); node && choices.Below(8) == 0)
                 delete node->SwapCanonicalForStream(KFS_MatchName(leaf->GetMatchName()));
-            }
         } else if (KFS_StreamGroup* const inner = child->GetAsGroup()) {
             EditAll(*inner, choices);
         }
@@ -140,12 +125,8 @@ extern "C" int LLVMFuzzerTestOneInput(std::uint8_t const* data, std::size_t size
 
     long long const before = Q_MemoryLive(nullptr).bytes;
     std::unique_ptr<SceneGroup> const tree = Load({data, size});
-    if (Q_MemoryLive(nullptr).bytes - before > KeptBytes + KeptPerByte * static_cast<long long>(size)) {
-        std::abort();
-    }
-    if (!tree) {
-        return 0;
-    }
+    if (Q_MemoryLive(nullptr).bytes - before > KeptBytes + KeptPerByte * static_cast<long long>(size)) std::abort();
+    if (!tree) return 0;
     ExpectRoundTrip(*tree, false);
     Visit(*tree, *tree);
     ExpectRoundTrip(*tree, false);

@@ -28,9 +28,7 @@ public:
     explicit Choices(std::span<unsigned char const> bytes)
     {
         std::uint32_t hash = 2166136261U;
-        for (unsigned char const byte : bytes) {
-            hash = (hash ^ byte) * 16777619U;
-        }
+        for (unsigned char const byte : bytes) hash = (hash ^ byte) * 16777619U;
         random_.seed(hash);
     }
     unsigned int Below(unsigned int count) { return static_cast<unsigned int>(random_() % count); }
@@ -61,9 +59,7 @@ inline void Ask(KFS_Stream const& stream)
         static_cast<void>(KFS_FindNearestKeyTime(&stream, &at, &index, &key));
         static_cast<void>(KFS_TimeToIndex(&stream, &at, &index));
     };
-    for (int const time : Times) {
-        ask(time);
-    }
+    for (int const time : Times) ask(time);
     for (int i = 0; i < stream.GetKeyCount(); ++i) {
         T_Time time{};
         if (KFS_IndexToTime(&stream, i, &time) == 0 && time.value > INT_MIN && time.value < INT_MAX) {
@@ -82,15 +78,12 @@ inline void Ask(KFS_Stream const& stream)
 inline void EditLeaf(KFS_Stream& stream, Choices& choices)
 {
     std::vector<double> numbers(static_cast<std::size_t>(stream.GetDimension()) + 1);
-    for (double& number : numbers) {
-        number = choices.Of(Numbers);
-    }
+    for (double& number : numbers) number = choices.Of(Numbers);
     int const count = stream.GetKeyCount();
     int const index = count > 0 ? static_cast<int>(choices.Below(static_cast<unsigned int>(count))) : 0;
     T_Time at{choices.Of(Times), stream.GetTimeScale()};
-    if (count > 0 && choices.Yes() && KFS_IndexToTime(&stream, index, &at) == 0 && at.value < INT_MAX) {
+    if (count > 0 && choices.Yes() && KFS_IndexToTime(&stream, index, &at) == 0 && at.value < INT_MAX)
         at.value += static_cast<int>(choices.Below(2));
-    }
     auto const interp = [&] { return static_cast<char>(choices.Below(4)); };
     double const* const out = choices.Yes() ? numbers.data() : nullptr;
     static_cast<void>(KFSp_Boundary([&]() -> int {
@@ -119,10 +112,7 @@ inline void ForgetNames(KFS_StreamBase& node)
 {
     node.SetNamesSameInitted(false);
     if (KFS_StreamGroup* const group = node.GetAsGroup()) {
-        for (unsigned int i = 0; i < group->GetNumStreams(); ++i) {
-            if (KFS_StreamBase* const child = group->GetEditableStreamNullOK(i)) {
-                ForgetNames(*child);
-            }
-        }
+        for (unsigned int i = 0; i < group->GetNumStreams(); ++i)
+            if (KFS_StreamBase* const child = group->GetEditableStreamNullOK(i)) ForgetNames(*child);
     }
 }

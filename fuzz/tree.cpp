@@ -22,9 +22,7 @@ using Bytes = std::vector<unsigned char>;
 std::unique_ptr<KFS_StreamBase> Load(std::span<unsigned char const> bytes)
 {
     CKF_File file;
-    if (file.Open(bytes) != 0) {
-        return nullptr;
-    }
+    if (file.Open(bytes) != 0) return nullptr;
     std::unique_ptr<KFS_StreamBase> root = TreeKinds::MakeRoot();
     return KFSp_Boundary([&] { root->Read(&file, nullptr); }) == 0 ? std::move(root) : nullptr;
 }
@@ -32,9 +30,8 @@ std::unique_ptr<KFS_StreamBase> Load(std::span<unsigned char const> bytes)
 std::optional<Bytes> Save(KFS_StreamBase const& root)
 {
     CKF_File file;
-    if (file.CreateInMemory() != 0 || KFSp_Boundary([&] { root.Write(&file); }) != 0 || file.Commit() != 0) {
+    if (file.CreateInMemory() != 0 || KFSp_Boundary([&] { root.Write(&file); }) != 0 || file.Commit() != 0)
         return std::nullopt;
-    }
     return Bytes(file.GetBytes().begin(), file.GetBytes().end());
 }
 
@@ -43,13 +40,9 @@ std::optional<Bytes> SaveTwice(KFS_StreamBase& root)
 {
     ForgetNames(root);
     std::optional<Bytes> const first = Save(root);
-    if (!first) {
-        return std::nullopt;
-    }
+    if (!first) return std::nullopt;
     std::unique_ptr<KFS_StreamBase> const again = Load(*first);
-    if (!again) {
-        std::abort();
-    }
+    if (!again) std::abort();
     return Save(*again);
 }
 
@@ -58,9 +51,7 @@ void ExpectRoundTrip(KFS_StreamBase& root)
 {
     if (std::optional<Bytes> const second = SaveTwice(root)) {
         std::unique_ptr<KFS_StreamBase> const again = Load(*second);
-        if (!again || Save(*again) != second) {
-            std::abort();
-        }
+        if (!again || Save(*again) != second) std::abort();
     }
 }
 
@@ -79,9 +70,7 @@ extern "C" int LLVMFuzzerTestOneInput(std::uint8_t const* data, std::size_t size
     TreeKinds const kinds;
 
     std::unique_ptr<KFS_StreamBase> const root = Load({data, size});
-    if (!root) {
-        return 0;
-    }
+    if (!root) return 0;
     ExpectRoundTrip(*root);
     Choices choices({data, size});
     ForEachLeaf(*root, [&](KFS_Stream* leaf) {

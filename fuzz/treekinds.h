@@ -90,9 +90,8 @@ public:
     bool CouldGoMissing() const override { return true; }
     void FillCanonicalLayout(KFS_CanonicalLayout* layout) override
     {
-        for (char const* const kind : kinds_) {
+        for (char const* const kind : kinds_)
             layout->push_back(this->GetFactory()->GetCanonicalStream(KFS_MatchName(kind, true)));
-        }
     }
 
 private:

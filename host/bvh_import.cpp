@@ -28,21 +28,14 @@ bool Fits(Rational const& last, unsigned int scale)
 unsigned int ChooseScale(Rational const& frameTime, Rational const& last)
 {
     auto const isWhole = [&](unsigned int scale) { return scale % frameTime.Denominator() == 0; };
-    if (isWhole(UsualScale) && Fits(last, UsualScale)) {
-        return UsualScale;
-    }
+    if (isWhole(UsualScale) && Fits(last, UsualScale)) return UsualScale;
     if (frameTime.Denominator() <= MaxKeyUnits && Fits(last, static_cast<unsigned int>(frameTime.Denominator()))) {
         auto scale = static_cast<unsigned int>(frameTime.Denominator());
-        while (scale < UsualScale && Fits(last, scale * 2)) {
-            scale *= 2;
-        }
+        while (scale < UsualScale && Fits(last, scale * 2)) scale *= 2;
         return scale;
     }
-    for (int power = 30; power >= 0; --power) {
-        if (Fits(last, 1U << power)) {
-            return 1U << power;
-        }
-    }
+    for (int power = 30; power >= 0; --power)
+        if (Fits(last, 1U << power)) return 1U << power;
     return 0;
 }
 
@@ -80,15 +73,13 @@ private:
         auto const lastFrame = static_cast<std::int64_t>(motion_.frames == 0 ? 0 : motion_.frames - 1);
         Rational const last = motion_.frameTime * Rational(lastFrame, 1);
         scene_.timeScale = options.timeScale == 0 ? ChooseScale(motion_.frameTime, last) : options.timeScale;
-        if (scene_.timeScale == 0 || !Fits(last, scene_.timeScale)) {
+        if (scene_.timeScale == 0 || !Fits(last, scene_.timeScale))
             throw ImportError("Frame Time", "the frames don't fit a 32-bit time line of that scale");
-        }
         for (std::int64_t frame = 0; frame <= lastFrame; ++frame) {
             Rational const time = motion_.frameTime * Rational(frame, 1);
             int const units = time.ToUnits(scene_.timeScale);
-            if (frame > 0 && units <= times_.back()) {
+            if (frame > 0 && units <= times_.back())
                 throw ImportError("Frame Time", "frames are closer than 1/" + std::to_string(scene_.timeScale) + " s");
-            }
             Rational const placed(units, scene_.timeScale);
             if (placed != time) {
                 scene_.exactTimes = false;
@@ -114,9 +105,7 @@ private:
 
     void AddStream(BvhJoint const& joint, std::string const& place, ChannelSet const& channels)
     {
-        if (channels.names.empty()) {
-            return;
-        }
+        if (channels.names.empty()) return;
         StreamItem item;
         item.animation = "motion";
         item.node = joint.name;

@@ -29,9 +29,7 @@ public:
 
     std::string_view Next(std::string_view wanted)
     {
-        if (AtEnd()) {
-            throw ImportError(Place(), "the file ends where " + std::string(wanted) + " should be");
-        }
+        if (AtEnd()) throw ImportError(Place(), "the file ends where " + std::string(wanted) + " should be");
         std::string_view const word = rest_.substr(0, rest_.find_first_of(Blanks));
         rest_.remove_prefix(word.size());
         return word;
@@ -42,20 +40,15 @@ public:
     {
         std::string_view line = rest_.substr(0, rest_.find('\n'));
         rest_.remove_prefix(line.size());
-        while (!line.empty() && Blanks.find(line.front()) != std::string_view::npos) {
-            line.remove_prefix(1);
-        }
-        while (!line.empty() && Blanks.find(line.back()) != std::string_view::npos) {
-            line.remove_suffix(1);
-        }
+        while (!line.empty() && Blanks.find(line.front()) != std::string_view::npos) line.remove_prefix(1);
+        while (!line.empty() && Blanks.find(line.back()) != std::string_view::npos) line.remove_suffix(1);
         return line;
     }
 
     void Expect(std::string_view wanted)
     {
-        if (std::string_view const word = Next(wanted); word != wanted) {
+        if (std::string_view const word = Next(wanted); word != wanted)
             throw ImportError(Place(), '"' + Shown(word) + "\" stands where " + std::string(wanted) + " should be");
-        }
     }
 
     double NextNumber(char const* wanted)
@@ -64,9 +57,8 @@ public:
         word.remove_prefix(word.starts_with('+') ? 1 : 0);
         double number = 0.0;
         auto const [end, error] = std::from_chars(word.data(), word.data() + word.size(), number);
-        if (error != std::errc() || end != word.data() + word.size() || !std::isfinite(number)) {
+        if (error != std::errc() || end != word.data() + word.size() || !std::isfinite(number))
             throw ImportError(Place(), '"' + Shown(word) + "\" isn't " + wanted);
-        }
         return number;
     }
 
@@ -75,9 +67,8 @@ public:
         std::string_view const word = Next(wanted);
         std::size_t count = 0;
         auto const [end, error] = std::from_chars(word.data(), word.data() + word.size(), count);
-        if (error != std::errc() || end != word.data() + word.size()) {
+        if (error != std::errc() || end != word.data() + word.size())
             throw ImportError(Place(), '"' + Shown(word) + "\" isn't " + wanted);
-        }
         return count;
     }
 
@@ -107,9 +98,7 @@ public:
         words_.Expect("HIERARCHY");
         words_.Expect("ROOT");
         OpenJoint();
-        while (depth_ > 0) {
-            ParseMember();
-        }
+        while (depth_ > 0) ParseMember();
         ParseMotion();
         return std::move(motion_);
     }
@@ -119,9 +108,7 @@ private:
     {
         BvhJoint joint;
         joint.name = CleanName(words_.RestOfLine());
-        if (joint.name.empty()) {
-            throw ImportError(words_.Place(), "a joint has no name");
-        }
+        if (joint.name.empty()) throw ImportError(words_.Place(), "a joint has no name");
         motion_.joints.push_back(std::move(joint));
         words_.Expect("{");
         ++depth_;
@@ -152,24 +139,20 @@ private:
 
     void ParseOffset()
     {
-        for (int axis = 0; axis < 3; ++axis) {
-            words_.NextNumber("a number of an offset");
-        }
+        for (int axis = 0; axis < 3; ++axis) words_.NextNumber("a number of an offset");
     }
 
     void ParseChannels()
     {
         std::size_t const count = words_.NextCount("a count of channels");
         BvhJoint& joint = motion_.joints.back();
-        if (!joint.channels.empty() || count > ChannelNames.size()) {
+        if (!joint.channels.empty() || count > ChannelNames.size())
             throw ImportError(words_.Place(), "a joint has up to six channels, given once");
-        }
         for (std::size_t i = 0; i < count; ++i) {
             std::string const name(words_.Next("a channel's name"));
             if (std::ranges::find(ChannelNames, name) == ChannelNames.end() ||
-                std::ranges::find(joint.channels, name) != joint.channels.end()) {
+                std::ranges::find(joint.channels, name) != joint.channels.end())
                 throw ImportError(words_.Place(), '"' + Words::Shown(name) + "\" isn't a channel, or is given twice");
-            }
             joint.channels.push_back(name);
         }
         motion_.channelCount += count;
@@ -184,9 +167,8 @@ private:
         words_.Expect("Time:");
         std::string_view const time = words_.Next("the frame time");
         auto const frameTime = Rational::Parse(time);
-        if (!frameTime || *frameTime <= Rational()) {
+        if (!frameTime || *frameTime <= Rational())
             throw ImportError(words_.Place(), '"' + Words::Shown(time) + "\" isn't a frame time in seconds");
-        }
         motion_.frameTime = *frameTime;
         ParseFrames();
     }
@@ -194,18 +176,14 @@ private:
     // A number takes a digit and a blank at least: what can't be there isn't made room for.
     void ParseFrames()
     {
-        if (motion_.channelCount == 0) {
-            throw ImportError(words_.Place(), "no joint has a channel");
-        }
+        if (motion_.channelCount == 0) throw ImportError(words_.Place(), "no joint has a channel");
         std::size_t const mostNumbers = words_.BytesLeft() / 2;
         if (motion_.frames > mostNumbers / motion_.channelCount) {
             throw ImportError(words_.Place(), "the file is too short for " + std::to_string(motion_.frames) +
                                                   " frames of " + std::to_string(motion_.channelCount) + " channels");
         }
         motion_.numbers.resize(motion_.frames * motion_.channelCount);
-        for (double& number : motion_.numbers) {
-            number = words_.NextNumber("a number of a frame");
-        }
+        for (double& number : motion_.numbers) number = words_.NextNumber("a number of a frame");
         if (!words_.AtEnd()) {
             throw ImportError(words_.Place(), "there is more than the " + std::to_string(motion_.frames) +
                                                   " frames of " + std::to_string(motion_.channelCount) + " channels");

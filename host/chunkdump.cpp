@@ -29,9 +29,7 @@ constexpr std::size_t MostText = 60;
 std::uint64_t Unsigned(Bytes data, std::size_t offset, std::size_t size)
 {
     std::uint64_t number = 0;
-    for (std::size_t i = 0; i < size; ++i) {
-        number = number << 8 | data[offset + i];
-    }
+    for (std::size_t i = 0; i < size; ++i) number = number << 8 | data[offset + i];
     return number;
 }
 
@@ -89,9 +87,8 @@ std::string Doubles(Bytes data)
 {
     std::size_t const count = data.size() / 8;
     std::string text;
-    for (std::size_t i = 0; i < std::min(count, MostNumbers); ++i) {
+    for (std::size_t i = 0; i < std::min(count, MostNumbers); ++i)
         text += fmt::format("{}{}", i == 0 ? "" : " ", Double(data, i * 8));
-    }
     return text + (count > MostNumbers ? fmt::format(" ... {} numbers", count) : "");
 }
 
@@ -101,9 +98,7 @@ std::string Keys(Bytes data)
     std::uint64_t const itemSize = Unsigned(data, 0, 4);
     std::uint64_t const count = Unsigned(data, 4, 4);
     std::string text = fmt::format("{} keys of {} bytes", count, itemSize);
-    if (itemSize < 8 || count == 0 || (data.size() - 8) / itemSize < count) {
-        return text;
-    }
+    if (itemSize < 8 || count == 0 || (data.size() - 8) / itemSize < count) return text;
     auto const last = static_cast<std::size_t>(8 + (count - 1) * itemSize);
     return text + fmt::format(", times {} to {}", Long(data, 8), Long(data, last));
 }
@@ -135,9 +130,8 @@ constexpr Decoder Decoders[] = {
 std::string Raw(Bytes data)
 {
     std::string text;
-    for (unsigned char const byte : data.first(std::min(data.size(), MostRawBytes))) {
+    for (unsigned char const byte : data.first(std::min(data.size(), MostRawBytes)))
         text += fmt::format("{}{:02x}", text.empty() ? "" : " ", byte);
-    }
     return text + (data.size() > MostRawBytes ? " ..." : "");
 }
 
@@ -161,13 +155,9 @@ std::string Letters(int id)
 std::string Line(CKF_RawChunk const& chunk)
 {
     std::string line = fmt::format("{:8}  {:{}}{}", chunk.offset, "", chunk.depth * 2, Letters(chunk.id));
-    if (chunk.listType != 0) {
-        line += ' ' + Letters(chunk.listType);
-    }
+    if (chunk.listType != 0) line += ' ' + Letters(chunk.listType);
     line += fmt::format(" [{}]", chunk.claimedSize);
-    if (chunk.listType == 0 && !chunk.data.empty()) {
-        line += ' ' + Content(chunk);
-    }
+    if (chunk.listType == 0 && !chunk.data.empty()) line += ' ' + Content(chunk);
     return line + (chunk.problem ? fmt::format("  <-- {}\n", chunk.problem) : "\n");
 }
 
@@ -182,9 +172,7 @@ ChunkDump DumpChunks(std::string const& fileName)
         dump.text += Line(chunk);
         dump.problems += chunk.problem ? 1 : 0;
     }
-    if (bytes.empty()) {
-        dump = {"       0  <-- the file is empty\n", 1};
-    }
+    if (bytes.empty()) dump = {"       0  <-- the file is empty\n", 1};
     return dump;
 }
 

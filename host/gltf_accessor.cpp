@@ -58,12 +58,9 @@ AccessorReader::AccessorReader(tinygltf::Model const& model, int index, std::str
     int const type = accessor_->componentType;
     int const size = tinygltf::GetComponentSizeInBytes(static_cast<std::uint32_t>(type));
     bool const isSmallInteger = type >= TINYGLTF_COMPONENT_TYPE_BYTE && type <= TINYGLTF_COMPONENT_TYPE_UNSIGNED_SHORT;
-    if (size <= 0 || (type != TINYGLTF_COMPONENT_TYPE_FLOAT && !isSmallInteger)) {
+    if (size <= 0 || (type != TINYGLTF_COMPONENT_TYPE_FLOAT && !isSmallInteger))
         throw ImportError(place_, "has components of type " + std::to_string(type) + ", which animation can't have");
-    }
-    if (isSmallInteger && !accessor_->normalized) {
-        throw ImportError(place_, "has integers that aren't normalized");
-    }
+    if (isSmallInteger && !accessor_->normalized) throw ImportError(place_, "has integers that aren't normalized");
     componentSize_ = static_cast<std::size_t>(size);
     auto const& sparse = accessor_->sparse;
     auto const sparseCount = sparse.isSparse ? static_cast<std::size_t>(std::max(sparse.count, 0)) : 0;
@@ -73,23 +70,18 @@ AccessorReader::AccessorReader(tinygltf::Model const& model, int index, std::str
     }
     // Zeros that no byte stands for are good for little; a great many of them are a trap.
     constexpr std::size_t mostZeros = 1 << 16;
-    if (accessor_->bufferView < 0 && accessor_->count - sparseCount > mostZeros) {
+    if (accessor_->bufferView < 0 && accessor_->count - sparseCount > mostZeros)
         throw ImportError(place_, "has " + std::to_string(Count()) + " elements and no data for them");
-    }
 }
 
 void AccessorReader::RequireType(int type, char const* name) const
 {
-    if (accessor_->type != type) {
-        throw ImportError(place_, std::string("isn't of type ") + name);
-    }
+    if (accessor_->type != type) throw ImportError(place_, std::string("isn't of type ") + name);
 }
 
 void AccessorReader::RequireFloats() const
 {
-    if (accessor_->componentType != TINYGLTF_COMPONENT_TYPE_FLOAT) {
-        throw ImportError(place_, "isn't made of floats");
-    }
+    if (accessor_->componentType != TINYGLTF_COMPONENT_TYPE_FLOAT) throw ImportError(place_, "isn't made of floats");
 }
 
 AccessorReader::Elements AccessorReader::Find(int view, std::size_t offset, std::size_t count, std::size_t size,
@@ -106,16 +98,11 @@ AccessorReader::Elements AccessorReader::Find(int view, std::size_t offset, std:
                                          std::to_string(model_->buffers.size()));
     }
     auto const& data = model_->buffers[static_cast<std::size_t>(bufferView.buffer)].data;
-    if (bufferView.byteOffset > data.size() || bufferView.byteLength > data.size() - bufferView.byteOffset) {
+    if (bufferView.byteOffset > data.size() || bufferView.byteLength > data.size() - bufferView.byteOffset)
         throw ImportError(viewPlace, "reaches beyond its buffer of " + std::to_string(data.size()) + " bytes");
-    }
     std::size_t const stride = bufferView.byteStride == 0 ? size : bufferView.byteStride;
-    if (stride < size) {
-        throw ImportError(viewPlace, "has a byteStride smaller than an element");
-    }
-    if (count == 0) {
-        return {};
-    }
+    if (stride < size) throw ImportError(viewPlace, "has a byteStride smaller than an element");
+    if (count == 0) return {};
     bool const startsInside = offset <= bufferView.byteLength && bufferView.byteLength - offset >= size;
     if (!startsInside || (bufferView.byteLength - offset - size) / stride < count - 1) {
         throw ImportError(place_, "says it has " + std::to_string(count) + ' ' + what +
@@ -138,9 +125,7 @@ double AccessorReader::ReadComponent(unsigned char const* bytes) const
 
 void AccessorReader::ReadElement(unsigned char const* bytes, double* numbers) const
 {
-    for (std::size_t i = 0; i < components_; ++i) {
-        numbers[i] = ReadComponent(bytes + i * componentSize_);
-    }
+    for (std::size_t i = 0; i < components_; ++i) numbers[i] = ReadComponent(bytes + i * componentSize_);
 }
 
 void AccessorReader::ApplySparse(std::vector<double>& numbers) const
@@ -148,18 +133,16 @@ void AccessorReader::ApplySparse(std::vector<double>& numbers) const
     auto const& sparse = accessor_->sparse;
     auto const count = static_cast<std::size_t>(std::max(sparse.count, 0));
     std::size_t const indexSize = IndexSize(sparse.indices.componentType);
-    if (indexSize == 0) {
+    if (indexSize == 0)
         throw ImportError(place_, "has sparse indices of type " + std::to_string(sparse.indices.componentType));
-    }
     Elements const indices = Find(sparse.indices.bufferView, static_cast<std::size_t>(sparse.indices.byteOffset), count,
                                   indexSize, "sparse indices");
     Elements const values = Find(sparse.values.bufferView, static_cast<std::size_t>(sparse.values.byteOffset), count,
                                  components_ * componentSize_, "sparse values");
     for (std::size_t i = 0; i < indices.count; ++i) {
         std::size_t const index = ReadIndex(indices.first + i * indices.stride, indexSize);
-        if (index >= accessor_->count) {
+        if (index >= accessor_->count)
             throw ImportError(place_, "replaces element " + std::to_string(index) + " of " + std::to_string(Count()));
-        }
         ReadElement(values.first + i * values.stride, &numbers[index * components_]);
     }
 }
@@ -172,12 +155,9 @@ std::vector<double> AccessorReader::ReadNumbers() const
                         "elements");
     }
     std::vector<double> numbers(accessor_->count * components_, 0.0);
-    for (std::size_t i = 0; i < elements.count; ++i) {
+    for (std::size_t i = 0; i < elements.count; ++i)
         ReadElement(elements.first + i * elements.stride, &numbers[i * components_]);
-    }
-    if (accessor_->sparse.isSparse) {
-        ApplySparse(numbers);
-    }
+    if (accessor_->sparse.isSparse) ApplySparse(numbers);
     auto const bad = std::ranges::find_if_not(numbers, [](double number) { return std::isfinite(number); });
     if (bad != numbers.end()) {
         auto const element = static_cast<std::size_t>(bad - numbers.begin()) / components_;

@@ -41,21 +41,15 @@ std::uint32_t ReadWord(std::string_view bytes, std::size_t offset)
 
 void AppendWord(std::string& bytes, std::uint32_t word)
 {
-    for (int shift = 0; shift < 32; shift += 8) {
-        bytes += static_cast<char>(word >> shift & 0xFF);
-    }
+    for (int shift = 0; shift < 32; shift += 8) bytes += static_cast<char>(word >> shift & 0xFF);
 }
 
 // Takes the chunk that `rest` begins with off it.
 std::string_view TakeChunk(std::string_view& rest, std::uint32_t type, std::string const& place)
 {
-    if (rest.size() < ChunkHeaderSize) {
-        throw ImportError(place, "the file ends in the chunk's header");
-    }
+    if (rest.size() < ChunkHeaderSize) throw ImportError(place, "the file ends in the chunk's header");
     std::uint32_t const length = ReadWord(rest, 0);
-    if (ReadWord(rest, 4) != type) {
-        throw ImportError(place, "is of another type than it must be");
-    }
+    if (ReadWord(rest, 4) != type) throw ImportError(place, "is of another type than it must be");
     rest.remove_prefix(ChunkHeaderSize);
     if (length > rest.size()) {
         throw ImportError(place, "the file has " + std::to_string(rest.size()) + " of the chunk's " +
@@ -68,12 +62,10 @@ std::string_view TakeChunk(std::string_view& rest, std::uint32_t type, std::stri
 
 Container OpenBinary(std::string_view bytes)
 {
-    if (bytes.size() < HeaderSize) {
+    if (bytes.size() < HeaderSize)
         throw ImportError("header", "the file ends after " + std::to_string(bytes.size()) + " bytes");
-    }
-    if (std::uint32_t const version = ReadWord(bytes, 4); version != 2) {
+    if (std::uint32_t const version = ReadWord(bytes, 4); version != 2)
         throw ImportError("header", "is of version " + std::to_string(version) + "; version 2 is supported");
-    }
     std::uint32_t const length = ReadWord(bytes, 8);
     if (length < HeaderSize || length > bytes.size()) {
         throw ImportError("header",
@@ -83,20 +75,15 @@ Container OpenBinary(std::string_view bytes)
     Container container;
     container.isBinary = true;
     container.text = TakeChunk(rest, JsonChunk, "JSON chunk");
-    if (!rest.empty()) {
-        container.binary = TakeChunk(rest, BinaryChunk, "BIN chunk");
-    }
+    if (!rest.empty()) container.binary = TakeChunk(rest, BinaryChunk, "BIN chunk");
     return container;
 }
 
 Container Open(std::string_view bytes, std::string const& fileName)
 {
-    if (bytes.starts_with(Magic)) {
-        return OpenBinary(bytes);
-    }
-    if (std::filesystem::path(fileName).extension() == ".glb") {
+    if (bytes.starts_with(Magic)) return OpenBinary(bytes);
+    if (std::filesystem::path(fileName).extension() == ".glb")
         throw ImportError("header", "this isn't a binary glTF file");
-    }
     return {bytes, {}, false};
 }
 
@@ -122,18 +109,15 @@ std::string FindBufferFile(std::string const& uri, std::string const& fileName, 
     std::string const name = DecodePercent(uri);
     std::filesystem::path const relative(name);
     bool const leavesFolder = relative.is_absolute() || std::ranges::find(relative, "..") != relative.end();
-    if (leavesFolder || name.find(':') != std::string::npos || name.find('\0') != std::string::npos) {
+    if (leavesFolder || name.find(':') != std::string::npos || name.find('\0') != std::string::npos)
         throw ImportError(place, '"' + CleanName(name) + "\" isn't a file in this file's folder");
-    }
     return (std::filesystem::path(fileName).parent_path() / relative).string();
 }
 
 // The number of bytes that a base64 text stands for.
 std::size_t Base64Size(std::string_view text)
 {
-    while (text.ends_with('=')) {
-        text.remove_suffix(1);
-    }
+    while (text.ends_with('=')) text.remove_suffix(1);
     return text.size() / 4 * 3 + text.size() % 4 * 3 / 4;
 }
 
@@ -151,33 +135,24 @@ void ResolveBuffer(json& buffer, std::string const& place, std::string const& fi
                    BufferFiles& files)
 {
     auto const length = buffer["byteLength"].get<std::uint64_t>();
-    if (length == 0) {
-        throw ImportError(place, "has no bytes");
-    }
+    if (length == 0) throw ImportError(place, "has no bytes");
     std::string const uri = buffer.value("uri", "");
     if (uri.empty()) {
-        if (container.binary.size() < length) {
+        if (container.binary.size() < length)
             throw ImportError(place, container.isBinary ? Lacking(container.binary.size(), length) : "has no uri");
-        }
     } else if (uri.starts_with("data:")) {
         constexpr std::string_view marker = ";base64,";
         std::size_t const start = uri.find(marker);
-        if (start == std::string::npos) {
-            throw ImportError(place, "has embedded data that isn't base64");
-        }
+        if (start == std::string::npos) throw ImportError(place, "has embedded data that isn't base64");
         std::string const data = uri.substr(start + marker.size());
-        if (Base64Size(data) < length) {
-            throw ImportError(place, Lacking(Base64Size(data), length));
-        }
+        if (Base64Size(data) < length) throw ImportError(place, Lacking(Base64Size(data), length));
         buffer["uri"] = "data:application/octet-stream;base64," + data;
         buffer["byteLength"] = Base64Size(data);
     } else {
         std::string const name = "buffer" + std::to_string(files.size());
         std::string& bytes = files[name];
         bytes = ReadFileBytes(FindBufferFile(uri, fileName, place), place, length);
-        if (bytes.size() < length) {
-            throw ImportError(place, Lacking(bytes.size(), length));
-        }
+        if (bytes.size() < length) throw ImportError(place, Lacking(bytes.size(), length));
         buffer["uri"] = name;
     }
 }
@@ -188,9 +163,7 @@ std::string Reassemble(std::string text, std::string_view binary)
     text.append((4 - text.size() % 4) % 4, ' ');
     std::size_t const binarySize = binary.empty() ? 0 : ChunkHeaderSize + binary.size();
     std::size_t const length = HeaderSize + ChunkHeaderSize + text.size() + binarySize;
-    if (length > std::numeric_limits<std::uint32_t>::max()) {
-        throw ImportError("", "is too long for a binary glTF file");
-    }
+    if (length > std::numeric_limits<std::uint32_t>::max()) throw ImportError("", "is too long for a binary glTF file");
     std::string bytes(Magic);
     AppendWord(bytes, 2);
     AppendWord(bytes, static_cast<std::uint32_t>(length));
@@ -249,9 +222,8 @@ tinygltf::Model Parse(json const& document, Container const& container, BufferFi
         done = reader.LoadASCIIFromString(&model, &error, &warning, text.data(), static_cast<unsigned int>(text.size()),
                                           "");
     }
-    if (!done || !error.empty()) {
+    if (!done || !error.empty())
         throw ImportError("", error.empty() ? "isn't glTF that can be read" : FirstLine(error));
-    }
     return model;
 }
 
@@ -263,15 +235,11 @@ tinygltf::Model LoadGltfDocument(std::string_view bytes, std::string const& file
     json document = ParseGltfJson(container.text);
     BufferFiles files;
     std::size_t index = 0;
-    for (json& buffer : document["buffers"]) {
+    for (json& buffer : document["buffers"])
         ResolveBuffer(buffer, "buffers[" + std::to_string(index++) + ']', fileName, container, files);
-    }
     // The reader drops channels without a node, and with them the count of those that follow.
-    for (json& animation : document["animations"]) {
-        for (json& channel : animation["channels"]) {
-            channel["target"].emplace("node", -1);
-        }
-    }
+    for (json& animation : document["animations"])
+        for (json& channel : animation["channels"]) channel["target"].emplace("node", -1);
     return Parse(document, container, files);
 }
 

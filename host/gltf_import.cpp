@@ -46,15 +46,9 @@ std::string At(std::string const& list, std::size_t index)
 
 SourceInterpolation InterpolationOf(tinygltf::AnimationSampler const& sampler, std::string const& place)
 {
-    if (sampler.interpolation == "STEP") {
-        return SourceInterpolation::Step;
-    }
-    if (sampler.interpolation.empty() || sampler.interpolation == "LINEAR") {
-        return SourceInterpolation::Linear;
-    }
-    if (sampler.interpolation == "CUBICSPLINE") {
-        return SourceInterpolation::CubicSpline;
-    }
+    if (sampler.interpolation == "STEP") return SourceInterpolation::Step;
+    if (sampler.interpolation.empty() || sampler.interpolation == "LINEAR") return SourceInterpolation::Linear;
+    if (sampler.interpolation == "CUBICSPLINE") return SourceInterpolation::CubicSpline;
     throw ImportError(place, "has the interpolation \"" + CleanName(sampler.interpolation) + '"');
 }
 
@@ -111,9 +105,8 @@ private:
             tinygltf::Animation const& animation = model_.animations[i];
             std::string const name =
                 animation.name.empty() ? "animation" + std::to_string(i) : CleanName(animation.name);
-            for (std::size_t j = 0; j < animation.channels.size(); ++j) {
+            for (std::size_t j = 0; j < animation.channels.size(); ++j)
                 CollectChannel(animation, name, At("animations", i), j);
-            }
         }
     }
 
@@ -123,9 +116,7 @@ private:
     {
         tinygltf::AnimationChannel const& source = animation.channels[index];
         auto const path = std::ranges::find(PathKinds, source.target_path, &PathKind::path);
-        if (source.target_node < 0 || path == std::end(PathKinds)) {
-            return;
-        }
+        if (source.target_node < 0 || path == std::end(PathKinds)) return;
         Channel channel{};
         channel.item.place = place + '.' + At("channels", index);
         if (static_cast<std::size_t>(source.target_node) >= model_.nodes.size()) {
@@ -159,9 +150,7 @@ private:
     void ReadTimes()
     {
         for (Channel const& channel : channels_) {
-            if (times_.contains(channel.input)) {
-                continue;
-            }
+            if (times_.contains(channel.input)) continue;
             AccessorReader const accessor(model_, channel.input, channel.samplerPlace);
             accessor.RequireType(TINYGLTF_TYPE_SCALAR, "SCALAR");
             accessor.RequireFloats();
@@ -181,9 +170,7 @@ private:
     void ChooseScale(ImportOptions const& options)
     {
         std::vector<float> all;
-        for (auto const& [index, times] : times_) {
-            all.insert(all.end(), times.begin(), times.end());
-        }
+        for (auto const& [index, times] : times_) all.insert(all.end(), times.begin(), times.end());
         try {
             TimeScale const scale =
                 options.timeScale == 0 ? ChooseTimeScale(all) : JudgeTimeScale(all, options.timeScale);
@@ -199,17 +186,14 @@ private:
     void MeasureChannels()
     {
         std::size_t most = FreeNumbers;
-        for (tinygltf::Buffer const& buffer : model_.buffers) {
-            most += buffer.data.size() * NumbersPerByte;
-        }
+        for (tinygltf::Buffer const& buffer : model_.buffers) most += buffer.data.size() * NumbersPerByte;
         std::size_t numbers = 0;
         for (Channel& channel : channels_) {
             std::size_t const keys = times_.at(channel.input).size();
             channel.dimension = DimensionOf(channel, keys);
             numbers += keys * channel.dimension * NumbersPerComponent;
-            if (numbers > most) {
+            if (numbers > most)
                 throw ImportError(channel.item.place, "the file's channels ask for more keys than are accepted");
-            }
         }
     }
 
@@ -241,9 +225,8 @@ private:
         try {
             StreamBuilder builder(static_cast<int>(values.dimension), scene_.timeScale, channel.item.path);
             AppendKeys(builder, channel, times, values);
-            if (channel.item.interpolation == SourceInterpolation::CubicSpline) {
+            if (channel.item.interpolation == SourceInterpolation::CubicSpline)
                 SetTangents(builder, times.size(), values);
-            }
             channel.item.stream = builder.Take();
         } catch (StoreError const& error) {
             throw ImportError(channel.item.place, error.what());

@@ -65,21 +65,17 @@ json CutDown(json const& object, std::span<Field const> fields, std::string cons
 
 json CutDownList(json const& list, std::span<Field const> fields, std::string const& place)
 {
-    if (!list.is_array()) {
-        throw ImportError(place, "isn't a list");
-    }
+    if (!list.is_array()) throw ImportError(place, "isn't a list");
     json result = json::array();
-    for (std::size_t i = 0; i < list.size(); ++i) {
+    for (std::size_t i = 0; i < list.size(); ++i)
         result.push_back(CutDown(list[i], fields, place + '[' + std::to_string(i) + ']'));
-    }
     return result;
 }
 
 json CutDownNumber(json const& value, std::uint64_t most, std::string const& place)
 {
-    if (!value.is_number_unsigned() || value.get<std::uint64_t>() > most) {
+    if (!value.is_number_unsigned() || value.get<std::uint64_t>() > most)
         throw ImportError(place, "isn't a whole number from 0 to " + std::to_string(most));
-    }
     return value;
 }
 
@@ -89,14 +85,10 @@ json CutDownMember(json const& value, Field const& field, std::string const& pla
     case Shape::Index: return CutDownNumber(value, INT_MAX, place);
     case Shape::Size: return CutDownNumber(value, std::uint64_t{1} << 40, place);
     case Shape::Text:
-        if (!value.is_string()) {
-            throw ImportError(place, "isn't a text");
-        }
+        if (!value.is_string()) throw ImportError(place, "isn't a text");
         return value;
     case Shape::Flag:
-        if (!value.is_boolean()) {
-            throw ImportError(place, "is neither true nor false");
-        }
+        if (!value.is_boolean()) throw ImportError(place, "is neither true nor false");
         return value;
     case Shape::Object: return CutDown(value, field.inside, place);
     case Shape::Objects: return CutDownList(value, field.inside, place);
@@ -106,18 +98,15 @@ json CutDownMember(json const& value, Field const& field, std::string const& pla
 
 json CutDown(json const& object, std::span<Field const> fields, std::string const& place)
 {
-    if (!object.is_object()) {
-        throw ImportError(place, "isn't an object");
-    }
+    if (!object.is_object()) throw ImportError(place, "isn't an object");
     json result = json::object();
     for (Field const& field : fields) {
         auto const member = object.find(field.name);
         std::string const memberPlace = place.empty() ? field.name : place + '.' + field.name;
-        if (member != object.end()) {
+        if (member != object.end())
             result[field.name] = CutDownMember(*member, field, memberPlace);
-        } else if (field.required) {
+        else if (field.required)
             throw ImportError(memberPlace, "is missing");
-        }
     }
     return result;
 }
@@ -134,9 +123,8 @@ std::string LineAndColumn(std::string_view text, std::size_t byte)
 json ParseText(std::string_view text)
 {
     auto const limitDepth = [](int depth, json::parse_event_t, json&) {
-        if (depth > MaxDepth) {
+        if (depth > MaxDepth)
             throw ImportError("", "the JSON is nested more than " + std::to_string(MaxDepth) + " deep");
-        }
         return true;
     };
     try {
@@ -161,9 +149,7 @@ bool LeavesAnimationAlone(std::string_view extension)
 void RefuseUnknownExtensions(json const& document)
 {
     auto const required = document.find("extensionsRequired");
-    if (required == document.end() || !required->is_array()) {
-        return;
-    }
+    if (required == document.end() || !required->is_array()) return;
     for (json const& name : *required) {
         if (name.is_string() && !LeavesAnimationAlone(name.get_ref<std::string const&>())) {
             throw ImportError("extensionsRequired",
@@ -179,9 +165,8 @@ json ParseGltfJson(std::string_view text)
     json const document = ParseText(text);
     json result = CutDown(document, DocumentFields, "");
     auto const& version = result["asset"]["version"].get_ref<std::string const&>();
-    if (!version.starts_with("2.")) {
+    if (!version.starts_with("2."))
         throw ImportError("asset.version", "is \"" + CleanName(version) + "\"; versions 2.x are supported");
-    }
     RefuseUnknownExtensions(document);
     return result;
 }

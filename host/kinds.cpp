@@ -60,9 +60,7 @@ KFS_StreamBase* MakeLeaf(LeafKind const& kind, KFS_MatchName const& name, KFS_St
                                              description, &name, factory, canonical);
     leaf->pSetDisplayName(Q_AsciiToUTF16String(kind.matchName));
     T_Time const start{0, timeScale};
-    if (int const code = KFS_InsertKeyF(leaf.get(), &start, 1, kind.value.data(), 0, 0)) {
-        throw int{code};
-    }
+    if (int const code = KFS_InsertKeyF(leaf.get(), &start, 1, kind.value.data(), 0, 0)) throw int{code};
     return leaf.release();
 }
 
@@ -104,9 +102,7 @@ KFS_StreamBase* NodeGroup::CloneStream(KFS_CloneStreamParams const& params) cons
 
 void NodeGroup::FillCanonicalLayout(KFS_CanonicalLayout* layout)
 {
-    for (StreamKind const kind : AllStreamKinds) {
-        layout->push_back(GetFactory()->GetCanonicalStream(MatchNameOf(kind)));
-    }
+    for (StreamKind const kind : AllStreamKinds) layout->push_back(GetFactory()->GetCanonicalStream(MatchNameOf(kind)));
 }
 
 void NodeGroup::FillInDisplayName() const

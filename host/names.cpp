@@ -18,12 +18,8 @@ std::size_t SequenceLength(std::string_view text)
         return byte(index) >= low && byte(index) <= high;
     };
     unsigned int const first = byte(0);
-    if (first < 0x80) {
-        return 1;
-    }
-    if (first >= 0xC2 && first <= 0xDF) {
-        return follows(1) ? 2 : 0;
-    }
+    if (first < 0x80) return 1;
+    if (first >= 0xC2 && first <= 0xDF) return follows(1) ? 2 : 0;
     if (first >= 0xE0 && first <= 0xEF) {
         unsigned int const low = first == 0xE0 ? 0xA0 : 0x80;
         unsigned int const high = first == 0xED ? 0x9F : 0xBF;
@@ -53,11 +49,10 @@ std::string CleanName(std::string_view name)
     while (!name.empty()) {
         std::size_t const length = SequenceLength(name);
         std::string_view const sequence = name.substr(0, length == 0 ? 1 : length);
-        if (length == 0 || IsControl(sequence)) {
+        if (length == 0 || IsControl(sequence))
             clean += '?';
-        } else {
+        else
             clean += sequence;
-        }
         name.remove_prefix(sequence.size());
     }
     return clean;
@@ -70,9 +65,7 @@ std::string StemOf(std::string const& fileName)
 
 std::string UniqueNames::Make(std::string const& wanted)
 {
-    if (taken_.insert(wanted).second) {
-        return wanted;
-    }
+    if (taken_.insert(wanted).second) return wanted;
     int& copy = copies_.try_emplace(wanted, 1).first->second;
     std::string name;
     do {

@@ -21,9 +21,7 @@ constexpr double AccuracyShare = 1e-6;
 double Length(std::vector<double> const& vector)
 {
     double squares = 0.0;
-    for (double const number : vector) {
-        squares += number * number;
-    }
+    for (double const number : vector) squares += number * number;
     return std::sqrt(squares);
 }
 
@@ -44,12 +42,8 @@ struct SourceKey {
         ThrowIfFailed(KFS_GetKeyF(&stream, index, value.data(), &inInterp, &outInterp));
         ThrowIfFailed(KFS_GetKeyTangentsF(&stream, index, inX.data(), inY.data(), outX.data(), outY.data()));
         ThrowIfFailed(KFS_GetKeyVelocityF(&stream, index, 0, inSpeed.data(), outSpeed.data()));
-        if (inInterp != KFS_Interp_Spline) {
-            std::ranges::fill(inY, 0.0);
-        }
-        if (outInterp != KFS_Interp_Spline) {
-            std::ranges::fill(outY, 0.0);
-        }
+        if (inInterp != KFS_Interp_Spline) std::ranges::fill(inY, 0.0);
+        if (outInterp != KFS_Interp_Spline) std::ranges::fill(outY, 0.0);
     }
 
     std::vector<double> value, inX, inY, outX, outY, inSpeed, outSpeed;
@@ -62,9 +56,7 @@ class Box {
 public:
     void Add(std::vector<double> const& point)
     {
-        if (low_.empty()) {
-            low_ = high_ = point;
-        }
+        if (low_.empty()) low_ = high_ = point;
         for (std::size_t i = 0; i < point.size(); ++i) {
             low_[i] = std::min(low_[i], point[i]);
             high_[i] = std::max(high_[i], point[i]);
@@ -112,12 +104,8 @@ std::unique_ptr<KFS_Stream> MakePath(StreamItem const& item)
                        static_cast<KFS_Interp>(key.outInterp));
     }
     double const size = KeyCount(source) == 0 ? 0.0 : box.Diagonal();
-    if (!std::isfinite(size)) {
-        throw ImportError(item.place, "positions are too far apart for a path");
-    }
-    if (size > 0.0) {
-        builder.SetPathAccuracy(size * AccuracyShare);
-    }
+    if (!std::isfinite(size)) throw ImportError(item.place, "positions are too far apart for a path");
+    if (size > 0.0) builder.SetPathAccuracy(size * AccuracyShare);
     for (int i = 0; i < KeyCount(source); ++i) {
         key.Read(source, i);
         builder.SetPathTangents(i, key.inY.data(), key.outY.data());
@@ -132,9 +120,7 @@ std::unique_ptr<KFS_Stream> MakePath(StreamItem const& item)
 
 void LetInnerKeysFloat(KFS_Stream& path)
 {
-    for (int i = 1; i + 1 < KeyCount(path); ++i) {
-        ThrowIfFailed(KFS_SetKeyFloat(&path, 1, i));
-    }
+    for (int i = 1; i + 1 < KeyCount(path); ++i) ThrowIfFailed(KFS_SetKeyFloat(&path, 1, i));
 }
 
 bool IsFloatKey(KFS_Stream const& path, int index)
@@ -147,9 +133,7 @@ bool IsFloatKey(KFS_Stream const& path, int index)
 std::size_t FloatKeyCount(KFS_Stream const& path)
 {
     std::size_t count = 0;
-    for (int i = 0; i < KeyCount(path); ++i) {
-        count += IsFloatKey(path, i) ? 1 : 0;
-    }
+    for (int i = 0; i < KeyCount(path); ++i) count += IsFloatKey(path, i) ? 1 : 0;
     return count;
 }
 

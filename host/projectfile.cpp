@@ -40,26 +40,20 @@ constexpr int ComponentsId = CKF_Id("khco");
 template <std::size_t Size>
 void PutWord(std::array<unsigned char, Size>& bytes, std::size_t offset, std::uint32_t word)
 {
-    for (std::size_t i = 0; i < 4; ++i) {
-        bytes[offset + i] = static_cast<unsigned char>(word >> (24 - 8 * i));
-    }
+    for (std::size_t i = 0; i < 4; ++i) bytes[offset + i] = static_cast<unsigned char>(word >> (24 - 8 * i));
 }
 
 template <std::size_t Size>
 std::uint32_t GetWord(std::array<unsigned char, Size> const& bytes, std::size_t offset)
 {
     std::uint32_t word = 0;
-    for (std::size_t i = 0; i < 4; ++i) {
-        word = word << 8 | bytes[offset + i];
-    }
+    for (std::size_t i = 0; i < 4; ++i) word = word << 8 | bytes[offset + i];
     return word;
 }
 
 void ThrowCode(int code)
 {
-    if (code != 0) {
-        throw int{code};
-    }
+    if (code != 0) throw int{code};
 }
 
 // ---- going through a tree
@@ -79,11 +73,8 @@ void ForEachChannel(SceneGroup const& tree, Visit const& visit)
         auto& animation = dynamic_cast<AnimationGroup&>(*scene.GetEditableStream(i));
         for (unsigned int j = 0; j < animation.GetNumStreams(); ++j) {
             auto& node = dynamic_cast<NodeGroup&>(*animation.GetEditableStream(j));
-            for (StreamKind const kind : AllStreamKinds) {
-                if (node.FindChannel(kind)) {
-                    visit(Channel{animation, node, kind});
-                }
-            }
+            for (StreamKind const kind : AllStreamKinds)
+                if (node.FindChannel(kind)) visit(Channel{animation, node, kind});
         }
     }
 }
@@ -124,14 +115,11 @@ std::string FaultOfKeys(KFS_Stream const& stream)
     for (int i = 0; i < stream.GetKeyCount(); ++i) {
         T_Time time{};
         ThrowIfFailed(KFS_IndexToTime(&stream, i, &time));
-        if (i > 0 && time.value <= before.value) {
-            return "has keys that aren't in the order of their times";
-        }
+        if (i > 0 && time.value <= before.value) return "has keys that aren't in the order of their times";
         before = time;
         ThrowIfFailed(KFS_GetKeyF(&stream, i, numbers.data(), nullptr, nullptr));
-        if (!std::ranges::all_of(numbers, [](double number) { return std::isfinite(number); })) {
+        if (!std::ranges::all_of(numbers, [](double number) { return std::isfinite(number); }))
             return "has a key without a finite value";
-        }
     }
     return "";
 }
@@ -139,19 +127,13 @@ std::string FaultOfKeys(KFS_Stream const& stream)
 // Why a stream can't stand in a project whose scene has that scale. A project that has one is neither saved nor loaded.
 std::string FaultOf(KFS_Stream const& stream, unsigned int timeScale)
 {
-    if (stream.GetValueDesc()->isCustom || stream.GetDimension() < 1) {
-        return "isn't made of numbers";
-    }
-    if (stream.IsSpatial() && (stream.GetDimension() < 2 || stream.GetDimension() > 3)) {
+    if (stream.GetValueDesc()->isCustom || stream.GetDimension() < 1) return "isn't made of numbers";
+    if (stream.IsSpatial() && (stream.GetDimension() < 2 || stream.GetDimension() > 3))
         return "is a path in " + std::to_string(stream.GetDimension()) + " dimensions";
-    }
-    if (stream.GetTimeScale() != timeScale) {
-        return "isn't in the times of its scene";
-    }
+    if (stream.GetTimeScale() != timeScale) return "isn't in the times of its scene";
     // A reader makes a constant of a stream that may not move, and needs its first key's value for that.
-    if (stream.HasKeys() && stream.GetKeyCount() == 0 && !stream.CanBeAnimated()) {
+    if (stream.HasKeys() && stream.GetKeyCount() == 0 && !stream.CanBeAnimated())
         return "may not move, and has no value to stand at";
-    }
     return FaultOfKeys(stream);
 }
 
@@ -160,9 +142,7 @@ ChannelFacts DescriptionOf(Channel const& channel)
 {
     ChannelFacts facts = channel.node.FactsOf(channel.kind);
     auto const dimension = static_cast<std::size_t>(StreamOf(channel).GetDimension());
-    if (facts.components.size() != dimension) {
-        facts.components = UsualComponents(channel.kind, dimension);
-    }
+    if (facts.components.size() != dimension) facts.components = UsualComponents(channel.kind, dimension);
     return facts;
 }
 
@@ -187,9 +167,7 @@ void WriteFacts(CKF_File* file, ChannelFacts const& facts)
     PutWord(interpolation, 0, static_cast<std::uint32_t>(facts.interpolation));
     ThrowCode(CKF_WriteAtom(file, InterpolationId, 4, interpolation.data()));
     std::string lines = CleanName(facts.components.front());
-    for (std::size_t i = 1; i < facts.components.size(); ++i) {
-        lines += '\n' + CleanName(facts.components[i]);
-    }
+    for (std::size_t i = 1; i < facts.components.size(); ++i) lines += '\n' + CleanName(facts.components[i]);
     ThrowCode(CKF_WriteString(file, ComponentsId, Q_MBToUTF16String(lines), 0));
 }
 
@@ -202,11 +180,12 @@ void WriteProject(CKF_File* file, SceneGroup const& tree)
 
 void CheckTree(SceneGroup const& tree, std::string const& fileName)
 {
-    ForEachChannel(tree, [&](Channel const& channel) {
-        if (std::string const fault = FaultOf(StreamOf(channel), tree.times.scale); !fault.empty()) {
-            throw ProjectError(fileName, "can't be saved: " + Sentence(channel, fault));
-        }
-    });
+    ForEachChannel(
+        tree,
+        [&](Channel const& channel) {
+            if (std::string const fault = FaultOf(StreamOf(channel), tree.times.scale); !fault.empty())
+                throw ProjectError(fileName, "can't be saved: " + Sentence(channel, fault));
+        });
 }
 
 // All of a file that was just created, with the code that this gave.
@@ -240,9 +219,7 @@ public:
     template <class Source>
     std::unique_ptr<SceneGroup> Run(Source source)
     {
-        if (int const code = file_.Open(source)) {
-            Fail(code);
-        }
+        if (int const code = file_.Open(source)) Fail(code);
         CheckVersion();
         tree_ = std::make_unique<SceneGroup>(Get_VX_StreamFactory());
         try {
@@ -288,9 +265,7 @@ private:
     {
         bool found = false;
         CKF_ScDescendList const list(&file_, SceneListType, nullptr, &found);
-        if (!found) {
-            throw ProjectError(fileName_, "a project, but not one with a scene of this program");
-        }
+        if (!found) throw ProjectError(fileName_, "a project, but not one with a scene of this program");
         std::array<unsigned char, 16> bytes{};
         ThrowCode(CKF_ReadAtom(&file_, TimesId, list.GetChunkInfo(), static_cast<int>(bytes.size()), bytes.data()));
         SceneGroup::Times& times = tree_->times;
@@ -299,18 +274,15 @@ private:
         times.worstError =
             std::bit_cast<double>(static_cast<std::uint64_t>(GetWord(bytes, 8)) << 32 | GetWord(bytes, 12));
         if (times.scale == 0 || times.scale > static_cast<unsigned int>(std::numeric_limits<int>::max()) ||
-            !(times.worstError >= 0.0)) {
+            !(times.worstError >= 0.0))
             throw ProjectError(fileName_, "damaged: the scene has times in 1/" + std::to_string(times.scale) + " s");
-        }
     }
 
     void CheckChannel(Channel const& channel)
     {
         KFS_Stream const& stream = StreamOf(channel);
         try {
-            if (std::string const fault = FaultOf(stream, tree_->times.scale); !fault.empty()) {
-                FailIn(channel, fault);
-            }
+            if (std::string const fault = FaultOf(stream, tree_->times.scale); !fault.empty()) FailIn(channel, fault);
             channel.node.SetFacts(channel.kind, ReadFacts(channel, static_cast<std::size_t>(stream.GetDimension())));
         } catch (int code) {
             Fail(code);
@@ -328,9 +300,7 @@ private:
     {
         bool found = false;
         CKF_ScDescendList const list(&file_, ChannelListType, nullptr, &found);
-        if (!found) {
-            FailIn(channel, "isn't described");
-        }
+        if (!found) FailIn(channel, "isn't described");
         std::array<unsigned char, 4> interpolation{};
         ThrowCode(CKF_ReadAtom(&file_, InterpolationId, list.GetChunkInfo(), 4, interpolation.data()));
         u16str lines;
@@ -339,9 +309,8 @@ private:
         facts.interpolation = static_cast<SourceInterpolation>(GetWord(interpolation, 0));
         std::string const text = Q_UTF16ToMBString(lines);
         bool const isKnown = !NameOf(facts.interpolation).empty();
-        if (!isKnown || static_cast<std::size_t>(std::ranges::count(text, '\n')) + 1 != dimension) {
+        if (!isKnown || static_cast<std::size_t>(std::ranges::count(text, '\n')) + 1 != dimension)
             FailIn(channel, "is described as something else");
-        }
         for (std::size_t begin = 0; begin <= text.size();) {
             std::size_t const end = std::min(text.find('\n', begin), text.size());
             facts.components.push_back(CleanName(std::string_view(text).substr(begin, end - begin)));
@@ -369,9 +338,7 @@ public:
     {
         std::vector<NodeGroup*>& nodes = nodes_[item.node];
         std::size_t const index = leaves_[PathOf(item)]++;
-        if (index == nodes.size()) {
-            nodes.push_back(&group_.AppendNode(item.node));
-        }
+        if (index == nodes.size()) nodes.push_back(&group_.AppendNode(item.node));
         return *nodes[index];
     }
 
@@ -391,9 +358,7 @@ std::unique_ptr<SceneGroup> MakeTree(Scene scene)
     tree->times = {scene.timeScale, scene.exactTimes, scene.worstTimeError};
     std::optional<AnimationBuilder> animation;
     for (StreamItem& item : scene.streams) {
-        if (!animation || animation->Name() != item.animation) {
-            animation.emplace(*tree, item.animation);
-        }
+        if (!animation || animation->Name() != item.animation) animation.emplace(*tree, item.animation);
         NodeGroup& node = animation->NodeFor(item);
         node.PutChannel(item.kind, std::move(item.stream));
         node.SetFacts(item.kind, {item.interpolation, std::move(item.components)});

@@ -33,9 +33,7 @@ bool Fits(Wide value)
 
 Rational Reduced(Wide numerator, Wide denominator)
 {
-    if (denominator == 0) {
-        throw std::invalid_argument("a rational number with a denominator of 0");
-    }
+    if (denominator == 0) throw std::invalid_argument("a rational number with a denominator of 0");
     if (denominator < 0) {
         numerator = -numerator;
         denominator = -denominator;
@@ -43,9 +41,7 @@ Rational Reduced(Wide numerator, Wide denominator)
     Wide const divisor = CommonDivisor(denominator, Magnitude(numerator));
     numerator /= divisor;
     denominator /= divisor;
-    if (!Fits(numerator) || !Fits(denominator)) {
-        throw std::overflow_error("a rational number that doesn't fit 64 bits");
-    }
+    if (!Fits(numerator) || !Fits(denominator)) throw std::overflow_error("a rational number that doesn't fit 64 bits");
     return {static_cast<std::int64_t>(numerator), static_cast<std::int64_t>(denominator)};
 }
 
@@ -53,13 +49,9 @@ Rational Reduced(Wide numerator, Wide denominator)
 std::optional<std::int64_t> ParseDigits(std::string_view text)
 {
     std::int64_t value = 0;
-    if (text.empty() || text.front() == '-') {
-        return std::nullopt;
-    }
+    if (text.empty() || text.front() == '-') return std::nullopt;
     auto const [end, error] = std::from_chars(text.data(), text.data() + text.size(), value);
-    if (error != std::errc() || end != text.data() + text.size()) {
-        return std::nullopt;
-    }
+    if (error != std::errc() || end != text.data() + text.size()) return std::nullopt;
     return value;
 }
 
@@ -68,9 +60,7 @@ constexpr std::int64_t MostPlaces = 18;  // 10 to this power fits
 Rational PowerOfTen(std::int64_t power)
 {
     std::int64_t value = 1;
-    for (std::int64_t i = 0; i < (power < 0 ? -power : power); ++i) {
-        value *= 10;
-    }
+    for (std::int64_t i = 0; i < (power < 0 ? -power : power); ++i) value *= 10;
     return power < 0 ? Rational(1, value) : Rational(value, 1);
 }
 
@@ -80,9 +70,7 @@ std::optional<Rational> ParsePlainDecimal(std::string_view text)
     std::size_t const point = text.find('.');
     std::string_view const places = point == std::string_view::npos ? "" : text.substr(point + 1);
     auto const digits = ParseDigits(std::string(text.substr(0, point)).append(places));
-    if (!digits || places.size() > MostPlaces) {
-        return std::nullopt;
-    }
+    if (!digits || places.size() > MostPlaces) return std::nullopt;
     return Rational(*digits, 1) * PowerOfTen(-static_cast<std::int64_t>(places.size()));
 }
 
@@ -90,16 +78,12 @@ std::optional<Rational> ParseDecimal(std::string_view text)
 {
     std::size_t const mark = text.find_first_of("eE");
     auto const mantissa = ParsePlainDecimal(text.substr(0, mark));
-    if (!mantissa || mark == std::string_view::npos) {
-        return mantissa;
-    }
+    if (!mantissa || mark == std::string_view::npos) return mantissa;
     std::string_view exponent = text.substr(mark + 1);
     bool const negative = exponent.starts_with('-');
     exponent.remove_prefix(negative || exponent.starts_with('+') ? 1 : 0);
     auto const power = ParseDigits(exponent);
-    if (!power || *power > MostPlaces) {
-        return std::nullopt;
-    }
+    if (!power || *power > MostPlaces) return std::nullopt;
     return *mantissa * PowerOfTen(negative ? -*power : *power);
 }
 
@@ -107,9 +91,8 @@ std::optional<Rational> ParseDecimal(std::string_view text)
 
 Rational::Rational(std::int64_t numerator, std::int64_t denominator) : numerator_(numerator), denominator_(denominator)
 {
-    if (denominator <= 0 || CommonDivisor(denominator, Magnitude(numerator)) != 1) {
+    if (denominator <= 0 || CommonDivisor(denominator, Magnitude(numerator)) != 1)
         *this = Reduced(numerator, denominator);
-    }
 }
 
 std::optional<Rational> Rational::Parse(std::string_view text)
@@ -123,9 +106,7 @@ try {
     } else {
         auto const numerator = ParseDigits(text.substr(0, slash));
         auto const denominator = ParseDigits(text.substr(slash + 1));
-        if (numerator && denominator && *denominator != 0) {
-            value = Rational(*numerator, *denominator);
-        }
+        if (numerator && denominator && *denominator != 0) value = Rational(*numerator, *denominator);
     }
     return value && negative ? std::optional(Rational() - *value) : value;
 } catch (std::overflow_error const&) {

@@ -34,9 +34,8 @@ std::vector<std::string> UsualComponents(StreamKind kind, std::size_t dimension)
     constexpr std::string_view axes = "xyzw";
     bool const areAxes = kind != StreamKind::Weights && dimension <= axes.size();
     std::vector<std::string> names;
-    for (std::size_t i = 0; i < dimension; ++i) {
+    for (std::size_t i = 0; i < dimension; ++i)
         names.push_back(areAxes ? std::string(1, axes[i]) : 'w' + std::to_string(i));
-    }
     return names;
 }
 
@@ -54,9 +53,7 @@ Rational KeyTime(KFS_Stream const& stream, int index)
 {
     T_Time time{};
     ThrowIfFailed(KFS_IndexToTime(&stream, index, &time));
-    if (time.scale == 0) {
-        throw StoreError(KFS_Err_NoKeys);
-    }
+    if (time.scale == 0) throw StoreError(KFS_Err_NoKeys);
     return {time.value, time.scale};
 }
 

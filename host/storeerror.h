@@ -18,9 +18,7 @@ private:
 
 inline void ThrowIfFailed(int code)
 {
-    if (code != 0) {
-        throw StoreError(code);
-    }
+    if (code != 0) throw StoreError(code);
 }
 
 }  // namespace kfshost

@@ -34,9 +34,7 @@ bool IsExact(float time, unsigned int scale)
 double Longest(std::span<float const> times)
 {
     double longest = 0.0;
-    for (float const time : times) {
-        longest = std::max(longest, std::abs(static_cast<double>(time)));
-    }
+    for (float const time : times) longest = std::max(longest, std::abs(static_cast<double>(time)));
     return longest;
 }
 
@@ -44,9 +42,7 @@ unsigned int FinestPowerOfTwo(double longest)
 {
     for (int power = 30; power >= 0; --power) {
         unsigned int const scale = 1U << power;
-        if (Fits(longest, scale)) {
-            return scale;
-        }
+        if (Fits(longest, scale)) return scale;
     }
     throw std::range_error("a time that is too long for a 32-bit time line");
 }
@@ -60,9 +56,8 @@ int ToUnits(float time, unsigned int scale)
 
 TimeScale JudgeTimeScale(std::span<float const> times, unsigned int scale)
 {
-    if (scale == 0 || !Fits(Longest(times), scale)) {
+    if (scale == 0 || !Fits(Longest(times), scale))
         throw std::range_error("a time that doesn't fit a 32-bit time line of that scale");
-    }
     TimeScale result{scale, true, 0.0};
     for (float const time : times) {
         result.exact = result.exact && IsExact(time, scale);
@@ -74,11 +69,9 @@ TimeScale JudgeTimeScale(std::span<float const> times, unsigned int scale)
 TimeScale ChooseTimeScale(std::span<float const> times)
 {
     double const longest = Longest(times);
-    for (unsigned int const scale : WellKnown) {
-        if (Fits(longest, scale) && std::ranges::all_of(times, [&](float time) { return IsExact(time, scale); })) {
+    for (unsigned int const scale : WellKnown)
+        if (Fits(longest, scale) && std::ranges::all_of(times, [&](float time) { return IsExact(time, scale); }))
             return JudgeTimeScale(times, scale);
-        }
-    }
     return JudgeTimeScale(times, FinestPowerOfTwo(longest));
 }
 

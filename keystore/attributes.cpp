@@ -15,9 +15,7 @@ namespace {
 int MarkAllKeys(KFS_Stream const* stream, int (KFS_Stream::*mark)(int, short) const)
 {
     int const count = stream->GetKeyCount();
-    if (count <= SHRT_MAX) {
-        return (stream->*mark)(-1, static_cast<short>(count));
-    }
+    if (count <= SHRT_MAX) return (stream->*mark)(-1, static_cast<short>(count));
     KFSp_FirstError error;
     error.Keep((stream->*mark)(-1, SHRT_MAX));
     error.Keep((stream->*mark)(0, 1));  // a range holds all that lies between its ends
@@ -45,59 +43,44 @@ int RefuseMultiplier()
 int KFSp_CanDoSpInterp(KFS_Stream* stream, unsigned short code)
 {
     unsigned int const mask = stream->GetInterpMask();
-    if (code == 0 || (code <= 16 && ((mask >> (code - 1)) & 1U) != 0)) {
-        return 0;
-    }
+    if (code == 0 || (code <= 16 && ((mask >> (code - 1)) & 1U) != 0)) return 0;
     return KFSp_ReportNumber(KFSp_Op_CanDoSpInterp, KFS_Err_InterpNotAllowed, KFSp_Row_SpInterpNotAllowed, code);
 }
 
 int KFS_MergeStream(KFS_Stream* stream, T_Time const*, KFS_Stream** other)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_Merge, stream, KFSp_Row_Merge)) {
-        return code;
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_Merge, stream, KFSp_Row_Merge)) return code;
     return KFSp_CheckStream(KFSp_Op_Merge, *other, KFSp_Row_Merge);
 }
 
 int KFS_SetStreamIMask(KFS_Stream* stream, unsigned short mask)
 {
     int const code = KFSp_CheckStream(KFSp_Op_SetIMask, stream, KFSp_Row_SetIMask);
-    if (code == 0) {
-        stream->SetInterpMask(mask);
-    }
+    if (code == 0) stream->SetInterpMask(mask);
     return code;
 }
 
 int KFS_SetStreamSpIMask(KFS_Stream* stream, unsigned short mask)
 {
     int const code = KFSp_CheckStream(KFSp_Op_SetSpIMask, stream, KFSp_Row_SetSpIMask);
-    if (code == 0) {
-        stream->SetSpInterpMask(mask);
-    }
+    if (code == 0) stream->SetSpInterpMask(mask);
     return code;
 }
 
 int KFS_SetStreamSpInterp(KFS_Stream* stream, unsigned short spInterp)
 {
     int code = KFSp_CheckStream(KFSp_Op_SetSpInterp, stream, KFSp_Row_SetSpInterp);
-    if (code == 0) {
-        code = KFSp_CanDoSpInterp(stream, spInterp);
-    }
-    if (code == 0) {
-        stream->SetSpInterp(spInterp);
-    }
+    if (code == 0) code = KFSp_CanDoSpInterp(stream, spInterp);
+    if (code == 0) stream->SetSpInterp(spInterp);
     return code;
 }
 
 int KFS_SetStreamSParametrize(KFS_Stream* stream, unsigned char on)
 {
     return KFSp_Boundary([&] {
-        if (int const code = KFSp_CheckStream(KFSp_Op_SetSParametrize, stream, KFSp_Row_SetSpInterp)) {
-            return code;
-        }
-        if (!stream->IsSpatial()) {
+        if (int const code = KFSp_CheckStream(KFSp_Op_SetSParametrize, stream, KFSp_Row_SetSpInterp)) return code;
+        if (!stream->IsSpatial())
             return KFSp_ReportRow(KFSp_Op_SetSParametrize, KFS_Err_NotSpatial, KFSp_Row_StreamIsntSpatial);
-        }
         KFSp_FirstError error;
         if (stream->IsSParametrized() != (on != 0)) {
             error.Keep(MarkAllKeys(stream, &KFS_Stream::SetArcInvalid));
@@ -112,9 +95,7 @@ int KFS_SetStreamSParametrize(KFS_Stream* stream, unsigned char on)
 int KFS_SetCustomFuncs(KFS_Stream* stream, KFS_CopyItemFunc copyItem, KFS_DisposeItemFunc disposeItem)
 {
     return KFSp_Boundary([&] {
-        if (int const code = KFSp_CheckStream(KFSp_Op_SetCustomFuncs, stream, KFSp_Row_SetCustomFuncs)) {
-            return code;
-        }
+        if (int const code = KFSp_CheckStream(KFSp_Op_SetCustomFuncs, stream, KFSp_Row_SetCustomFuncs)) return code;
         stream->SetCopyItemFunc(copyItem);
         stream->SetDisposeItemFunc(disposeItem);
         return KFSp_SetKeyFuncs(stream);
@@ -124,70 +105,40 @@ int KFS_SetCustomFuncs(KFS_Stream* stream, KFS_CopyItemFunc copyItem, KFS_Dispos
 int KFS_GetStreamAccuracy(KFS_Stream const* stream, double* accuracy)
 {
     int const code = KFSp_CheckStream(KFSp_Op_GetAccuracy, stream, KFSp_Row_SetValueDesc);
-    if (code == 0) {
-        *accuracy = std::sqrt(stream->GetAccuracy());
-    }
+    if (code == 0) *accuracy = std::sqrt(stream->GetAccuracy());
     return code;
 }
 
 int KFS_SetStreamAccuracy(KFS_Stream* stream, double const* newValue, double* oldValue)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_SetAccuracy, stream, KFSp_Row_SetValueDesc)) {
-        return code;
-    }
-    if (oldValue) {
-        *oldValue = std::sqrt(stream->GetAccuracy());
-    }
-    if (newValue) {
-        stream->SetAccuracy(*newValue * *newValue);
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_SetAccuracy, stream, KFSp_Row_SetValueDesc)) return code;
+    if (oldValue) *oldValue = std::sqrt(stream->GetAccuracy());
+    if (newValue) stream->SetAccuracy(*newValue * *newValue);
     return 0;
 }
 
 int KFS_GetStreamMultiplier(KFS_Stream const* stream, double* multiplier)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_GetMultiplier, stream, KFSp_Row_SetValueDesc)) {
-        return code;
-    }
-    if (!stream->IsSpatial()) {
-        return RefuseMultiplier();
-    }
-    for (int i = 0; i < stream->GetDimension(); ++i) {
-        multiplier[i] = stream->GetMultiplier()[i & 3];
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_GetMultiplier, stream, KFSp_Row_SetValueDesc)) return code;
+    if (!stream->IsSpatial()) return RefuseMultiplier();
+    for (int i = 0; i < stream->GetDimension(); ++i) multiplier[i] = stream->GetMultiplier()[i & 3];
     return 0;
 }
 
 int KFS_SetStreamMultiplier(KFS_Stream* stream, double const* newValue, double* oldValue)
 {
     return KFSp_Boundary([&] {
-        if (int const code = KFSp_CheckStream(KFSp_Op_SetMultiplier, stream, KFSp_Row_SetValueDesc)) {
-            return code;
-        }
-        if (!stream->IsSpatial()) {
-            return RefuseMultiplier();
-        }
+        if (int const code = KFSp_CheckStream(KFSp_Op_SetMultiplier, stream, KFSp_Row_SetValueDesc)) return code;
+        if (!stream->IsSpatial()) return RefuseMultiplier();
         M_Vector4T<double>& multiplier = *stream->GetMultiplierForModify();
         for (int i = 0; i < stream->GetDimension(); ++i) {
-            if (oldValue) {
-                oldValue[i] = multiplier[i & 3];
-            }
-            if (newValue) {
-                multiplier[i & 3] = newValue[i];
-            }
+            if (oldValue) oldValue[i] = multiplier[i & 3];
+            if (newValue) multiplier[i & 3] = newValue[i];
         }
-        if (!newValue) {
-            return 0;
-        }
-        if (int const code = MarkAllKeys(stream, &KFS_Stream::SetInvalid)) {
-            return code;
-        }
-        if (int const code = MarkAllKeys(stream, &KFS_Stream::SetArcInvalid)) {
-            return code;
-        }
-        if (int const code = ForgetComputedValue(stream)) {
-            return code;
-        }
+        if (!newValue) return 0;
+        if (int const code = MarkAllKeys(stream, &KFS_Stream::SetInvalid)) return code;
+        if (int const code = MarkAllKeys(stream, &KFS_Stream::SetArcInvalid)) return code;
+        if (int const code = ForgetComputedValue(stream)) return code;
         return Notify(stream);
     });
 }

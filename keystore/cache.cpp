@@ -22,11 +22,10 @@ constexpr int CacheMemoryId = 0x1D0003;
 int CopyKeyToCache(KFS_StreamKeyData const* data, int index)
 {
     int const code = SEQ_GetItemCopy(data->keys, 0, index, data->cache);
-    if (code != 0) {
+    if (code != 0)
         data->cache->time = KFS_INVALID_INDEX;
-    } else if (KFSp_HasSpatialBlock(data->cache)) {
+    else if (KFSp_HasSpatialBlock(data->cache))
         data->cache->remapTable = nullptr;
-    }
     return code;
 }
 
@@ -67,21 +66,13 @@ int InterpolateToCache(KFS_Stream const* stream, KFS_StreamKeyData const* data, 
 inline int FillBetweenKeys(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int next,
                            KFS_InterpFunc* interpFunc, long refcon)
 {
-    if (next == 0) {
-        return CopyKeyToCache(data, 0);
-    }
-    if (next >= KFSp_ItemCount(data)) {
-        return CopyKeyToCache(data, next - 1);
-    }
+    if (next == 0) return CopyKeyToCache(data, 0);
+    if (next >= KFSp_ItemCount(data)) return CopyKeyToCache(data, next - 1);
     if (!stream->IsSpatial()) {
         auto const [a, b] = KFSp_GetKeyPair(data, next - 1);
-        if (a->outInterp == KFS_Interp_Hold) {
-            return CopyKeyToCache(data, next - 1);
-        }
+        if (a->outInterp == KFS_Interp_Hold) return CopyKeyToCache(data, next - 1);
         // A hold on the far side takes the later key's value, and is meant to.
-        if (b->inInterp == KFS_Interp_Hold) {
-            return CopyKeyToCache(data, next);
-        }
+        if (b->inInterp == KFS_Interp_Hold) return CopyKeyToCache(data, next);
         if (!interpFunc && stream->GetInterpFunc() == KFSp_Interpolate) [[likely]] {
             int const code = KFSp_InterpolateBetween(stream, a, b, time, KFSp_Numbers(data->cache));
             data->cache->time = code == 0 ? time : KFS_INVALID_INDEX;
@@ -91,9 +82,7 @@ inline int FillBetweenKeys(KFS_Stream const* stream, KFS_StreamKeyData const* da
     KFSp_FirstError error;
     {
         KFSp_ScConstPin const pin(data->keys, error);
-        if (error.None()) {
-            error.Keep(InterpolateToCache(stream, data, time, next - 1, interpFunc, refcon));
-        }
+        if (error.None()) error.Keep(InterpolateToCache(stream, data, time, next - 1, interpFunc, refcon));
     }
     return error.Code();
 }
@@ -110,9 +99,7 @@ KFS_KeyScalar* KFS_Stream::AllocateCacheImpl() const
 {
     auto* const cache = static_cast<KFS_KeyScalar*>(Q_AllocatePtrClear(
         CacheMemoryId, KFSp_MessageText(KFSp_Row_StreamValueCache), static_cast<std::size_t>(GetCacheSize())));
-    if (!cache) {
-        throw int{KFS_Err_OutOfMemory};
-    }
+    if (!cache) throw int{KFS_Err_OutOfMemory};
     cache->time = KFS_INVALID_INDEX;
     return cache;
 }
@@ -134,9 +121,7 @@ KFS_KeyScalar* KFS_Stream::CloneCache(KFS_KeyScalar const* source) const
 {
     KFS_KeyScalar* const clone = AllocateCacheImpl();
     std::memcpy(static_cast<void*>(clone), source, static_cast<std::size_t>(GetCacheSize()));
-    if (KFSp_HasSpatialBlock(clone)) {
-        clone->remapTable = nullptr;
-    }
+    if (KFSp_HasSpatialBlock(clone)) clone->remapTable = nullptr;
     if (!KFSp_CacheIsEmpty(source) && copyItemFunc_) {
         int const code = KFSp_Boundary([&] {
             return copyItemFunc_(this, GetItemRefcon(), KFS_Item_CacheWhole, KFSp_ValueData(source),
@@ -152,13 +137,10 @@ KFS_KeyScalar* KFS_Stream::CloneCache(KFS_KeyScalar const* source) const
 
 int KFSp_ClearCacheRecord(KFS_Stream const* stream, KFS_KeyScalar* cache)
 {
-    if (KFSp_CacheIsEmpty(cache)) {
-        return 0;
-    }
+    if (KFSp_CacheIsEmpty(cache)) return 0;
     int code = 0;
-    if (KFS_DisposeItemFunc const dispose = stream->GetDisposeItemFunc()) {
+    if (KFS_DisposeItemFunc const dispose = stream->GetDisposeItemFunc())
         code = dispose(stream, stream->GetItemRefcon(), KFS_Item_CacheWhole, KFSp_ValueData(cache));
-    }
     cache->time = KFS_INVALID_INDEX;
     return code;
 }
@@ -181,9 +163,7 @@ int KFSp_SetupCache(KFS_Stream const* stream, int time, void const* value, char 
         cache->spFlags = 0;
         cache->remapTable = nullptr;
     }
-    if (!value) {
-        return 0;
-    }
+    if (!value) return 0;
     KFS_CopyItemFunc const copy = !convert || stream->IsCustom() ? KFSp_FakeCopyItemFunc : KFSp_ConvertItemToFloat;
     return copy(stream, 0, kind, value, KFSp_ValueData(cache));
 }
@@ -201,18 +181,13 @@ inline void UpdateCache(KFS_Stream const* stream, KFS_StreamKeyData const* data,
 {
     KFS_KeyScalar* const cache = data->cache;
     if (stream->HasNoKeys()) {
-        if (time != KFS_INVALID_INDEX) {  // which would say that the constant has no value
+        if (time != KFS_INVALID_INDEX)  // which would say that the constant has no value
             cache->time = time;
-        }
-        if (request.atKey) {
-            *request.atKey = 1;
-        }
+        if (request.atKey) *request.atKey = 1;
         return;
     }
     bool const stands = !request.value || (cache->time == time && !KFSp_CacheIsEmpty(cache));
-    if (stands && !request.atKey) {
-        return;
-    }
+    if (stands && !request.atKey) return;
     bool found = false;
     int index = 0;
     KFSp_ThrowIf(KFSp_SearchKeys(data, time, &found, &index));
@@ -228,15 +203,12 @@ inline void UpdateCache(KFS_Stream const* stream, KFS_StreamKeyData const* data,
             KFSp_ThrowIf(stream->UpdateStream());
             KFSp_ThrowIf(KFSp_SearchKeys(data, time, &found, &index));  // float keys may have moved
         }
-        if (found) {
+        if (found)
             KFSp_ThrowIf(CopyKeyToCache(data, index));
-        } else if (!request.keyOnly && KFSp_ItemCount(data) > 0) {
+        else if (!request.keyOnly && KFSp_ItemCount(data) > 0)
             KFSp_ThrowIf(FillBetweenKeys(stream, data, time, index, request.interpFunc, request.refcon));
-        }
     }
-    if (request.atKey) {
-        *request.atKey = found ? 1 : 0;
-    }
+    if (request.atKey) *request.atKey = found ? 1 : 0;
 }
 
 }  // namespace

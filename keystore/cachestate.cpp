@@ -15,13 +15,9 @@ void KFS_StreamCacheState::Deactivate() {}
 
 KFS_StreamKeyData* KFS_StreamCacheState::GetOverrideKeyData(KFS_Stream const* stream, KFS_StreamKeyData const& source)
 {
-    if (stream == lastStream_) {
-        return lastKeyData_;
-    }
+    if (stream == lastStream_) return lastKeyData_;
     boost::shared_ptr<KFS_StreamKeyData>& entry = keyData_[stream];
-    if (!entry) {
-        entry = boost::make_shared<KFS_StreamKeyData>(source, stream);
-    }
+    if (!entry) entry = boost::make_shared<KFS_StreamKeyData>(source, stream);
     lastStream_ = stream;
     lastKeyData_ = entry.get();
     return lastKeyData_;

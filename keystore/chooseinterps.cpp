@@ -35,9 +35,7 @@ void TakeSegment(KFS_KeyScalar const* a, KFS_KeyScalar const* b, Proposal* propo
     }
     TakeFlags(a, proposal);
     proposal->flags &= b->flags;
-    if (KFSp_HasSpatialBlock(b)) {
-        proposal->spFlags = proposal->hasSpFlags ? proposal->spFlags & b->spFlags : b->spFlags;
-    }
+    if (KFSp_HasSpatialBlock(b)) proposal->spFlags = proposal->hasSpFlags ? proposal->spFlags & b->spFlags : b->spFlags;
     proposal->hasSpFlags = KFSp_HasSpatialBlock(b);
 }
 
@@ -45,21 +43,15 @@ int ProposeInList(KFS_StreamKeyData const* data, int time, Proposal* proposal)
 {
     bool found = false;
     int index = 0;
-    if (int const code = KFSp_SearchKeys(data, time, &found, &index)) {
-        return code;
-    }
+    if (int const code = KFSp_SearchKeys(data, time, &found, &index)) return code;
     KFSp_FirstError error;
     {
         KFSp_ScConstPin const pin(data->keys, error);
         int const count = KFSp_ItemCount(data);
         KFS_KeyScalar const* a = nullptr;  // the key before the time
         KFS_KeyScalar const* b = nullptr;  // the key at the time, or after it
-        if (error.None() && index > 0 && !found) {
-            error.Keep(KFSp_GetConstKey(data, index - 1, &a));
-        }
-        if (error.None() && index < count) {
-            error.Keep(KFSp_GetConstKey(data, index, &b));
-        }
+        if (error.None() && index > 0 && !found) error.Keep(KFSp_GetConstKey(data, index - 1, &a));
+        if (error.None() && index < count) error.Keep(KFSp_GetConstKey(data, index, &b));
         if (!error.None()) {
             // as it is: nothing is proposed
         } else if (a && b) {
@@ -76,9 +68,7 @@ int ProposeInList(KFS_StreamKeyData const* data, int time, Proposal* proposal)
 int Propose(KFS_Stream const* stream, T_Time const* time, Proposal* proposal)
 {
     int at = 0;
-    if (int const code = KFSp_TimeInStream(stream, time, &at)) {
-        return code;
-    }
+    if (int const code = KFSp_TimeInStream(stream, time, &at)) return code;
     KFS_StreamKeyData const* const data = stream->GetKeyData();
     if (stream->HasNoKeys()) {
         if (!KFSp_CacheIsEmpty(data->cache)) {
@@ -107,25 +97,15 @@ int KFSp_ChooseInterpsAndFlags(KFS_Stream* stream, T_Time const* time, char* inI
     Proposal proposal;
     KFSp_FirstError error;
     error.Keep(KFSp_CheckStream(KFSp_Op_ChooseInterps, stream, KFSp_Row_InquireKey));
-    if (error.None()) {
-        error.Keep(KFSp_Boundary([&] { return Propose(stream, time, &proposal); }));
-    }
-    if (!error.None()) {
-        proposal = {};
-    }
-    if (inInterp) {
-        *inInterp = static_cast<char>(proposal.in);
-    }
+    if (error.None()) error.Keep(KFSp_Boundary([&] { return Propose(stream, time, &proposal); }));
+    if (!error.None()) proposal = {};
+    if (inInterp) *inInterp = static_cast<char>(proposal.in);
     if (outInterp) {
         // Nothing can follow a hold but a hold, or the value would jump back.
         *outInterp = static_cast<char>(proposal.in == KFS_Interp_Hold ? proposal.in : proposal.out);
     }
-    if (flags) {
-        *flags = proposal.flags;
-    }
-    if (spFlags && proposal.hasSpFlags) {
-        *spFlags = proposal.spFlags;
-    }
+    if (flags) *flags = proposal.flags;
+    if (spFlags && proposal.hasSpFlags) *spFlags = proposal.spFlags;
     return error.Code();
 }
 

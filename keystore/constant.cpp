@@ -17,20 +17,16 @@ constexpr int CanonicalLine = 998;
 void Verify(KFS_Stream const* stream)
 {
     constexpr int id = KFSp_ReportId(KFSp_Op_SetConstant);
-    if (!stream->CanBeAnimated()) {
+    if (!stream->CanBeAnimated())
         Q_ReportFailedVerification(id, NotAnimatableLine, 0, "attempt to animate a non-animatable stream");
-    }
-    if (stream->IsCanonical()) {
+    if (stream->IsCanonical())
         Q_ReportFailedVerification(id, CanonicalLine, 0, "attempt to animate the canonical instance stream");
-    }
 }
 
 int DisposeList(KFS_Stream* stream)
 {
     int code = KFS_DisposeRemapTables(stream);
-    if (KFS_KeyScalar* const cache = stream->GetCache(); KFSp_HasSpatialBlock(cache)) {
-        cache->remapTable = nullptr;
-    }
+    if (KFS_KeyScalar* const cache = stream->GetCache(); KFSp_HasSpatialBlock(cache)) cache->remapTable = nullptr;
     if (code == 0) {
         SEQ_Head** const keys = stream->GetKeys();
         stream->SetKeys(nullptr);  // whatever the disposal says, the list is gone after it
@@ -48,18 +44,12 @@ int MakeFirstKey(KFS_Stream* stream)
     error.Keep(value.Code());
     if (error.None()) {
         KFS_KeyScalar* const cache = stream->GetCache();
-        if (stream->IsSpatial()) {
-            cache->flags &= ~KFS_KeyFlag_TangentsSet;
-        }
+        if (stream->IsSpatial()) cache->flags &= ~KFS_KeyFlag_TangentsSet;
         error.Keep(KFSp_PutKeyFromCache(0, 1, 0, 0, stream, nullptr));
-        if (!error.None()) {
-            value.Restore();
-        }
+        if (!error.None()) value.Restore();
     }
     if (!error.None()) {
-        if (!hadList && stream->GetKeys()) {
-            static_cast<void>(DisposeList(stream));
-        }
+        if (!hadList && stream->GetKeys()) static_cast<void>(DisposeList(stream));
         stream->SetKFSFlags(stream->GetKFSFlags() | KFS_StreamFlag_NoKeys);
         return error.Code();
     }
@@ -72,18 +62,14 @@ int MakeKeyed(KFS_Stream* stream, bool keepValue)
 {
     Verify(stream);
     stream->SetKFSFlags(stream->GetKFSFlags() & ~KFS_StreamFlag_NoKeys);
-    if (!keepValue) {
-        return KFSp_ClearCache(stream);
-    }
+    if (!keepValue) return KFSp_ClearCache(stream);
     return KFSp_CacheIsEmpty(stream->GetCache()) ? 0 : MakeFirstKey(stream);
 }
 
 int MakeConstant(KFS_Stream* stream)
 {
     if (stream->GetKeys()) {
-        if (int const code = DisposeList(stream)) {
-            return code;
-        }
+        if (int const code = DisposeList(stream)) return code;
     }
     stream->SetKFSFlags(stream->GetKFSFlags() | KFS_StreamFlag_NoKeys);
     for (int* const range : {stream->GetInvalidKeyIndexForModify(), stream->GetArcInvalidKeyIndexForModify()}) {
@@ -97,13 +83,9 @@ int MakeConstant(KFS_Stream* stream)
 
 int KFS_Stream::SetConstant(unsigned char constant, unsigned char keepValue)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_SetConstant, this, KFSp_Row_SetConstant)) {
-        return code;
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_SetConstant, this, KFSp_Row_SetConstant)) return code;
     bool const toConstant = constant != 0;
-    if (HasNoKeys() == toConstant) {
-        return 0;
-    }
+    if (HasNoKeys() == toConstant) return 0;
     KFSp_FirstError error;
     error.Keep(KFSp_Boundary([&] { return toConstant ? MakeConstant(this) : MakeKeyed(this, keepValue != 0); }));
     error.Keep(KFSp_Boundary([this] { NotifyValueChanged(); }));

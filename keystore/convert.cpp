@@ -30,13 +30,12 @@ struct Fixed {
         double const sum = number * UnitsPerFixed + (number < 0.0 ? -0.5 : 0.5);
         constexpr double beyond = 9223372036854775808.0;  // 2 to the 63rd
         std::int64_t whole = 0;
-        if (sum >= beyond) {
+        if (sum >= beyond)
             whole = std::numeric_limits<std::int64_t>::max();
-        } else if (sum < -beyond) {
+        else if (sum < -beyond)
             whole = std::numeric_limits<std::int64_t>::min();
-        } else if (sum == sum) {
+        else if (sum == sum)
             whole = static_cast<std::int64_t>(sum);
-        }
         return static_cast<Element>(whole);
     }
 };
@@ -75,9 +74,7 @@ void ElementsFromDoubles(int count, void const* source, void* destination)
 
 void CopyDoubles(int count, void const* source, void* destination)
 {
-    if (count > 0) {
-        std::memmove(destination, source, static_cast<std::size_t>(count) * sizeof(double));
-    }
+    if (count > 0) std::memmove(destination, source, static_cast<std::size_t>(count) * sizeof(double));
 }
 
 struct Conversion {
@@ -129,51 +126,41 @@ int ElementCount(KFS_Stream const* stream, short kind)
 
 void MoveBlock(KFS_Stream const* stream, short kind, void const* source, void* destination)
 {
-    if (stream->IsCustom()) {
+    if (stream->IsCustom())
         std::memmove(destination, source, stream->GetValueDesc()->itemSize);
-    } else {
+    else
         CopyDoubles(ElementCount(stream, kind), source, destination);
-    }
 }
 
 }  // namespace
 
 int KFSp_ConvertItemToFloat(KFS_Stream const* stream, long, short kind, void const* source, void* destination)
 {
-    if (stream->IsCustom()) {
-        return KFSp_RefuseCustomValue(KFSp_Op_ConvertToFloat, KFSp_Row_ConvertTo);
-    }
-    if (Conversion const* const conversion = FindConversion(stream->GetValueDesc()->dataType)) {
+    if (stream->IsCustom()) return KFSp_RefuseCustomValue(KFSp_Op_ConvertToFloat, KFSp_Row_ConvertTo);
+    if (Conversion const* const conversion = FindConversion(stream->GetValueDesc()->dataType))
         conversion->toDoubles(ElementCount(stream, kind), source, destination);
-    }
     return 0;
 }
 
 int KFSp_ConvertItemFromFloat(KFS_Stream const* stream, long, short kind, void const* source, void* destination)
 {
-    if (stream->IsCustom()) {
-        return KFSp_RefuseCustomValue(KFSp_Op_ConvertFromFloat, KFSp_Row_ConvertFrom);
-    }
-    if (Conversion const* const conversion = FindConversion(stream->GetValueDesc()->dataType)) {
+    if (stream->IsCustom()) return KFSp_RefuseCustomValue(KFSp_Op_ConvertFromFloat, KFSp_Row_ConvertFrom);
+    if (Conversion const* const conversion = FindConversion(stream->GetValueDesc()->dataType))
         conversion->fromDoubles(ElementCount(stream, kind), source, destination);
-    }
     return 0;
 }
 
 int KFS_ConvertItemFromFloat(short count, char dataType, double const* source, void* destination)
 {
-    if (Conversion const* const conversion = FindConversion(dataType)) {
+    if (Conversion const* const conversion = FindConversion(dataType))
         conversion->fromDoubles(count, source, destination);
-    }
     return 0;
 }
 
 int KFSp_FakeCopyItemFunc(KFS_Stream const* stream, long, short kind, void const* source, void* destination)
 {
     MoveBlock(stream, kind, source, destination);
-    if (kind == KFS_Item_Component || !stream->IsFloatBased()) {
-        return 0;
-    }
+    if (kind == KFS_Item_Component || !stream->IsFloatBased()) return 0;
     return KFSp_Boundary([&] { stream->GetAsLeaf()->LegalizeValue(static_cast<double*>(destination)); });
 }
 

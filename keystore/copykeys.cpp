@@ -33,18 +33,14 @@ int DataSize(KFS_Stream const* stream)
 // A record is read for as many bytes as the destination has; what they mean isn't looked at.
 int CheckRoom(Route const& route, int operation)
 {
-    if (DataSize(route.source) >= DataSize(route.destination)) {
-        return 0;
-    }
+    if (DataSize(route.source) >= DataSize(route.destination)) return 0;
     return Qp_ReportLegacyErrString(KFSp_ReportId(operation), KFSp_Severity, KFS_Err_LegacyMismatch,
                                     KFSp_MessageText(KFSp_Row_KeyDataSizeMismatch));
 }
 
 int CheckStreams(KFS_Stream const* source, KFS_Stream const* destination, short operation)
 {
-    if (int const code = KFSp_CheckStream(operation, source, KFSp_Row_CopyKeyFrom)) {
-        return code;
-    }
+    if (int const code = KFSp_CheckStream(operation, source, KFSp_Row_CopyKeyFrom)) return code;
     return KFSp_CheckStream(operation, destination, KFSp_Row_CopyKeyTo);
 }
 
@@ -71,9 +67,7 @@ void CopyFlags(KFS_KeyScalar const* record, KFS_KeyScalar* copy)
 
 void CopySpatialBlock(KFS_KeyScalar const* record, KFS_KeyScalar* copy)
 {
-    if (!KFSp_HasSpatialBlock(record) || !KFSp_HasSpatialBlock(copy)) {
-        return;
-    }
+    if (!KFSp_HasSpatialBlock(record) || !KFSp_HasSpatialBlock(copy)) return;
     copy->spFlags = record->spFlags;
     copy->arcLength = record->arcLength;
     copy->inSpeed = record->inSpeed;
@@ -87,9 +81,7 @@ int TimeAtDestination(Route const& route, int operation, short row, T_Time const
 {
     T_Time converted = time;
     if (time.scale != route.destination->GetTimeScale()) {
-        if (int const code = T_ConvTime(&time, route.destination->GetTimeScale(), &converted, 0)) {
-            return code;
-        }
+        if (int const code = T_ConvTime(&time, route.destination->GetTimeScale(), &converted, 0)) return code;
     }
     *value = converted.value;
     return converted.value != KFS_INVALID_INDEX ? 0 : KFSp_ReportErr(operation, KFS_Err_TimeNotRepresentable, row);
@@ -129,9 +121,7 @@ public:
             return 0;
         }
         KFS_DisposeItemFunc const dispose = stream_->GetDisposeItemFunc();
-        if (!dispose || KFSp_CacheIsEmpty(cache_.get())) {
-            return 0;
-        }
+        if (!dispose || KFSp_CacheIsEmpty(cache_.get())) return 0;
         return dispose(stream_, stream_->GetItemRefcon(), KFS_Item_CacheWhole, KFSp_ValueData(cache_.get()));
     }
 
@@ -144,25 +134,20 @@ int PutCopy(Route const& route, KFS_KeyScalar const* record, int time, bool repl
 {
     KFSp_FirstError error;
     error.Keep(AssembleCopy(route, record, time));
-    if (error.None()) {
-        error.Keep(KFSp_PutKeyFromCache(replace, 1, 1, 0, route.destination, index));
-    }
+    if (error.None()) error.Keep(KFSp_PutKeyFromCache(replace, 1, 1, 0, route.destination, index));
     return error.Code();
 }
 
 int CopyToConstant(Route const& route, KFS_KeyScalar const* record, int time, bool replace, int* index)
 {
-    if (!KFSp_CacheIsEmpty(route.to->cache) && !replace) {
+    if (!KFSp_CacheIsEmpty(route.to->cache) && !replace)
         return KFSp_ReportErr(KFSp_Op_InsertKey, KFS_Err_KeyValue, KFSp_Row_OverwriteKey);
-    }
     if (record == route.to->cache) {  // onto itself
         *index = 0;
         return 0;
     }
     SavedConstant old(route.destination);
-    if (old.Code() != 0) {
-        return old.Code();
-    }
+    if (old.Code() != 0) return old.Code();
     KFSp_FirstError error;
     error.Keep(PutCopy(route, record, time, replace, index));
     error.Keep(KFSp_Boundary([&] { return old.End(error.None()); }));
@@ -171,9 +156,7 @@ int CopyToConstant(Route const& route, KFS_KeyScalar const* record, int time, bo
 
 int CopyToKeys(Route const& route, KFS_KeyScalar const* record, int time, bool replace, int* index)
 {
-    if (int const code = KFSp_ClearCache(route.destination)) {
-        return code;
-    }
+    if (int const code = KFSp_ClearCache(route.destination)) return code;
     int const code = PutCopy(route, record, time, replace, index);
     route.to->cache->time = KFS_INVALID_INDEX;  // what it holds is the source's
     return code;
@@ -183,33 +166,23 @@ int CopyRecord(Route const& route, KFS_KeyScalar const* record, bool replace, T_
 {
     T_Time const own{route.source->HasNoKeys() ? 0 : record->time, route.source->GetTimeScale()};
     int at = 0;
-    if (int const code = TimeAtDestination(route, KFSp_Op_CopyKey, KFSp_Row_CopyKeyTo, time ? *time : own, &at)) {
+    if (int const code = TimeAtDestination(route, KFSp_Op_CopyKey, KFSp_Row_CopyKeyTo, time ? *time : own, &at))
         return code;
-    }
     return route.destination->HasNoKeys() ? CopyToConstant(route, record, at, replace, index)
                                           : CopyToKeys(route, record, at, replace, index);
 }
 
 int CopyKey(Route const& route, int index, bool replace, T_Time const* time, int* newIndex)
 {
-    if (KFSp_HasNoValue(route.source, route.from)) {
+    if (KFSp_HasNoValue(route.source, route.from))
         return KFSp_ReportErr(KFSp_Op_CopyKey, KFS_Err_NoKeys, KFSp_Row_CopyKeyFrom);
-    }
-    if (int const code = CheckRoom(route, KFSp_Op_CopyKey)) {
-        return code;
-    }
-    if (int const code = BringUpToDate(route)) {
-        return code;
-    }
-    if (route.source->HasNoKeys()) {
-        return CopyRecord(route, route.from->cache, replace, time, newIndex);
-    }
+    if (int const code = CheckRoom(route, KFSp_Op_CopyKey)) return code;
+    if (int const code = BringUpToDate(route)) return code;
+    if (route.source->HasNoKeys()) return CopyRecord(route, route.from->cache, replace, time, newIndex);
     KFSp_FirstError error;
     {
         KFSp_ScKey const key(route.from->keys, index, error);
-        if (error.None()) {
-            error.Keep(CopyRecord(route, key.get(), replace, time, newIndex));
-        }
+        if (error.None()) error.Keep(CopyRecord(route, key.get(), replace, time, newIndex));
     }
     return error.Code();
 }
@@ -217,17 +190,12 @@ int CopyKey(Route const& route, int index, bool replace, T_Time const* time, int
 int CopyOneKey(Route const& route, int index, KFSp_CopyUndo& undo)
 {
     KFS_KeyScalar const* record = nullptr;
-    if (int const code = KFSp_GetConstKey(route.from, index, &record)) {
-        return code;
-    }
+    if (int const code = KFSp_GetConstKey(route.from, index, &record)) return code;
     int at = 0;
     if (int const code = TimeAtDestination(route, KFSp_Op_CopyKeys, KFSp_Row_CopyKeyTo,
-                                           {record->time, route.source->GetTimeScale()}, &at)) {
+                                           {record->time, route.source->GetTimeScale()}, &at))
         return code;
-    }
-    if (int const code = undo.Note(at)) {
-        return code;
-    }
+    if (int const code = undo.Note(at)) return code;
     // Within one stream the record is about to be written over.
     KFS_KeyScalar head{};
     std::memcpy(static_cast<void*>(&head), record, static_cast<std::size_t>(KFSp_ValueDataOffset(record)));
@@ -239,17 +207,11 @@ int CopyOneKey(Route const& route, int index, KFSp_CopyUndo& undo)
         error.Keep(KFSp_InsertKeyFromCache(1, 1, 1, 0, route.destination, &newIndex));
     }
     route.to->cache->time = KFS_INVALID_INDEX;
-    if (!error.None()) {
-        return error.Code();
-    }
+    if (!error.None()) return error.Code();
     void* item = nullptr;
-    if (int const code = SEQ_GetAddress(route.to->keys, newIndex, 0, &item)) {
-        return code;
-    }
+    if (int const code = SEQ_GetAddress(route.to->keys, newIndex, 0, &item)) return code;
     auto* const copy = static_cast<KFS_KeyScalar*>(item);
-    if (!KFSp_HasSpatialBlock(&head) || !KFSp_HasSpatialBlock(copy)) {
-        return 0;
-    }
+    if (!KFSp_HasSpatialBlock(&head) || !KFSp_HasSpatialBlock(copy)) return 0;
     CopySpatialBlock(&head, copy);
     // The arc table of a key that was overwritten belongs to the arc that was there.
     return copy == record ? 0 : KFSp_DisposeRemapTable(copy);
@@ -264,9 +226,7 @@ int KeyIndexOf(SEQ_Head const* const* keys, int n, int* index)
     }
     void const* item = nullptr;
     int const code = SEQ_GetConstAddress(keys, n, &item);
-    if (code == 0) {
-        std::memcpy(index, item, sizeof *index);
-    }
+    if (code == 0) std::memcpy(index, item, sizeof *index);
     return code;
 }
 
@@ -286,9 +246,7 @@ int CopyKeysPinned(Route const& route, SEQ_Head const* const* keys, int count, K
         for (int n = 0; error.None() && n < count; ++n) {
             int index = 0;
             error.Keep(KeyIndexOf(keys, n, &index));
-            if (error.None()) {
-                error.Keep(CopyOneKey(route, index, undo));
-            }
+            if (error.None()) error.Keep(CopyOneKey(route, index, undo));
         }
     }
     return error.Code();
@@ -300,15 +258,9 @@ int CopyIntoKeys(Route const& route, SEQ_Head const* const* keys)
     int const count = keys ? (*keys)->count : KFSp_ItemCount(route.from);
     KFSp_FirstError error;
     error.Keep(KFSp_ClearCache(route.destination));
-    if (error.None()) {
-        error.Keep(KFSp_CreateKeyList(route.destination));
-    }
-    if (error.None()) {
-        error.Keep(ReserveKeys(route, count));
-    }
-    if (!error.None()) {
-        return error.Code();
-    }
+    if (error.None()) error.Keep(KFSp_CreateKeyList(route.destination));
+    if (error.None()) error.Keep(ReserveKeys(route, count));
+    if (!error.None()) return error.Code();
     KFSp_CopyUndo undo(route.destination, route.to, count);
     error.Keep(undo.Code());
     if (error.None()) {
@@ -331,12 +283,8 @@ int CopyConstant(Route const& route)
     T_Time const time{0, route.source->GetTimeScale()};
     char const in = static_cast<char>(record->inInterp);
     char const out = static_cast<char>(record->outInterp);
-    if (destination->IsCustom()) {
-        return KFS_InsertKey(destination, &time, 1, KFSp_ValueData(record), in, out);
-    }
-    if (int const code = KFS_InsertKeyF(destination, &time, 1, KFSp_Numbers(record), in, out)) {
-        return code;
-    }
+    if (destination->IsCustom()) return KFS_InsertKey(destination, &time, 1, KFSp_ValueData(record), in, out);
+    if (int const code = KFS_InsertKeyF(destination, &time, 1, KFSp_Numbers(record), in, out)) return code;
     if (destination->HasNoKeys() && destination->GetValueDesc()->dataType != KFS_Type_Double &&
         record != route.to->cache) {
         std::memcpy(KFSp_ValueData(route.to->cache), KFSp_ValueData(record),
@@ -347,24 +295,13 @@ int CopyConstant(Route const& route)
 
 int CopyKeys(Route const& route, SEQ_Head const* const* keys)
 {
-    if (keys && (*keys)->count == 0) {
-        return 0;
-    }
-    if (KFSp_HasNoValue(route.source, route.from)) {
+    if (keys && (*keys)->count == 0) return 0;
+    if (KFSp_HasNoValue(route.source, route.from))
         return KFSp_ReportErr(KFSp_Op_CopyKeys, KFS_Err_NoKeys, KFSp_Row_CopyKeyFrom);
-    }
-    if (int const code = CheckRoom(route, KFSp_Op_CopyKeys)) {
-        return code;
-    }
-    if (route.source->HasNoKeys()) {
-        return CopyConstant(route);
-    }
-    if (route.destination->HasNoKeys()) {
-        return KFSp_ReportErr(KFSp_Op_CopyKeys, KFS_Err_Constant, KFSp_Row_CopyKeyTo);
-    }
-    if (int const code = BringUpToDate(route)) {
-        return code;
-    }
+    if (int const code = CheckRoom(route, KFSp_Op_CopyKeys)) return code;
+    if (route.source->HasNoKeys()) return CopyConstant(route);
+    if (route.destination->HasNoKeys()) return KFSp_ReportErr(KFSp_Op_CopyKeys, KFS_Err_Constant, KFSp_Row_CopyKeyTo);
+    if (int const code = BringUpToDate(route)) return code;
     return CopyIntoKeys(route, keys);
 }
 
@@ -373,31 +310,21 @@ int CopyKeys(Route const& route, SEQ_Head const* const* keys)
 int KFS_CopyKey(KFS_Stream* source, int index, unsigned char replace, T_Time const* time, KFS_Stream* destination,
                 int* newIndex)
 {
-    if (newIndex) {
-        *newIndex = KFS_INVALID_INDEX;
-    }
-    if (int const code = CheckStreams(source, destination, KFSp_Op_CopyKey)) {
-        return code;
-    }
+    if (newIndex) *newIndex = KFS_INVALID_INDEX;
+    if (int const code = CheckStreams(source, destination, KFSp_Op_CopyKey)) return code;
     int made = KFS_INVALID_INDEX;
     int const code = KFSp_Boundary([&] {
         Route const route{source, source->GetKeyData(), destination, destination->GetKeyDataForModify()};
         return CopyKey(route, index, replace != 0, time, &made);
     });
-    if (code != 0) {
-        return code;
-    }
-    if (newIndex) {
-        *newIndex = made;
-    }
+    if (code != 0) return code;
+    if (newIndex) *newIndex = made;
     return KFSp_Boundary([&] { destination->NotifyValueChanged(); });
 }
 
 int KFS_CopyKeys(KFS_Stream const* source, SEQ_Head** keys, KFS_Stream* destination)
 {
-    if (int const code = CheckStreams(source, destination, KFSp_Op_CopyKeys)) {
-        return code;
-    }
+    if (int const code = CheckStreams(source, destination, KFSp_Op_CopyKeys)) return code;
     return KFSp_Boundary([&] {
         return CopyKeys({source, source->GetKeyData(), destination, destination->GetKeyDataForModify()}, keys);
     });

@@ -14,9 +14,7 @@ KFSp_CopyUndo::KFSp_CopyUndo(KFS_Stream* stream, KFS_StreamKeyData* data, int co
 
 KFSp_CopyUndo::~KFSp_CopyUndo()
 {
-    if (kept_) {
-        SEQ_Dispose(kept_, 0);
-    }
+    if (kept_) SEQ_Dispose(kept_, 0);
 }
 
 int KFSp_CopyUndo::Code() const noexcept
@@ -28,13 +26,9 @@ int KFSp_CopyUndo::Note(int time)
 {
     bool found = false;
     int index = 0;
-    if (int const code = KFSp_SearchKeys(data_, time, &found, &index)) {
-        return code;
-    }
+    if (int const code = KFSp_SearchKeys(data_, time, &found, &index)) return code;
     if (found) {
-        if (int const code = Keep(index)) {
-            return code;
-        }
+        if (int const code = Keep(index)) return code;
     }
     static_cast<Step*>(steps_.get())[stepCount_++] = {time, found};
     return 0;
@@ -43,14 +37,10 @@ int KFSp_CopyUndo::Note(int time)
 int KFSp_CopyUndo::Keep(int index)
 {
     if (!kept_) {
-        if (int const code = KFSp_NewKeyList(stream_, &kept_)) {
-            return code;
-        }
+        if (int const code = KFSp_NewKeyList(stream_, &kept_)) return code;
     }
     KFS_KeyScalar const* key = nullptr;
-    if (int const code = KFSp_GetConstKey(data_, index, &key)) {
-        return code;
-    }
+    if (int const code = KFSp_GetConstKey(data_, index, &key)) return code;
     return SEQ_InsertCopy(key, -1, kept_, 0);
 }
 
@@ -60,14 +50,11 @@ void KFSp_CopyUndo::Undo()
         Step const step = static_cast<Step const*>(steps_.get())[--stepCount_];
         bool found = false;
         int index = 0;
-        if (KFSp_SearchKeys(data_, step.time, &found, &index) != 0 || !found) {
-            continue;  // the copy never got in
-        }
-        if (step.overwrites) {
+        if (KFSp_SearchKeys(data_, step.time, &found, &index) != 0 || !found) continue;  // the copy never got in
+        if (step.overwrites)
             PutBack(index);
-        } else {
+        else
             static_cast<void>(KFSp_RemoveKeyItem(data_, index, nullptr));
-        }
     }
     MarkAllStale();
 }
@@ -76,17 +63,13 @@ void KFSp_CopyUndo::Undo()
 void KFSp_CopyUndo::PutBack(int index)
 {
     void* item = nullptr;
-    if (SEQ_GetAddress(data_->keys, index, 0, &item) != 0) {
-        return;
-    }
+    if (SEQ_GetAddress(data_->keys, index, 0, &item) != 0) return;
     auto* const key = static_cast<KFS_KeyScalar*>(item);
     bool const hasTable = KFSp_HasSpatialBlock(key);
     SEQ_Head** const table = hasTable ? key->remapTable : nullptr;
     static_cast<void>(KFSp_DisposeKeyItemFunc(stream_, data_->keys, item));
     static_cast<void>(SEQ_Remove((*kept_)->count - 1, kept_, 0, item));
-    if (hasTable) {
-        key->remapTable = table;
-    }
+    if (hasTable) key->remapTable = table;
 }
 
 void KFSp_CopyUndo::MarkAllStale() const

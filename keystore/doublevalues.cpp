@@ -25,9 +25,7 @@ KFSp_ScDoubleValues::KFSp_ScDoubleValues(KFS_Stream* stream, KFS_CopyItemFunc co
 {
     stream->SetCopyItemFunc(copy);
     code_ = KFS_SetValueDescription(stream, &DoubleDescription(), nullptr);
-    if (code_ == 0) {
-        code_ = KFSp_SetKeyFuncs(stream);
-    }
+    if (code_ == 0) code_ = KFSp_SetKeyFuncs(stream);
 }
 
 KFSp_ScDoubleValues::~KFSp_ScDoubleValues()
@@ -38,9 +36,7 @@ KFSp_ScDoubleValues::~KFSp_ScDoubleValues()
 int KFSp_ScDoubleValues::Restore()
 {
     KFS_Stream* const stream = std::exchange(stream_, nullptr);
-    if (!stream) {
-        return 0;
-    }
+    if (!stream) return 0;
     KFSp_FirstError error;
     error.Keep(KFS_SetValueDescription(stream, &saved_, nullptr));
     *stream->GetValueDescForModify() = saved_;

@@ -58,9 +58,7 @@ int AssembleKey(KFS_Stream* stream, int time, void const* value, bool keepValue,
         cache->outInfluence = 0.0;
     }
     auto* const data = static_cast<char*>(KFSp_ValueData(cache));
-    if (!value && !keepValue) {
-        std::memset(data, 0, ValueSize(stream));
-    }
+    if (!value && !keepValue) std::memset(data, 0, ValueSize(stream));
     std::memset(data + ValueSize(stream), 0, DataSize(stream) - ValueSize(stream));
     return code;
 }
@@ -70,13 +68,9 @@ int AssembleKey(KFS_Stream* stream, int time, void const* value, bool keepValue,
 int InsertConstant(KFS_Stream* stream, int time, bool replace, void const* value, char inInterp, char outInterp)
 {
     bool const hasValue = !KFSp_CacheIsEmpty(stream->GetCache());
-    if (hasValue && !replace) {
-        return KFSp_ReportErr(KFSp_Op_InsertKey, KFS_Err_KeyValue, KFSp_Row_OverwriteKey);
-    }
+    if (hasValue && !replace) return KFSp_ReportErr(KFSp_Op_InsertKey, KFS_Err_KeyValue, KFSp_Row_OverwriteKey);
     KFSp_ScBytes const old(DataSize(stream));
-    if (!old.get()) {
-        return KFS_Err_OutOfMemory;
-    }
+    if (!old.get()) return KFS_Err_OutOfMemory;
     KFS_KeyScalar* const cache = stream->GetCache();
     KFS_KeyScalar head{};
     std::memcpy(static_cast<void*>(&head), cache, static_cast<std::size_t>(KFSp_ValueDataOffset(cache)));
@@ -115,30 +109,21 @@ int InsertIntoKeys(KFS_Stream* stream, int time, bool replace, void const* value
 
 void StoreInterps(KFS_KeyScalar* record, char inInterp, char outInterp)
 {
-    if (inInterp != KFS_Interp_None) {
-        record->inInterp = static_cast<signed char>(inInterp);
-    }
-    if (outInterp != KFS_Interp_None) {
-        record->outInterp = static_cast<signed char>(outInterp);
-    }
-    if (record->inInterp != KFS_Interp_Spline && record->outInterp != KFS_Interp_Spline) {
+    if (inInterp != KFS_Interp_None) record->inInterp = static_cast<signed char>(inInterp);
+    if (outInterp != KFS_Interp_None) record->outInterp = static_cast<signed char>(outInterp);
+    if (record->inInterp != KFS_Interp_Spline && record->outInterp != KFS_Interp_Spline)
         record->flags &= static_cast<unsigned short>(~KFS_KeyFlag_Continuous);
-    }
 }
 
 // The copy is finished before the old value is given up, so a value that can't be had leaves the old one standing.
 int StoreValue(KFS_Stream const* stream, KFS_KeyScalar* record, short kind, void const* value)
 {
     KFSp_ScBytes const made(ValueSize(stream));
-    if (!made.get()) {
-        return KFS_Err_OutOfMemory;
-    }
+    if (!made.get()) return KFS_Err_OutOfMemory;
     KFS_CopyItemFunc const own = stream->GetCopyItemFunc();
     KFS_CopyItemFunc const copy = own ? own : KFSp_ConvertItemToFloat;
-    if (int const code =
-            KFSp_Boundary([&] { return copy(stream, stream->GetItemRefcon(), kind, value, made.get()); })) {
+    if (int const code = KFSp_Boundary([&] { return copy(stream, stream->GetItemRefcon(), kind, value, made.get()); }))
         return code;
-    }
     if (int const code = DisposeValue(stream, kind, KFSp_ValueData(record))) {
         DisposeValue(stream, kind, made.get());
         return code;
@@ -152,30 +137,20 @@ int ChangeRecord(KFS_Stream* stream, KFS_KeyScalar* record, short kind, int inde
 {
     StoreInterps(record, inInterp, outInterp);
     if (value) {
-        if (int const code = StoreValue(stream, record, kind, value)) {
-            return code;
-        }
+        if (int const code = StoreValue(stream, record, kind, value)) return code;
     }
     KFSp_FirstError error;
     error.Keep(stream->SetInvalid(index + 1, 3));
-    if (stream->IsSpatial()) {
-        error.Keep(stream->SetArcInvalid(index + 2, 4));
-    }
+    if (stream->IsSpatial()) error.Keep(stream->SetArcInvalid(index + 2, 4));
     return error.Code();
 }
 
 int SetKey(KFS_Stream* stream, int index, void const* value, char inInterp, char outInterp)
 {
-    if (int const code = KFSp_CanDoInterp(stream, inInterp)) {
-        return code;
-    }
-    if (int const code = KFSp_CanDoInterp(stream, outInterp)) {
-        return code;
-    }
+    if (int const code = KFSp_CanDoInterp(stream, inInterp)) return code;
+    if (int const code = KFSp_CanDoInterp(stream, outInterp)) return code;
     KFS_StreamKeyData const* const data = stream->GetKeyData();
-    if (KFSp_HasNoValue(stream, data)) {
-        return KFSp_ReportErr(KFSp_Op_SetKey, KFS_Err_NoKeys, KFSp_Row_AlterKey);
-    }
+    if (KFSp_HasNoValue(stream, data)) return KFSp_ReportErr(KFSp_Op_SetKey, KFS_Err_NoKeys, KFSp_Row_AlterKey);
     KFSp_FirstError error;
     if (stream->HasNoKeys()) {
         error.Keep(ChangeRecord(stream, data->cache, KFS_Item_CacheValue, 0, value, inInterp, outInterp));
@@ -183,9 +158,8 @@ int SetKey(KFS_Stream* stream, int index, void const* value, char inInterp, char
         error.Keep(KFSp_ClearCache(stream));
         if (error.None()) {
             KFSp_ScKey const key(data->keys, index, error);
-            if (error.None()) {
+            if (error.None())
                 error.Keep(ChangeRecord(stream, key.get(), KFS_Item_KeyValue, index, value, inInterp, outInterp));
-            }
         }
     }
     return error.Code();
@@ -194,29 +168,20 @@ int SetKey(KFS_Stream* stream, int index, void const* value, char inInterp, char
 int InsertKey(KFS_Stream* stream, T_Time const* time, bool replace, void const* value, char inInterp, char outInterp)
 {
     int at = 0;
-    if (int const code = KFSp_TimeInStream(stream, time, &at)) {
-        return code;
-    }
-    if (at == KFS_INVALID_INDEX) {
+    if (int const code = KFSp_TimeInStream(stream, time, &at)) return code;
+    if (at == KFS_INVALID_INDEX)
         return KFSp_ReportErr(KFSp_Op_InsertKey, KFS_Err_TimeNotRepresentable, KFSp_Row_InsertKey);
-    }
     if (stream->HasKeys()) {
         bool found = false;
         int index = 0;
-        if (int const code = KFSp_SearchKeys(stream->GetKeyData(), at, &found, &index)) {
-            return code;
-        }
+        if (int const code = KFSp_SearchKeys(stream->GetKeyData(), at, &found, &index)) return code;
         if (found) {
             return replace ? SetKey(stream, index, value, inInterp, outInterp)
                            : KFSp_ReportErr(KFSp_Op_InsertKey, KFS_Err_KeyValue, KFSp_Row_OverwriteKey);
         }
     }
-    if (int const code = KFSp_CanDoInterp(stream, inInterp)) {
-        return code;
-    }
-    if (int const code = KFSp_CanDoInterp(stream, outInterp)) {
-        return code;
-    }
+    if (int const code = KFSp_CanDoInterp(stream, inInterp)) return code;
+    if (int const code = KFSp_CanDoInterp(stream, outInterp)) return code;
     return stream->HasNoKeys() ? InsertConstant(stream, at, replace, value, inInterp, outInterp)
                                : InsertIntoKeys(stream, at, replace, value, inInterp, outInterp);
 }
@@ -233,24 +198,16 @@ bool TakesDoubles(KFS_Stream const* stream)
 template <class Edit>
 int EditDoubles(KFS_Stream* stream, bool describe, Edit&& edit)
 {
-    if (!describe) {
-        return edit();
-    }
-    if (!TakesDoubles(stream)) {
-        return KFSp_RefuseCustomValue(KFSp_Op_ConvertToFloat, KFSp_Row_ConvertTo);
-    }
+    if (!describe) return edit();
+    if (!TakesDoubles(stream)) return KFSp_RefuseCustomValue(KFSp_Op_ConvertToFloat, KFSp_Row_ConvertTo);
     // The list's items have the size that the present description says.
     if (stream->IsCustom() && stream->HasKeys()) {
-        if (int const code = KFSp_CreateKeyList(stream)) {
-            return code;
-        }
+        if (int const code = KFSp_CreateKeyList(stream)) return code;
     }
     KFSp_FirstError error;
     KFSp_ScDoubleValues doubles(stream, KFSp_FakeCopyItemFunc);
     error.Keep(doubles.Code());
-    if (error.None()) {
-        error.Keep(KFSp_Boundary(edit));
-    }
+    if (error.None()) error.Keep(KFSp_Boundary(edit));
     error.Keep(doubles.Restore());
     return error.Code();
 }
@@ -266,9 +223,7 @@ int WithDoubles(KFS_Stream* stream, double const* value, Edit&& edit)
 // A range of stale keys ends at the last key.
 void PullIn(int* range, int keyCount)
 {
-    if (range[1] >= keyCount) {
-        range[1] = keyCount - 1;
-    }
+    if (range[1] >= keyCount) range[1] = keyCount - 1;
 }
 
 int DisposeRemapTable(SEQ_Head** keys, int index)
@@ -276,9 +231,7 @@ int DisposeRemapTable(SEQ_Head** keys, int index)
     KFSp_FirstError error;
     {
         KFSp_ScKey const key(keys, index, error);
-        if (key.get()) {
-            error.Keep(KFSp_DisposeRemapTable(key.get()));
-        }
+        if (key.get()) error.Keep(KFSp_DisposeRemapTable(key.get()));
     }
     return error.Code();
 }
@@ -288,26 +241,15 @@ int DisposeRemapTable(SEQ_Head** keys, int index)
 int KFSp_TakeKeyOut(KFS_Stream* stream, int index, bool keepInCache)
 {
     KFS_StreamKeyData* const data = stream->GetKeyDataForModify();
-    if (!data->keys) {
-        return KFS_Err_NoKeys;
-    }
-    if (index < 0 || index >= KFSp_ItemCount(data)) {
+    if (!data->keys) return KFS_Err_NoKeys;
+    if (index < 0 || index >= KFSp_ItemCount(data))
         return KFSp_RemoveKeyItem(data, index, nullptr);  // the list's own answer
-    }
     KFSp_FirstError error;
-    if (stream->IsSpatial()) {
-        error.Keep(DisposeRemapTable(data->keys, index));
-    }
-    if (keepInCache && error.None()) {
-        error.Keep(KFSp_ClearCache(stream));
-    }
-    if (error.None()) {
-        error.Keep(KFSp_RemoveKeyItem(data, index, keepInCache ? data->cache : nullptr));
-    }
+    if (stream->IsSpatial()) error.Keep(DisposeRemapTable(data->keys, index));
+    if (keepInCache && error.None()) error.Keep(KFSp_ClearCache(stream));
+    if (error.None()) error.Keep(KFSp_RemoveKeyItem(data, index, keepInCache ? data->cache : nullptr));
     error.Keep(stream->SetInvalid(index, 1));
-    if (stream->IsSpatial()) {
-        static_cast<void>(stream->SetArcInvalid(index + 2, 4));
-    }
+    if (stream->IsSpatial()) static_cast<void>(stream->SetArcInvalid(index + 2, 4));
     int const keyCount = KFSp_KeyCount(stream, data);
     PullIn(data->invalidKeyIndex, keyCount);
     PullIn(data->arcInvalidKeyIndex, keyCount);
@@ -320,15 +262,11 @@ namespace {
 int RemoveKey(KFS_Stream* stream, int index, void* value)
 {
     KFS_StreamKeyData const* const data = stream->GetKeyData();
-    if (KFSp_HasNoValue(stream, data)) {
-        return KFSp_ReportErr(KFSp_Op_RemoveKey, KFS_Err_NoKeys, KFSp_Row_RemoveKey);
-    }
+    if (KFSp_HasNoValue(stream, data)) return KFSp_ReportErr(KFSp_Op_RemoveKey, KFS_Err_NoKeys, KFSp_Row_RemoveKey);
     KFSp_FirstError error;
     if (stream->HasKeys()) {
         error.Keep(KFSp_ClearCache(stream));
-        if (error.None()) {
-            error.Keep(KFSp_TakeKeyOut(stream, index, value != nullptr));
-        }
+        if (error.None()) error.Keep(KFSp_TakeKeyOut(stream, index, value != nullptr));
     }
     bool const removed = error.None();
     if (value && !KFSp_CacheIsEmpty(data->cache)) {
@@ -339,9 +277,7 @@ int RemoveKey(KFS_Stream* stream, int index, void* value)
         }));
     }
     error.Keep(KFSp_ClearCache(stream));
-    if (removed) {
-        error.Keep(Notify(stream));
-    }
+    if (removed) error.Keep(Notify(stream));
     return error.Code();
 }
 
@@ -350,9 +286,7 @@ int RemoveKey(KFS_Stream* stream, int index, void* value)
 int KFS_InsertKey(KFS_Stream* stream, T_Time const* time, unsigned char replace, void const* value, char inInterp,
                   char outInterp)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_InsertKey, stream, KFSp_Row_InsertKey)) {
-        return code;
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_InsertKey, stream, KFSp_Row_InsertKey)) return code;
     int const code = KFSp_Boundary([&] { return InsertKey(stream, time, replace != 0, value, inInterp, outInterp); });
     return code != 0 ? code : Notify(stream);
 }
@@ -360,35 +294,27 @@ int KFS_InsertKey(KFS_Stream* stream, T_Time const* time, unsigned char replace,
 int KFS_InsertKeyF(KFS_Stream* stream, T_Time const* time, unsigned char replace, double const* value, char inInterp,
                    char outInterp)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_InsertKeyF, stream, KFSp_Row_AlterKey)) {
-        return code;
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_InsertKeyF, stream, KFSp_Row_AlterKey)) return code;
     return WithDoubles(stream, value,
                        [&] { return InsertKey(stream, time, replace != 0, value, inInterp, outInterp); });
 }
 
 int KFS_SetKey(KFS_Stream* stream, int index, void const* value, char inInterp, char outInterp)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_SetKey, stream, KFSp_Row_AlterKey)) {
-        return code;
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_SetKey, stream, KFSp_Row_AlterKey)) return code;
     int const code = KFSp_Boundary([&] { return SetKey(stream, index, value, inInterp, outInterp); });
     return code != 0 ? code : Notify(stream);
 }
 
 int KFS_SetKeyF(KFS_Stream* stream, int index, double const* value, char inInterp, char outInterp)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_SetKeyF, stream, KFSp_Row_AlterKey)) {
-        return code;
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_SetKeyF, stream, KFSp_Row_AlterKey)) return code;
     return WithDoubles(stream, value, [&] { return SetKey(stream, index, value, inInterp, outInterp); });
 }
 
 int KFS_RemoveKey(KFS_Stream* stream, int index, void* value)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_RemoveKey, stream, KFSp_Row_RemoveKey)) {
-        return code;
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_RemoveKey, stream, KFSp_Row_RemoveKey)) return code;
     return KFSp_Boundary([&] { return RemoveKey(stream, index, value); });
 }
 

@@ -51,13 +51,10 @@ short ValueItemKind(KFS_Stream const* stream)
 int ExternalForm::Adapt(KFS_Stream const* stream, KFS_Stream const* target, void* value)
 {
     if (target == stream || target->GetValueDesc()->dataType == stream->GetValueDesc()->dataType ||
-        target->GetDimension() != stream->GetDimension() || stream->GetDimension() > MaxAdaptedDimension) {
+        target->GetDimension() != stream->GetDimension() || stream->GetDimension() > MaxAdaptedDimension)
         return 0;
-    }
     double numbers[MaxAdaptedDimension] = {};
-    if (int const code = KFSp_ConvertItemToFloat(target, 0, ValueItemKind(target), value, numbers)) {
-        return code;
-    }
+    if (int const code = KFSp_ConvertItemToFloat(target, 0, ValueItemKind(target), value, numbers)) return code;
     return KFSp_ConvertItemFromFloat(stream, 0, ValueItemKind(stream), numbers, value);
 }
 
@@ -72,9 +69,7 @@ int ReadFollowers(KFS_Stream const* stream, int time, int flags, double* value, 
     T_Time const at{time, stream->GetTimeScale()};
     for (int d = 0; d < stream->GetDimension(); ++d) {
         if (KFS_Stream const* const follower = stream->GetSeparationFollower(d)) {
-            if (int const code = KFS_GetValueFPlus(follower, &at, flags, value + d, nullptr, bag)) {
-                return code;
-            }
+            if (int const code = KFS_GetValueFPlus(follower, &at, flags, value + d, nullptr, bag)) return code;
         }
     }
     return 0;
@@ -97,19 +92,11 @@ bool ReadExpression(KFS_ExpState* state, KFS_Stream const* stream, int time, int
     state->ResolveExprTarget(&target, &targetTime, bag, &resolved);
     KFS_ParamBag const* const inForce = resolved.GetOverrideCount() == 0 ? bag : &resolved;
     boost::shared_ptr<KFS_ExprContext> const context = state->GetExprContext(target);
-    if (!context || !context->CanEvaluate()) {
-        return false;
-    }
+    if (!context || !context->CanEvaluate()) return false;
     *code = KFSp_Boundary([&] { Form::EvalExpr(state, target, targetTime, flags, value, inForce); });
-    if (*code != 0 && *code != KFS_Err_ExprNoValue) {
-        return true;
-    }
-    if (atKey) {
-        *atKey = 0;
-    }
-    if (*code == KFS_Err_ExprNoValue) {
-        return false;
-    }
+    if (*code != 0 && *code != KFS_Err_ExprNoValue) return true;
+    if (atKey) *atKey = 0;
+    if (*code == KFS_Err_ExprNoValue) return false;
     *code = Form::Adapt(stream, target, value);
     return true;
 }
@@ -123,9 +110,8 @@ int ReportMissingState()
 // The current render context goes before the stream's project, which is asked only without one.
 Q_RenderContext const* FindRenderContext(KFS_Stream const* stream)
 {
-    if (Q_RenderContext const* const current = Q_RenderContext::PeekCurrent()) [[likely]] {
+    if (Q_RenderContext const* const current = Q_RenderContext::PeekCurrent()) [[likely]]
         return current;
-    }
     KFS_Project const* const project = KFS_GetConstProject(stream, true);
     return project ? project->GetRenderContext(true) : nullptr;
 }
@@ -135,9 +121,8 @@ Q_RenderContext const* FindRenderContext(KFS_Stream const* stream)
 Q_RenderContext const* NeedRenderContext()
 {
     Q_RenderContext const* const current = Q_RenderContext::PeekCurrent();
-    if (!current) [[unlikely]] {
+    if (!current) [[unlikely]]
         static_cast<void>(Q_RenderContext::GetCurrent(false));
-    }
     return current;
 }
 
@@ -146,18 +131,14 @@ template <class Form, class ReadKeys>
 int ReadStaged(KFS_Stream const* stream, Q_RenderContext const* context, int time, int flags,
                typename Form::Value* value, unsigned char* atKey, KFS_ParamBag const* bag, ReadKeys&& readKeys)
 {
-    if (AnswersFromFollowers(stream, value)) [[unlikely]] {
+    if (AnswersFromFollowers(stream, value)) [[unlikely]]
         return ReadFollowers(stream, time, flags, static_cast<double*>(value), bag);
-    }
     KFS_ExpState* const state = context ? KFSp_GetRenderStates(context).expState : nullptr;
-    if (!state) [[unlikely]] {
+    if (!state) [[unlikely]]
         return ReportMissingState();
-    }
     if (WantsExpression(stream, flags, value)) [[unlikely]] {
         int code = 0;
-        if (ReadExpression<Form>(state, stream, time, flags, value, atKey, bag, &code)) {
-            return code;
-        }
+        if (ReadExpression<Form>(state, stream, time, flags, value, atKey, bag, &code)) return code;
     }
     readKeys(state);
     return 0;
@@ -168,18 +149,15 @@ int ReadStaged(KFS_Stream const* stream, Q_RenderContext const* context, int tim
 bool BringCache(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, unsigned char keyOnly,
                 void const* value, unsigned char* atKey, KFS_InterpFunc* interpFunc, long refcon)
 {
-    if (KFSp_HasNoValue(stream, data)) [[unlikely]] {
+    if (KFSp_HasNoValue(stream, data)) [[unlikely]]
         throw KFSp_ReportErr(KFSp_Op_GetValueNoExpr, KFS_Err_NoKeys, KFSp_Row_GetValue);
-    }
     if (value && !keyOnly && !atKey && !interpFunc) [[likely]] {
         KFSp_UpdateCacheToTime(stream, data, time);
         return stream->GetDimension() >= 1;
     }
     unsigned char found = 0;
     KFSp_UpdateCacheToTime(stream, data, time, keyOnly, value, &found, interpFunc, refcon);
-    if (atKey) {
-        *atKey = found;
-    }
+    if (atKey) *atKey = found;
     return value && stream->GetDimension() >= 1 && (!keyOnly || found);
 }
 
@@ -187,15 +165,11 @@ int ReadSamples(KFS_Stream const* stream, T_Time time, T_Time const* step, int c
 {
     bool const separated = stream->GetParent() && stream->AreDimensionsSeparated();
     std::vector<KFS_Stream const*> followers;
-    if (separated) {
-        stream->GetSeparationFollowers(followers);
-    }
+    if (separated) stream->GetSeparationFollowers(followers);
     int const dimension = stream->GetDimension();
     for (int sample = 0; sample < count; ++sample, values += dimension) {
         KFSp_FirstError error;
-        if (!separated) {
-            error.Keep(KFS_GetValueFPlus(stream, &time, flags, values, nullptr, nullptr));
-        }
+        if (!separated) error.Keep(KFS_GetValueFPlus(stream, &time, flags, values, nullptr, nullptr));
         for (int d = 0; separated && d < dimension && error.None(); ++d) {
             values[d] = 0.0;
             if (static_cast<std::size_t>(d) < followers.size()) {
@@ -203,12 +177,8 @@ int ReadSamples(KFS_Stream const* stream, T_Time time, T_Time const* step, int c
                                              nullptr));
             }
         }
-        if (error.None() && sample + 1 < count) {
-            error.Keep(KFS_AddTime(step, &time, 0, &time));
-        }
-        if (!error.None()) {
-            return error.Code();
-        }
+        if (error.None() && sample + 1 < count) error.Keep(KFS_AddTime(step, &time, 0, &time));
+        if (!error.None()) return error.Code();
     }
     return 0;
 }
@@ -224,13 +194,9 @@ int KFS_GetValue(KFS_Stream const* stream, T_Time const* time, unsigned char, vo
 int KFS_GetValuePlus(KFS_Stream const* stream, T_Time const* time, int flags, void* value, unsigned char* atKey,
                      KFS_ParamBag const* bag, KFS_InterpFunc* interpFunc, long refcon)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_GetValue, stream, KFSp_Row_GetValue)) {
-        return code;
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_GetValue, stream, KFSp_Row_GetValue)) return code;
     int at = 0;
-    if (int const code = KFSp_TimeInStream(stream, time, &at)) {
-        return code;
-    }
+    if (int const code = KFSp_TimeInStream(stream, time, &at)) return code;
     return KFSp_Boundary([&] {
         return ReadStaged<ExternalForm>(
             stream, FindRenderContext(stream), at, flags, value, atKey, bag, [&](KFS_ExpState* state) {
@@ -248,16 +214,11 @@ int KFS_GetValueF(KFS_Stream const* stream, T_Time const* time, unsigned char, d
 int KFS_GetValueFPlus(KFS_Stream const* stream, T_Time const* time, int flags, double* value, unsigned char* atKey,
                       KFS_ParamBag const* bag)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_GetValue, stream, KFSp_Row_GetValue)) {
-        return code;
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_GetValue, stream, KFSp_Row_GetValue)) return code;
     int at = 0;
-    if (int const code = KFSp_TimeInStream(stream, time, &at)) {
-        return code;
-    }
-    if (stream->IsCustom()) [[unlikely]] {
+    if (int const code = KFSp_TimeInStream(stream, time, &at)) return code;
+    if (stream->IsCustom()) [[unlikely]]
         return KFSp_RefuseCustomValue(KFSp_Op_GetFloat, KFSp_Row_ComputeFloatValues);
-    }
     return KFSp_Boundary([&] {
         return ReadStaged<DoubleForm>(
             stream, NeedRenderContext(), at, flags, value, atKey, bag,
@@ -270,13 +231,9 @@ void KFS_GetValueNoExpr(KFS_Stream const* stream, int time, unsigned char keyOnl
 {
     KFSp_ThrowIf(KFSp_CheckStream(KFSp_Op_GetValueNoExpr, stream, KFSp_Row_GetValue));
     KFS_StreamKeyData const* const data = stream->GetKeyData();
-    if (!BringCache(stream, data, time, keyOnly, value, atKey, interpFunc, refcon)) {
-        return;
-    }
+    if (!BringCache(stream, data, time, keyOnly, value, atKey, interpFunc, refcon)) return;
     KFS_CopyItemFunc copy = stream->GetCopyItemFunc();
-    if (!copy) {
-        copy = stream->IsCustom() ? KFSp_FakeCopyItemFunc : KFSp_ConvertItemFromFloat;
-    }
+    if (!copy) copy = stream->IsCustom() ? KFSp_FakeCopyItemFunc : KFSp_ConvertItemFromFloat;
     void const* const from = source ? source : KFSp_ValueData(data->cache);
     KFSp_ThrowIf(copy(stream, stream->GetItemRefcon(), KFS_Item_CacheValue, from, value));
 }
@@ -301,29 +258,19 @@ void KFS_GetValueFNoExpr(KFS_Stream const* stream, int time, unsigned char keyOn
                          void const* source)
 {
     KFSp_ThrowIf(KFSp_CheckStream(KFSp_Op_GetValueNoExpr, stream, KFSp_Row_GetValue));
-    if (stream->IsCustom()) {
-        throw KFSp_RefuseCustomValue(KFSp_Op_GetValuesFRefusal, KFSp_Row_ComputeFloatValues);
-    }
+    if (stream->IsCustom()) throw KFSp_RefuseCustomValue(KFSp_Op_GetValuesFRefusal, KFSp_Row_ComputeFloatValues);
     KFS_StreamKeyData const* const data = stream->GetKeyData();
-    if (!BringCache(stream, data, time, keyOnly, value, atKey, nullptr, 0)) {
-        return;
-    }
+    if (!BringCache(stream, data, time, keyOnly, value, atKey, nullptr, 0)) return;
     void const* const from = source ? source : KFSp_ValueData(data->cache);
-    if (!stream->IsFloatBased() && CopyFewDoubles(stream->GetDimension(), from, value)) {
-        return;
-    }
+    if (!stream->IsFloatBased() && CopyFewDoubles(stream->GetDimension(), from, value)) return;
     KFSp_ThrowIf(KFSp_FakeCopyItemFunc(stream, 0, KFS_Item_CacheValue, from, value));
 }
 
 int KFS_GetValuesFPlus(KFS_Stream const* stream, T_Time const* start, T_Time const* step, int count, int flags,
                        char*** values)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_GetFloat, stream, KFSp_Row_GetValue)) {
-        return code;
-    }
-    if (stream->IsCustom()) {
-        return KFSp_RefuseCustomValue(KFSp_Op_GetValuesFRefusal, KFSp_Row_ComputeFloatValues);
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_GetFloat, stream, KFSp_Row_GetValue)) return code;
+    if (stream->IsCustom()) return KFSp_RefuseCustomValue(KFSp_Op_GetValuesFRefusal, KFSp_Row_ComputeFloatValues);
     if (!values) {
         return Qp_ReportLegacyErrString(KFSp_ReportId(KFSp_Op_GetValuesFHandle), KFSp_Severity, KFS_Err_LegacyMismatch,
                                         nullptr);
@@ -332,9 +279,7 @@ int KFS_GetValuesFPlus(KFS_Stream const* stream, T_Time const* start, T_Time con
         count > 0 ? static_cast<std::size_t>(count) * static_cast<std::size_t>(stream->GetDimension()) : 0;
     char** const handle = Q_AllocateHandleClear(KFSp_ReportId(KFSp_Op_GetValuesFHandle),
                                                 KFSp_MessageText(KFSp_Row_InterpolationArray), number * sizeof(double));
-    if (!handle) {
-        return KFS_Err_OutOfMemory;
-    }
+    if (!handle) return KFS_Err_OutOfMemory;
     T_Time const first = start ? *start : T_Time{0, stream->GetTimeScale()};
     int const code = KFSp_Boundary(
         [&] { return ReadSamples(stream, first, step, count, flags, reinterpret_cast<double*>(*handle)); });
@@ -348,9 +293,7 @@ int KFS_GetValuesFPlus(KFS_Stream const* stream, T_Time const* start, T_Time con
 
 int KFS_DisposeValue(KFS_Stream const* stream, void* value)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_DisposeValue, stream, KFSp_Row_Dispose)) {
-        return code;
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_DisposeValue, stream, KFSp_Row_Dispose)) return code;
     KFS_DisposeItemFunc const dispose = stream->GetDisposeItemFunc();
     return dispose ? KFSp_Boundary([&] { return dispose(stream, stream->GetItemRefcon(), KFS_Item_KeyValue, value); })
                    : 0;
@@ -378,9 +321,7 @@ public:
                 std::max<std::size_t>(stream->GetValueDesc()->itemSize, sizeof(double))),
           buffer_(::operator new(size_, Alignment, std::nothrow))
     {
-        if (!buffer_) {
-            throw int{KFS_Err_OutOfMemory};
-        }
+        if (!buffer_) throw int{KFS_Err_OutOfMemory};
         Q_AccountAllocationEx(size_, 1);
     }
     ~ScratchValue()
@@ -416,9 +357,8 @@ void KFS_Stream::ValidateCacheAtTime(T_Time const& time)
     }
     int at = 0;
     KFSp_ThrowIf(KFSp_TimeInStream(this, &time, &at));
-    if (at != KFS_INVALID_INDEX) {  // which would say that the constant has no value
+    if (at != KFS_INVALID_INDEX)  // which would say that the constant has no value
         GetCache()->time = at;
-    }
 }
 
 void KFS_Stream::ForceInterpolateAtTime(T_Time const& time)

@@ -47,16 +47,11 @@ int BringUpToDate(Insertion const& insertion)
 {
     bool const readsDerived = !insertion.valueGiven || (insertion.stream->IsSpatial() && !insertion.tangentsGiven &&
                                                         (insertion.HasSplineSide() || insertion.HasOpenSide()));
-    if (!readsDerived || KFSp_ItemCount(insertion.data) == 0 || !KFSp_IsStale(insertion.data)) {
-        return 0;
-    }
-    if (insertion.IsCustom()) {  // no key floats there, so the record isn't written
+    if (!readsDerived || KFSp_ItemCount(insertion.data) == 0 || !KFSp_IsStale(insertion.data)) return 0;
+    if (insertion.IsCustom())  // no key floats there, so the record isn't written
         return insertion.stream->IsSpatial() ? insertion.stream->UpdateStream() : 0;
-    }
     KFSp_SavedCache const record(insertion.stream);
-    if (record.Code() != 0) {
-        return record.Code();
-    }
+    if (record.Code() != 0) return record.Code();
     int const code = insertion.stream->UpdateStream();
     record.Restore();
     return code;
@@ -68,13 +63,11 @@ char TangentMode(Insertion const& insertion)
     KFS_Stream const* const stream = insertion.stream;
     bool const spatial = stream->IsSpatial();
     int mode = 0;
-    if (!insertion.tangentsGiven && insertion.HasSplineSide() && (spatial || !insertion.IsCustom())) {
+    if (!insertion.tangentsGiven && insertion.HasSplineSide() && (spatial || !insertion.IsCustom()))
         mode |= KFSp_Tangents_Temporal;
-    }
     bool const tangentsSet = (insertion.key->flags & KFS_KeyFlag_TangentsSet) == KFS_KeyFlag_TangentsSet;
-    if (spatial && !tangentsSet && stream->GetSpInterp() == KFS_SpInterp_Auto && !insertion.IsCustom()) {
+    if (spatial && !tangentsSet && stream->GetSpInterp() == KFS_SpInterp_Auto && !insertion.IsCustom())
         mode |= KFSp_Tangents_Spatial;
-    }
     return static_cast<char>(mode);
 }
 
@@ -85,29 +78,21 @@ void TakeBits(unsigned short* word, unsigned short bits, unsigned short from)
 
 void DecideSide(signed char* interp, char proposed)
 {
-    if (*interp == KFS_Interp_None) {
-        *interp = static_cast<signed char>(proposed);
-    }
-    if (*interp == KFS_Interp_None) {
-        *interp = KFS_Interp_Linear;
-    }
+    if (*interp == KFS_Interp_None) *interp = static_cast<signed char>(proposed);
+    if (*interp == KFS_Interp_None) *interp = KFS_Interp_Linear;
 }
 
 // Sides without a code take what the neighbours suggest, and flags go with that.
 int DecideInterps(Insertion const& insertion)
 {
     KFS_KeyScalar* const key = insertion.key;
-    if (!insertion.HasOpenSide()) {
-        return 0;
-    }
+    if (!insertion.HasOpenSide()) return 0;
     T_Time const time{key->time, insertion.stream->GetTimeScale()};
     char in = KFS_Interp_None;
     char out = KFS_Interp_None;
     unsigned short flags = 0;
     unsigned int spFlags = 0;
-    if (int const code = KFSp_ChooseInterpsAndFlags(insertion.stream, &time, &in, &out, &flags, &spFlags)) {
-        return code;
-    }
+    if (int const code = KFSp_ChooseInterpsAndFlags(insertion.stream, &time, &in, &out, &flags, &spFlags)) return code;
     DecideSide(&key->inInterp, in);
     DecideSide(&key->outInterp, out);
     TakeBits(&key->flags, KFS_KeyFlag_Continuous | KFS_KeyFlag_Modifiable, flags);
@@ -138,16 +123,11 @@ int EvaluateCustomValue(Insertion& insertion)
 
 int FillInValueAndTangents(Insertion& insertion, char mode)
 {
-    if (KFSp_ItemCount(insertion.data) == 0) {
-        return 0;
-    }
+    if (KFSp_ItemCount(insertion.data) == 0) return 0;
     if (!insertion.valueGiven) {
-        if (!insertion.IsCustom()) {
+        if (!insertion.IsCustom())
             return KFSp_SubdivideSpline(insertion.stream, insertion.key->time, mode, insertion.key);
-        }
-        if (int const code = EvaluateCustomValue(insertion)) {
-            return code;
-        }
+        if (int const code = EvaluateCustomValue(insertion)) return code;
     }
     return mode != 0 ? KFSp_SetDefaultKeyframeTangents(insertion.stream, insertion.key->time, mode, insertion.key) : 0;
 }
@@ -166,15 +146,9 @@ int InsertNewKey(Insertion& insertion)
             error.Keep(around->Code());
         }
         bool const saved = error.None();
-        if (error.None()) {
-            error.Keep(FillInValueAndTangents(insertion, TangentMode(insertion)));
-        }
-        if (error.None()) {
-            error.Keep(KFSp_InsertKeyItem(insertion.data, insertion.key, position));
-        }
-        if (!error.None() && around && saved) {
-            around->Restore();
-        }
+        if (error.None()) error.Keep(FillInValueAndTangents(insertion, TangentMode(insertion)));
+        if (error.None()) error.Keep(KFSp_InsertKeyItem(insertion.data, insertion.key, position));
+        if (!error.None() && around && saved) around->Restore();
     }
     error.Keep(insertion.stream->SetInvalid(position + 1, 2));
     error.Keep(insertion.stream->SetArcInvalid(position + 2, 4));
@@ -187,35 +161,24 @@ int ReplaceOldKey(Insertion& insertion, KFSp_ScKey const& old)
 {
     KFS_KeyScalar* const key = insertion.key;
     KFS_Stream* const stream = insertion.stream;
-    if (key->inInterp == KFS_Interp_None) {
-        key->inInterp = old->inInterp;
-    }
-    if (key->outInterp == KFS_Interp_None) {
-        key->outInterp = old->outInterp;
-    }
+    if (key->inInterp == KFS_Interp_None) key->inInterp = old->inInterp;
+    if (key->outInterp == KFS_Interp_None) key->outInterp = old->outInterp;
     char const mode = TangentMode(insertion);
     bool const hasTable = stream->IsSpatial() && KFSp_HasSpatialBlock(old.get()) && KFSp_HasSpatialBlock(key);
     SEQ_Head** const table = hasTable ? old->remapTable : nullptr;
     KFSp_FirstError error;
-    if (stream->IsSpatial()) {
-        error.Keep(stream->SetArcInvalid(insertion.position + 2, 4));
-    }
+    if (stream->IsSpatial()) error.Keep(stream->SetArcInvalid(insertion.position + 2, 4));
     if (error.None() && !insertion.valueGiven) {
         error.Keep(CopyItem(insertion, KFS_Item_KeyValue, KFSp_ValueData(old.get()), KFSp_ValueData(key)));
         insertion.ownsValue = insertion.ownsValue || error.None();
     }
-    if (error.None() && mode != 0) {
-        error.Keep(KFSp_SetDefaultKeyframeTangents(stream, key->time, mode, key));
-    }
+    if (error.None() && mode != 0) error.Keep(KFSp_SetDefaultKeyframeTangents(stream, key->time, mode, key));
     // Told here and not after the replacement, which then stays undone.
-    if (error.None() && insertion.HasOpenSide()) {
+    if (error.None() && insertion.HasOpenSide())
         error.Keep(KFSp_ReportErr(KFSp_Op_InsertKeyFromCache, KFS_Err_InterpNotAllowed, KFS_Interp_None));
-    }
     if (error.None()) {
         error.Keep(KFSp_ReplaceKeyItem(insertion.data, key, insertion.position));
-        if (error.None() && hasTable) {
-            old->remapTable = table;
-        }
+        if (error.None() && hasTable) old->remapTable = table;
     }
     return error.Code();
 }
@@ -225,9 +188,7 @@ int OverwriteKey(Insertion& insertion)
     KFSp_FirstError error;
     if (insertion.overwrite) {
         KFSp_ScKey const old(insertion.data->keys, insertion.position, error);
-        if (error.None()) {
-            error.Keep(ReplaceOldKey(insertion, old));
-        }
+        if (error.None()) error.Keep(ReplaceOldKey(insertion, old));
     } else {
         error.Keep(KFSp_ReportErr(KFSp_Op_InsertKeyFromCache, KFS_Err_KeyValue, KFSp_Row_OverwriteKey));
         // Nothing was pinned here, so this takes away a pin of the caller's if there is one. Callers count on that.
@@ -239,16 +200,10 @@ int OverwriteKey(Insertion& insertion)
 
 int InsertIntoList(Insertion& insertion)
 {
-    if (int const code = KFSp_CreateKeyList(insertion.stream)) {
-        return code;
-    }
-    if (int const code = BringUpToDate(insertion)) {
-        return code;
-    }
+    if (int const code = KFSp_CreateKeyList(insertion.stream)) return code;
+    if (int const code = BringUpToDate(insertion)) return code;
     bool found = false;
-    if (int const code = KFSp_SearchKeys(insertion.data, insertion.key->time, &found, &insertion.position)) {
-        return code;
-    }
+    if (int const code = KFSp_SearchKeys(insertion.data, insertion.key->time, &found, &insertion.position)) return code;
     return found ? OverwriteKey(insertion) : InsertNewKey(insertion);
 }
 
@@ -256,9 +211,7 @@ int InsertIntoKeyedStream(Insertion& insertion, bool clearCache)
 {
     KFSp_FirstError error;
     error.Keep(KFSp_Boundary([&] { return InsertIntoList(insertion); }));
-    if (clearCache || insertion.ownsValue) {
-        error.Keep(KFSp_ClearCache(insertion.stream));
-    }
+    if (clearCache || insertion.ownsValue) error.Keep(KFSp_ClearCache(insertion.stream));
     insertion.key->time = KFS_INVALID_INDEX;
     return error.Code();
 }
@@ -268,14 +221,10 @@ int InsertIntoKeyedStream(Insertion& insertion, bool clearCache)
 int TakeConstant(Insertion& insertion, bool ownsValue)
 {
     insertion.position = 0;
-    if (ownsValue) {
-        return 0;
-    }
+    if (ownsValue) return 0;
     void* const value = KFSp_ValueData(insertion.key);
     int const code = CopyItem(insertion, KFS_Item_CacheWhole, value, value);
-    if (code != 0) {
-        insertion.key->time = KFS_INVALID_INDEX;
-    }
+    if (code != 0) insertion.key->time = KFS_INVALID_INDEX;
     return code;
 }
 
@@ -288,17 +237,14 @@ int KFSp_PutKeyFromCache(unsigned char overwrite, unsigned char valueGiven, unsi
     Insertion insertion{stream, data, data->cache, overwrite != 0, valueGiven != 0, tangentsGiven != 0, false};
     bool const clears = clearCache != 0;
     int const code = stream->HasNoKeys() ? TakeConstant(insertion, clears) : InsertIntoKeyedStream(insertion, clears);
-    if (index) {
-        *index = code == 0 ? insertion.position : KFS_INVALID_INDEX;
-    }
+    if (index) *index = code == 0 ? insertion.position : KFS_INVALID_INDEX;
     return code;
 }
 
 int KFSp_InsertKeyFromCache(unsigned char overwrite, unsigned char valueGiven, unsigned char tangentsGiven,
                             unsigned char clearCache, KFS_Stream* stream, int* index)
 {
-    if (int const code = KFSp_PutKeyFromCache(overwrite, valueGiven, tangentsGiven, clearCache, stream, index)) {
+    if (int const code = KFSp_PutKeyFromCache(overwrite, valueGiven, tangentsGiven, clearCache, stream, index))
         return code;
-    }
     return KFSp_Boundary([&] { stream->NotifyValueChanged(); });
 }

@@ -38,18 +38,14 @@ std::size_t LeadingBytes(KFS_Stream const* stream)
 
 int KFS_GetKeyScalarDataSize(KFS_ValueDesc const* desc, unsigned char spatial, short dimension)
 {
-    if (desc->isCustom) {
-        return desc->itemSize;
-    }
+    if (desc->isCustom) return desc->itemSize;
     return static_cast<int>(sizeof(double)) * (spatial ? 3 : 5) * dimension;
 }
 
 int KFSp_NewKeyList(KFS_Stream* stream, SEQ_Head*** list)
 {
     SEQ_Head** made = nullptr;
-    if (int const code = SEQ_New(0, static_cast<short>(KFSp_KeyItemSize(stream)), 4, 1, &made)) {
-        return code;
-    }
+    if (int const code = SEQ_New(0, static_cast<short>(KFSp_KeyItemSize(stream)), 4, 1, &made)) return code;
     (*made)->refcon = stream;
     SEQ_Funcs const funcs{stream->GetCopyItemFunc() ? KFSp_CopyKeyItemFunc : nullptr,
                           stream->GetDisposeItemFunc() ? KFSp_DisposeKeyItemFunc : nullptr, KFSp_SortKeyItemFunc};
@@ -63,31 +59,21 @@ int KFSp_NewKeyList(KFS_Stream* stream, SEQ_Head*** list)
 
 int KFSp_CreateKeyList(KFS_Stream* stream)
 {
-    if (stream->GetKeys()) {
-        return 0;
-    }
+    if (stream->GetKeys()) return 0;
     SEQ_Head** list = nullptr;
     int const code = KFSp_NewKeyList(stream, &list);
-    if (code == 0) {
-        stream->SetKeys(list);
-    }
+    if (code == 0) stream->SetKeys(list);
     return code;
 }
 
 int KFSp_SetKeyFuncs(KFS_Stream* stream)
 {
     SEQ_Head** const list = stream->GetKeys();
-    if (!list) {
-        return 0;
-    }
+    if (!list) return 0;
     (*list)->refcon = stream;
     SEQ_Funcs funcs{SEQ_RemoveFunc, SEQ_RemoveFunc, nullptr};
-    if (stream->GetCopyItemFunc()) {
-        funcs.copy = KFSp_CopyKeyItemFunc;
-    }
-    if (stream->GetDisposeItemFunc()) {
-        funcs.dispose = KFSp_DisposeKeyItemFunc;
-    }
+    if (stream->GetCopyItemFunc()) funcs.copy = KFSp_CopyKeyItemFunc;
+    if (stream->GetDisposeItemFunc()) funcs.dispose = KFSp_DisposeKeyItemFunc;
     return SEQ_SetFuncs(list, 3, &funcs);
 }
 
@@ -108,9 +94,7 @@ int KFSp_CopyKeyItemFunc(void*, SEQ_Head const* const* list, void const* source,
     auto* const to = static_cast<KFS_KeyScalar*>(destination);
     auto const head = static_cast<std::size_t>(KFSp_ValueDataOffset(from));
     std::memcpy(destination, source, head + (KFSp_HasSpatialBlock(from) ? LeadingBytes(stream) : 0));
-    if (KFSp_HasSpatialBlock(from)) {
-        to->remapTable = nullptr;
-    }
+    if (KFSp_HasSpatialBlock(from)) to->remapTable = nullptr;
     KFS_CopyItemFunc const own = stream->GetCopyItemFunc();
     KFS_CopyItemFunc const copy = own ? own : KFSp_FakeCopyItemFunc;
     return copy(stream, stream->GetItemRefcon(), KFS_Item_KeyWhole, KFSp_ValueData(from), KFSp_ValueData(to));
@@ -120,31 +104,21 @@ int KFSp_DisposeKeyItemFunc(void*, SEQ_Head** list, void* item)
 {
     KFS_Stream const* const stream = OwnerOf(list);
     KFS_DisposeItemFunc const dispose = stream->GetDisposeItemFunc();
-    if (!dispose) {
-        return 0;
-    }
+    if (!dispose) return 0;
     return dispose(stream, stream->GetItemRefcon(), KFS_Item_KeyWhole,
                    KFSp_ValueData(static_cast<KFS_KeyScalar*>(item)));
 }
 
 int KFS_DisposeRemapTables(KFS_Stream* stream)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_DisposeRemapTables, stream, KFSp_Row_Dispose)) {
-        return code;
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_DisposeRemapTables, stream, KFSp_Row_Dispose)) return code;
     KFS_StreamKeyData const* const data = stream->GetKeyData();
-    if (!stream->IsSpatial() || stream->HasNoKeys() || KFSp_ItemCount(data) == 0) {
-        return 0;
-    }
+    if (!stream->IsSpatial() || stream->HasNoKeys() || KFSp_ItemCount(data) == 0) return 0;
     KFSp_FirstError error;
     {
         KFSp_ScPin const pin(data->keys, error);
-        if (error.None()) {
-            error.Keep(KFSp_DisposeRemapTables(data->keys));
-        }
+        if (error.None()) error.Keep(KFSp_DisposeRemapTables(data->keys));
     }
-    if (error.None()) {
-        error.Keep(stream->SetArcInvalid(-1, static_cast<short>(KFSp_ItemCount(data))));
-    }
+    if (error.None()) error.Keep(stream->SetArcInvalid(-1, static_cast<short>(KFSp_ItemCount(data))));
     return error.Code();
 }

@@ -40,8 +40,6 @@ int KFSp_FakeCopyItemFuncNoLimits(KFS_Stream const* stream, long refcon, short k
 // What brings a value from a record into external form: the stream's own copy function, or what stands in for it.
 inline KFS_CopyItemFunc KFSp_OutwardFunc(KFS_Stream const* stream)
 {
-    if (KFS_CopyItemFunc const own = stream->GetCopyItemFunc()) {
-        return own;
-    }
+    if (KFS_CopyItemFunc const own = stream->GetCopyItemFunc()) return own;
     return stream->IsCustom() ? KFSp_FakeCopyItemFunc : KFSp_ConvertItemFromFloat;
 }

@@ -39,11 +39,10 @@ bool ChangesFloat(KFS_Stream const* stream, unsigned short flags, FlagChange con
 int ChangeFloat(KFS_Stream* stream, KFS_StreamKeyData const* data, KFS_KeyScalar* key, int index, FlagChange* change)
 {
     KFSp_FirstError error;
-    if ((key->flags & KFS_KeyFlag_Float) != 0) {
+    if ((key->flags & KFS_KeyFlag_Float) != 0)
         error.Keep(KFSp_SubdivideSpline(stream, key->time, KFSp_Tangents_Temporal, key));
-    } else if (index == 0 || index == KFSp_ItemCount(data) - 1) {
+    else if (index == 0 || index == KFSp_ItemCount(data) - 1)
         change->value &= static_cast<unsigned short>(~KFS_KeyFlag_Float);
-    }
     error.Keep(stream->SetInvalid(index + 1, 2));
     error.Keep(stream->SetArcInvalid(index + 1, 2));
     return error.Code();
@@ -54,12 +53,8 @@ int EqualizeSides(KFS_Stream* stream, int index)
 {
     KFSp_ScBytes const bytes(static_cast<std::size_t>(std::max<int>(stream->GetDimension(), 1)) * sizeof(double));
     auto* const velocity = static_cast<double*>(bytes.get());
-    if (!velocity) {
-        return KFS_Err_OutOfMemory;
-    }
-    if (int const code = KFS_GetKeyVelocityF(stream, index, 0, velocity, nullptr)) {
-        return code;
-    }
+    if (!velocity) return KFS_Err_OutOfMemory;
+    if (int const code = KFS_GetKeyVelocityF(stream, index, 0, velocity, nullptr)) return code;
     return KFS_SetKeyVelocityF(stream, index, nullptr, velocity);
 }
 
@@ -67,19 +62,16 @@ int ChangeFlags(KFS_Stream* stream, KFS_StreamKeyData const* data, KFS_KeyScalar
 {
     KFSp_FirstError error;
     if ((change.mask & ShapingFlags) != 0) {
-        if (ChangesFloat(stream, key->flags, change)) {
+        if (ChangesFloat(stream, key->flags, change))
             error.Keep(ChangeFloat(stream, data, key, index, &change));
-        } else if (change.Differs(key->flags)) {
+        else if (change.Differs(key->flags))
             error.Keep(stream->SetInvalid(index + 1, 2));
-        }
     }
     if (error.None()) {
         key->flags = change.Apply(key->flags);
         // A custom value has no handles, but for those along a path.
         bool const hasHandles = stream->IsSpatial() || !stream->IsCustom();
-        if (change.Sets(KFS_KeyFlag_Continuous) && index != 0 && hasHandles) {
-            error.Keep(EqualizeSides(stream, index));
-        }
+        if (change.Sets(KFS_KeyFlag_Continuous) && index != 0 && hasHandles) error.Keep(EqualizeSides(stream, index));
     }
     return error.Code();
 }
@@ -87,20 +79,14 @@ int ChangeFlags(KFS_Stream* stream, KFS_StreamKeyData const* data, KFS_KeyScalar
 int ChangeKey(KFS_Stream* stream, KFS_StreamKeyData const* data, int index, FlagChange const& change)
 {
     void* present = nullptr;
-    if (int const code = SEQ_GetAddress(data->keys, index, 0, &present)) {
-        return code;
-    }
+    if (int const code = SEQ_GetAddress(data->keys, index, 0, &present)) return code;
     if (ChangesFloat(stream, static_cast<KFS_KeyScalar*>(present)->flags, change)) {
         // Its time is about to become its own, so it has to be the right one.
-        if (int const code = stream->UpdateStream()) {
-            return code;
-        }
+        if (int const code = stream->UpdateStream()) return code;
     }
     if ((change.mask & ~change.value & KFS_KeyFlag_Modifiable) != 0) {
         // Handles that stop being automatic stay as a read would find them now.
-        if (int const code = stream->UpdateStreamIfStaleTangents(index)) {
-            return code;
-        }
+        if (int const code = stream->UpdateStreamIfStaleTangents(index)) return code;
     }
     KFSp_FirstError error;
     {
@@ -111,9 +97,7 @@ int ChangeKey(KFS_Stream* stream, KFS_StreamKeyData const* data, int index, Flag
             error.Keep(around.Code());
             if (error.None()) {
                 error.Keep(ChangeFlags(stream, data, key.get(), index, change));
-                if (!error.None()) {
-                    around.Restore();
-                }
+                if (!error.None()) around.Restore();
             }
         }
     }
@@ -123,18 +107,14 @@ int ChangeKey(KFS_Stream* stream, KFS_StreamKeyData const* data, int index, Flag
 int SetKeyFlags(KFS_Stream* stream, int index, FlagChange const& change)
 {
     KFS_StreamKeyData const* const data = stream->GetKeyData();
-    if (KFSp_HasNoValue(stream, data)) {
-        return KFSp_ReportErr(KFSp_Op_KeyFlags, KFS_Err_NoKeys, KFSp_Row_InquireKey);
-    }
+    if (KFSp_HasNoValue(stream, data)) return KFSp_ReportErr(KFSp_Op_KeyFlags, KFS_Err_NoKeys, KFSp_Row_InquireKey);
     if (stream->HasNoKeys()) {
         data->cache->flags = change.Apply(data->cache->flags);
         return 0;
     }
     KFSp_FirstError error;
     error.Keep(KFSp_ClearCache(stream));
-    if (error.None()) {
-        error.Keep(ChangeKey(stream, data, index, change));
-    }
+    if (error.None()) error.Keep(ChangeKey(stream, data, index, change));
     // Scratch of the work above owns nothing, so it isn't disposed.
     data->cache->time = KFS_INVALID_INDEX;
     return error.Code();
@@ -144,9 +124,7 @@ int SetKeyFlags(KFS_Stream* stream, int index, FlagChange const& change)
 
 int KFS_SetKeyFlags(KFS_Stream* stream, int index, unsigned short mask, unsigned short value)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_SetKeyFlags, stream, KFSp_Row_AlterKey)) {
-        return code;
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_SetKeyFlags, stream, KFSp_Row_AlterKey)) return code;
     FlagChange const change{static_cast<unsigned short>(mask & ~KFS_KeyFlag_SpatialBlock), value};
     int const code = KFSp_Boundary([&] { return SetKeyFlags(stream, index, change); });
     return code != 0 ? code : KFSp_Boundary([&] { stream->NotifyValueChanged(); });
@@ -173,8 +151,6 @@ int KFSp_SetKeySpatialState(SEQ_Head**, long on, int, void* key)
 int KFSp_KeyClearRemap(SEQ_Head**, long, int, void* key)
 {
     auto* const record = static_cast<KFS_KeyScalar*>(key);
-    if (KFSp_HasSpatialBlock(record)) {
-        record->remapTable = nullptr;
-    }
+    if (KFSp_HasSpatialBlock(record)) record->remapTable = nullptr;
     return 0;
 }

@@ -26,9 +26,7 @@ int SearchList(KFS_StreamKeyData const* data, int time, bool* found, int* index)
 // A stale key that an insertion has moved up stays in its range.
 void KeepMarked(int* range, int inserted)
 {
-    if (range[1] != KFS_INVALID_INDEX && range[1] >= inserted) {
-        ++range[1];
-    }
+    if (range[1] != KFS_INVALID_INDEX && range[1] >= inserted) ++range[1];
 }
 
 int DisposeRemapTableOfItem(SEQ_Head**, long, int, void* item)
@@ -43,9 +41,7 @@ int KFSp_SearchKeyList(KFS_StreamKeyData const* data, int time, bool* found, int
 {
     *found = false;
     *index = 0;
-    if (!data->keys) {
-        return 0;
-    }
+    if (!data->keys) return 0;
     return data->times.Build(data->keys) ? KFSp_SearchKeys(data, time, found, index)
                                          : SearchList(data, time, found, index);
 }
@@ -54,12 +50,8 @@ int KFSp_InsertKeyItem(KFS_StreamKeyData* data, KFS_KeyScalar const* record, int
 {
     bool const mirrors = data->times.Mirrors((*data->keys)->count);
     int const code = SEQ_InsertCopy(record, index, data->keys, 0);
-    if (code != 0) {
-        return code;
-    }
-    if (mirrors) {
-        data->times.Inserted(index, record->time);
-    }
+    if (code != 0) return code;
+    if (mirrors) data->times.Inserted(index, record->time);
     KeepMarked(data->invalidKeyIndex, index);
     KeepMarked(data->arcInvalidKeyIndex, index);
     return 0;
@@ -69,34 +61,26 @@ int KFSp_RemoveKeyItem(KFS_StreamKeyData* data, int index, KFS_KeyScalar* record
 {
     bool const mirrors = data->times.Mirrors((*data->keys)->count);
     int const code = SEQ_Remove(index, data->keys, 0, record);
-    if (code == 0 && mirrors) {
-        data->times.Removed(index);
-    }
+    if (code == 0 && mirrors) data->times.Removed(index);
     return code;
 }
 
 int KFSp_ReplaceKeyItem(KFS_StreamKeyData* data, KFS_KeyScalar const* record, int index)
 {
     int const code = SEQ_SetItemCopy(record, index, data->keys, 0, 0);
-    if (code == 0 && data->times.Mirrors((*data->keys)->count)) {
-        data->times.Retimed(index, record->time);
-    }
+    if (code == 0 && data->times.Mirrors((*data->keys)->count)) data->times.Retimed(index, record->time);
     return code;
 }
 
 void KFSp_RetimeKey(KFS_StreamKeyData* data, int index, KFS_KeyScalar* key, int time)
 {
     key->time = time;
-    if (data->times.Mirrors((*data->keys)->count)) {
-        data->times.Retimed(index, time);
-    }
+    if (data->times.Mirrors((*data->keys)->count)) data->times.Retimed(index, time);
 }
 
 int KFSp_DisposeRemapTable(KFS_KeyScalar* key)
 {
-    if (!KFSp_HasSpatialBlock(key) || !key->remapTable) {
-        return 0;
-    }
+    if (!KFSp_HasSpatialBlock(key) || !key->remapTable) return 0;
     return SEQ_Dispose(std::exchange(key->remapTable, nullptr), 0);
 }
 

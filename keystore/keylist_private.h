@@ -46,9 +46,7 @@ inline int KFSp_ItemCount(KFS_StreamKeyData const* data)
 // What GetKeyCount answers, on key data that the caller has at hand.
 inline int KFSp_KeyCount(KFS_Stream const* stream, KFS_StreamKeyData const* data)
 {
-    if (stream->HasNoKeys()) {
-        return data->cache->time == KFS_INVALID_INDEX ? 0 : -1;
-    }
+    if (stream->HasNoKeys()) return data->cache->time == KFS_INVALID_INDEX ? 0 : -1;
     return KFSp_ItemCount(data);
 }
 

@@ -27,14 +27,10 @@ bool KFS_KeyTimes::Build(SEQ_Head const* const* keys)
     }
     for (int i = 0; i < count; ++i) {
         void const* item = nullptr;
-        if (SEQ_GetConstAddress(keys, i, &item) != 0) {
-            return false;
-        }
+        if (SEQ_GetConstAddress(keys, i, &item) != 0) return false;
         times_[static_cast<std::size_t>(i)] = static_cast<KFS_KeyScalar const*>(item)->time;
     }
-    for (int i = 1; i < count; ++i) {
-        falls_ += FallsTo(times_, i);
-    }
+    for (int i = 1; i < count; ++i) falls_ += FallsTo(times_, i);
     mirrors_ = true;
     Changed();
     return true;
@@ -60,9 +56,7 @@ void KFS_KeyTimes::Changed() noexcept
 
 void KFS_KeyTimes::Inserted(int index, int time) noexcept
 {
-    if (!mirrors_) {
-        return;
-    }
+    if (!mirrors_) return;
     int const fall = FallsTo(times_, index);
     try {
         times_.insert(times_.begin() + index, time);
@@ -102,14 +96,11 @@ int KFS_KeyTimes::Search(int time) const noexcept
     };
     int const* base = times_.data();
     auto const all = static_cast<unsigned int>(times_.size());
-    if (all == 0) {
-        return 0;
-    }
+    if (all == 0) return 0;
     // Keys are mostly added at the end.
     if (ordered_ && times_.back() < time &&
-        static_cast<unsigned int>(time) - static_cast<unsigned int>(times_.front()) < 1U << 31) {
+        static_cast<unsigned int>(time) - static_cast<unsigned int>(times_.front()) < 1U << 31)
         return static_cast<int>(all);
-    }
     for (unsigned int count = all; count > 1;) {
         unsigned int const half = count / 2;
         base += half & (0U - isBefore(base[half - 1]));

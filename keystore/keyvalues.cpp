@@ -16,9 +16,7 @@ namespace {
 int GetRecord(KFS_Stream const* stream, int index, KFSp_Op operation, KFSp_Row action, KFS_KeyScalar const** record)
 {
     KFS_StreamKeyData const* const data = stream->GetKeyData();
-    if (KFSp_HasNoValue(stream, data)) {
-        return KFSp_ReportErr(operation, KFS_Err_NoKeys, action);
-    }
+    if (KFSp_HasNoValue(stream, data)) return KFSp_ReportErr(operation, KFS_Err_NoKeys, action);
     if (stream->HasNoKeys()) {
         *record = data->cache;
         return 0;
@@ -28,12 +26,8 @@ int GetRecord(KFS_Stream const* stream, int index, KFSp_Op operation, KFSp_Row a
 
 void AnswerCodes(char* inInterp, char* outInterp, char in, char out)
 {
-    if (inInterp) {
-        *inInterp = in;
-    }
-    if (outInterp) {
-        *outInterp = out;
-    }
+    if (inInterp) *inInterp = in;
+    if (outInterp) *outInterp = out;
 }
 
 // The record with its codes answered, for the two forms of the question.
@@ -41,9 +35,7 @@ int GetRecordAndCodes(KFS_Stream const* stream, int index, char* inInterp, char*
                       KFS_KeyScalar const** record)
 {
     int const code = GetRecord(stream, index, KFSp_Op_GetKey, KFSp_Row_GetValue, record);
-    if (code == 0) {
-        AnswerCodes(inInterp, outInterp, (*record)->inInterp, (*record)->outInterp);
-    }
+    if (code == 0) AnswerCodes(inInterp, outInterp, (*record)->inInterp, (*record)->outInterp);
     return code;
 }
 
@@ -52,14 +44,10 @@ int GetRecordAndCodes(KFS_Stream const* stream, int index, char* inInterp, char*
 int KFS_GetKeyFlags(KFS_Stream const* stream, int index, unsigned short* flags)
 {
     return KFSp_Boundary([&] {
-        if (int const code = KFSp_CheckStream(KFSp_Op_KeyFlags, stream, KFSp_Row_InquireKey)) {
-            return code;
-        }
+        if (int const code = KFSp_CheckStream(KFSp_Op_KeyFlags, stream, KFSp_Row_InquireKey)) return code;
         KFS_KeyScalar const* record = nullptr;
         int const code = GetRecord(stream, index, KFSp_Op_KeyFlags, KFSp_Row_InquireKey, &record);
-        if (code == 0) {
-            *flags = record->flags;
-        }
+        if (code == 0) *flags = record->flags;
         return code;
     });
 }
@@ -68,14 +56,10 @@ int KFS_GetKey(KFS_Stream const* stream, int index, void* value, char* inInterp,
 {
     AnswerCodes(inInterp, outInterp, KFS_Interp_None, KFS_Interp_None);
     return KFSp_Boundary([&] {
-        if (int const code = KFSp_CheckStream(KFSp_Op_GetKey, stream, KFSp_Row_GetValue)) {
-            return code;
-        }
+        if (int const code = KFSp_CheckStream(KFSp_Op_GetKey, stream, KFSp_Row_GetValue)) return code;
         KFS_KeyScalar const* record = nullptr;
         int const code = GetRecordAndCodes(stream, index, inInterp, outInterp, &record);
-        if (code != 0 || !value) {
-            return code;
-        }
+        if (code != 0 || !value) return code;
         short const kind = stream->HasNoKeys() ? KFS_Item_CacheValue : KFS_Item_KeyValue;
         return KFSp_OutwardFunc(stream)(stream, stream->GetItemRefcon(), kind, KFSp_ValueData(record), value);
     });
@@ -85,17 +69,11 @@ int KFS_GetKeyF(KFS_Stream const* stream, int index, double* value, char* inInte
 {
     AnswerCodes(inInterp, outInterp, KFS_Interp_None, KFS_Interp_None);
     return KFSp_Boundary([&] {
-        if (int const code = KFSp_CheckStream(KFSp_Op_GetKey, stream, KFSp_Row_GetValue)) {
-            return code;
-        }
-        if (value && stream->IsCustom()) {
-            return KFSp_RefuseCustomValue(KFSp_Op_GetFloat, KFSp_Row_ComputeFloatValues);
-        }
+        if (int const code = KFSp_CheckStream(KFSp_Op_GetKey, stream, KFSp_Row_GetValue)) return code;
+        if (value && stream->IsCustom()) return KFSp_RefuseCustomValue(KFSp_Op_GetFloat, KFSp_Row_ComputeFloatValues);
         KFS_KeyScalar const* record = nullptr;
         int const code = GetRecordAndCodes(stream, index, inInterp, outInterp, &record);
-        if (code == 0 && value) {
-            std::copy_n(KFSp_Numbers(record), stream->GetDimension(), value);
-        }
+        if (code == 0 && value) std::copy_n(KFSp_Numbers(record), stream->GetDimension(), value);
         return code;
     });
 }

@@ -15,12 +15,8 @@ constexpr double NoMaximum = 1e9;
 // Truncated to an int; what doesn't fit, the nearest end of the range, and NaN is 0.
 int Truncate(double number)
 {
-    if (number >= 2147483648.0) {
-        return std::numeric_limits<int>::max();
-    }
-    if (number <= -2147483649.0) {
-        return std::numeric_limits<int>::min();
-    }
+    if (number >= 2147483648.0) return std::numeric_limits<int>::max();
+    if (number <= -2147483649.0) return std::numeric_limits<int>::min();
     return number == number ? static_cast<int>(number) : 0;
 }
 
@@ -130,20 +126,14 @@ short KFS_Stream::GetPrecision() const
 
 void KFS_Stream::LegalizeValue(double* values) const
 {
-    if (!CanLegalizeValue()) {
-        return;
-    }
+    if (!CanLegalizeValue()) return;
     // The comparisons are such that a NaN becomes the limit.
     if (HasMinValue()) {
         double const least = GetMinValue();
-        for (int i = 0; i < dimension_; ++i) {
-            values[i] = values[i] > least ? values[i] : least;
-        }
+        for (int i = 0; i < dimension_; ++i) values[i] = values[i] > least ? values[i] : least;
     }
     if (HasMaxValue()) {
         double const greatest = GetMaxValue();
-        for (int i = 0; i < dimension_; ++i) {
-            values[i] = greatest > values[i] ? values[i] : greatest;
-        }
+        for (int i = 0; i < dimension_; ++i) values[i] = greatest > values[i] ? values[i] : greatest;
     }
 }

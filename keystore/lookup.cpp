@@ -16,26 +16,20 @@ constexpr T_Time NoTime{KFS_INVALID_INDEX, 0};
 template <class Value>
 void Answer(Value* out, Value const& value)
 {
-    if (out) {
-        *out = value;
-    }
+    if (out) *out = value;
 }
 
 // The time at which a constant's value stands. The sentinel would say that there is no value.
 void MoveConstant(KFS_StreamKeyData const* data, int time)
 {
-    if (time != KFS_INVALID_INDEX) {
-        data->cache->time = time;
-    }
+    if (time != KFS_INVALID_INDEX) data->cache->time = time;
 }
 
 int GetKeyTime(KFS_Stream const* stream, KFS_StreamKeyData const* data, int index, T_Time* time)
 {
     KFS_KeyScalar const* key = nullptr;
     int const code = KFSp_GetConstKey(data, index, &key);
-    if (code == 0) {
-        *time = {key->time, stream->GetTimeScale()};
-    }
+    if (code == 0) *time = {key->time, stream->GetTimeScale()};
     return code;
 }
 
@@ -43,45 +37,27 @@ int GetKeyTime(KFS_Stream const* stream, KFS_StreamKeyData const* data, int inde
 int StepFromSearch(bool found, int index, short direction)
 {
     bool const backward = (direction & KFS_Find_Backward) != 0;
-    if (!found) {
-        return backward ? index - 1 : index;  // the search stopped at the next later key
-    }
-    if (direction & KFS_Find_AtTime) {
-        return index;
-    }
+    if (!found) return backward ? index - 1 : index;  // the search stopped at the next later key
+    if (direction & KFS_Find_AtTime) return index;
     return backward ? index - 1 : index + 1;
 }
 
 int FindKeyTime(KFS_Stream const* stream, T_Time const* time, short direction, int* index, T_Time* keyTime)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_FindKeyTime, stream, KFSp_Row_GetKeyValue)) {
-        return code;
-    }
-    if (stream->HasNoKeys()) {
-        return KFSp_ReportErr(KFSp_Op_FindKeyTime, KFS_Err_Constant, KFSp_Row_GetKeyValue);
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_FindKeyTime, stream, KFSp_Row_GetKeyValue)) return code;
+    if (stream->HasNoKeys()) return KFSp_ReportErr(KFSp_Op_FindKeyTime, KFS_Err_Constant, KFSp_Row_GetKeyValue);
     KFS_StreamKeyData const* const data = stream->GetKeyData();
     int const count = KFSp_ItemCount(data);
-    if (count == 0) {
-        return 0;
-    }
+    if (count == 0) return 0;
     int at = 0;
-    if (int const code = KFSp_TimeInStream(stream, time, &at)) {
-        return code;
-    }
+    if (int const code = KFSp_TimeInStream(stream, time, &at)) return code;
     bool found = false;
     int position = 0;
-    if (int const code = KFSp_SearchKeys(data, at, &found, &position)) {
-        return code;
-    }
+    if (int const code = KFSp_SearchKeys(data, at, &found, &position)) return code;
     int const answer = StepFromSearch(found, position, direction);
-    if (answer < 0 || answer >= count) {
-        return 0;
-    }
+    if (answer < 0 || answer >= count) return 0;
     int const code = GetKeyTime(stream, data, answer, keyTime);
-    if (code == 0) {
-        *index = answer;
-    }
+    if (code == 0) *index = answer;
     return code;
 }
 
@@ -106,19 +82,14 @@ int NearerKey(KFS_StreamKeyData const* data, int at, int next, int* nearest)
 
 int FindNearestKeyTime(KFS_Stream const* stream, T_Time const* time, int* index, T_Time* keyTime)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_FindNearestKeyTime, stream, KFSp_Row_InquireKey)) {
-        return code;
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_FindNearestKeyTime, stream, KFSp_Row_InquireKey)) return code;
     int at = 0;
-    if (int const code = KFSp_TimeInStream(stream, time, &at)) {
-        return code;
-    }
+    if (int const code = KFSp_TimeInStream(stream, time, &at)) return code;
     KFS_StreamKeyData const* const data = stream->GetKeyData();
     T_Time const asked{at, stream->GetTimeScale()};
     if (stream->HasNoKeys()) {
-        if (KFSp_HasNoValue(stream, data)) {
+        if (KFSp_HasNoValue(stream, data))
             return KFSp_ReportErr(KFSp_Op_FindNearestKeyTime, KFS_Err_NoKeys, KFSp_Row_GetValue);
-        }
         MoveConstant(data, at);
         *index = 0;
         *keyTime = asked;
@@ -130,9 +101,7 @@ int FindNearestKeyTime(KFS_Stream const* stream, T_Time const* time, int* index,
     }
     bool found = false;
     int position = 0;
-    if (int const code = KFSp_SearchKeys(data, at, &found, &position)) {
-        return code;
-    }
+    if (int const code = KFSp_SearchKeys(data, at, &found, &position)) return code;
     if (found) {
         *index = position;
         *keyTime = asked;
@@ -143,12 +112,8 @@ int FindNearestKeyTime(KFS_Stream const* stream, T_Time const* time, int* index,
     KFSp_FirstError error;
     {
         KFSp_ScConstPin const pin(data->keys, error);
-        if (error.None()) {
-            error.Keep(NearerKey(data, at, position, &nearest));
-        }
-        if (error.None()) {
-            error.Keep(GetKeyTime(stream, data, nearest, &nearestTime));
-        }
+        if (error.None()) error.Keep(NearerKey(data, at, position, &nearest));
+        if (error.None()) error.Keep(GetKeyTime(stream, data, nearest, &nearestTime));
     }
     if (error.None()) {
         *index = nearest;
@@ -171,9 +136,7 @@ private:
     static int& ThisThreads()
     {
         boost::thread_specific_ptr<int>& check = KFSp_GetTimeToIndexCheck();
-        if (!check.get()) {
-            check.reset(new int(0));
-        }
+        if (!check.get()) check.reset(new int(0));
         return *check;
     }
 
@@ -195,57 +158,35 @@ int UpdateForLookup(KFS_Stream const* stream)
 
 int TimeToIndex(KFS_Stream const* stream, T_Time const* time, int* index)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_TimeToIndex, stream, KFSp_Row_InquireKey)) {
-        return code;
-    }
-    if (stream->HasNoKeys()) {
-        return KFSp_ReportErr(KFSp_Op_TimeToIndex, KFS_Err_Constant, KFSp_Row_InquireKey);
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_TimeToIndex, stream, KFSp_Row_InquireKey)) return code;
+    if (stream->HasNoKeys()) return KFSp_ReportErr(KFSp_Op_TimeToIndex, KFS_Err_Constant, KFSp_Row_InquireKey);
     KFS_StreamKeyData const* const data = stream->GetKeyData();
-    if (KFSp_ItemCount(data) == 0) {
-        return KFSp_ReportErr(KFSp_Op_TimeToIndex, KFS_Err_NoKeys, KFSp_Row_InquireKey);
-    }
+    if (KFSp_ItemCount(data) == 0) return KFSp_ReportErr(KFSp_Op_TimeToIndex, KFS_Err_NoKeys, KFSp_Row_InquireKey);
     int at = 0;
-    if (int const code = KFSp_TimeInStream(stream, time, &at)) {
-        return code;
-    }
+    if (int const code = KFSp_TimeInStream(stream, time, &at)) return code;
     bool found = false;
     int position = 0;
-    if (int const code = KFSp_SearchKeys(data, at, &found, &position)) {
-        return code;
-    }
+    if (int const code = KFSp_SearchKeys(data, at, &found, &position)) return code;
     // An update asks for float keys that are in the way, and those are to be found where they stand.
     if (!found || !IsFloatKey(data, position)) {
         if (int const code = UpdateForLookup(stream)) {
             // The key that stands there is no less an answer.
-            if (found) {
-                *index = position;
-            }
+            if (found) *index = position;
             return found ? 0 : code;
         }
-        if (int const code = KFSp_SearchKeys(data, at, &found, &position)) {
-            return code;
-        }
+        if (int const code = KFSp_SearchKeys(data, at, &found, &position)) return code;
     }
-    if (found) {
-        *index = position;
-    }
+    if (found) *index = position;
     return 0;
 }
 
 int GetKeyIndex(KFS_Stream const* stream, T_Time const* time, int* index, bool* found)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_GetKeyIndex, stream, KFSp_Row_InquireKey)) {
-        return code;
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_GetKeyIndex, stream, KFSp_Row_InquireKey)) return code;
     int at = 0;
-    if (int const code = KFSp_TimeInStream(stream, time, &at)) {
-        return code;
-    }
+    if (int const code = KFSp_TimeInStream(stream, time, &at)) return code;
     KFS_StreamKeyData const* const data = stream->GetKeyData();
-    if (KFSp_HasNoValue(stream, data)) {
-        return KFSp_ReportErr(KFSp_Op_GetKeyIndex, KFS_Err_NoKeys, KFSp_Row_GetValue);
-    }
+    if (KFSp_HasNoValue(stream, data)) return KFSp_ReportErr(KFSp_Op_GetKeyIndex, KFS_Err_NoKeys, KFSp_Row_GetValue);
     if (stream->HasNoKeys()) {
         MoveConstant(data, at);
         *index = 0;
@@ -253,52 +194,36 @@ int GetKeyIndex(KFS_Stream const* stream, T_Time const* time, int* index, bool* 
         return 0;
     }
     int position = 0;
-    if (int const code = KFSp_SearchKeys(data, at, found, &position)) {
-        return code;
-    }
-    if (*found) {
+    if (int const code = KFSp_SearchKeys(data, at, found, &position)) return code;
+    if (*found)
         *index = position;
-    } else if (position > 0) {
+    else if (position > 0)
         *index = position - 1;
-    }
     return 0;
 }
 
 int IndexToTime(KFS_Stream const* stream, int index, T_Time* time)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_IndexToTime, stream, KFSp_Row_InquireKey)) {
-        return code;
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_IndexToTime, stream, KFSp_Row_InquireKey)) return code;
     KFS_StreamKeyData const* const data = stream->GetKeyData();
     if (stream->HasNoKeys()) {
-        if (KFSp_HasNoValue(stream, data)) {
+        if (KFSp_HasNoValue(stream, data))
             return KFSp_ReportErr(KFSp_Op_IndexToTime, KFS_Err_Constant, KFSp_Row_InquireKey);
-        }
         *time = {data->cache->time, stream->GetTimeScale()};
         return 0;
     }
     int const count = KFSp_ItemCount(data);
-    if (count == 0 || index < -1 || index >= count) {
-        return 0;
-    }
+    if (count == 0 || index < -1 || index >= count) return 0;
     T_Time answer = NoTime;
     KFSp_FirstError error;
     {
         KFSp_ScConstPin const pin(data->keys, error);
         KFS_KeyScalar const* key = nullptr;
-        if (error.None()) {
-            error.Keep(KFSp_GetConstKey(data, index, &key));
-        }
-        if (error.None()) {
-            error.Keep(stream->UpdateStreamIfFloatItem(key, index));
-        }
-        if (error.None()) {
-            answer = {key->time, stream->GetTimeScale()};
-        }
+        if (error.None()) error.Keep(KFSp_GetConstKey(data, index, &key));
+        if (error.None()) error.Keep(stream->UpdateStreamIfFloatItem(key, index));
+        if (error.None()) answer = {key->time, stream->GetTimeScale()};
     }
-    if (error.None()) {
-        *time = answer;
-    }
+    if (error.None()) *time = answer;
     return error.Code();
 }
 

@@ -10,16 +10,12 @@ public:
     KFSp_ScConstPin(SEQ_Head const* const* list, KFSp_FirstError& error) noexcept : error_(error)
     {
         int const code = SEQ_LockConst(1, list);
-        if (code == 0) {
-            list_ = list;  // a failed lock owes no unlock
-        }
+        if (code == 0) list_ = list;  // a failed lock owes no unlock
         error_.Keep(code);
     }
     ~KFSp_ScConstPin()
     {
-        if (list_) {
-            error_.Keep(SEQ_UnlockConst(list_));
-        }
+        if (list_) error_.Keep(SEQ_UnlockConst(list_));
     }
     KFSp_ScConstPin(KFSp_ScConstPin const&) = delete;
     KFSp_ScConstPin& operator=(KFSp_ScConstPin const&) = delete;
@@ -35,16 +31,12 @@ public:
     KFSp_ScPin(SEQ_Head** list, KFSp_FirstError& error) noexcept : error_(error)
     {
         int const code = SEQ_Lock(1, list);
-        if (code == 0) {
-            list_ = list;
-        }
+        if (code == 0) list_ = list;
         error_.Keep(code);
     }
     ~KFSp_ScPin()
     {
-        if (list_) {
-            error_.Keep(SEQ_Unlock(list_));
-        }
+        if (list_) error_.Keep(SEQ_Unlock(list_));
     }
     KFSp_ScPin(KFSp_ScPin const&) = delete;
     KFSp_ScPin& operator=(KFSp_ScPin const&) = delete;
@@ -70,9 +62,7 @@ public:
     }
     ~KFSp_ScKey()
     {
-        if (list_) {
-            error_.Keep(SEQ_Unlock(list_));
-        }
+        if (list_) error_.Keep(SEQ_Unlock(list_));
     }
     KFSp_ScKey(KFSp_ScKey const&) = delete;
     KFSp_ScKey& operator=(KFSp_ScKey const&) = delete;

@@ -16,9 +16,7 @@ bool IsAnyFollowerAnimated(KFS_Stream const* leader)
 {
     for (int i = 0; i < leader->GetEffectiveDimension(); ++i) {
         KFS_Stream const* const follower = leader->GetSeparationFollower(i);
-        if (follower && follower->IsAnimated(false)) {
-            return true;
-        }
+        if (follower && follower->IsAnimated(false)) return true;
     }
     return false;
 }
@@ -40,12 +38,8 @@ bool KFS_Stream::IsModified() const
 
 bool KFS_Stream::IsAnimated(bool evenIfDisabled) const
 {
-    if (!IsCanonical() && GetParent() && AreDimensionsSeparated()) {
-        return IsAnyFollowerAnimated(this);
-    }
-    if (HasKeys()) {
-        return true;
-    }
+    if (!IsCanonical() && GetParent() && AreDimensionsSeparated()) return IsAnyFollowerAnimated(this);
+    if (HasKeys()) return true;
     return evenIfDisabled ? HasExpression() : HasActiveExpression();
 }
 
@@ -61,26 +55,18 @@ bool KFS_Stream::IsHoldOnly() const
 
 bool KFS_Stream::SameValueAtTimes(T_Time const& a, T_Time const& b, KFS_ParamBag const*) const
 {
-    if (!IsAnimated(false) || a == b) {
-        return true;
-    }
-    if (GetInterpMask() != KFS_InterpMask_Hold || HasActiveExpression()) {
-        return false;
-    }
+    if (!IsAnimated(false) || a == b) return true;
+    if (GetInterpMask() != KFS_InterpMask_Hold || HasActiveExpression()) return false;
     return HoldingKey(this, a) == HoldingKey(this, b);
 }
 
 void KFS_Stream::PrepareSetValue(T_Time const& time)
 {
-    if (HasNoKeys()) {
-        return;
-    }
+    if (HasNoKeys()) return;
     if (KFSp_ItemCount(GetKeyData()) > 0) {
         int index = KFS_INVALID_INDEX;
         KFSp_ThrowIf(KFS_TimeToIndex(this, &time, &index));
-        if (index != KFS_INVALID_INDEX) {
-            return;
-        }
+        if (index != KFS_INVALID_INDEX) return;
     }
     KFSp_ThrowIf(KFS_InsertKeyF(this, &time, 1, nullptr, KFS_Interp_None, KFS_Interp_None));
 }
@@ -163,12 +149,8 @@ void KFS_Stream::DisposeCapsuleOverrideValue(void*&) const {}
 
 bool KFS_Stream::CanHaveExpression() const
 {
-    if (!CanBeAnimated()) {
-        return false;
-    }
-    if (!GetMatchName().IsValid()) {
-        return true;
-    }
+    if (!CanBeAnimated()) return false;
+    if (!GetMatchName().IsValid()) return true;
     switch (GetParamDef().paramType) {
     case FX_Param_LAYER:
     case FX_Param_GROUP:

@@ -15,9 +15,7 @@ int Distance(int old, unsigned int oldScale, T_Time const& tick, T_Time* distanc
 {
     T_Time const before{old, oldScale};
     int const code = KFS_SubTime(&before, &tick, 0, distance);
-    if (code == 0 && distance->value < 0) {
-        distance->value = -distance->value;
-    }
+    if (code == 0 && distance->value < 0) distance->value = -distance->value;
     return code;
 }
 
@@ -30,9 +28,7 @@ int EarlierStays(int earlier, int later, unsigned int oldScale, T_Time const& ti
     KFSp_FirstError error;
     error.Keep(Distance(earlier, oldScale, tick, &fromEarlier));
     error.Keep(Distance(later, oldScale, tick, &fromLater));
-    if (error.None()) {
-        error.Keep(T_CompareTime(&fromEarlier, &fromLater, &order));
-    }
+    if (error.None()) error.Keep(T_CompareTime(&fromEarlier, &fromLater, &order));
     *stays = order <= 0;
     return error.Code();
 }
@@ -44,24 +40,16 @@ int RetimeKeys(KFS_Stream* stream, KFS_StreamKeyData* data, unsigned int newScal
     int previousNew = KFS_INVALID_INDEX;
     for (int index = 0; index < KFSp_ItemCount(data);) {
         void* item = nullptr;
-        if (int const code = SEQ_GetAddress(data->keys, index, 0, &item)) {
-            return code;
-        }
+        if (int const code = SEQ_GetAddress(data->keys, index, 0, &item)) return code;
         auto* const key = static_cast<KFS_KeyScalar*>(item);
         int const oldTime = key->time;
         T_Time tick{0, newScale};
-        if (int const code = T_ShortConvTime(oldTime, oldScale, newScale, &tick.value)) {
-            return code;
-        }
+        if (int const code = T_ShortConvTime(oldTime, oldScale, newScale, &tick.value)) return code;
         KFSp_RetimeKey(data, index, key, tick.value);
         if (index > 0 && tick.value == previousNew) {
             bool earlierStays = true;
-            if (int const code = EarlierStays(previousOld, oldTime, oldScale, tick, &earlierStays)) {
-                return code;
-            }
-            if (int const code = KFS_RemoveKey(stream, earlierStays ? index : index - 1, nullptr)) {
-                return code;
-            }
+            if (int const code = EarlierStays(previousOld, oldTime, oldScale, tick, &earlierStays)) return code;
+            if (int const code = KFS_RemoveKey(stream, earlierStays ? index : index - 1, nullptr)) return code;
         } else {
             ++index;
         }
@@ -89,9 +77,7 @@ private:
 int RescaleKeys(KFS_Stream* stream, unsigned int newScale)
 {
     KFS_StreamKeyData* const data = stream->GetKeyDataForModify();
-    if (int const code = KFSp_ClearCache(stream)) {
-        return code;
-    }
+    if (int const code = KFSp_ClearCache(stream)) return code;
     KFSp_FirstError error;
     {
         KFSp_ScPin const pin(data->keys, error);
@@ -101,9 +87,7 @@ int RescaleKeys(KFS_Stream* stream, unsigned int newScale)
         }
     }
     error.Keep(KFSp_ClearCache(stream));  // of what was read meanwhile
-    if (error.None()) {
-        error.Keep(SEQ_Compact(data->keys));
-    }
+    if (error.None()) error.Keep(SEQ_Compact(data->keys));
     return error.Code();
 }
 
@@ -112,16 +96,10 @@ int RescaleKeys(KFS_Stream* stream, unsigned int newScale)
 int KFS_RescaleStream(KFS_Stream* stream, unsigned int newScale)
 {
     return KFSp_Boundary([&] {
-        if (int const code = KFSp_CheckStream(KFSp_Op_Rescale, stream, KFSp_Row_Rescale)) {
-            return code;
-        }
-        if (newScale == stream->GetTimeScale()) {
-            return 0;
-        }
+        if (int const code = KFSp_CheckStream(KFSp_Op_Rescale, stream, KFSp_Row_Rescale)) return code;
+        if (newScale == stream->GetTimeScale()) return 0;
         if (stream->HasKeys() && KFSp_ItemCount(stream->GetKeyData()) > 0) {
-            if (int const code = RescaleKeys(stream, newScale)) {
-                return code;
-            }
+            if (int const code = RescaleKeys(stream, newScale)) return code;
         }
         stream->SetTimeScale(newScale);
         return 0;

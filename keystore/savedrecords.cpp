@@ -45,9 +45,7 @@ KFSp_SavedCache::KFSp_SavedCache(KFS_Stream const* stream) noexcept
       size_(static_cast<std::size_t>(stream->GetCacheSize())),
       bytes_(size_)
 {
-    if (bytes_.get()) {
-        std::memcpy(bytes_.get(), static_cast<void const*>(cache_), size_);
-    }
+    if (bytes_.get()) std::memcpy(bytes_.get(), static_cast<void const*>(cache_), size_);
 }
 
 void KFSp_SavedCache::Restore() const noexcept
@@ -66,9 +64,8 @@ KFSp_SavedKeys::KFSp_SavedKeys(KFS_Stream const* stream, KFS_StreamKeyData const
     for (int i = first_; code_ == 0 && i <= last_; ++i) {
         KFS_KeyScalar const* key = nullptr;
         code_ = KFSp_GetConstKey(data_, i, &key);
-        if (code_ == 0) {
+        if (code_ == 0)
             std::memcpy(static_cast<char*>(bytes_.get()) + static_cast<std::size_t>(i - first_) * size_, key, size_);
-        }
     }
 }
 
@@ -76,18 +73,14 @@ void KFSp_SavedKeys::Restore() const noexcept
 {
     for (int i = first_; i <= last_; ++i) {
         void* item = nullptr;
-        if (SEQ_GetAddress(data_->keys, i, 0, &item) != 0) {
-            return;
-        }
+        if (SEQ_GetAddress(data_->keys, i, 0, &item) != 0) return;
         auto* const key = static_cast<KFS_KeyScalar*>(item);
         int const time = key->time;
         bool const hasTable = KFSp_HasSpatialBlock(key);
         SEQ_Head** const table = hasTable ? key->remapTable : nullptr;
         std::memcpy(item, static_cast<char const*>(bytes_.get()) + static_cast<std::size_t>(i - first_) * size_, size_);
         key->time = time;
-        if (hasTable) {
-            key->remapTable = table;
-        }
+        if (hasTable) key->remapTable = table;
     }
 }
 
@@ -95,10 +88,6 @@ KFSp_AnchorRange::KFSp_AnchorRange(KFS_StreamKeyData const* data, int before, in
     : first(std::max(before, 0)),
       last(std::min(after, KFSp_ItemCount(data) - 1))
 {
-    while (first > 0 && IsFloat(data, first)) {
-        --first;
-    }
-    while (last < KFSp_ItemCount(data) - 1 && IsFloat(data, last)) {
-        ++last;
-    }
+    while (first > 0 && IsFloat(data, first)) --first;
+    while (last < KFSp_ItemCount(data) - 1 && IsFloat(data, last)) ++last;
 }

@@ -32,18 +32,14 @@ Range MarkedRange(int keyCount, int index, int count)
         long const shrunk = static_cast<long>(count) - (static_cast<long>(index) - last);
         reach = static_cast<int>(std::max(shrunk, 0L));
     }
-    if (reach < 1) {
-        return {};
-    }
+    if (reach < 1) return {};
     long const first = static_cast<long>(last) - reach;
     return {static_cast<int>(std::max(first, 0L)), std::max(last, 0)};
 }
 
 void Merge(Range mark, int* stored)
 {
-    if (mark.IsNone()) {
-        return;
-    }
+    if (mark.IsNone()) return;
     stored[0] = stored[0] == KFS_INVALID_INDEX ? mark.first : std::min(stored[0], mark.first);
     stored[1] = stored[1] == KFS_INVALID_INDEX ? mark.last : std::max(stored[1], mark.last);
 }
@@ -71,12 +67,8 @@ int WidenOverFloatKeys(SEQ_Head** keys, Range* range)
     {
         KFSp_ScPin const pin(keys, error);
         int const lastKey = (*keys)->count - 1;
-        while (error.None() && range->first > 0 && IsFloatKey(keys, range->first, error)) {
-            --range->first;
-        }
-        while (error.None() && range->last < lastKey && IsFloatKey(keys, range->last, error)) {
-            ++range->last;
-        }
+        while (error.None() && range->first > 0 && IsFloatKey(keys, range->first, error)) --range->first;
+        while (error.None() && range->last < lastKey && IsFloatKey(keys, range->last, error)) ++range->last;
     }
     return error.Code();
 }
@@ -93,9 +85,7 @@ int KFS_Stream::SetInvalid(int index, short count) const
     }
     Range mark = MarkedRange(keyCount, index, count);
     int code = 0;
-    if (IsSpatial() && !mark.IsNone()) {
-        code = WidenOverFloatKeys(data->keys, &mark);
-    }
+    if (IsSpatial() && !mark.IsNone()) code = WidenOverFloatKeys(data->keys, &mark);
     Merge(mark, data->invalidKeyIndex);
     return code;
 }

@@ -37,17 +37,11 @@ int DuplicateRemapTables(SEQ_Head const* const* source, SEQ_Head** copy)
         void* to = nullptr;
         error.Keep(SEQ_GetConstAddress(source, i, &from));
         error.Keep(SEQ_GetAddress(copy, i, 0, &to));
-        if (!from || !to) {
-            return error.Code();
-        }
+        if (!from || !to) return error.Code();
         auto* const key = static_cast<KFS_KeyScalar*>(to);
         SEQ_Head** const table = RemapTableOf(static_cast<KFS_KeyScalar const*>(from));
-        if (KFSp_HasSpatialBlock(key)) {
-            key->remapTable = nullptr;
-        }
-        if (table && error.None()) {
-            error.Keep(SEQ_Duplicate(table, 0, &key->remapTable));
-        }
+        if (KFSp_HasSpatialBlock(key)) key->remapTable = nullptr;
+        if (table && error.None()) error.Keep(SEQ_Duplicate(table, 0, &key->remapTable));
     }
     return error.Code();
 }
@@ -64,17 +58,11 @@ KFS_Stream const& Undamaged(KFS_Stream const& source)
 
 int SetCustomDescription(KFS_Stream* stream, KFS_ValueDesc const& desc)
 {
-    if (!KFSp_KeyItemFits(desc, stream->IsSpatial(), stream->GetDimension())) {
-        return KFS_Err_BadValueDesc;
-    }
+    if (!KFSp_KeyItemFits(desc, stream->IsSpatial(), stream->GetDimension())) return KFS_Err_BadValueDesc;
     *stream->GetValueDescForModify() = desc;
     stream->SetInterpFunc(desc.interpFunc);
-    if (stream->GetCopyItemFunc()) {
-        return 0;
-    }
-    if (int const code = KFSp_CheckStream(KFSp_Op_SetCustomFuncs, stream, KFSp_Row_SetCustomFuncs)) {
-        return code;
-    }
+    if (stream->GetCopyItemFunc()) return 0;
+    if (int const code = KFSp_CheckStream(KFSp_Op_SetCustomFuncs, stream, KFSp_Row_SetCustomFuncs)) return code;
     stream->SetCopyItemFunc(KFSp_FakeCopyItemFunc);
     stream->SetDisposeItemFunc(nullptr);
     return KFSp_SetKeyFuncs(stream);
@@ -84,9 +72,8 @@ int SetPlainDescription(KFS_Stream* stream, KFS_ValueDesc const& newDesc)
 {
     auto const type = static_cast<signed char>(newDesc.dataType & 0xFF);
     if (type > KFS_Type_Double ||
-        !KFSp_KeyItemFits(*stream->GetValueDesc(), stream->IsSpatial(), stream->GetDimension())) {
+        !KFSp_KeyItemFits(*stream->GetValueDesc(), stream->IsSpatial(), stream->GetDimension()))
         return KFS_Err_BadValueDesc;
-    }
     KFS_ValueDesc* const desc = stream->GetValueDescForModify();
     desc->dataType = (desc->dataType & ~0xFFL) | (newDesc.dataType & 0xFF);
     int code = 0;
@@ -110,15 +97,11 @@ KFS_StreamKeyData::KFS_StreamKeyData(KFS_StreamKeyData const& source, KFS_Stream
     : invalidKeyIndex{source.invalidKeyIndex[0], source.invalidKeyIndex[1]},
       arcInvalidKeyIndex{source.arcInvalidKeyIndex[0], source.arcInvalidKeyIndex[1]}
 {
-    if (source.keys) {
-        KFSp_ThrowIf(SEQ_Duplicate(source.keys, 0, &keys));
-    }
+    if (source.keys) KFSp_ThrowIf(SEQ_Duplicate(source.keys, 0, &keys));
     KFSp_FirstError error;
     if (keys) {
         error.Keep(SEQ_SetRefcon((*source.keys)->refcon, keys));
-        if (stream->IsSpatial()) {
-            error.Keep(DuplicateRemapTables(source.keys, keys));
-        }
+        if (stream->IsSpatial()) error.Keep(DuplicateRemapTables(source.keys, keys));
     }
     try {
         KFSp_ThrowIf(error.Code());
@@ -132,9 +115,7 @@ KFS_StreamKeyData::KFS_StreamKeyData(KFS_StreamKeyData const& source, KFS_Stream
 
 KFS_StreamKeyData::~KFS_StreamKeyData()
 {
-    if (valueOwner_) {
-        static_cast<void>(KFSp_ClearCacheRecord(valueOwner_, cache));
-    }
+    if (valueOwner_) static_cast<void>(KFSp_ClearCacheRecord(valueOwner_, cache));
     KFSp_DisposeKeyList(keys);
     Q_FreePtr(cache);
 }
@@ -151,16 +132,12 @@ KFS_Stream::KFS_Stream(short dimension, unsigned int timeScale, unsigned char no
       multiplier_{1.0, 1.0, 1.0, 1.0},
       interpFunc_(KFSp_Interpolate)
 {
-    if (noKeys) {
-        kfsFlags_ |= KFS_StreamFlag_NoKeys;
-    }
+    if (noKeys) kfsFlags_ |= KFS_StreamFlag_NoKeys;
     if (spatial) {
         kfsFlags_ |= KFS_StreamFlag_Spatial | KFS_StreamFlag_NonDecreasing;
         interpFunc_ = KFSp_InterpolateSpatial;
     }
-    if (valueDesc.isCustom) {
-        interpFunc_ = valueDesc.interpFunc;
-    }
+    if (valueDesc.isCustom) interpFunc_ = valueDesc.interpFunc;
     KFSp_ThrowIf(KFS_SetValueDescription(this, &valueDesc, nullptr));
     AllocateCache();
     if (spatial && !IsCustom() && dimension <= 3) {
@@ -192,17 +169,11 @@ KFS_Stream::KFS_Stream(KFS_Stream const& source, KFS_CloneStreamParams const& pa
 {
     int const code = KFSp_Boundary([&] {
         keyData_.cache = source.CloneCache(source.GetCache());
-        if (params.cloneKeys && source.keyData_.keys) {
-            CopyKeysFrom(source);
-        }
-        if (params.cloneExpression && source.HasExpression()) {
-            CopyExpressionFrom(source);
-        }
+        if (params.cloneKeys && source.keyData_.keys) CopyKeysFrom(source);
+        if (params.cloneExpression && source.HasExpression()) CopyExpressionFrom(source);
     });
     if (code != 0) {
-        if (keyData_.cache) {
-            KFSp_ClearCacheRecord(this, keyData_.cache);
-        }
+        if (keyData_.cache) KFSp_ClearCacheRecord(this, keyData_.cache);
         SetCanonical(true);  // silent: listeners who hear the source have never seen this one, nor do they its end
         throw int{code};
     }
@@ -212,9 +183,7 @@ KFS_Stream::KFS_Stream(KFS_Stream const& source, KFS_CloneStreamParams const& pa
 void KFS_Stream::CopyKeysFrom(KFS_Stream const& source)
 {
     KFSp_ThrowIf(SEQ_Duplicate(source.GetKeys(), 0, &keyData_.keys));
-    if (IsSpatial()) {
-        KFSp_ThrowIf(SEQ_ForEach(keyData_.keys, 0, KFSp_KeyClearRemap, 0));
-    }
+    if (IsSpatial()) KFSp_ThrowIf(SEQ_ForEach(keyData_.keys, 0, KFSp_KeyClearRemap, 0));
     KFSp_ThrowIf(SEQ_SetRefcon(this, keyData_.keys));
     int const count = (*keyData_.keys)->count;
     if (HasKeys() && count > 0) {
@@ -229,9 +198,8 @@ void KFS_Stream::CopyExpressionFrom(KFS_Stream const& source)
 {
     exprInfo_.SetExpression(source.exprInfo_.GetExpression());
     exprInfo_.SetFlags(source.exprInfo_.GetFlags());
-    if (source.exprInfo_.HasExpressionError()) {
+    if (source.exprInfo_.HasExpressionError())
         exprInfo_.SetExpressionError(source.exprInfo_.GetExpressionError(), -1, u16str());
-    }
 }
 
 // The stream's own key data throughout, whatever context the thread is in. The client's dispose function still finds a
@@ -239,9 +207,7 @@ void KFS_Stream::CopyExpressionFrom(KFS_Stream const& source)
 KFS_Stream::~KFS_Stream()
 {
     static_cast<void>(KFSp_CheckStream(KFSp_Op_StreamDestroy, this, KFSp_Row_Dispose));
-    if (keyData_.cache) {
-        static_cast<void>(KFSp_ClearCacheRecord(this, keyData_.cache));
-    }
+    if (keyData_.cache) static_cast<void>(KFSp_ClearCacheRecord(this, keyData_.cache));
     KFSp_DisposeKeyList(std::exchange(keyData_.keys, nullptr));
     exprInfo_.clear();
     FreeCache();
@@ -282,9 +248,8 @@ KFS_Stream const* KFS_Stream::GetAsLeaf() const
 KFS_StreamKeyData const* KFS_Stream::GetKeyData() const
 {
     Q_RenderContext const* const context = Q_RenderContext::PeekCurrent();
-    if (!context || !context->GetIsTempCloneContext()) [[likely]] {
+    if (!context || !context->GetIsTempCloneContext()) [[likely]]
         return &keyData_;
-    }
     return KFSp_GetRenderStates(context).cacheState->GetOverrideKeyData(this, keyData_);
 }
 
@@ -312,7 +277,8 @@ bool KFS_Stream::HasNoValue() const
 
 void KFS_Stream::NotifyValueChanged()
 {
-    KFSp_Notify(this, [this](KFS_StreamListener* listener) { listener->StreamValueChanged(this); });
+    KFSp_Notify(
+        this, [this](KFS_StreamListener* listener) { listener->StreamValueChanged(this); });
 }
 
 KFS_Stream::QuietExpressionErrorToken::QuietExpressionErrorToken(KFS_Stream* stream)
@@ -329,15 +295,9 @@ KFS_Stream::QuietExpressionErrorToken::~QuietExpressionErrorToken()
 
 int KFS_SetValueDescription(KFS_Stream* stream, KFS_ValueDesc const* newDesc, KFS_ValueDesc* oldDesc)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_SetValueDesc, stream, KFSp_Row_SetValueDesc)) {
-        return code;
-    }
-    if (oldDesc) {
-        *oldDesc = *stream->GetValueDesc();
-    }
-    if (!newDesc) {
-        return 0;
-    }
+    if (int const code = KFSp_CheckStream(KFSp_Op_SetValueDesc, stream, KFSp_Row_SetValueDesc)) return code;
+    if (oldDesc) *oldDesc = *stream->GetValueDesc();
+    if (!newDesc) return 0;
     if (stream->IsCustom() && !newDesc->isCustom) {
         stream->MarkTemporarilyNonCustom(true);
     } else if (newDesc->isCustom) {

@@ -36,18 +36,15 @@ void KFS_Stream::swap(KFS_Stream& other)
 
     // A list hands its owner to the item functions.
     KFSp_FirstError error;
-    for (KFS_Stream* const owner : {this, &other}) {
-        if (owner->keyData_.keys) {
-            error.Keep(SEQ_SetRefcon(owner, owner->keyData_.keys));
-        }
-    }
+    for (KFS_Stream* const owner : {this, &other})
+        if (owner->keyData_.keys) error.Keep(SEQ_SetRefcon(owner, owner->keyData_.keys));
     KFSp_ThrowIf(error.Code());
 
     NotifyValueChanged();
     unsigned int const newFlags = GetStreamBaseFlags();
     if (newFlags != oldFlags) {
-        KFSp_Notify(this, [this, oldFlags, newFlags](KFS_StreamListener* listener) {
-            listener->StreamFlagsChanged(this, oldFlags, newFlags);
-        });
+        KFSp_Notify(
+            this, [this, oldFlags,
+                   newFlags](KFS_StreamListener* listener) { listener->StreamFlagsChanged(this, oldFlags, newFlags); });
     }
 }

@@ -30,9 +30,7 @@ constexpr unsigned short DisplayFlag_Pixels = 0x4;
 Name SliderUnits(FX_ParamDef const& def)
 {
     unsigned short const flags = def.value.floatSlider.displayFlags;
-    if (flags & DisplayFlag_Percent) {
-        return Percent;
-    }
+    if (flags & DisplayFlag_Percent) return Percent;
     return (flags & DisplayFlag_Pixels) != 0 ? Pixels : NoName;
 }
 
@@ -84,17 +82,13 @@ KFS_Stream const* UnitsOwner(KFS_Stream const* stream)
 
 u16str KFS_Stream::GetUnitsName() const
 {
-    if (KFS_Stream const* const leader = UnitsOwner(this)) {
-        return leader->GetUnitsName();
-    }
+    if (KFS_Stream const* const leader = UnitsOwner(this)) return leader->GetUnitsName();
     return Translated(Units(GetParamDef()));
 }
 
 u16str KFS_Stream::GetEnglishUnitsName() const
 {
-    if (KFS_Stream const* const leader = UnitsOwner(this)) {
-        return leader->GetEnglishUnitsName();
-    }
+    if (KFS_Stream const* const leader = UnitsOwner(this)) return leader->GetEnglishUnitsName();
     return Q_MBToUTF16String(Units(GetParamDef()).english);
 }
 

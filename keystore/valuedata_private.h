@@ -108,19 +108,14 @@ inline double KFSp_Seconds(int later, int earlier, unsigned int timeScale)
 inline double KFSp_SquaredLength(std::span<double const> vector)
 {
     double sum = 0.0;
-    for (double const component : vector) {
-        sum += component * component;
-    }
+    for (double const component : vector) sum += component * component;
     return sum;
 }
 
 inline bool KFSp_IsZero(std::span<double const> vector)
 {
-    for (double const component : vector) {
-        if (component != 0.0) {
-            return false;
-        }
-    }
+    for (double const component : vector)
+        if (component != 0.0) return false;
     return true;
 }
 

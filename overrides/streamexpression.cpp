@@ -29,9 +29,7 @@ u16str KFS_GetStreamExpression(KFS_Stream const* stream)
 int KFS_SetStreamExprFlags(KFS_Stream* stream, unsigned int mask, unsigned int value)
 {
     KFSp_FirstError error;
-    if ((mask & KFS_ExprFlag_Disabled) != 0) {
-        error.Keep(KFSp_Boundary([stream] { ForgetError(stream); }));
-    }
+    if ((mask & KFS_ExprFlag_Disabled) != 0) error.Keep(KFSp_Boundary([stream] { ForgetError(stream); }));
     stream->GetExprInfoForModify().SetFlagMask(value, mask);
     error.Keep(KFSp_Boundary([stream] { stream->NotifyValueChanged(); }));
     return error.Code();

@@ -46,13 +46,10 @@ struct Layout {
 // A client's bytes are in the client's own order.
 void SwapData(Layout const& layout, void* data)
 {
-    if (layout.custom) {
-        return;
-    }
+    if (layout.custom) return;
     auto* const bytes = static_cast<unsigned char*>(data);
-    for (int offset = 0; offset + 8 <= layout.data; offset += 8) {
+    for (int offset = 0; offset + 8 <= layout.data; offset += 8)
         Q_FpLongSwap(reinterpret_cast<double*>(bytes + offset));
-    }
 }
 
 void SwapRecord(Layout const& layout, KFS_KeyScalarDisk* record)
@@ -62,9 +59,8 @@ void SwapRecord(Layout const& layout, KFS_KeyScalarDisk* record)
     if (layout.spatial) {
         record->spFlags = Q_LongSwap(record->spFlags);
         for (double* const number :
-             {&record->arcLength, &record->inSpeed, &record->inInfluence, &record->outSpeed, &record->outInfluence}) {
+             {&record->arcLength, &record->inSpeed, &record->inInfluence, &record->outSpeed, &record->outInfluence})
             Q_FpLongSwap(number);
-        }
     }
     SwapData(layout, reinterpret_cast<char*>(record) + layout.diskHead);
 }
@@ -127,9 +123,8 @@ void CheckDiskSize(KFS_Stream const* stream, Layout const& layout, SEQ_Head cons
 
 void ReportIfTooBig(SEQ_Head const* list, SEQ_Head const* keys)
 {
-    if (list->itemSize > keys->itemSize) {
+    if (list->itemSize > keys->itemSize)
         Q_ReportError(ReadKeysReportId, Q_SeverityError, Q_ZStringToUTF16String(TooBigText));
-    }
 }
 
 }  // namespace
@@ -149,27 +144,22 @@ int KFSp_CreateKeyDiskList(KFS_Stream* stream, SEQ_Head**& list)
 {
     list = nullptr;
     SEQ_Head** made = nullptr;
-    if (int const code = SEQ_New(0, static_cast<short>(Layout(stream).DiskSize()), 4, 1, &made)) {
-        return code;
-    }
+    if (int const code = SEQ_New(0, static_cast<short>(Layout(stream).DiskSize()), 4, 1, &made)) return code;
     SEQ_Funcs const funcs{nullptr, nullptr, KFSp_SortKeyItemDiskFunc};
     KFSp_FirstError error;
     error.Keep(SEQ_SetRefcon(stream, made));
     error.Keep(SEQ_SetFuncs(made, 3, &funcs));
-    if (error.None()) {
+    if (error.None())
         list = made;
-    } else {
+    else
         static_cast<void>(SEQ_Dispose(made, 0));
-    }
     return error.Code();
 }
 
 void KFSp_ConvertToKeyDiskList(KFS_Stream const* stream, SEQ_Head** list)
 {
     SEQ_Head const* const* const keys = stream->GetKeys();
-    if (!keys) {
-        return;
-    }
+    if (!keys) return;
     Layout const layout(stream);
     int const count = (*keys)->count;
     KFSp_ThrowIf(SEQ_SetNumItems(count, list, 0));

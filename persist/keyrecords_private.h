@@ -61,9 +61,7 @@ public:
     KFSp_ScList() = default;
     ~KFSp_ScList()
     {
-        if (list) {
-            static_cast<void>(SEQ_Dispose(list, 0));
-        }
+        if (list) static_cast<void>(SEQ_Dispose(list, 0));
     }
     KFSp_ScList(KFSp_ScList const&) = delete;
     KFSp_ScList& operator=(KFSp_ScList const&) = delete;

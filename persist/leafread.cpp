@@ -36,9 +36,8 @@ void ReportWrongDimension(KFS_Stream const* stream, int found)
     } const arguments[] = {{"@2", Q_MBToUTF16String(std::to_string(stream->GetDimension()))},
                            {"@1", Q_MBToUTF16String(std::to_string(found))},
                            {"@0", stream->GetMatchName16Str()}};
-    for (auto const& argument : arguments) {
+    for (auto const& argument : arguments)
         hearth::string::ReplaceInString(&text, Q_AsciiToUTF16String(argument.mark), argument.value);
-    }
     Q_ReportError(ReadReportId, Q_SeverityWarning, text);
 }
 
@@ -50,9 +49,7 @@ KFSp_StreamDiskData ReadRecord(CKF_File* file, CKF_ChunkInfo const* list)
     int expected = 0;
     KFSp_ThrowIf(CKF_ConvertChunkIDToXMLFormat(KFSp_RecordId, &expected));
     CKF_ChunkInfo const* const info = chunk.GetChunkInfo();
-    if (info->id != expected) {
-        throw KFSp_ReportErr(KFSp_Op_Read, KFS_Err_BadFileInfo, KFSp_Row_UnrecognizedChunk);
-    }
+    if (info->id != expected) throw KFSp_ReportErr(KFSp_Op_Read, KFS_Err_BadFileInfo, KFSp_Row_UnrecognizedChunk);
     KFSp_StreamDiskData record{};
     int size = static_cast<int>(std::min(info->size, static_cast<std::uint32_t>(sizeof record)));
     KFSp_ThrowIf(CKF_ReadChunkData(file, &size, &record));
@@ -125,9 +122,7 @@ void LeafReader::CheckHeader() const
     bool const spatial = (record_.kfsFlags & KFS_StreamFlag_Spatial) != 0;
     KFS_ValueDesc const desc = DescriptionOf(record_);
     bool const knownType = desc.isCustom || static_cast<signed char>(record_.dataType) <= KFS_Type_Double;
-    if (!knownType || !KFSp_KeyItemFits(desc, spatial, record_.dimension)) {
-        throw int{KFS_Err_BadValueDesc};
-    }
+    if (!knownType || !KFSp_KeyItemFits(desc, spatial, record_.dimension)) throw int{KFS_Err_BadValueDesc};
 }
 
 void LeafReader::TakeHeader()
@@ -139,14 +134,11 @@ void LeafReader::TakeHeader()
     stream_->SetTimeScale(record_.timeScale);
     stream_->SetAccuracy(record_.accuracy.Get());
     stream_->SetSpInterp(record_.spInterp);
-    if (!isDerived_) {
+    if (!isDerived_)
         TakeDescription();
-    } else if (!spatialMismatch_) {
+    else if (!spatialMismatch_)
         stream_->SetKFSFlags(record_.kfsFlags);
-    }
-    for (int i = 0; i < 4; ++i) {
-        (*stream_->GetMultiplierForModify())[i] = record_.multiplier[i].Get();
-    }
+    for (int i = 0; i < 4; ++i) (*stream_->GetMultiplierForModify())[i] = record_.multiplier[i].Get();
     unsigned short const layout = stream_->IsSpatial() ? KFS_KeyFlag_SpatialBlock : 0;
     stream_->GetCache()->flags = static_cast<unsigned short>((record_.cacheFlags & ~KFS_KeyFlag_SpatialBlock) | layout);
 }
@@ -191,9 +183,7 @@ void LeafReader::ReadValue()
 
 void LeafReader::ReadConstant()
 {
-    if (!spatialMismatch_) {
-        ReadValue();
-    }
+    if (!spatialMismatch_) ReadValue();
     KFS_KeyScalar* const cache = stream_->GetCache();
     cache->time = record_.cacheTime;
     cache->inInterp = record_.cacheInInterp;
@@ -234,21 +224,16 @@ void LeafReader::ReadStream()
 {
     CheckHeader();
     TakeHeader();
-    if (stream_->HasNoKeys()) {
+    if (stream_->HasNoKeys())
         ReadConstant();
-    } else {
+    else
         KFSp_ThrowIf(KFSp_ClearCache(stream_));  // of the value of a constant that now has keys, maybe none
-    }
-    if (record_.hasKeyList != 0 && !spatialMismatch_) {
-        ReadKeys();
-    }
+    if (record_.hasKeyList != 0 && !spatialMismatch_) ReadKeys();
     if (spatialMismatch_) {
         stream_->SetKFSFlags(stream_->GetKFSFlags() | KFS_StreamFlag_NoKeys);
         stream_->InsertDefaultKey(T_Time{0, stream_->GetTimeScale()});
     }
-    if (record_.hasExpression != 0) {
-        ReadExpression();
-    }
+    if (record_.hasExpression != 0) ReadExpression();
 }
 
 void LeafReader::ReadLayer()
@@ -273,9 +258,7 @@ void LeafReader::ReadSlider()
 
 void LeafReader::ReadParam()
 {
-    if (file_->majorVersion < KFSp_FirstVersion_ParamAtoms) {
-        return;
-    }
+    if (file_->majorVersion < KFSp_FirstVersion_ParamAtoms) return;
     int const kind = stream_->GetParamDef().paramType;
     if (kind == FX_Param_LAYER) {
         ReadLayer();
@@ -300,9 +283,7 @@ void LeafReader::MarkAllStale()
 void LeafReader::Finish()
 {
     MarkAllStale();
-    if (stream_->GetParamDef().paramType != FX_Param_ALWAYS_SAVED) {
-        stream_->SetConstantIfNotAnimatable();
-    }
+    if (stream_->GetParamDef().paramType != FX_Param_ALWAYS_SAVED) stream_->SetConstantIfNotAnimatable();
     KFSp_ThrowIf(KFSp_CheckStream(KFSp_Op_Read, stream_, KFSp_Row_Read));
 }
 
@@ -318,9 +299,7 @@ void ReadLeaf(KFS_Stream* stream, CKF_File* file, CKF_ChunkInfo const* chunk)
     stream->KFS_StreamBase::Read(file, chunk);
     LeafReader reader(stream, file, chunk);
     reader.ReadStream();
-    if (readsParam) {
-        reader.ReadParam();
-    }
+    if (readsParam) reader.ReadParam();
     reader.Finish();
 }
 
@@ -328,16 +307,13 @@ void ReadLeaf(KFS_Stream* stream, CKF_File* file, CKF_ChunkInfo const* chunk)
 
 void KFS_Stream::Read(CKF_File* file, CKF_ChunkInfo const* chunk)
 {
-    if ((GetStreamBaseFlags() & KFS_BaseFlag_SkipLeafRead) == 0) {
+    if ((GetStreamBaseFlags() & KFS_BaseFlag_SkipLeafRead) == 0)
         KFSp_ThrowIf(KFSp_Boundary([&] { ReadLeaf(this, file, chunk); }));
-    }
 }
 
 void KFS_Stream::SetConstantIfNotAnimatable()
 {
-    if (HasNoKeys() || CanBeAnimated()) {
-        return;
-    }
+    if (HasNoKeys() || CanBeAnimated()) return;
     ValidateCacheAtTime(T_Time{0, 1});
     KFSp_ThrowIf(SetConstant(1, 0));
 }

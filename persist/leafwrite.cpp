@@ -45,9 +45,7 @@ KFSp_StreamDiskData MakeRecord(KFS_Stream const* stream, CKF_File const* file)
     record.timeScale = stream->GetTimeScale();
     record.accuracy.Set(stream->GetAccuracy());
     M_Vector4T<double> const& multiplier = stream->GetMultiplier();
-    for (int i = 0; i < 4; ++i) {
-        record.multiplier[i].Set(multiplier[i]);
-    }
+    for (int i = 0; i < 4; ++i) record.multiplier[i].Set(multiplier[i]);
     KFS_ValueDesc const& desc = *stream->GetValueDesc();
     record.isCustom = static_cast<unsigned short>(desc.isCustom);
     record.itemSize = desc.itemSize;
@@ -55,9 +53,7 @@ KFSp_StreamDiskData MakeRecord(KFS_Stream const* stream, CKF_File const* file)
     record.hasKeyList = stream->GetKeys() ? 1 : 0;
     record.exprFlags = stream->GetExpressionFlags();
     record.hasExpression = stream->HasExpression() ? 1 : 0;
-    if (stream->HasNoKeys()) {
-        FillInCacheFields(stream, file, record);
-    }
+    if (stream->HasNoKeys()) FillInCacheFields(stream, file, record);
     return record;
 }
 
@@ -124,9 +120,8 @@ void WriteLayer(KFS_Stream const* stream, CKF_File* file)
         throw int{KFS_Err_LegacyMismatch};
     }
     KFSp_WriteLong(file, KFSp_LayerId, Q_PointerToInt32(layer->GetFlattenedReserved0()));
-    if (KFSp_HasLayerSelector(file)) {
+    if (KFSp_HasLayerSelector(file))
         KFSp_WriteLong(file, KFSp_LayerSelectorId, stream->GetParamDef().value.layer.layerSelector);
-    }
 }
 
 void WriteParam(KFS_Stream const* stream, CKF_File* file)
@@ -145,9 +140,7 @@ void WriteParam(KFS_Stream const* stream, CKF_File* file)
 void WriteLeaf(KFS_Stream const* stream, CKF_File* file)
 {
     KFSp_ThrowIf(KFSp_CheckStream(KFSp_Op_Write, stream, KFSp_Row_Write));
-    if (stream->HasKeys()) {
-        KFSp_ThrowIf(KFSp_ClearCache(stream));
-    }
+    if (stream->HasKeys()) KFSp_ThrowIf(KFSp_ClearCache(stream));
     KFSp_StreamDiskData record = MakeRecord(stream, file);
     bool const hasKeyList = record.hasKeyList != 0;
     bool const hasExpression = record.hasExpression != 0;
@@ -157,15 +150,9 @@ void WriteLeaf(KFS_Stream const* stream, CKF_File* file)
     KFSp_ThrowIf(CKF_BeginChunkWrite(file, CKF_ListId, KFSp_ValueDataSize(stream) + 140, KFSp_LeafListType, &chunk));
     stream->KFS_StreamBase::Write(file);
     KFSp_ThrowIf(CKF_WriteAtom(file, KFSp_RecordId, sizeof record, &record));
-    if (stream->HasNoKeys()) {
-        WriteConstant(stream, file);
-    }
-    if (hasKeyList) {
-        WriteKeys(stream, file);
-    }
-    if (hasExpression) {
-        WriteExpression(stream, file);
-    }
+    if (stream->HasNoKeys()) WriteConstant(stream, file);
+    if (hasKeyList) WriteKeys(stream, file);
+    if (hasExpression) WriteExpression(stream, file);
     WriteParam(stream, file);
     KFSp_ThrowIf(CKF_EndChunkWrite(file, &chunk));
 }
@@ -176,9 +163,7 @@ bool KFS_Stream::ShouldWriteForVersion(CKF_File const* file) const
 {
     if (file->majorVersion < KFSp_FirstVersion_NewParamKinds) {
         int const kind = GetParamDef().paramType;
-        if (kind == FX_Param_LABEL || kind == FX_Param_POINT_3D) {
-            return false;
-        }
+        if (kind == FX_Param_LABEL || kind == FX_Param_POINT_3D) return false;
     }
     return KFS_StreamBase::ShouldWriteForVersion(file);
 }

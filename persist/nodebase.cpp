@@ -33,12 +33,8 @@ constexpr char const* UnknownNameText = "$$$/KFS/KFS_StreamBase/Read/UnknownStre
 bool IsNameKnownToReaders(KFS_StreamBase const* node, u16str const& name)
 {
     KFS_StreamGroup const* const parent = node->GetParent();
-    if (node->IsCanonical() || !parent) {
-        return false;
-    }
-    if (!parent->IsIndexedGroup()) {
-        return !parent->CouldGoMissing();
-    }
+    if (node->IsCanonical() || !parent) return false;
+    if (!parent->IsIndexedGroup()) return !parent->CouldGoMissing();
     // A node that no factory made is of no kind, and so has no canonical stream.
     KFS_StreamBase const* const canonical =
         node->GetFactory() ? node->GetCanonicalStream(node->GetMatchName()) : nullptr;
@@ -55,21 +51,15 @@ void ReadName(KFS_StreamBase* node, CKF_File* file, CKF_ChunkInfo const* chunk)
 {
     u16str name;
     bool const found = CKF_ReadString(file, chunk, NameId, &name, Q_ZStringToUTF16String(UnknownNameText), 0);
-    if (found && name != Q_AsciiToUTF16String(NoNameMarker) && TakesNameFromFile(node)) {
-        node->SetDisplayName(name);
-    }
+    if (found && name != Q_AsciiToUTF16String(NoNameMarker) && TakesNameFromFile(node)) node->SetDisplayName(name);
 }
 
 // Files up to that version have no notion of a follower that isn't active.
 void ActivateOldFollower(KFS_StreamBase* node, CKF_File const* file)
 {
-    if (file->majorVersion > KFSp_LastVersion_ImplicitFollowers) {
-        return;
-    }
+    if (file->majorVersion > KFSp_LastVersion_ImplicitFollowers) return;
     KFS_Stream const* const leaf = node->GetAsLeaf();
-    if (leaf && leaf->IsSeparationFollower()) {
-        node->SetStreamBaseFlags(KFS_BaseFlag_Active, KFS_BaseFlag_Active);
-    }
+    if (leaf && leaf->IsSeparationFollower()) node->SetStreamBaseFlags(KFS_BaseFlag_Active, KFS_BaseFlag_Active);
 }
 
 }  // namespace
@@ -82,9 +72,7 @@ void KFS_StreamBase::Write(CKF_File* file) const
         ScRecursiveLock const guard(lock_);
         name = GetDisplayName();
     }
-    if (IsNameKnownToReaders(this, name)) {
-        name = Q_AsciiToUTF16String(NoNameMarker);
-    }
+    if (IsNameKnownToReaders(this, name)) name = Q_AsciiToUTF16String(NoNameMarker);
     KFSp_ThrowIf(CKF_WriteString(file, NameId, name, 0));
 }
 
@@ -92,9 +80,7 @@ void KFS_StreamBase::Read(CKF_File* file, CKF_ChunkInfo const* chunk)
 {
     if (file->majorVersion >= KFSp_FirstVersion_BaseFlags) {
         SetStreamBaseFlags(static_cast<unsigned int>(KFSp_ReadLong(file, chunk, FlagsId)), ~UnsavedFlags);
-        if (file->majorVersion >= KFSp_FirstVersion_DisplayName) {
-            ReadName(this, file, chunk);
-        }
+        if (file->majorVersion >= KFSp_FirstVersion_DisplayName) ReadName(this, file, chunk);
     }
     ActivateOldFollower(this, file);
 }

@@ -21,9 +21,7 @@ int KFS_WriteOldStreamID(KFS_OldStreamID const* id, CKF_File* file)
 int KFS_ReadOldStreamID(CKF_File* file, CKF_ChunkInfo* parent, KFS_OldStreamID* id)
 {
     unsigned int words[WordsAskedFor] = {};
-    if (int const code = CKF_ReadAtom(file, OldStreamIdAtom, parent, sizeof words, words)) {
-        return code;
-    }
+    if (int const code = CKF_ReadAtom(file, OldStreamIdAtom, parent, sizeof words, words)) return code;
     id->words[0] = Q_LongSwap(words[0]);
     id->words[1] = Q_LongSwap(words[1]);
     return 0;

@@ -35,16 +35,12 @@ void KFSp_StreamSwap(KFSp_StreamDiskData* record)
     record->interpMask = Q_ShortSwap(record->interpMask);
     record->timeScale = Q_LongSwap(record->timeScale);
     record->accuracy.Swap();
-    for (KFSp_DiskDouble& factor : record->multiplier) {
-        factor.Swap();
-    }
+    for (KFSp_DiskDouble& factor : record->multiplier) factor.Swap();
     record->isCustom = Q_ShortSwap(record->isCustom);
     record->itemSize = Q_ShortSwap(record->itemSize);
     record->cacheTime = std::bit_cast<int>(Q_LongSwap(std::bit_cast<unsigned int>(record->cacheTime)));
     record->cacheFlags = Q_ShortSwap(record->cacheFlags);
     record->cacheSpFlags = Q_LongSwap(record->cacheSpFlags);
-    for (KFSp_DiskDouble& tangent : record->cacheTangents) {
-        tangent.Swap();
-    }
+    for (KFSp_DiskDouble& tangent : record->cacheTangents) tangent.Swap();
     record->exprFlags = Q_LongSwap(record->exprFlags);
 }

@@ -20,16 +20,12 @@ void ReadGroup(KFS_StreamGroup* group, CKF_File* file, CKF_ChunkInfo const* pare
 {
     bool found = false;
     CKF_ScDescendList const list(file, CKF_Id("kfgp"), parent, &found);
-    if (!found) {
-        return;
-    }
+    if (!found) return;
     group->KFS_StreamBase::Read(file, list.GetChunkInfo());
     for (;;) {
         KFS_MatchName name;
         name.Read(file, list.GetChunkInfo());  // steps over what nobody has taken
-        if (name.IsEndOfGroupMarker()) {
-            return;
-        }
+        if (name.IsEndOfGroupMarker()) return;
         group->ReadAndStore(name, file, list.GetChunkInfo());
     }
 }
@@ -45,9 +41,7 @@ void KFS_NamedStreamGroup::ReadAndStore(KFS_MatchName const& name, CKF_File* fil
 {
     Q_ScAutoPtr<KFS_StreamBase> stream(CreateStream(name, true, NewStreamScale, false, false));
     KFS_StreamBase* const child = stream.get();
-    if (!child) {
-        return;
-    }
+    if (!child) return;
     if (!GetStream(name, false)) {
         ReadChild(child, file, chunk);
         UpgradeChildStream(child);
@@ -63,9 +57,7 @@ void KFS_IndexedStreamGroup::ReadAndStore(KFS_MatchName const& name, CKF_File* f
 {
     Q_ScAutoPtr<KFS_StreamBase> stream(CreateStream(name, true, NewStreamScale, true, false));
     KFS_StreamBase* const child = stream.get();
-    if (!child) {
-        return;
-    }
+    if (!child) return;
     InsertStream(GetNumStreams(), &stream);
     ReadChild(child, file, chunk);
 }

@@ -29,26 +29,21 @@ bool IsDescribedLike(KFS_StreamBase const* child, KFS_StreamBase const* canonica
     KFS_Stream const* const leaf = child->GetAsLeaf();
     KFS_Stream const* const canonicalLeaf = canonical->GetAsLeaf();
     if (leaf && KFSp_HasSliderRange(child->GetParamDef().paramType) &&
-        (!canonicalLeaf || !HasSameRange(leaf, canonicalLeaf))) {
+        (!canonicalLeaf || !HasSameRange(leaf, canonicalLeaf)))
         return false;
-    }
     if (((child->GetStreamBaseFlags() ^ canonical->GetStreamBaseFlags()) &
-         ~static_cast<unsigned int>(KFS_BaseFlag_Canonical)) != 0) {
+         ~static_cast<unsigned int>(KFS_BaseFlag_Canonical)) != 0)
         return false;
-    }
     return child->GetDisplayName() == canonical->GetDisplayName() &&
            FX_ParamDef_GetName(&child->GetParamDef()) == FX_ParamDef_GetName(&canonical->GetParamDef());
 }
 
 bool IsWritten(KFS_StreamGroup const* group, KFS_StreamBase const* child, CKF_File const* file)
 {
-    if (child->IsCanonical() || !child->ShouldWriteForVersion(file)) {
-        return false;
-    }
+    if (child->IsCanonical() || !child->ShouldWriteForVersion(file)) return false;
     if (group->IsIndexedGroup() || child->IsNamedGroup() || child->IsModified() ||
-        dynamic_cast<KFS_ParamLayerStream const*>(child) || child->GetParamDef().paramType == FX_Param_ALWAYS_SAVED) {
+        dynamic_cast<KFS_ParamLayerStream const*>(child) || child->GetParamDef().paramType == FX_Param_ALWAYS_SAVED)
         return true;
-    }
     KFS_StreamBase const* const canonical = child->GetCanonicalStream(child->GetMatchName());
     return !canonical || !IsDescribedLike(child, canonical);
 }

@@ -26,10 +26,7 @@ bool KFS_ShouldAlwaysDecanonicalize()
 
 void KFS_DecanonicalizeAllChildStreamsDeep(KFS_StreamGroup* group)
 {
-    if (!group || IsSuspendedFor(group)) {
-        return;
-    }
-    for (unsigned int i = 0; i < group->GetNumStreams(); ++i) {
+    if (!group || IsSuspendedFor(group)) return;
+    for (unsigned int i = 0; i < group->GetNumStreams(); ++i)
         KFS_DecanonicalizeAllChildStreamsDeep(group->GetEditableStream(i)->GetAsGroup());
-    }
 }

@@ -44,19 +44,13 @@ KFS_StreamFactory::~KFS_StreamFactory()
 bool KFS_StreamFactory::RegisterFactoryFunc(KFS_MatchName const& name, KFS_FactoryFunc const& func, bool deferLayout)
 {
     ScRecursiveLock const guard(lock_);
-    if (!factoryFuncs_.emplace(name, func).second) {
-        return false;
-    }
+    if (!factoryFuncs_.emplace(name, func).second) return false;
     Q_ScAutoPtr<KFS_StreamBase> instance;
     try {
         instance.reset(CreateStream(name, true, 600, true, true));
-        if (!instance) {
-            throw int{KFS_Err_UnknownStream};
-        }
+        if (!instance) throw int{KFS_Err_UnknownStream};
         canonicalInstances_.emplace(name, instance.get());
-        if (!deferLayout) {
-            instance->SetupCanonicalLayout();
-        }
+        if (!deferLayout) instance->SetupCanonicalLayout();
     } catch (...) {
         canonicalInstances_.erase(name);
         factoryFuncs_.erase(name);
@@ -77,16 +71,12 @@ bool KFS_StreamFactory::UnregisterFactoryFunc_NullOK(KFS_MatchName const& name, 
     ScRecursiveLock const guard(lock_);
     auto const found = canonicalInstances_.find(name);
     if (found == canonicalInstances_.end()) {
-        if (!nullOK) {
-            XLOG_Log(0, "KFS", "UnregisterFactoryFunc", reinterpret_cast<char const*>(name.GetName()));
-        }
+        if (!nullOK) XLOG_Log(0, "KFS", "UnregisterFactoryFunc", reinterpret_cast<char const*>(name.GetName()));
         return false;
     }
     instance.reset(found->second);
     canonicalInstances_.erase(found);
-    if (factoryFuncs_.erase(name) == 0) {
-        KFSp_FailVerification("couldn't find factory method for stream to unregister");
-    }
+    if (factoryFuncs_.erase(name) == 0) KFSp_FailVerification("couldn't find factory method for stream to unregister");
     return true;
 }
 
@@ -96,23 +86,15 @@ KFS_StreamBase* KFS_StreamFactory::CreateStream(KFS_MatchName const& name, bool 
     KFS_FactoryFunc func;
     {
         ScRecursiveLock const guard(lock_);
-        if (auto const found = factoryFuncs_.find(name); found != factoryFuncs_.end()) {
-            func = found->second;
-        }
+        if (auto const found = factoryFuncs_.find(name); found != factoryFuncs_.end()) func = found->second;
     }
     Q_ScAutoPtr<KFS_StreamBase> stream(func ? func(name, this, true, timeScale, canonical) : nullptr);
-    if (!stream) {
-        return RefuseUnknownKind(name, reportIfUnknown);
-    }
+    if (!stream) return RefuseUnknownKind(name, reportIfUnknown);
     if (KFS_Stream* const leaf = stream->GetAsLeaf()) {
         leaf->InsertDefaultKey(DefaultKeyTime);
-        if (!constant) {
-            KFSp_ThrowIf(leaf->SetConstant(false, true));  // the default value becomes the first key
-        }
+        if (!constant) KFSp_ThrowIf(leaf->SetConstant(false, true));  // the default value becomes the first key
     }
-    if (!canonical && KFS_ShouldAlwaysDecanonicalize()) {
-        KFS_DecanonicalizeAllChildStreamsDeep(stream->GetAsGroup());
-    }
+    if (!canonical && KFS_ShouldAlwaysDecanonicalize()) KFS_DecanonicalizeAllChildStreamsDeep(stream->GetAsGroup());
     return stream.release();
 }
 
@@ -126,9 +108,7 @@ KFS_StreamBase* KFS_StreamFactory::RegisterCanonicalInstance(KFS_StreamBase* str
     KFS_MatchName const name = stream->GetMatchName();
     if (factoryFuncs_.contains(name)) {
         KFS_StreamBase* const registered = GetCanonicalStream(name);
-        if (registered == stream) {
-            static_cast<void>(instance.release());
-        }
+        if (registered == stream) static_cast<void>(instance.release());
         return registered;
     }
     stream->SetCanonical(true);
@@ -189,18 +169,14 @@ void KFS_StreamFactory::RegisterDataFileContainer(KFS_MatchName const& name)
 void KFS_StreamFactory::UnRegisterDataFileContainers()
 {
     std::set<KFS_MatchName> const containers = GetDataFileMatchNames();
-    for (KFS_MatchName const& name : containers) {
-        UnregisterCanonicalMatchName(name, containers);
-    }
+    for (KFS_MatchName const& name : containers) UnregisterCanonicalMatchName(name, containers);
 }
 
 void KFS_StreamFactory::UnregisterCanonicalMatchName(KFS_MatchName const& name, std::set<KFS_MatchName> const& keep)
 {
     KFS_StreamBase const* const canonical = GetCanonicalStream(name);
     KFS_StreamGroup const* const group = canonical ? canonical->GetAsGroup() : nullptr;
-    if (!group) {
-        return;
-    }
+    if (!group) return;
     UnregisterCanonicalInstanceRecursive(group, keep);
     ScRecursiveLock const guard(lock_);
     dataFileContainers_.erase(name);
@@ -234,9 +210,7 @@ std::map<KFS_StreamBase const*, KFS_MatchName> KFS_StreamFactory::GetNamesOfInst
 {
     ScRecursiveLock const guard(lock_);
     std::map<KFS_StreamBase const*, KFS_MatchName> names;
-    for (auto const& [name, instance] : canonicalInstances_) {
-        names.emplace(instance, name);
-    }
+    for (auto const& [name, instance] : canonicalInstances_) names.emplace(instance, name);
     return names;
 }
 
@@ -249,28 +223,22 @@ void KFS_StreamFactory::UnregisterCanonicalInstanceRecursive(KFS_StreamGroup con
     if (layout) {
         // An instance that another group's unregistration has taken away must not be touched any more.
         auto const registered = GetNamesOfInstances();
-        for (KFS_StreamBase const* const child : *layout) {
-            if (auto const found = registered.find(child); found != registered.end()) {
-                children.push_back(found->second);
-            }
-        }
+        for (KFS_StreamBase const* const child : *layout)
+            if (auto const found = registered.find(child); found != registered.end()) children.push_back(found->second);
     }
     UnregisterFactoryFunc_NullOK(name, false);
     if (keep.empty()) {
-        std::erase_if(children, [&](KFS_MatchName const& child) {
-            KFS_StreamBase const* const canonical = GetCanonicalStream(child);
-            KFS_StreamGroup const* const subgroup = canonical ? canonical->GetAsGroup() : nullptr;
-            if (subgroup) {
-                UnregisterCanonicalInstanceRecursive(subgroup, keep);
-            }
-            return subgroup != nullptr;
-        });
+        std::erase_if(
+            children,
+            [&](KFS_MatchName const& child) {
+                KFS_StreamBase const* const canonical = GetCanonicalStream(child);
+                KFS_StreamGroup const* const subgroup = canonical ? canonical->GetAsGroup() : nullptr;
+                if (subgroup) UnregisterCanonicalInstanceRecursive(subgroup, keep);
+                return subgroup != nullptr;
+            });
     }
-    for (KFS_MatchName const& child : children) {
-        if (!keep.contains(child)) {
-            UnregisterFactoryFunc_NullOK(child, true);
-        }
-    }
+    for (KFS_MatchName const& child : children)
+        if (!keep.contains(child)) UnregisterFactoryFunc_NullOK(child, true);
 }
 
 void KFS_StreamFactory::RegisterObsoleteStreamParent(KFS_MatchName const& obsoleteName, KFS_MatchName const& parentName)
@@ -285,23 +253,18 @@ bool KFS_StreamFactory::GatherObsoleteReplacementStreams(KFS_StreamBase* stream,
     {
         ScRecursiveLock const guard(lock_);
         auto const found = obsoleteParents_.find(stream->GetMatchName());
-        if (found == obsoleteParents_.end()) {
-            return false;
-        }
+        if (found == obsoleteParents_.end()) return false;
         replacement.reset(CreateStream(found->second, true, 600, true, false));
     }
     result.clear();
     KFS_NamedStreamGroup* const group = replacement ? replacement->GetAsNamedGroup() : nullptr;
-    if (!group) {
-        return true;
-    }
+    if (!group) return true;
     group->UpgradeChildStream(stream);
     result.reserve(group->GetNumStreams());
     for (unsigned int i = 0; i < group->GetNumStreams(); ++i) {
         KFS_StreamBase const* const child = group->GetEditableStreamNullOK(i);
-        if (child && child->IsLeaf()) {
+        if (child && child->IsLeaf())
             result.push_back(group->SwapCanonicalForStream(child->GetMatchName())->GetAsLeaf());
-        }
     }
     return true;
 }
@@ -309,14 +272,10 @@ bool KFS_StreamFactory::GatherObsoleteReplacementStreams(KFS_StreamBase* stream,
 void KFS_ScRegisterStreams::Register(KFS_MatchName const& name, KFS_FactoryFunc const& func, bool deferLayout)
 {
     names_.reserve(names_.size() + 1);
-    if (factory_->RegisterFactoryFunc(name, func, deferLayout)) {
-        names_.push_back(name);
-    }
+    if (factory_->RegisterFactoryFunc(name, func, deferLayout)) names_.push_back(name);
 }
 
 void KFS_ScRegisterStreams::UnregisterAll()
 {
-    for (; !names_.empty(); names_.pop_back()) {
-        factory_->UnregisterFactoryFunc_NullOK(names_.back(), false);
-    }
+    for (; !names_.empty(); names_.pop_back()) factory_->UnregisterFactoryFunc_NullOK(names_.back(), false);
 }

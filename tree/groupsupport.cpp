@@ -7,9 +7,8 @@ KFS_GroupChildren KFSp_CloneChildren(KFS_GroupChildren const& source, KFS_CloneS
     KFS_GroupChildren clones;
     clones.reserve(source.size());
     try {
-        for (KFS_StreamBase* const child : source) {
+        for (KFS_StreamBase* const child : source)
             clones.push_back(child->IsCanonical() ? child : child->CloneStream(params));
-        }
     } catch (...) {
         KFSp_DeleteChildren(&clones);
         throw;
@@ -19,11 +18,8 @@ KFS_GroupChildren KFSp_CloneChildren(KFS_GroupChildren const& source, KFS_CloneS
 
 void KFSp_DeleteChildren(KFS_GroupChildren* children) noexcept
 {
-    for (KFS_StreamBase* const child : *children) {
-        if (!child->IsCanonical()) {
-            delete child;
-        }
-    }
+    for (KFS_StreamBase* const child : *children)
+        if (!child->IsCanonical()) delete child;
     children->clear();
 }
 
@@ -31,8 +27,6 @@ void KFSp_NotifyOfSwap(KFS_StreamGroup* group, KFS_StreamBase* incoming, KFS_Str
                        unsigned int index)
 {
     std::optional<KFS_ScSetResetIndependent> tiedIn;
-    if (incoming->IsIndependent()) {
-        tiedIn.emplace(incoming, false);
-    }
+    if (incoming->IsIndependent()) tiedIn.emplace(incoming, false);
     KFSp_NotifyOfChild(&KFS_StreamListener::StreamSwapped, group, child, index);
 }

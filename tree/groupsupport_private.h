@@ -17,9 +17,7 @@ struct KFSp_ScIncoming {
     explicit KFSp_ScIncoming(KFS_StreamBase* child) noexcept : stream(child) {}
     ~KFSp_ScIncoming()
     {
-        if (stream && stream->IsCanonical()) {
-            static_cast<void>(stream.release());
-        }
+        if (stream && stream->IsCanonical()) static_cast<void>(stream.release());
     }
     KFSp_ScIncoming(KFSp_ScIncoming const&) = delete;
     KFSp_ScIncoming& operator=(KFSp_ScIncoming const&) = delete;
@@ -30,9 +28,8 @@ struct KFSp_ScIncoming {
 // An identifier that has both an index and a match name must agree with the child at that index.
 inline void KFSp_ValidateMatchNames(KFS_StreamID const& id, KFS_StreamBase const* child)
 {
-    if (id.GetMatchName().IsValid() && id.GetMatchName() != child->GetMatchName()) {
+    if (id.GetMatchName().IsValid() && id.GetMatchName() != child->GetMatchName())
         KFSp_FailVerification("stream at index has wrong matchname");
-    }
 }
 
 // One of the listener's operations that tell of a child's edit.
@@ -41,7 +38,8 @@ using KFSp_ChildNotification = void (KFS_StreamListener::*)(KFS_StreamGroup*, KF
 inline void KFSp_NotifyOfChild(KFSp_ChildNotification what, KFS_StreamGroup* group, KFS_StreamBase const* child,
                                unsigned int index)
 {
-    KFSp_Notify(group, [=](KFS_StreamListener* listener) { (listener->*what)(group, child, index); });
+    KFSp_Notify(
+        group, [=](KFS_StreamListener* listener) { (listener->*what)(group, child, index); });
 }
 
 // Tells that `incoming` is in its place now; `child` is the one that listeners are told of. An independent newcomer is

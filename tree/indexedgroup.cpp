@@ -54,11 +54,10 @@ KFS_IndexedStreamGroup::~KFS_IndexedStreamGroup()
 {
     for (unsigned int i = static_cast<unsigned int>(streams_.size()); i-- > 0;) {
         KFS_StreamBase* const child = streams_[i];
-        if (!child->IsCanonical()) {
+        if (!child->IsCanonical())
             delete KFS_IndexedStreamGroup::RemoveStream(i);
-        } else if (child->GetParent() == this) {
+        else if (child->GetParent() == this)
             child->SetParent(nullptr);
-        }
     }
 }
 
@@ -120,18 +119,14 @@ KFS_StreamBase* KFS_IndexedStreamGroup::GetEditableStream(KFS_StreamID const& id
 KFS_StreamID KFS_IndexedStreamGroup::SlowGetIDOfChild(KFS_StreamBase const* child) const
 {
     auto const found = std::find(streams_.begin(), streams_.end(), child);
-    if (found == streams_.end()) {
-        KFSp_FailVerification("child not found in parent");
-    }
+    if (found == streams_.end()) KFSp_FailVerification("child not found in parent");
     return KFS_StreamID(static_cast<unsigned int>(found - streams_.begin()), child->GetMatchName());
 }
 
 bool KFS_IndexedStreamGroup::RemoveChild(KFS_StreamBase* child)
 {
     auto const found = std::find(streams_.begin(), streams_.end(), child);
-    if (found == streams_.end()) {
-        return false;
-    }
+    if (found == streams_.end()) return false;
     auto const index = static_cast<unsigned int>(found - streams_.begin());
     KFSp_NotifyOfChild(&KFS_StreamListener::StreamAboutToBeRemoved, this, child, index);
     child->SetParent(nullptr);
@@ -153,12 +148,8 @@ KFS_Stream* KFS_IndexedStreamGroup::GetEditableLeafStream(unsigned int index)
 void KFS_IndexedStreamGroup::InsertStream(unsigned int index, Q_ScAutoPtr<KFS_StreamBase>* stream)
 {
     KFS_StreamBase* const incoming = stream->get();
-    if (!CanStore(incoming->GetMatchName())) {
-        RefuseCorruptChild(*this);
-    }
-    if (index > GetNumStreams()) {
-        KFSp_FailVerification("invalid index for insert in indexed group");
-    }
+    if (!CanStore(incoming->GetMatchName())) RefuseCorruptChild(*this);
+    if (index > GetNumStreams()) KFSp_FailVerification("invalid index for insert in indexed group");
     KFSp_NotifyOfChild(&KFS_StreamListener::StreamAboutToBeInserted, this, incoming, index);
     streams_.insert(streams_.begin() + index, incoming);
     static_cast<void>(stream->release());
@@ -177,17 +168,11 @@ KFS_StreamBase* KFS_IndexedStreamGroup::DuplicateStream(unsigned int index)
 
 KFS_StreamBase* KFS_IndexedStreamGroup::SwapStream(unsigned int index, Q_ScAutoPtr<KFS_StreamBase>* stream)
 {
-    if (index >= GetNumStreams()) {
-        KFSp_FailVerification("invalid index for swap in indexed group");
-    }
+    if (index >= GetNumStreams()) KFSp_FailVerification("invalid index for swap in indexed group");
     KFS_StreamBase* const incoming = stream->get();
-    if (!CanStore(incoming->GetMatchName())) {
-        KFSp_FailVerification("invalid name for storing in this named group");
-    }
+    if (!CanStore(incoming->GetMatchName())) KFSp_FailVerification("invalid name for storing in this named group");
     KFSp_NotifyOfChild(&KFS_StreamListener::StreamAboutToBeSwapped, this, incoming, index);
-    if (!incoming->IsCanonical()) {
-        incoming->SetParent(this);
-    }
+    if (!incoming->IsCanonical()) incoming->SetParent(this);
     KFS_StreamBase* const outgoing = std::exchange(streams_[index], stream->release());
     // A failure further on must not lose the stream that left.
     Q_ScAutoPtr<KFS_StreamBase> leaving(outgoing->IsCanonical() ? nullptr : outgoing);
@@ -199,9 +184,7 @@ KFS_StreamBase* KFS_IndexedStreamGroup::SwapStream(unsigned int index, Q_ScAutoP
 
 KFS_StreamBase* KFS_IndexedStreamGroup::RemoveStream(unsigned int index)
 {
-    if (index >= GetNumStreams()) {
-        KFSp_FailVerification("invalid index for remove in indexed group");
-    }
+    if (index >= GetNumStreams()) KFSp_FailVerification("invalid index for remove in indexed group");
     KFS_StreamBase* const child = At(index);
     KFSp_NotifyOfChild(&KFS_StreamListener::StreamAboutToBeRemoved, this, child, index);
     streams_.erase(streams_.begin() + index);
@@ -220,7 +203,8 @@ void KFS_IndexedStreamGroup::ReorderStreamsStart(KFS_StreamBase* stream, unsigne
 
 void KFS_IndexedStreamGroup::ReorderStreamsEnd(KFS_StreamBase* stream, unsigned int from, unsigned int to)
 {
-    KFSp_Notify(this, [=, this](KFS_StreamListener* listener) { listener->StreamsReordered(this, stream, from, to); });
+    KFSp_Notify(
+        this, [=, this](KFS_StreamListener* listener) { listener->StreamsReordered(this, stream, from, to); });
 }
 
 void KFS_IndexedStreamGroup::ReorderStreams(unsigned int from, unsigned int to)
@@ -244,17 +228,14 @@ unsigned int KFS_IndexedStreamGroup::AppendStream(Q_ScAutoPtr<KFS_StreamBase>* s
 
 KFS_StreamBase* KFS_IndexedStreamGroup::At(unsigned int index) const
 {
-    if (index >= streams_.size()) {
-        KFSp_FailVerification("invalid index in indexed group");
-    }
+    if (index >= streams_.size()) KFSp_FailVerification("invalid index in indexed group");
     return streams_[index];
 }
 
 KFS_StreamBase* KFS_IndexedStreamGroup::At(KFS_StreamID const& id) const
 {
-    if (id.GetIndex() == KFS_StreamID::NoIndex) {
+    if (id.GetIndex() == KFS_StreamID::NoIndex)
         KFSp_FailVerification("index must be specified for lookup in indexed group");
-    }
     KFS_StreamBase* const child = At(id.GetIndex());
     KFSp_ValidateMatchNames(id, child);
     return child;

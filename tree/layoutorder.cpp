@@ -34,20 +34,14 @@ KFSp_LayoutOrder::KFSp_LayoutOrder(KFS_CanonicalLayout const& layout)
         names_.push_back(layout[position]->GetMatchName());
         keys_.push_back(names_.back().GetGuid().Half(0));
     }
-    for (unsigned int position = 0; position < layout.size(); ++position) {
-        if (layout[position]->IsGroup()) {
-            subgroups_.push_back(position);
-        }
-    }
+    for (unsigned int position = 0; position < layout.size(); ++position)
+        if (layout[position]->IsGroup()) subgroups_.push_back(position);
 }
 
 unsigned int KFSp_LayoutOrder::Find(KFS_MatchName const& name) const
 {
     std::uint64_t const key = name.GetGuid().Half(0);
-    for (std::size_t slot = LowerBound(keys_, key); slot < keys_.size() && keys_[slot] == key; ++slot) {
-        if (names_[slot] == name) {
-            return static_cast<unsigned int>(slot);
-        }
-    }
+    for (std::size_t slot = LowerBound(keys_, key); slot < keys_.size() && keys_[slot] == key; ++slot)
+        if (names_[slot] == name) return static_cast<unsigned int>(slot);
     return None;
 }

@@ -16,9 +16,7 @@ namespace {
 bool& ThisThreadsPause()
 {
     boost::thread_specific_ptr<bool>& state = KFSp_GetMainListenerPauseState();
-    if (!state.get()) {
-        state.reset(new bool(false));
-    }
+    if (!state.get()) state.reset(new bool(false));
     return *state;
 }
 
@@ -37,11 +35,8 @@ KFS_StreamListenerManager::~KFS_StreamListenerManager() = default;
 
 void KFS_StreamListenerManager::NotifyAllListeners(KFS_Notification const& call)
 {
-    for (KFS_StreamListener* const listener : listeners_) {
-        if (listener->ListenOnThisThread()) {
-            call(listener);
-        }
-    }
+    for (KFS_StreamListener* const listener : listeners_)
+        if (listener->ListenOnThisThread()) call(listener);
 }
 
 int KFS_RegisterMainListener(KFS_StreamListener* listener)
@@ -62,17 +57,11 @@ int KFS_PauseMainListener(bool pause, bool& wasPaused)
 
 bool KFSp_IsHeard(KFS_StreamBase* stream)
 {
-    if (stream->GetListenerState() == KFS_ListenerState_Silent) {
+    if (stream->GetListenerState() == KFS_ListenerState_Silent) return false;
+    if (Q_GetRunMode() == Q_RunMode_Silent || stream->IsCanonical() || ThisThreadsPause() || !S_KFS_MainListenerManager)
         return false;
-    }
-    if (Q_GetRunMode() == Q_RunMode_Silent || stream->IsCanonical() || ThisThreadsPause() ||
-        !S_KFS_MainListenerManager) {
-        return false;
-    }
     int state = stream->GetListenerState();
-    if (state == KFS_ListenerState_Unknown) {
-        state = stream->ProbeListenerState();
-    }
+    if (state == KFS_ListenerState_Unknown) state = stream->ProbeListenerState();
     return state == KFS_ListenerState_Heard;
 }
 

@@ -13,9 +13,7 @@ KFS_StreamListenerManager* KFSp_GetMainListenerManager();
 template <class Call>
 void KFSp_Notify(KFS_StreamBase* stream, Call const& call)
 {
-    if (KFSp_IsHeard(stream)) {
-        KFSp_GetMainListenerManager()->NotifyAllListeners(call);
-    }
+    if (KFSp_IsHeard(stream)) KFSp_GetMainListenerManager()->NotifyAllListeners(call);
 }
 
 // The main manager's life, from KFS_StreamBase::Birth to Death.

@@ -27,9 +27,7 @@ unsigned char const* AsBytes(char const* text)
 hearth::utility::Guid HashText(unsigned char const* text)
 {
     hearth::utility::Murmur3MixerState state;
-    if (text) {
-        hearth::utility::UpdateHashState(state, text, std::strlen(reinterpret_cast<char const*>(text)));
-    }
+    if (text) hearth::utility::UpdateHashState(state, text, std::strlen(reinterpret_cast<char const*>(text)));
     hearth::utility::Guid guid;
     hearth::utility::GetHashResult(state, guid);
     return guid;
@@ -51,9 +49,7 @@ std::size_t KFSp_HashGuid::operator()(KFSp_MatchNameEntry const& entry) const
     unsigned char bytes[16];
     hearth::utility::Guid::GuidToBytes(entry.GetGuid(), bytes);
     std::uint64_t seed = 0;
-    for (unsigned char const byte : bytes) {
-        seed ^= byte + std::uint64_t{0x9e3779b9} + (seed << 6) + (seed >> 2);
-    }
+    for (unsigned char const byte : bytes) seed ^= byte + std::uint64_t{0x9e3779b9} + (seed << 6) + (seed >> 2);
     return static_cast<std::size_t>(seed);
 }
 
@@ -71,17 +67,13 @@ KFSp_MatchNameEntry const* KFSp_MatchNamePool::FindRecent(hearth::utility::Guid 
 hearth::utility::Guid KFSp_MatchNamePool::GuidFromName(unsigned char const* text)
 {
     KFSp_MatchNameEntry const key(text);
-    if (FindRecent(key.GetGuid())) {
-        return key.GetGuid();
-    }
+    if (FindRecent(key.GetGuid())) return key.GetGuid();
     boost::upgrade_lock<boost::shared_mutex> shared(mutex_);
     auto found = entries_.find(key);
     if (found == entries_.end()) {
         boost::upgrade_to_unique_lock<boost::shared_mutex> const exclusive(shared);
         found = entries_.find(key);
-        if (found == entries_.end()) {
-            found = entries_.insert(key);
-        }
+        if (found == entries_.end()) found = entries_.insert(key);
     }
     RecentOf(key.GetGuid()).store(&*found, std::memory_order_release);
     return found->GetGuid();
@@ -89,14 +81,10 @@ hearth::utility::Guid KFSp_MatchNamePool::GuidFromName(unsigned char const* text
 
 unsigned char const* KFSp_MatchNamePool::NameFromGuid(hearth::utility::Guid const& guid) const
 {
-    if (KFSp_MatchNameEntry const* const recent = FindRecent(guid)) {
-        return recent->GetName();
-    }
+    if (KFSp_MatchNameEntry const* const recent = FindRecent(guid)) return recent->GetName();
     boost::shared_lock<boost::shared_mutex> const shared(mutex_);
     auto const found = entries_.find(KFSp_MatchNameEntry(guid));
-    if (found == entries_.end()) {
-        return nullptr;
-    }
+    if (found == entries_.end()) return nullptr;
     RecentOf(guid).store(&*found, std::memory_order_release);
     return found->GetName();
 }
@@ -158,11 +146,10 @@ void KFS_MatchName::Read(CKF_File* file, CKF_ChunkInfo const* parent)
 void KFS_MatchName::Write(CKF_File* file) const
 {
     unsigned char atom[AtomSize] = {};
-    if (unsigned char const* const text = GetName()) {
+    if (unsigned char const* const text = GetName())
         std::memcpy(atom, text, std::strlen(reinterpret_cast<char const*>(text)));
-    } else if (IsValid()) {
+    else if (IsValid())
         KFSp_FailVerification("asked to write a match name without a text");
-    }
     KFSp_ThrowIf(CKF_WriteAtom(file, AtomId, AtomSize, atom));
 }
 

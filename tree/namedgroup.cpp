@@ -98,26 +98,20 @@ KFS_StreamBase const* KFS_NamedStreamGroup::GetStream(unsigned int index) const
 
 KFS_StreamBase* KFS_NamedStreamGroup::GetEditableStreamNullOK(unsigned int index)
 {
-    if (IsAsInLayout(index)) {
-        return nullptr;
-    }
+    if (IsAsInLayout(index)) return nullptr;
     return const_cast<KFS_StreamBase*>(std::as_const(*this).GetEditableStreamNullOK(index));
 }
 
 KFS_StreamBase const* KFS_NamedStreamGroup::GetEditableStreamNullOK(unsigned int index) const
 {
-    if (IsAsInLayout(index)) {
-        return nullptr;
-    }
+    if (IsAsInLayout(index)) return nullptr;
     KFS_StreamBase const* const child = *LookupStreamAt(index);
     return child->IsCanonical() ? nullptr : child;
 }
 
 KFS_StreamBase const* KFS_NamedStreamGroup::GetStream(KFS_StreamID const& id) const
 {
-    if (id.GetIndex() == KFS_StreamID::NoIndex) {
-        return GetStream(id.GetMatchName(), true);
-    }
+    if (id.GetIndex() == KFS_StreamID::NoIndex) return GetStream(id.GetMatchName(), true);
     KFS_StreamBase const* const child = GetStream(id.GetIndex());
     KFSp_ValidateMatchNames(id, child);
     return child;
@@ -125,9 +119,7 @@ KFS_StreamBase const* KFS_NamedStreamGroup::GetStream(KFS_StreamID const& id) co
 
 KFS_StreamBase* KFS_NamedStreamGroup::GetEditableStream(KFS_StreamID const& id)
 {
-    if (id.GetIndex() == KFS_StreamID::NoIndex) {
-        return GetEditableStream(id.GetMatchName());
-    }
+    if (id.GetIndex() == KFS_StreamID::NoIndex) return GetEditableStream(id.GetMatchName());
     KFS_StreamBase* const child = GetEditableStream(id.GetIndex());
     KFSp_ValidateMatchNames(id, child);
     return child;
@@ -141,9 +133,7 @@ KFS_StreamID KFS_NamedStreamGroup::SlowGetIDOfChild(KFS_StreamBase const* child)
 bool KFS_NamedStreamGroup::RemoveChild(KFS_StreamBase* child)
 {
     auto const found = std::find(streams_.begin(), streams_.end(), child);
-    if (found == streams_.end()) {
-        return false;
-    }
+    if (found == streams_.end()) return false;
     auto const index = static_cast<unsigned int>(found - streams_.begin());
     KFSp_NotifyOfChild(&KFS_StreamListener::StreamAboutToBeRemoved, this, child, index);
     child->SetParent(nullptr);
@@ -156,18 +146,13 @@ bool KFS_NamedStreamGroup::RemoveChild(KFS_StreamBase* child)
 KFS_StreamBase* KFS_NamedStreamGroup::GetEditableStream(KFS_MatchName const& name)
 {
     KFS_StreamBase* const child = *LookupStream(name, true);
-    if (!child->IsCanonical()) {
-        return child;
-    }
+    if (!child->IsCanonical()) return child;
     Q_ScAutoPtr<KFS_StreamBase> created(CreateStream(name, true, 600, true, false));
     KFS_StreamBase* const stream = created.get();
-    if (!stream) {
-        throw int{KFS_Err_UnknownStream};
-    }
+    if (!stream) throw int{KFS_Err_UnknownStream};
     SwapStream(&created);
-    if (KFS_Stream* const leaf = stream->GetAsLeaf(); leaf && leaf->NeedsResetAfterStored()) {
+    if (KFS_Stream* const leaf = stream->GetAsLeaf(); leaf && leaf->NeedsResetAfterStored())
         leaf->InsertDefaultKey(T_Time{0, 1});
-    }
     return stream;
 }
 
@@ -206,43 +191,29 @@ KFS_Stream const* KFS_NamedStreamGroup::GetLeafStream(KFS_MatchName const& name)
 
 KFS_StreamBase* KFS_NamedStreamGroup::SwapStream(Q_ScAutoPtr<KFS_StreamBase>* stream)
 {
-    if (!GetLayout()) {
-        return nullptr;
-    }
+    if (!GetLayout()) return nullptr;
     KFS_StreamBase* const incoming = stream->get();
     KFS_MatchName const& name = incoming->GetMatchName();
-    if (!CanStore(name)) {
-        KFSp_FailVerification("invalid name for storing in this named group");
-    }
+    if (!CanStore(name)) KFSp_FailVerification("invalid name for storing in this named group");
     auto const slot = LookupStream(name, true);
     unsigned int const index = GetIndexInUILayout(name);
     KFSp_NotifyOfChild(&KFS_StreamListener::StreamAboutToBeSwapped, this, incoming, index);
     KFS_StreamBase* const outgoing = std::exchange(*slot, stream->release());
     // Whatever throws from here on, the group has the stream that came, and the one that left must not be lost.
     Q_ScAutoPtr<KFS_StreamBase> leaving(outgoing->IsCanonical() ? nullptr : outgoing);
-    if (!incoming->IsCanonical()) {
-        incoming->SetParent(this);
-    }
-    if (outgoing->GetParent()) {
-        outgoing->SetParent(nullptr);
-    }
+    if (!incoming->IsCanonical()) incoming->SetParent(this);
+    if (outgoing->GetParent()) outgoing->SetParent(nullptr);
     KFSp_NotifyOfSwap(this, incoming, outgoing, index);
     return leaving.release();
 }
 
 KFS_StreamBase* KFS_NamedStreamGroup::SwapCanonicalForStream(KFS_MatchName const& name)
 {
-    if ((*LookupStream(name, true))->IsCanonical()) {
-        return nullptr;
-    }
+    if ((*LookupStream(name, true))->IsCanonical()) return nullptr;
     KFSp_ScIncoming incoming(GetCanonicalStream(name));
-    if (!incoming.stream) {
-        KFSp_FailVerification("unexpected match name searched for in group");
-    }
+    if (!incoming.stream) KFSp_FailVerification("unexpected match name searched for in group");
     Q_ScAutoPtr<KFS_StreamBase> leaving(SwapStream(&incoming.stream));
-    if (KFS_ShouldAlwaysDecanonicalize()) {
-        GetEditableStream(name);
-    }
+    if (KFS_ShouldAlwaysDecanonicalize()) GetEditableStream(name);
     return leaving.release();
 }
 
@@ -258,9 +229,7 @@ bool KFS_NamedStreamGroup::UserCanHideAndShowChildren(KFS_MatchName const&) cons
 
 void KFS_NamedStreamGroup::ResetAllStreamsToCanonical(bool force)
 {
-    if (IsCanonical() && !force) {
-        return;
-    }
+    if (IsCanonical() && !force) return;
     DestroyContents();
     ShareLayoutOf(GetMatchName());
     FillInStreamsFromCanonicalLayout();
@@ -268,14 +237,10 @@ void KFS_NamedStreamGroup::ResetAllStreamsToCanonical(bool force)
 
 void KFS_NamedStreamGroup::FillInStreamsFromCanonicalLayout()
 {
-    if (!GetLayout()) {
-        return;
-    }
+    if (!GetLayout()) return;
     DestroyContents();
     streams_.assign(layoutOrder_->Slots().begin(), layoutOrder_->Slots().end());
-    if (!IsCanonical()) {
-        MakeSubgroupsReal();
-    }
+    if (!IsCanonical()) MakeSubgroupsReal();
     filledFrom_.store(GetLayout().get(), std::memory_order_release);
 }
 
@@ -284,9 +249,7 @@ void KFS_NamedStreamGroup::MakeSubgroupsReal()
 {
     for (unsigned int const position : layoutOrder_->Subgroups()) {
         KFS_StreamBase*& slot = streams_[layoutOrder_->SlotOf(position)];
-        if (!slot->IsCanonical()) {
-            continue;  // somebody who was told of an earlier one has asked for it
-        }
+        if (!slot->IsCanonical()) continue;  // somebody who was told of an earlier one has asked for it
         KFS_StreamBase* const clone = slot->CloneStream(WholeClone);
         clone->SetCanonical(false);
         slot = clone;
@@ -302,21 +265,15 @@ bool KFS_NamedStreamGroup::IsComplete() const
 
 void KFS_NamedStreamGroup::EnsureUILayoutComplete() const
 {
-    if (!IsCanonical() || !GetLayout() || IsComplete()) {
-        return;
-    }
+    if (!IsCanonical() || !GetLayout() || IsComplete()) return;
     ScRecursiveLock const guard(KFSp_GetCanonicalLock());
-    if (!IsComplete()) {
-        const_cast<KFS_NamedStreamGroup*>(this)->FillInStreamsFromCanonicalLayout();
-    }
+    if (!IsComplete()) const_cast<KFS_NamedStreamGroup*>(this)->FillInStreamsFromCanonicalLayout();
 }
 
 void KFS_NamedStreamGroup::CopyAcceptableStreams(KFS_NamedStreamGroup const& other)
 {
     for (KFS_StreamBase const* const child : other.streams_) {
-        if (child->IsCanonical() || Find(child->GetMatchName()) == streams_.end()) {
-            continue;
-        }
+        if (child->IsCanonical() || Find(child->GetMatchName()) == streams_.end()) continue;
         Q_ScAutoPtr<KFS_StreamBase> clone(child->CloneStream(WholeClone));
         Q_ScAutoPtr<KFS_StreamBase> const replaced(SwapStream(&clone));
     }
@@ -331,9 +288,7 @@ void KFS_NamedStreamGroup::DestroyContents()
     }
     for (unsigned int i = 0; i < streams_.size(); ++i) {
         KFS_StreamBase* const child = streams_[i];
-        if (child->IsCanonical()) {
-            continue;
-        }
+        if (child->IsCanonical()) continue;
         KFSp_NotifyOfChild(&KFS_StreamListener::StreamAboutToBeRemoved, this, child, i);
         child->SetParent(nullptr);
         KFSp_NotifyOfChild(&KFS_StreamListener::StreamRemoved, this, child, i);
@@ -353,11 +308,10 @@ KFS_StreamBase* KFS_NamedStreamGroup::DefaultFor(KFS_MatchName const& name) cons
 
 void KFS_NamedStreamGroup::DeleteRealStreams() noexcept
 {
-    if (IsCanonical()) {
+    if (IsCanonical())
         streams_.clear();
-    } else {
+    else
         KFSp_DeleteChildren(&streams_);
-    }
 }
 
 KFS_NamedStreamGroup::Streams::const_iterator KFS_NamedStreamGroup::LookupStream(KFS_MatchName const& name,
@@ -366,9 +320,7 @@ KFS_NamedStreamGroup::Streams::const_iterator KFS_NamedStreamGroup::LookupStream
     EnsureUILayoutComplete();
     auto const found = Find(name);
     if (found == streams_.end()) {
-        if (mustExist) {
-            KFSp_FailVerification("unexpected match name searched for in group");
-        }
+        if (mustExist) KFSp_FailVerification("unexpected match name searched for in group");
         return found;
     }
     return Entered(found);
@@ -379,9 +331,8 @@ KFS_NamedStreamGroup::Streams::const_iterator KFS_NamedStreamGroup::Entered(Stre
 {
     bool const hasLeavesOnly = layoutOrder_ && layoutOrder_->Subgroups().empty();
     if (!hasLeavesOnly && (*found)->IsCanonical()) {
-        if (KFS_NamedStreamGroup const* const group = std::as_const(**found).GetAsNamedGroup()) {
+        if (KFS_NamedStreamGroup const* const group = std::as_const(**found).GetAsNamedGroup())
             group->EnsureUILayoutComplete();
-        }
     }
     return found;
 }
@@ -396,9 +347,7 @@ KFS_NamedStreamGroup::Streams::iterator KFS_NamedStreamGroup::LookupStream(KFS_M
 // Most slots are, and it shows without a look at the stream. False says nothing.
 bool KFS_NamedStreamGroup::IsAsInLayout(unsigned int position) const
 {
-    if (!IsComplete() || position >= streams_.size()) {
-        return false;
-    }
+    if (!IsComplete() || position >= streams_.size()) return false;
     unsigned int const slot = layoutOrder_->SlotOf(position);
     return streams_[slot] == layoutOrder_->Slots()[slot];
 }
@@ -423,8 +372,6 @@ KFS_NamedStreamGroup::Streams::const_iterator KFS_NamedStreamGroup::Find(KFS_Mat
 
 KFS_MatchName const& KFS_NamedStreamGroup::NameAt(unsigned int index, std::size_t count) const
 {
-    if (index >= count) {
-        KFSp_FailVerification("invalid index in named group");
-    }
+    if (index >= count) KFSp_FailVerification("invalid index in named group");
     return (*GetLayout())[index]->GetMatchName();
 }

@@ -40,31 +40,23 @@ bool FX_ParamDef_HasParamName(FX_ParamDef const* def)
 
 u16str FX_ParamDef_GetParamName(FX_ParamDef const* def)
 {
-    if (!FX_ParamDef_HasParamName(def) || !ParamNameField(def)) {
-        return {};
-    }
+    if (!FX_ParamDef_HasParamName(def) || !ParamNameField(def)) return {};
     return Q_MBToUTF16String(ParamNameField(def));
 }
 
 void FX_ParamDef_SetParamName(FX_ParamDef* def, u16str const& name, bool keepEmpty)
 {
-    if (!FX_ParamDef_HasParamName(def)) {
-        return;
-    }
+    if (!FX_ParamDef_HasParamName(def)) return;
     char*& field = ParamNameField(def);
     if (field) {
         Q_FreePtr(field);
         field = nullptr;
     }
-    if (name.empty() && !keepEmpty) {
-        return;
-    }
+    if (name.empty() && !keepEmpty) return;
     std::string const text = Q_UTF16ToMBString(name, false);
     std::size_t const size = text.size() + 1;
     auto* const buffer = static_cast<char*>(Q_AllocatePtr(KFSp_ModuleId, "paramdef name field", size));
-    if (!buffer) {
-        throw int{KFS_Err_OutOfMemory};
-    }
+    if (!buffer) throw int{KFS_Err_OutOfMemory};
     if (int const code = Q_CopyString(text.c_str(), static_cast<int>(size), buffer)) {
         Q_FreePtr(buffer);
         throw code;
@@ -74,18 +66,12 @@ void FX_ParamDef_SetParamName(FX_ParamDef* def, u16str const& name, bool keepEmp
 
 void FX_ParamDef_Copy(FX_ParamDef const& source, FX_ParamDef* target)
 {
-    if (&source == target) {
-        return;
-    }
+    if (&source == target) return;
     KFS_DeleteParamDefInternalString(target);
     *target = source;
-    if (!FX_ParamDef_HasParamName(target)) {
-        return;
-    }
+    if (!FX_ParamDef_HasParamName(target)) return;
     ParamNameField(target) = nullptr;
-    if (ParamNameField(&source)) {
-        FX_ParamDef_SetParamName(target, FX_ParamDef_GetParamName(&source), false);
-    }
+    if (ParamNameField(&source)) FX_ParamDef_SetParamName(target, FX_ParamDef_GetParamName(&source), false);
 }
 
 void KFS_DeleteParamDefInternalString(FX_ParamDef* def)

@@ -58,8 +58,6 @@ void KFS_ParamLayerStream::InsertDefaultKey(T_Time const&)
 
 void* KFS_ParamLayerStream::GetFlattenedReserved0() const
 {
-    if (IsIndependent()) {
-        return GetParamDef().value.layer.reservedPointer;
-    }
+    if (IsIndependent()) return GetParamDef().value.layer.reservedPointer;
     return IsCanonical() ? nullptr : Q_IntPtrToPointer(KFSp_GetCallbacks().layerIndependentFunc(this, true));
 }

@@ -4,16 +4,12 @@ KFS_ScSetResetIndependent::KFS_ScSetResetIndependent(KFS_StreamBase* stream, boo
     : stream_(stream),
       saved_(stream->IsIndependent())
 {
-    if (saved_ != wanted) {
-        stream_->MakeIndependent(wanted);
-    }
+    if (saved_ != wanted) stream_->MakeIndependent(wanted);
 }
 
 KFS_ScSetResetIndependent::~KFS_ScSetResetIndependent()
 {
-    if (stream_->IsIndependent() == saved_) {
-        return;
-    }
+    if (stream_->IsIndependent() == saved_) return;
     try {
         stream_->MakeIndependent(saved_);
     } catch (...) {

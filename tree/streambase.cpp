@@ -20,9 +20,7 @@ namespace {
 // Every question about kinds goes to the factory, so a node without one can't answer it.
 KFS_StreamFactory* Required(KFS_StreamFactory* factory)
 {
-    if (!factory) {
-        KFSp_FailVerification("asked a property without a factory for a property type");
-    }
+    if (!factory) KFSp_FailVerification("asked a property without a factory for a property type");
     return factory;
 }
 
@@ -65,9 +63,7 @@ KFS_StreamBase::KFS_StreamBase(KFS_MatchName const* name, KFS_StreamFactory* fac
     : flags_(KFS_BaseFlag_Active | (canonical ? KFS_BaseFlag_Canonical : 0U)),
       factory_(factory)
 {
-    if (name) {
-        matchName_ = *name;
-    }
+    if (name) matchName_ = *name;
     KFS_StreamBase::FillInParamDef();
 }
 
@@ -84,7 +80,8 @@ KFS_StreamBase::KFS_StreamBase(KFS_StreamBase const& source)
 KFS_StreamBase::~KFS_StreamBase()
 {
     try {
-        KFSp_Notify(this, [this](KFS_StreamListener* listener) { listener->StreamDestroyed(this); });
+        KFSp_Notify(
+            this, [this](KFS_StreamListener* listener) { listener->StreamDestroyed(this); });
     } catch (int) {
         // A listener's failure doesn't keep a stream alive.
     } catch (std::exception& exception) {
@@ -147,17 +144,13 @@ bool KFS_StreamBase::IsLoading() const
 
 int KFS_StreamBase::ProbeListenerState()
 {
-    if (listenerState_ != KFS_ListenerState_Unknown) {
-        return listenerState_;
-    }
+    if (listenerState_ != KFS_ListenerState_Unknown) return listenerState_;
     if (IsCanonical()) {
         listenerState_ = KFS_ListenerState_Silent;
         return listenerState_;
     }
     KFS_StreamGroup* const root = GetRoot();
-    if (!root) {
-        return KFS_ListenerState_Unknown;
-    }
+    if (!root) return KFS_ListenerState_Unknown;
     listenerState_ = root->ProbeListenerState();
     return listenerState_;
 }
@@ -214,9 +207,9 @@ void KFS_StreamBase::SetStreamBaseFlags(unsigned int value, unsigned int mask)
     flags_ = (value & mask) | (oldFlags & ~mask);
     unsigned int const newFlags = flags_;
     if (newFlags != oldFlags) {
-        KFSp_Notify(this, [this, oldFlags, newFlags](KFS_StreamListener* listener) {
-            listener->StreamFlagsChanged(this, oldFlags, newFlags);
-        });
+        KFSp_Notify(
+            this, [this, oldFlags,
+                   newFlags](KFS_StreamListener* listener) { listener->StreamFlagsChanged(this, oldFlags, newFlags); });
     }
 }
 
@@ -301,9 +294,7 @@ u16str const& KFS_StreamBase::GetMatchName16Str() const
 {
     ScRecursiveLock const guard(lock_);
     if (matchName16_.empty()) {
-        if (unsigned char const* const text = matchName_.GetName()) {
-            matchName16_ = Q_MatchNameToUTF16String(text);
-        }
+        if (unsigned char const* const text = matchName_.GetName()) matchName16_ = Q_MatchNameToUTF16String(text);
     }
     return matchName16_;
 }
@@ -311,9 +302,7 @@ u16str const& KFS_StreamBase::GetMatchName16Str() const
 u16str const& KFS_StreamBase::GetDisplayName() const
 {
     ScRecursiveLock const guard(lock_);
-    if (displayName_.empty()) {
-        FillInDisplayName();
-    }
+    if (displayName_.empty()) FillInDisplayName();
     return displayName_;
 }
 
@@ -329,16 +318,13 @@ void KFS_StreamBase::pSetDisplayName(u16str const& name) const
     displayName_ = name;
     // In the word itself, since a name that is filled in on demand is no news to listeners; and only where the bit is
     // set, since readers fill names in beside other readers of the word.
-    if (NamesSameInitted()) {
+    if (NamesSameInitted())
         const_cast<KFS_StreamBase*>(this)->flags_ &= ~static_cast<unsigned int>(KFS_BaseFlag_NamesSameInitted);
-    }
 }
 
 bool KFS_StreamBase::IsMatchNameSameAsDisplayName() const
 {
-    if (NamesSameInitted()) {
-        return NamesSame();
-    }
+    if (NamesSameInitted()) return NamesSame();
     bool const same = GetMatchName16Str() == GetDisplayName();
     auto* const self = const_cast<KFS_StreamBase*>(this);
     self->SetNamesSame(same);
@@ -349,17 +335,14 @@ bool KFS_StreamBase::IsMatchNameSameAsDisplayName() const
 void KFS_StreamBase::SetParent(KFS_StreamGroup* group)
 {
     parent_ = group;
-    if (!group) {
-        return;
-    }
+    if (!group) return;
     group->NotifyParentsStreamStored(this);
     // Canonical leaves below stay at their own scale.
     KFSp_RescaleNewlyInstalledStream const rescale{group->GetPreferredTimeScale()};
-    if (KFS_Stream* const leaf = GetAsLeaf()) {
+    if (KFS_Stream* const leaf = GetAsLeaf())
         rescale(leaf);
-    } else if (KFS_StreamGroup* const self = GetAsGroup()) {
+    else if (KFS_StreamGroup* const self = GetAsGroup())
         self->ForEachNonCanonicalLeafStream(rescale, nullptr);
-    }
 }
 
 KFS_StreamGroup* KFS_StreamBase::GetRoot()
@@ -370,9 +353,7 @@ KFS_StreamGroup* KFS_StreamBase::GetRoot()
 KFS_StreamGroup const* KFS_StreamBase::GetRoot() const
 {
     KFS_StreamGroup const* top = parent_;
-    while (top && top->GetParent()) {
-        top = top->GetParent();
-    }
+    while (top && top->GetParent()) top = top->GetParent();
     return top;
 }
 
@@ -382,9 +363,7 @@ bool KFS_StreamBase::IsChildOf(KFS_StreamGroup const* group, unsigned int* depth
     for (KFS_StreamGroup const* node = parent_; node; node = node->GetParent()) {
         ++steps;
         if (node == group) {
-            if (depth) {
-                *depth = steps;
-            }
+            if (depth) *depth = steps;
             return true;
         }
     }
@@ -393,21 +372,15 @@ bool KFS_StreamBase::IsChildOf(KFS_StreamGroup const* group, unsigned int* depth
 
 bool KFS_StreamBase::AreAllParentsActive() const
 {
-    for (KFS_StreamGroup const* node = parent_; node; node = node->GetParent()) {
-        if (!node->IsActive()) {
-            return false;
-        }
-    }
+    for (KFS_StreamGroup const* node = parent_; node; node = node->GetParent())
+        if (!node->IsActive()) return false;
     return true;
 }
 
 bool KFS_StreamBase::IsHiddenByAncestor() const
 {
-    for (KFS_StreamBase const* node = this; node; node = node->GetParent()) {
-        if (node->IsHidden()) {
-            return true;
-        }
-    }
+    for (KFS_StreamBase const* node = this; node; node = node->GetParent())
+        if (node->IsHidden()) return true;
     return false;
 }
 
@@ -434,9 +407,7 @@ bool KFS_StreamBase::GatherObsoleteReplacementStreams(std::vector<KFS_Stream*>& 
 
 FX_ParamDef& KFS_StreamBase::GetParamDef()
 {
-    if (paramDef_.paramType == FX_Param_NotFilledIn) {
-        FillInParamDef();
-    }
+    if (paramDef_.paramType == FX_Param_NotFilledIn) FillInParamDef();
     return paramDef_;
 }
 
@@ -464,9 +435,8 @@ boost::any KFS_StreamBase::GetSMDataPath() const
 {
     ScRecursiveLock const guard(lock_);
     if (smDataPath_.empty() && !IsCanonical() && factory_) {
-        if (KFS_StreamBase const* const canonical = GetCanonicalStream(matchName_)) {
+        if (KFS_StreamBase const* const canonical = GetCanonicalStream(matchName_))
             smDataPath_ = canonical->GetSMDataPath();
-        }
     }
     return smDataPath_;
 }

@@ -31,9 +31,7 @@ void KFS_StreamBase::SlowGetPathFromRootToMe(KFS_StreamGroup const** root, KFS_S
 KFS_StreamCapsuleData const& KFS_StreamBase::GetStreamCapsuleData() const
 {
     hearth::threads::ScRecursiveLock const guard(lock_);
-    if (!capsuleData_.id.empty()) {
-        return capsuleData_;
-    }
+    if (!capsuleData_.id.empty()) return capsuleData_;
     if (IsCanonical()) {
         capsuleData_.id = GetMatchName16Str();
         return capsuleData_;

@@ -20,13 +20,9 @@ Base* Walk(Group* group, KFS_StreamIDPath const& path, Step const& step)
     Base* found = group;
     for (KFS_StreamID const& id : path.GetPathConst()) {
         Group* const current = found->GetAsGroup();
-        if (!current) {
-            KFSp_FailVerification("expected group");
-        }
+        if (!current) KFSp_FailVerification("expected group");
         found = step(current, id);
-        if (!found) {
-            return nullptr;
-        }
+        if (!found) return nullptr;
     }
     return found;
 }
@@ -39,30 +35,22 @@ KFS_StreamGroup::KFS_StreamGroup(KFS_MatchName const* name, KFS_StreamFactory* f
     FX_ParamDef def{};
     def.paramType = FX_Param_GROUP;
     SetParamDef(def);
-    if (name) {
-        ShareLayoutOf(*name);
-    }
+    if (name) ShareLayoutOf(*name);
 }
 
 KFS_StreamGroup::KFS_StreamGroup(KFS_StreamGroup const& source) = default;
 
 bool KFS_StreamGroup::IsModified() const
 {
-    for (unsigned int i = 0; i < GetNumStreams(); ++i) {
-        if (GetStream(i)->IsModified()) {
-            return true;
-        }
-    }
+    for (unsigned int i = 0; i < GetNumStreams(); ++i)
+        if (GetStream(i)->IsModified()) return true;
     return false;
 }
 
 bool KFS_StreamGroup::IsAnimated(bool evenIfDisabled) const
 {
-    for (unsigned int i = 0; i < GetNumStreams(); ++i) {
-        if (GetStream(i)->IsAnimated(evenIfDisabled)) {
-            return true;
-        }
-    }
+    for (unsigned int i = 0; i < GetNumStreams(); ++i)
+        if (GetStream(i)->IsAnimated(evenIfDisabled)) return true;
     return false;
 }
 
@@ -99,14 +87,9 @@ hearth::utility::Guid KFS_StreamGroup::GetRenderGuid(KFS_RenderOptionsBase const
 
 void KFS_StreamGroup::MakeIndependent(bool independent)
 {
-    if (IsIndependent() == independent) {
-        return;
-    }
-    for (unsigned int i = 0; i < GetNumStreams(); ++i) {
-        if (!GetStream(i)->IsCanonical()) {
-            GetEditableStream(i)->MakeIndependent(independent);
-        }
-    }
+    if (IsIndependent() == independent) return;
+    for (unsigned int i = 0; i < GetNumStreams(); ++i)
+        if (!GetStream(i)->IsCanonical()) GetEditableStream(i)->MakeIndependent(independent);
     SetStreamBaseFlags(independent ? KFS_BaseFlag_Independent : 0U, KFS_BaseFlag_Independent);
 }
 
@@ -114,9 +97,8 @@ void KFS_StreamGroup::SetupCanonicalLayout()
 {
     auto const layout = boost::make_shared<KFS_CanonicalLayout>();
     FillCanonicalLayout(layout.get());
-    if (std::find(layout->begin(), layout->end(), nullptr) != layout->end()) {
+    if (std::find(layout->begin(), layout->end(), nullptr) != layout->end())
         KFSp_FailVerification("UI layout has an unregistered child");
-    }
     SetLayout(layout);
 }
 
@@ -146,9 +128,7 @@ int KFS_StreamGroup::EvaluateExpression(KFS_Stream const*, T_Time const*, double
 
 unsigned int KFS_StreamGroup::GetIndexInUILayout(KFS_MatchName const& name) const
 {
-    if (std::optional<unsigned int> const position = FindPosition(name)) {
-        return *position;
-    }
+    if (std::optional<unsigned int> const position = FindPosition(name)) return *position;
     KFSp_FailVerification("match name isn't in UI layout");
 }
 
@@ -210,14 +190,8 @@ KFS_Stream const* KFS_StreamGroup::FindEditableLeafStreamNullOK(KFS_StreamIDPath
 void KFS_StreamGroup::NotifyParentsStreamStored(KFS_StreamBase* stream)
 {
     boost::thread_specific_ptr<bool>& check = KFSp_GetNotifyParentsCheck();
-    if (!check.get()) {
-        check.reset(new bool(false));
-    }
-    if (*check) {
-        return;
-    }
+    if (!check.get()) check.reset(new bool(false));
+    if (*check) return;
     Q_ScSetReset<bool> const inside(check.get(), true);
-    for (KFS_StreamGroup* group = this; group; group = group->GetParent()) {
-        group->NotifyStreamStored(this, stream);
-    }
+    for (KFS_StreamGroup* group = this; group; group = group->GetParent()) group->NotifyStreamStored(this, stream);
 }

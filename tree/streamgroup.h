@@ -116,11 +116,8 @@ protected:
     // Makes this the parent of the real ones of cloned children, without what SetParent does besides.
     void pAdopt(KFS_GroupChildren const& children)
     {
-        for (KFS_StreamBase* const child : children) {
-            if (!child->IsCanonical()) {
-                child->parent_ = this;
-            }
-        }
+        for (KFS_StreamBase* const child : children)
+            if (!child->IsCanonical()) child->parent_ = this;
     }
 
 private:
@@ -142,19 +139,12 @@ void KFS_StreamGroup::ForEachNonCanonicalLeafStream(F& f, KFS_StreamIDPath* path
 {
     for (unsigned int i = 0; i < GetNumStreams(); ++i) {
         KFS_StreamBase* const child = GetEditableStreamNullOK(i);
-        if (!child) {
-            continue;
-        }
-        if (path) {
-            path->AddTail(KFS_StreamID(i, child->GetMatchName()));
-        }
-        if (KFS_Stream* const leaf = child->GetAsLeaf()) {
+        if (!child) continue;
+        if (path) path->AddTail(KFS_StreamID(i, child->GetMatchName()));
+        if (KFS_Stream* const leaf = child->GetAsLeaf())
             f(leaf);
-        } else if (KFS_StreamGroup* const group = child->GetAsGroup()) {
+        else if (KFS_StreamGroup* const group = child->GetAsGroup())
             group->ForEachNonCanonicalLeafStream(f, path);
-        }
-        if (path) {
-            path->RemoveTail();
-        }
+        if (path) path->RemoveTail();
     }
 }

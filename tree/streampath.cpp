@@ -36,9 +36,7 @@ void KFS_StreamIDPath::Clear()
 
 KFS_StreamID const& KFS_StreamIDPath::GetComponent(unsigned int position) const
 {
-    if (position >= GetLength()) {
-        KFSp_FailVerification("asked for invalid component of property path");
-    }
+    if (position >= GetLength()) KFSp_FailVerification("asked for invalid component of property path");
     return components_[position];
 }
 
@@ -66,9 +64,7 @@ void KFS_StreamIDPath::AddTail(KFS_StreamIDPath const& path)
 {
     // By position, since the components may move when `path` is this one.
     std::size_t const added = path.components_.size();
-    for (std::size_t i = 0; i < added; ++i) {
-        components_.push_back(path.components_[i]);
-    }
+    for (std::size_t i = 0; i < added; ++i) components_.push_back(path.components_[i]);
 }
 
 KFS_StreamID KFS_StreamIDPath::RemoveHead()
@@ -126,9 +122,7 @@ bool KFS_StreamIDPath::FindFirstInstanceOfMatchName(KFS_MatchName const& name, u
     auto const found = std::find_if(components_.begin(), components_.end(),
                                     [&](KFS_StreamID const& id) { return id.GetMatchName() == name; });
     bool const stands = found != components_.end();
-    if (where) {
-        *where = stands ? static_cast<unsigned int>(found - components_.begin()) : KFS_StreamID::NoIndex;
-    }
+    if (where) *where = stands ? static_cast<unsigned int>(found - components_.begin()) : KFS_StreamID::NoIndex;
     return stands;
 }
 

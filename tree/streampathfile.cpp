@@ -27,9 +27,7 @@ void KFS_StreamIDPath::Read(CKF_File* file, CKF_ChunkInfo const* parent)
         AddTail(id);
     }
     // Whether there is a type number is for the file to say, so a host without the callback keeps the path as it is.
-    if (auto const fixUp = KFSp_GetCallbacks().oldPathFixupFunc; fixUp && oldType >= 0) {
-        fixUp(oldType, this);
-    }
+    if (auto const fixUp = KFSp_GetCallbacks().oldPathFixupFunc; fixUp && oldType >= 0) fixUp(oldType, this);
 }
 
 void KFS_StreamIDPath::Write(CKF_File* file) const
@@ -37,9 +35,7 @@ void KFS_StreamIDPath::Write(CKF_File* file) const
     CKF_ScWriteList const list(file, ListType, 0);
     KFSp_WriteLong(file, OldTypeId, NoOldType);
     KFSp_WriteLong(file, LengthId, static_cast<int>(GetLength()));
-    for (KFS_StreamID const& id : components_) {
-        id.Write(file);
-    }
+    for (KFS_StreamID const& id : components_) id.Write(file);
 }
 
 void KFS_StreamIDPath::WriteSentinel(CKF_File* file)

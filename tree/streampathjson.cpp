@@ -12,18 +12,14 @@ constexpr int MaxKeyWidth = 31;
 Q_Any const& Entry(Q_AnyTree const& component, char const* key)
 {
     auto const found = component.find(Q_AsciiToUTF16String(key));
-    if (found == component.not_found()) {
-        throw int{Q_Err_NoChild};
-    }
+    if (found == component.not_found()) throw int{Q_Err_NoChild};
     return found->second.data();
 }
 
 unsigned int Index(Q_Any const& value)
 {
     std::int64_t const index = value.GetAs_int();
-    if (index < 0 || index > std::int64_t{KFS_StreamID::NoIndex}) {
-        throw int{Q_Err_NotANumber};
-    }
+    if (index < 0 || index > std::int64_t{KFS_StreamID::NoIndex}) throw int{Q_Err_NotANumber};
     return static_cast<unsigned int>(index);
 }
 

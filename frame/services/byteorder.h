@@ -28,7 +28,7 @@ inline void Q_FpLongSwap(double* number) noexcept
     std::uint32_t words[2];
     std::memcpy(words, number, sizeof words);
     if constexpr (std::endian::native == std::endian::little) {
-        const std::uint32_t high = Q_LongSwap(words[0]);
+        std::uint32_t const high = Q_LongSwap(words[0]);
         words[0] = Q_LongSwap(words[1]);
         words[1] = high;
     }

@@ -12,8 +12,8 @@ inline long M_RoundDouble(double number) noexcept
     if (number < -beyond) return std::numeric_limits<long>::min();
     if (number != number) return 0;
     // Adding a half first would round 0.49999999999999994 up; the rest behind the point is exact.
-    const long whole = static_cast<long>(number);
-    const double rest = number - static_cast<double>(whole);
+    long const whole = static_cast<long>(number);
+    double const rest = number - static_cast<double>(whole);
     return whole + (rest >= 0.5 ? 1 : 0) - (rest <= -0.5 ? 1 : 0);
 }
 

@@ -38,26 +38,20 @@ Chunks Parse(std::uint8_t const* data, std::size_t size)
     CKF_RawChunk raw{};
     while (walk.Next(&raw)) {
         chunks.push_back({raw.id, raw.listType, raw.depth, {}});
-        if (!chunks.back().IsList()) {
-            chunks.back().data.assign(raw.data.begin(), raw.data.end());
-        }
+        if (!chunks.back().IsList()) chunks.back().data.assign(raw.data.begin(), raw.data.end());
     }
     return chunks;
 }
 
 void AppendWord(std::string& bytes, std::uint32_t word)
 {
-    for (int shift = 24; shift >= 0; shift -= 8) {
-        bytes += static_cast<char>(word >> shift & 0xFF);
-    }
+    for (int shift = 24; shift >= 0; shift -= 8) bytes += static_cast<char>(word >> shift & 0xFF);
 }
 
 std::size_t EndOf(Chunks const& chunks, std::size_t at)
 {
     std::size_t end = at + 1;
-    while (end < chunks.size() && chunks[end].depth > chunks[at].depth) {
-        ++end;
-    }
+    while (end < chunks.size() && chunks[end].depth > chunks[at].depth) ++end;
     return end;
 }
 
@@ -90,16 +84,11 @@ void Write(Chunks const& chunks, std::string& bytes)
 // Makes the count of a list of items what its bytes allow.
 void MendItems(std::string& data)
 {
-    if (data.size() < 8) {
-        return;
-    }
+    if (data.size() < 8) return;
     std::uint32_t itemSize = 0;
-    for (int i = 0; i < 4; ++i) {
+    for (int i = 0; i < 4; ++i)
         itemSize = itemSize << 8 | static_cast<unsigned char>(data[static_cast<std::size_t>(i)]);
-    }
-    if (itemSize == 0 || itemSize > data.size()) {
-        return;
-    }
+    if (itemSize == 0 || itemSize > data.size()) return;
     std::size_t const count = (data.size() - 8) / itemSize;
     data.resize(8 + count * itemSize);
     std::string word;
@@ -114,13 +103,9 @@ void MutateData(Chunk& chunk, Random& random)
     std::vector<std::uint8_t> data(chunk.data.begin(), chunk.data.end());
     data.resize(room);
     std::size_t changed = LLVMFuzzerMutate(data.data(), size, room);
-    if (random() % 4 != 0) {
-        changed = size == 0 ? changed : size;
-    }
+    if (random() % 4 != 0) changed = size == 0 ? changed : size;
     chunk.data.assign(data.begin(), data.begin() + static_cast<std::ptrdiff_t>(changed));
-    if (chunk.id == ItemListId && random() % 8 != 0) {
-        MendItems(chunk.data);
-    }
+    if (chunk.id == ItemListId && random() % 8 != 0) MendItems(chunk.data);
 }
 
 // Puts a copy of the chunk `source`, with what is in it, before a chunk of `chunks`.
@@ -129,9 +114,7 @@ void Insert(Chunks& chunks, std::size_t before, Chunks const& from, std::size_t 
     Chunks copy(from.begin() + static_cast<std::ptrdiff_t>(source),
                 from.begin() + static_cast<std::ptrdiff_t>(EndOf(from, source)));
     int const deeper = chunks[before].depth - copy.front().depth;
-    for (Chunk& chunk : copy) {
-        chunk.depth += deeper;
-    }
+    for (Chunk& chunk : copy) chunk.depth += deeper;
     chunks.insert(chunks.begin() + static_cast<std::ptrdiff_t>(before), copy.begin(), copy.end());
 }
 
@@ -145,9 +128,8 @@ std::size_t Pick(Chunks const& chunks, Random& random)
 std::size_t PickAlike(Chunks const& chunks, Chunk const& model, Random& random)
 {
     std::size_t at = Pick(chunks, random);
-    for (int tries = 0; tries < 16 && (chunks[at].id != model.id || chunks[at].listType != model.listType); ++tries) {
+    for (int tries = 0; tries < 16 && (chunks[at].id != model.id || chunks[at].listType != model.listType); ++tries)
         at = Pick(chunks, random);
-    }
     return at;
 }
 
@@ -184,9 +166,7 @@ std::size_t Finish(Chunks const& chunks, std::uint8_t* data, std::size_t maxSize
 {
     std::string bytes;
     Write(chunks, bytes);
-    if (bytes.size() > maxSize) {
-        return 0;
-    }
+    if (bytes.size() > maxSize) return 0;
     std::memcpy(data, bytes.data(), bytes.size());
     return bytes.size();
 }
@@ -198,9 +178,7 @@ extern "C" std::size_t LLVMFuzzerCustomMutator(std::uint8_t* data, std::size_t s
 {
     Random random(seed);
     Chunks chunks = Parse(data, size);
-    if (chunks.size() < 2 || random() % 32 == 0) {
-        return LLVMFuzzerMutate(data, size, maxSize);
-    }
+    if (chunks.size() < 2 || random() % 32 == 0) return LLVMFuzzerMutate(data, size, maxSize);
     for (unsigned long edits = 1 + random() % 3; edits > 0 && chunks.size() > 1; --edits) {
         Chunks const other = chunks;
         Mutate(chunks, other, random);
@@ -216,9 +194,7 @@ extern "C" std::size_t LLVMFuzzerCustomCrossOver(std::uint8_t const* data1, std:
     Random random(seed);
     Chunks chunks = Parse(data1, size1);
     Chunks const other = Parse(data2, size2);
-    if (chunks.size() < 2 || other.size() < 2) {
-        return 0;
-    }
+    if (chunks.size() < 2 || other.size() < 2) return 0;
     std::size_t const at = Pick(chunks, random);
     Insert(chunks, at, other, PickAlike(other, chunks[at], random));
     return Finish(chunks, out, maxSize);

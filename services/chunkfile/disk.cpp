@@ -26,14 +26,14 @@ template <class Call>
 auto Uninterrupted(Call call)
 {
     for (;;) {
-        const auto result = call();
+        auto const result = call();
         if (result != -1 || errno != EINTR) return result;
     }
 }
 
 std::string FolderOf(std::string const& path)
 {
-    const std::size_t slash = path.rfind('/');
+    std::size_t const slash = path.rfind('/');
     if (slash == std::string::npos) return ".";
     return slash == 0 ? "/" : path.substr(0, slash);
 }
@@ -70,7 +70,7 @@ int CKFp_DiskSink::Create(char const* path)
     if (::stat(path, &present) == 0) {
         if (!S_ISREG(present.st_mode)) return Fail(S_ISDIR(present.st_mode) ? EISDIR : EINVAL, "replace", target_);
         // A link stays a link: what it points to is replaced.
-        const std::unique_ptr<char, FreeMemory> real(::realpath(path, nullptr));
+        std::unique_ptr<char, FreeMemory> const real(::realpath(path, nullptr));
         if (!real) return Fail(errno, "find", target_);
         target_ = real.get();
         mode = present.st_mode & 07777;
@@ -84,7 +84,7 @@ int CKFp_DiskSink::Create(char const* path)
 // `mode` is 0 for a new file, which gets what the process gives new files.
 int CKFp_DiskSink::CreateTemporary(unsigned mode)
 {
-    if (const int error = Refused(CKF_IoCall::Create, 0)) return Fail(error, "write beside", target_);
+    if (int const error = Refused(CKF_IoCall::Create, 0)) return Fail(error, "write beside", target_);
     constexpr int attempts = 1000;
     for (int i = 0; i < attempts && descriptor_ < 0; ++i) {
         std::string name = TemporaryName(folder_);
@@ -102,10 +102,10 @@ int CKFp_DiskSink::CreateTemporary(unsigned mode)
 
 int CKFp_DiskSink::WriteAt(std::uint64_t offset, void const* bytes, std::size_t size)
 {
-    if (const int error = Refused(CKF_IoCall::Write, size)) return Fail(error, "write", target_);
+    if (int const error = Refused(CKF_IoCall::Write, size)) return Fail(error, "write", target_);
     unsigned char const* from = static_cast<unsigned char const*>(bytes);
     while (size > 0) {
-        const ssize_t done =
+        ssize_t const done =
             Uninterrupted([&] { return ::pwrite(descriptor_, from, size, static_cast<off_t>(offset)); });
         if (done <= 0) return Fail(done < 0 ? errno : ENOSPC, "write", target_);
         from += done;
@@ -118,7 +118,7 @@ int CKFp_DiskSink::WriteAt(std::uint64_t offset, void const* bytes, std::size_t 
 int CKFp_DiskSink::Flush()
 {
     if (buffer_.empty()) return 0;
-    if (const int code = WriteAt(flushed_, buffer_.data(), buffer_.size())) return code;
+    if (int const code = WriteAt(flushed_, buffer_.data(), buffer_.size())) return code;
     flushed_ += buffer_.size();
     buffer_.clear();
     return 0;
@@ -128,9 +128,9 @@ int CKFp_DiskSink::Flush()
 int CKFp_DiskSink::DoAppend(void const* bytes, std::size_t size)
 {
     if (size > BufferSize - buffer_.size())
-        if (const int code = Flush()) return code;
+        if (int const code = Flush()) return code;
     if (size > BufferSize) {
-        if (const int code = WriteAt(flushed_, bytes, size)) return code;
+        if (int const code = WriteAt(flushed_, bytes, size)) return code;
         flushed_ += size;
         return 0;
     }
@@ -148,12 +148,12 @@ int CKFp_DiskSink::Patch(std::uint64_t offset, void const* bytes, std::size_t si
 
 int CKFp_DiskSink::SyncAndClose()
 {
-    if (const int error = Refused(CKF_IoCall::Sync, 0)) return Fail(error, "flush", target_);
+    if (int const error = Refused(CKF_IoCall::Sync, 0)) return Fail(error, "flush", target_);
     if (Uninterrupted([&] { return ::fsync(descriptor_); }) != 0) return Fail(errno, "flush", target_);
     struct stat written;
     if (::fstat(descriptor_, &written) != 0) return Fail(errno, "check", target_);
     if (static_cast<std::uint64_t>(written.st_size) != Size()) return Fail(EIO, "check", target_);
-    if (const int error = Refused(CKF_IoCall::Close, 0)) return Fail(error, "close", target_);
+    if (int const error = Refused(CKF_IoCall::Close, 0)) return Fail(error, "close", target_);
     // After an error the descriptor is gone as well.
     if (::close(std::exchange(descriptor_, -1)) != 0) return Fail(errno, "close", target_);
     return 0;
@@ -161,11 +161,11 @@ int CKFp_DiskSink::SyncAndClose()
 
 int CKFp_DiskSink::SyncFolder()
 {
-    if (const int error = Refused(CKF_IoCall::SyncFolder, 0)) return Fail(error, "flush the folder", folder_);
-    const int folder = Uninterrupted([&] { return ::open(folder_.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC); });
+    if (int const error = Refused(CKF_IoCall::SyncFolder, 0)) return Fail(error, "flush the folder", folder_);
+    int const folder = Uninterrupted([&] { return ::open(folder_.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC); });
     if (folder < 0) return errno == EACCES ? 0 : Fail(errno, "open the folder", folder_);
-    const int result = Uninterrupted([&] { return ::fsync(folder); });
-    const int error = result != 0 ? errno : 0;
+    int const result = Uninterrupted([&] { return ::fsync(folder); });
+    int const error = result != 0 ? errno : 0;
     ::close(folder);
     // Some file systems can't flush a folder and say so with EINVAL; a folder that may be written to but not listed
     // can't be opened. Neither is a failed save.
@@ -174,9 +174,9 @@ int CKFp_DiskSink::SyncFolder()
 
 int CKFp_DiskSink::Commit()
 {
-    if (const int code = Flush()) return code;
-    if (const int code = SyncAndClose()) return code;
-    if (const int error = Refused(CKF_IoCall::Rename, 0)) return Fail(error, "replace", target_);
+    if (int const code = Flush()) return code;
+    if (int const code = SyncAndClose()) return code;
+    if (int const error = Refused(CKF_IoCall::Rename, 0)) return Fail(error, "replace", target_);
     if (::rename(temporary_.c_str(), target_.c_str()) != 0) return Fail(errno, "replace", target_);
     temporary_.clear();
     return SyncFolder();

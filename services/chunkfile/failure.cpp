@@ -43,7 +43,7 @@ int CKFp_Failure::SetBadAtomId(int id, std::uint64_t offset) noexcept
 CKFp_IdText::CKFp_IdText(int id) noexcept
 {
     for (int i = 0; i < 4; ++i) {
-        const unsigned byte = (static_cast<unsigned>(id) >> (24 - 8 * i)) & 0xFF;
+        unsigned const byte = (static_cast<unsigned>(id) >> (24 - 8 * i)) & 0xFF;
         text[i] = byte >= 0x20 && byte < 0x7F ? static_cast<char>(byte) : '?';
     }
     text[4] = 0;

@@ -6,7 +6,7 @@ int StartReading(CKF_File& file, CKF_File::Impl& impl, CKFp_Bytes bytes)
 {
     impl.reader = std::make_unique<CKFp_Reader>(bytes, impl.failure);
     CKFp_Version version;
-    if (const int code = impl.reader->Start(&version)) return code;
+    if (int const code = impl.reader->Start(&version)) return code;
     file.majorVersion = version.major;
     file.minorVersion = version.minor;
     file.textEncoding.code = version.encoding;
@@ -43,40 +43,47 @@ CKF_File::~CKF_File() = default;
 
 int CKF_File::Open(char const* path)
 {
-    return Begin(*this, *impl_, [&] {
-        if (!path) return impl_->failure.Set(CKF_Err_BadArgument, 0, "no path");
-        std::size_t size = 0;
-        if (const int code = CKFp_LoadFile(path, impl_->failure, &impl_->loaded, &size)) return code;
-        return StartReading(*this, *impl_, {impl_->loaded.get(), size});
-    });
+    return Begin(
+        *this, *impl_,
+        [&] {
+            if (!path) return impl_->failure.Set(CKF_Err_BadArgument, 0, "no path");
+            std::size_t size = 0;
+            if (int const code = CKFp_LoadFile(path, impl_->failure, &impl_->loaded, &size)) return code;
+            return StartReading(*this, *impl_, {impl_->loaded.get(), size});
+        });
 }
 
 int CKF_File::Open(std::span<unsigned char const> bytes)
 {
-    return Begin(*this, *impl_, [&] { return StartReading(*this, *impl_, bytes); });
+    return Begin(
+        *this, *impl_, [&] { return StartReading(*this, *impl_, bytes); });
 }
 
 int CKF_File::Create(char const* path, CKF_IoHook* hook)
 {
-    return Begin(*this, *impl_, [&] {
-        if (!path) return impl_->failure.Set(CKF_Err_BadArgument, 0, "no path");
-        auto sink = std::make_unique<CKFp_DiskSink>(hook, impl_->failure);
-        if (const int code = sink->Create(path)) return code;
-        return StartWriting(*impl_, std::move(sink), maxSize_);
-    });
+    return Begin(
+        *this, *impl_,
+        [&] {
+            if (!path) return impl_->failure.Set(CKF_Err_BadArgument, 0, "no path");
+            auto sink = std::make_unique<CKFp_DiskSink>(hook, impl_->failure);
+            if (int const code = sink->Create(path)) return code;
+            return StartWriting(*impl_, std::move(sink), maxSize_);
+        });
 }
 
 int CKF_File::CreateInMemory(CKF_IoHook* hook)
 {
-    return Begin(*this, *impl_, [&] {
-        auto sink = std::make_unique<CKFp_MemorySink>(hook, impl_->failure, impl_->committed);
-        return StartWriting(*impl_, std::move(sink), maxSize_);
-    });
+    return Begin(
+        *this, *impl_,
+        [&] {
+            auto sink = std::make_unique<CKFp_MemorySink>(hook, impl_->failure, impl_->committed);
+            return StartWriting(*impl_, std::move(sink), maxSize_);
+        });
 }
 
 int CKF_File::Commit()
 {
-    const int code = CKFp_WithWriter(this, [&](CKFp_Writer& writer) {
+    int const code = CKFp_WithWriter(this, [&](CKFp_Writer& writer) {
         return writer.Commit({majorVersion, minorVersion, textEncoding.code});
     });
     impl_->writer.reset();

@@ -33,7 +33,7 @@ int CKFp_WithWorker(CKF_File* file, std::unique_ptr<Worker> CKF_File::Impl::*wor
 {
     if (!file) return CKF_Err_BadArgument;
     CKF_File::Impl& impl = CKFp_Access::ImplOf(*file);
-    if (const int code = impl.failure.Code()) return code;
+    if (int const code = impl.failure.Code()) return code;
     if (!(impl.*worker)) return impl.failure.Set(CKF_Err_NotOpen, 0, "the file isn't open for %s", direction);
     try {
         return work(*(impl.*worker));

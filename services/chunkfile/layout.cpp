@@ -26,9 +26,9 @@ char const* CKFp_ParseChunk(CKFp_Bytes bytes, std::uint64_t offset, std::uint64_
     chunk->id = static_cast<int>(CKFp_Get32(header));
     chunk->claimed = CKFp_Get32(header + CKFp_LengthOffset);
     chunk->data = offset + CKFp_HeaderSize;
-    const std::uint64_t room = limit - chunk->data;
-    const std::uint64_t length = std::min<std::uint64_t>(chunk->claimed, room);
-    const bool fits = chunk->claimed <= room;
+    std::uint64_t const room = limit - chunk->data;
+    std::uint64_t const length = std::min<std::uint64_t>(chunk->claimed, room);
+    bool const fits = chunk->claimed <= room;
     chunk->end = chunk->data + length;
     if (chunk->IsList()) {
         if (length < 4) return "a list that is too short for its type";

@@ -28,7 +28,7 @@ ssize_t ReadFully(int descriptor, unsigned char* bytes, std::size_t size) noexce
 {
     std::size_t done = 0;
     while (done < size) {
-        const ssize_t count = ::read(descriptor, bytes + done, size - done);
+        ssize_t const count = ::read(descriptor, bytes + done, size - done);
         if (count < 0 && errno == EINTR) continue;
         if (count < 0) return -1;
         if (count == 0) break;
@@ -42,7 +42,7 @@ ssize_t ReadFully(int descriptor, unsigned char* bytes, std::size_t size) noexce
 int CKFp_LoadFile(char const* path, CKFp_Failure& failure, CKFp_Block* block, std::size_t* size)
 {
     // Without waiting: what isn't a regular file, such as a pipe, is refused below.
-    const Descriptor file(::open(path, O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+    Descriptor const file(::open(path, O_RDONLY | O_CLOEXEC | O_NONBLOCK));
     if (file.Number() < 0) return failure.SetIo(errno, 0, "open", path);
     struct stat status;
     if (::fstat(file.Number(), &status) != 0) return failure.SetIo(errno, 0, "open", path);
@@ -55,10 +55,10 @@ int CKFp_LoadFile(char const* path, CKFp_Failure& failure, CKFp_Block* block, st
     if (CKFp_Get32(id) != static_cast<std::uint32_t>(CKFp_FormId))
         return failure.Set(CKF_Err_NotAChunkFile, 0, "\"%s\" isn't a project file", path);
 
-    const std::size_t bytes = static_cast<std::size_t>(status.st_size);
+    std::size_t const bytes = static_cast<std::size_t>(status.st_size);
     block->reset(static_cast<unsigned char*>(Q_AllocatePtr(CKFp_AllocationId, "project file", bytes)));
     if (!*block) return failure.Set(Q_Err_OutOfMemory, 0, "not enough memory to open \"%s\"", path);
-    const ssize_t read = ReadFully(file.Number(), block->get(), bytes);
+    ssize_t const read = ReadFully(file.Number(), block->get(), bytes);
     if (read < 0) return failure.SetIo(errno, 0, "read", path);
     *size = static_cast<std::size_t>(read);
     return 0;

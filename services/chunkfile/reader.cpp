@@ -45,7 +45,7 @@ int CKFp_Reader::CheckLevel(CKF_ChunkInfo const* parent) noexcept
 
 bool CKFp_Reader::Level::IsKnownMissing(int id, int listType) const noexcept
 {
-    const auto known = missing.begin() + std::min<std::ptrdiff_t>(missingCount, std::ssize(missing));
+    auto const known = missing.begin() + std::min<std::ptrdiff_t>(missingCount, std::ssize(missing));
     return std::any_of(missing.begin(), known,
                        [&](Missing const& entry) { return entry.id == id && entry.listType == listType; });
 }
@@ -57,7 +57,7 @@ void CKFp_Reader::Level::RememberMissing(int id, int listType) noexcept
 
 int CKFp_Reader::Find(int id, int listType, CKF_ChunkInfo const* parent, CKFp_Chunk* found) noexcept
 {
-    if (const int code = CheckLevel(parent)) return code;
+    if (int const code = CheckLevel(parent)) return code;
     Level& level = Top();
     // The position of a level only goes forward, so what was missing once stays missing.
     if (level.IsKnownMissing(id, listType)) return CKF_Err_NoSuchChunk;
@@ -103,7 +103,7 @@ int CKFp_Reader::Read(std::size_t size, void* buffer) noexcept
 {
     if (Top().chunk.IsList())
         return failure_.Set(CKF_Err_BadArgument, position_, "data is read where no atom is entered");
-    const std::uint64_t left = Top().chunk.end - position_;
+    std::uint64_t const left = Top().chunk.end - position_;
     if (size > left)
         return failure_.Set(CKF_Err_PastEnd, position_, "%zu bytes are read where chunk \"%s\" has %llu left", size,
                             CKFp_IdText(Top().chunk.id).text, static_cast<unsigned long long>(left));

@@ -4,8 +4,8 @@
 
 int CKFp_Sink::Append(void const* bytes, std::size_t size)
 {
-    if (const int error = Refused(CKF_IoCall::Append, size)) return failure_.SetIo(error, size_, "write", Name());
-    if (const int code = DoAppend(bytes, size)) return code;
+    if (int const error = Refused(CKF_IoCall::Append, size)) return failure_.SetIo(error, size_, "write", Name());
+    if (int const code = DoAppend(bytes, size)) return code;
     size_ += size;
     return 0;
 }

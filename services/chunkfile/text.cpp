@@ -23,12 +23,11 @@ bool IsLow(unsigned unit) noexcept
 // The first surrogate without a partner from an index on, or the text's length.
 std::size_t FindLoneSurrogate(u16str const& text, std::size_t index) noexcept
 {
-    for (; index < text.size(); ++index) {
+    for (; index < text.size(); ++index)
         if (IsHigh(text[index]) && index + 1 < text.size() && IsLow(text[index + 1]))
             ++index;
         else if (IsHigh(text[index]) || IsLow(text[index]))
             break;
-    }
     return index;
 }
 
@@ -69,7 +68,7 @@ u16str CKFp_FromUtf8(CKFp_Bytes bytes)
 {
     u16str text;
     for (std::size_t from = 0;;) {
-        const std::size_t at = FindSurrogateBytes(bytes, from);
+        std::size_t const at = FindSurrogateBytes(bytes, from);
         if (at > from)
             text += Q_MBToUTF16String(std::string(reinterpret_cast<char const*>(bytes.data()) + from, at - from));
         if (at == bytes.size()) return text;
@@ -81,7 +80,7 @@ u16str CKFp_FromUtf8(CKFp_Bytes bytes)
 u16str CKFp_CutText(u16str text, unsigned long maxLength)
 {
     if (maxLength == 0 || text.size() <= maxLength) return text;
-    const bool splits = IsHigh(text[maxLength - 1]) && IsLow(text[maxLength]);
+    bool const splits = IsHigh(text[maxLength - 1]) && IsLow(text[maxLength]);
     text.resize(splits ? maxLength - 1 : maxLength);
     return text;
 }
@@ -89,9 +88,9 @@ u16str CKFp_CutText(u16str text, unsigned long maxLength)
 char** CKF_NewHandleFromString(u16str const& text, bool marked)
 {
     try {
-        const std::string bytes = CKFp_ToUtf8(text);
-        const bool ascii = std::all_of(text.begin(), text.end(), [](unsigned unit) { return unit < 0x80; });
-        const std::size_t front = marked && !ascii ? sizeof Utf8Mark : 0;
+        std::string const bytes = CKFp_ToUtf8(text);
+        bool const ascii = std::all_of(text.begin(), text.end(), [](unsigned unit) { return unit < 0x80; });
+        std::size_t const front = marked && !ascii ? sizeof Utf8Mark : 0;
         char** const handle = Q_AllocateHandleClear(CKFp_AllocationId, "text handle", front + bytes.size());
         if (!handle) return nullptr;
         std::memcpy(*handle, Utf8Mark, front);
@@ -105,8 +104,8 @@ char** CKF_NewHandleFromString(u16str const& text, bool marked)
 u16str CKF_ConvertHandleToStringAndDisposeIfEncoded(char*** handle, CKF_TextEncoding const* encoding)
 {
     if (!handle || !*handle) return {};
-    const std::unique_ptr<char*, CKFp_FreePtr> owner(std::exchange(*handle, nullptr));
-    const CKFp_Bytes bytes(reinterpret_cast<unsigned char const*>(*owner), Q_GetHandleSize(owner.get()));
+    std::unique_ptr<char*, CKFp_FreePtr> const owner(std::exchange(*handle, nullptr));
+    CKFp_Bytes const bytes(reinterpret_cast<unsigned char const*>(*owner), Q_GetHandleSize(owner.get()));
     if (bytes.size() >= sizeof Utf8Mark && std::equal(std::begin(Utf8Mark), std::end(Utf8Mark), bytes.begin()))
         return CKFp_FromUtf8(bytes.subspan(sizeof Utf8Mark));
     return encoding && *encoding == CKF_TextEncoding_Latin1 ? FromLatin1(bytes) : CKFp_FromUtf8(bytes);

@@ -28,9 +28,9 @@ CKF_ChunkWalk::CKF_ChunkWalk(std::span<unsigned char const> bytes) noexcept : by
 
 bool CKF_ChunkWalk::Next(CKF_RawChunk* chunk) noexcept
 {
-    const auto limit = [&] { return open_ > 0 ? ends_[open_ - 1] : bytes_.size(); };
+    auto const limit = [&] { return open_ > 0 ? ends_[open_ - 1] : bytes_.size(); };
     while (open_ > 0 && position_ >= limit()) {
-        const std::uint64_t end = ends_[--open_];
+        std::uint64_t const end = ends_[--open_];
         // Chunks begin at even places, so one with an odd end is followed by padding, as far as its parent has any.
         position_ = std::min<std::uint64_t>(end + (end & 1), limit());
     }
@@ -39,9 +39,9 @@ bool CKF_ChunkWalk::Next(CKF_RawChunk* chunk) noexcept
     CKFp_Chunk parsed;
     char const* problem =
         open_ == 0 ? ParseOutermost(bytes_, position_, &parsed) : ParseInner(bytes_, position_, limit(), &parsed);
-    const bool holdsChunks =
+    bool const holdsChunks =
         parsed.id == (open_ == 0 ? CKFp_FormId : CKF_ListId) && parsed.data >= parsed.offset + CKFp_ListHeaderSize;
-    const bool tooDeep = holdsChunks && open_ > CKF_MaxDepth;
+    bool const tooDeep = holdsChunks && open_ > CKF_MaxDepth;
     if (tooDeep && !problem) problem = "nested too deeply";
 
     *chunk = {parsed.id,      parsed.listType, parsed.offset,

@@ -2,7 +2,7 @@
 
 int CKFp_Writer::CheckRoom(std::uint64_t size)
 {
-    const std::uint64_t present = sink_->Size();
+    std::uint64_t const present = sink_->Size();
     if (present > maxSize_ || size > maxSize_ - present)
         return failure_.Set(CKF_Err_TooBig, present, "the project doesn't fit into a file of %u bytes", maxSize_);
     return 0;
@@ -14,24 +14,24 @@ int CKFp_Writer::Start()
     CKFp_PutHeader(prelude, CKFp_FormId, 0);
     CKFp_Put32(prelude + CKFp_HeaderSize, static_cast<std::uint32_t>(CKFp_FormType));
     CKFp_PutHeader(prelude + CKFp_ListHeaderSize, CKFp_VersionId, CKFp_VersionSize);
-    if (const int code = CheckRoom(sizeof prelude)) return code;
+    if (int const code = CheckRoom(sizeof prelude)) return code;
     return Append(prelude, sizeof prelude);
 }
 
 int CKFp_Writer::Commit(CKFp_Version const& version)
 {
     if (open_ > 0) return failure_.Set(CKF_Err_Unbalanced, sink_->Size(), "%d lists were not closed", open_);
-    if (const int code = PatchLength(CKFp_ListHeaderSize)) return code;
+    if (int const code = PatchLength(CKFp_ListHeaderSize)) return code;
     unsigned char record[CKFp_VersionSize];
     CKFp_PutVersion(record, version);
-    if (const int code = sink_->Patch(CKFp_VersionOffset, record, sizeof record)) return code;
+    if (int const code = sink_->Patch(CKFp_VersionOffset, record, sizeof record)) return code;
     return sink_->Commit();
 }
 
 int CKFp_Writer::BeginAtom(int id, std::uint64_t size)
 {
     if (!CKFp_IsAtomId(id)) return failure_.SetBadAtomId(id, sink_->Size());
-    if (const int code = CheckRoom(CKFp_HeaderSize + size + (size & 1))) return code;
+    if (int const code = CheckRoom(CKFp_HeaderSize + size + (size & 1))) return code;
     unsigned char header[CKFp_HeaderSize];
     CKFp_PutHeader(header, id, static_cast<std::uint32_t>(size));
     return Append(header, sizeof header);
@@ -48,12 +48,12 @@ int CKFp_Writer::BeginList(int listType, CKF_ChunkInfo* chunk)
     if (listType == 0) return failure_.Set(CKF_Err_BadArgument, sink_->Size(), "a list without a type");
     if (open_ == CKF_MaxDepth)
         return failure_.Set(CKF_Err_TooDeep, sink_->Size(), "the project nests more than %d lists", CKF_MaxDepth);
-    if (const int code = CheckRoom(CKFp_ListHeaderSize)) return code;
+    if (int const code = CheckRoom(CKFp_ListHeaderSize)) return code;
     unsigned char header[CKFp_ListHeaderSize];
     CKFp_PutHeader(header, CKF_ListId, 0);
     CKFp_Put32(header + CKFp_HeaderSize, static_cast<std::uint32_t>(listType));
-    if (const int code = Append(header, sizeof header)) return code;
-    const std::uint32_t data = static_cast<std::uint32_t>(sink_->Size());
+    if (int const code = Append(header, sizeof header)) return code;
+    std::uint32_t const data = static_cast<std::uint32_t>(sink_->Size());
     data_[static_cast<std::size_t>(open_++)] = data;
     *chunk = {data, CKF_ListId, 0, listType, open_};
     return 0;
@@ -71,7 +71,7 @@ int CKFp_Writer::EndList(CKF_ChunkInfo* chunk)
 {
     if (open_ == 0 || chunk->depth != open_ || chunk->offset != data_[static_cast<std::size_t>(open_ - 1)])
         return failure_.Set(CKF_Err_Unbalanced, sink_->Size(), "a list is closed that isn't the innermost open one");
-    if (const int code = PatchLength(chunk->offset)) return code;
+    if (int const code = PatchLength(chunk->offset)) return code;
     --open_;
     chunk->size = static_cast<std::uint32_t>(sink_->Size() - chunk->offset);
     return 0;

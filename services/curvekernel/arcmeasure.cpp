@@ -16,25 +16,25 @@
 namespace {
 
 // Speed may be off by this share inside a piece, whatever the accuracy asked for.
-constexpr double kSpeedTolerance = 3e-4;
+constexpr double SpeedTolerance = 3e-4;
 
 // A stretch shorter than this share of the control polygon is a step that nobody sees: it isn't cut further, and a
 // place whose slow surroundings are that short counts as standing still.
-constexpr double kNegligible = 1e-7;
+constexpr double Negligible = 1e-7;
 
 // The smallest accuracy that is worth pieces, as a share of the control polygon.
-constexpr double kFinestAccuracy = 1e-9;
+constexpr double FinestAccuracy = 1e-9;
 
 // Positions between two samples of the speed error stay below this share of its maximum times the piece's length: the
 // error of a Hermite quintic, v^3 (1-v)^3, stands at 0.29 of its steepest slope. What a piece may use of the accuracy
 // leaves the rest to the errors that the samples don't see, and to those of the lengths.
-constexpr double kErrorShare = 0.35;
-constexpr double kSteepest = 0.276;
-constexpr double kAccuracyShare = 0.4;
+constexpr double ErrorShare = 0.35;
+constexpr double Steepest = 0.276;
+constexpr double AccuracyShare = 0.4;
 
 // What differs by less than this share differs by rounding. A line that doesn't turn back is as long as its chord, so
 // that whole numbers stay whole.
-constexpr double kRounding = 1e-14;
+constexpr double RoundingShare = 1e-14;
 
 // The squared speed q0 + q1 t + ... + q4 t^4. Rounding is 1e-16 of the largest coefficient, in the speed less than what
 // makes a standstill.
@@ -44,7 +44,7 @@ public:
 
     double At(double t) const
     {
-        const double square = (((q_[4] * t + q_[3]) * t + q_[2]) * t + q_[1]) * t + q_[0];
+        double const square = (((q_[4] * t + q_[3]) * t + q_[2]) * t + q_[1]) * t + q_[0];
         return square > 0.0 ? square : 0.0;
     }
     // The derivatives by t, the first and second halved, the third by 6.
@@ -55,14 +55,14 @@ public:
     // The length from one parameter to another, by Gauss and Legendre's five points.
     double Length(double from, double to) const
     {
-        constexpr double kInner = 0.53846931010568309104, kOuter = 0.90617984593866399280;
-        constexpr double kInnerWeight = 0.47862867049936646804, kOuterWeight = 0.23692688505618908751;
-        constexpr double kMiddleWeight = 0.56888888888888888889;
-        const double half = 0.5 * (to - from);
-        const double middle = from + half;
-        const double outer = std::sqrt(At(middle - kOuter * half)) + std::sqrt(At(middle + kOuter * half));
-        const double inner = std::sqrt(At(middle - kInner * half)) + std::sqrt(At(middle + kInner * half));
-        return half * (kMiddleWeight * std::sqrt(At(middle)) + (kInnerWeight * inner + kOuterWeight * outer));
+        constexpr double Inner = 0.53846931010568309104, Outer = 0.90617984593866399280;
+        constexpr double InnerWeight = 0.47862867049936646804, OuterWeight = 0.23692688505618908751;
+        constexpr double MiddleWeight = 0.56888888888888888889;
+        double const half = 0.5 * (to - from);
+        double const middle = from + half;
+        double const outer = std::sqrt(At(middle - Outer * half)) + std::sqrt(At(middle + Outer * half));
+        double const inner = std::sqrt(At(middle - Inner * half)) + std::sqrt(At(middle + Inner * half));
+        return half * (MiddleWeight * std::sqrt(At(middle)) + (InnerWeight * inner + OuterWeight * outer));
     }
 
     // The slowest places inside, ascending: at most two.
@@ -71,11 +71,11 @@ public:
         // Between the turns of the slope it has one root at most.
         double bounds[4] = {0.0, 0.0, 0.0, 0.0};
         int count = 1;
-        const double a = 6.0 * q_[4], b = 1.5 * q_[3], c = q_[2];  // a t^2 + 2 b t + c
-        const double discriminant = b * b - a * c;
+        double const a = 6.0 * q_[4], b = 1.5 * q_[3], c = q_[2];  // a t^2 + 2 b t + c
+        double const discriminant = b * b - a * c;
         if (discriminant > 0.0) {
-            const double root = std::sqrt(discriminant);
-            const double q = b < 0.0 ? root - b : -(root + b);
+            double const root = std::sqrt(discriminant);
+            double const q = b < 0.0 ? root - b : -(root + b);
             double first = q / a;
             double second = c / q;
             if (second < first) std::swap(first, second);
@@ -96,7 +96,7 @@ private:
     {
         double t = low + 0.5 * (high - low);
         for (int step = 0; step < 60; ++step) {
-            const double f = HalfSlope(t);
+            double const f = HalfSlope(t);
             if (f < 0.0)
                 low = t;
             else
@@ -137,23 +137,23 @@ class Cutter {
 public:
     explicit Cutter(double const (&inputs)[CRVp_ArcInputs])
         : speed_(inputs),
-          loadByShift_(kErrorShare / (kAccuracyShare * inputs[6])),
+          loadByShift_(ErrorShare / (AccuracyShare * inputs[6])),
           polygon_(inputs[5]),
-          negligible_(CRVp_Min(kNegligible * inputs[5], 0.1 * inputs[6]))
+          negligible_(CRVp_Min(Negligible * inputs[5], 0.1 * inputs[6]))
     {}
 
     void Run()
     {
-        const Place start = PlaceAt(0.0);
-        const Place end = PlaceAt(1.0);
+        Place const start = PlaceAt(0.0);
+        Place const end = PlaceAt(1.0);
         double slow[2];
-        const int count = speed_.Slowest(slow);
+        int const count = speed_.Slowest(slow);
         knots_[0] = start.knot;
         Place from = start;
         for (int i = 0; i < count; ++i) {
-            const Place at = PlaceAt(slow[i]);
+            Place const at = PlaceAt(slow[i]);
             // A gentle minimum needs no cut.
-            if (at.square > kSharp * CRVp_Max(start.square, end.square)) continue;
+            if (at.square > Sharp * CRVp_Max(start.square, end.square)) continue;
             CutStretch(from, at);
             from = at;
         }
@@ -169,7 +169,7 @@ public:
         double* word = starts + count;
         double s = 0.0;
         int at = 0;
-        const auto put = [&](CRVp_ArcKnot const& knot) {
+        auto const put = [&](CRVp_ArcKnot const& knot) {
             starts[at++] = s;
             *word++ = knot.t;
             *word++ = knot.slope;
@@ -181,55 +181,55 @@ public:
             s += lengths_[i];
         }
         // Next to the polygon's length the path is a line that doesn't turn back, up to far less than any accuracy.
-        if (std::fabs(polygon_ - s) <= 0.1 * kFinestAccuracy * polygon_) s = polygon_;
+        if (std::fabs(polygon_ - s) <= 0.1 * FinestAccuracy * polygon_) s = polygon_;
         put(straight_[count_ - 1] ? CRVp_ArcKnot{1.0, 0.0, 0.0} : knots_[count_]);
     }
 
 private:
-    static constexpr int kMostPieces = CRVp_MostArcKnots / 3 * 2 - 1;  // each second knot may be kept twice
-    static constexpr int kKeptBack = 8;                                // pieces for the stretches that come
-    static constexpr int kMostTrials = 4 * kMostPieces;
-    static constexpr double kSharp = 0.05;
-    static constexpr double kAside = 1e-3;  // 3e-4 of the speed from some ten-thousandth of the path on
+    static constexpr int MostPieces = CRVp_MostArcKnots / 3 * 2 - 1;  // each second knot may be kept twice
+    static constexpr int KeptBack = 8;                                // pieces for the stretches that come
+    static constexpr int MostTrials = 4 * MostPieces;
+    static constexpr double Sharp = 0.05;
+    static constexpr double Aside = 1e-3;  // 3e-4 of the speed from some ten-thousandth of the path on
 
     // The end of a curved piece and the start of a straight one are two knots.
     bool IsKeptTwice(int i) const { return straight_[i] && !straight_[i - 1]; }
 
     Place PlaceAt(double t) const
     {
-        const double square = speed_.At(t);
-        const double halfSlope = speed_.HalfSlope(t);
-        const double halfBend = speed_.HalfBend(t);
+        double const square = speed_.At(t);
+        double const halfSlope = speed_.HalfSlope(t);
+        double const halfBend = speed_.HalfBend(t);
         // Near its minimum the speed is sqrt(square + halfBend tau^2), which is slow over square / sqrt(halfBend). At an
         // end of the path the minimum may lie aside, twice the way to it being halfSlope^2 / halfBend^1.5. What the
         // standstill is off by that way falls only with the distance's square root, so it has to be far shorter.
-        const double slow = 0.25 * negligible_;
-        const double aside = kAside * slow;
-        const double squaredSlope = halfSlope * halfSlope;
+        double const slow = 0.25 * negligible_;
+        double const aside = Aside * slow;
+        double const squaredSlope = halfSlope * halfSlope;
         if (halfBend > 0.0 && square * square <= slow * slow * halfBend &&
             squaredSlope * squaredSlope <= aside * aside * halfBend * halfBend * halfBend) {
-            const double first = std::sqrt(halfBend);
-            const double sixthJerk = speed_.SixthJerk(t);
-            const double second = sixthJerk / first;
-            const CRVp_ArcKnot knot{t, -std::sqrt(2.0 / first), -(second / first) * (2.0 / first) / 3.0};
-            return {knot, 0.0, 0.0, first, second, halfBend / CRVp_Max(std::fabs(sixthJerk), halfBend / kFarthest)};
+            double const first = std::sqrt(halfBend);
+            double const sixthJerk = speed_.SixthJerk(t);
+            double const second = sixthJerk / first;
+            CRVp_ArcKnot const knot{t, -std::sqrt(2.0 / first), -(second / first) * (2.0 / first) / 3.0};
+            return {knot, 0.0, 0.0, first, second, halfBend / CRVp_Max(std::fabs(sixthJerk), halfBend / Farthest)};
         }
-        const double speed = std::sqrt(square);
-        const double inverse = 1.0 / speed;
-        const double first = halfSlope * inverse;
-        const double way = std::fabs(first) + RoughRoot<2>(first * first + std::fabs(halfBend));
+        double const speed = std::sqrt(square);
+        double const inverse = 1.0 / speed;
+        double const first = halfSlope * inverse;
+        double const way = std::fabs(first) + RoughRoot<2>(first * first + std::fabs(halfBend));
         // 0 over 0 where the speed vanishes like the square of t, or more; nothing is known there.
-        const double reach = speed > kFarthest * way ? kFarthest : square > 0.0 ? speed / way : 0.25;
-        const CRVp_ArcKnot knot{t, inverse, -(first * inverse) * inverse * inverse};
+        double const reach = speed > Farthest * way ? Farthest : square > 0.0 ? speed / way : 0.25;
+        CRVp_ArcKnot const knot{t, inverse, -(first * inverse) * inverse * inverse};
         return {knot, square, speed, first, (halfBend - first * first) * inverse, reach};
     }
 
     // From a slow end towards a fast one; from both ends where the middle is faster than either.
     void CutStretch(Place const& from, Place const& to)
     {
-        const double middle = from.knot.t + 0.5 * (to.knot.t - from.knot.t);
-        if (CRVp_Max(from.square, to.square) <= kSharp * speed_.At(middle)) {
-            const Place between = PlaceAt(middle);
+        double const middle = from.knot.t + 0.5 * (to.knot.t - from.knot.t);
+        if (CRVp_Max(from.square, to.square) <= Sharp * speed_.At(middle)) {
+            Place const between = PlaceAt(middle);
             Walk<true>(from, between);
             WalkBack(between, to);
         } else if (from.square <= to.square) {
@@ -242,7 +242,7 @@ private:
     // The pieces from `from` to `to`, found from `to` on.
     void WalkBack(Place const& from, Place const& to)
     {
-        const int first = count_;
+        int const first = count_;
         Walk<false>(to, from);
         std::reverse(lengths_ + first, lengths_ + count_);
         std::reverse(straight_ + first, straight_ + count_);
@@ -258,34 +258,34 @@ private:
     template <bool forward>
     void Walk(Place near, Place const& goal)
     {
-        double share = kFirstShare;
-        double laterShare = kFirstShare;
+        double share = FirstShare;
+        double laterShare = FirstShare;
         for (bool arrived = false; !arrived;) {
-            const double rest = std::fabs(goal.knot.t - near.knot.t);
-            const double step = share * near.reach;
-            const bool forced = count_ >= kMostPieces - kKeptBack || trials_ >= kMostTrials;
-            const bool last = forced || rest <= step;
+            double const rest = std::fabs(goal.knot.t - near.knot.t);
+            double const step = share * near.reach;
+            bool const forced = count_ >= MostPieces - KeptBack || trials_ >= MostTrials;
+            bool const last = forced || rest <= step;
             // The last steps are equal, so that none is a sliver.
-            const double h = last ? rest : rest < 4.0 * step ? rest / (1 + static_cast<int>(rest / step)) : step;
-            const Place far = last ? goal : PlaceAt(forward ? near.knot.t + h : near.knot.t - h);
+            double const h = last ? rest : rest < 4.0 * step ? rest / (1 + static_cast<int>(rest / step)) : step;
+            Place const far = last ? goal : PlaceAt(forward ? near.knot.t + h : near.knot.t - h);
             ++trials_;
             Place const& from = forward ? near : far;
             Place const& to = forward ? far : near;
-            const double length = speed_.Length(from.knot.t, to.knot.t);
-            const bool straight = forced || length <= negligible_;
-            const double load = straight ? 0.0 : Load(from, to, length);
-            const double taken = h / near.reach;
+            double const length = speed_.Length(from.knot.t, to.knot.t);
+            bool const straight = forced || length <= negligible_;
+            double const load = straight ? 0.0 : Load(from, to, length);
+            double const taken = h / near.reach;
             if (load <= 1.0) {
                 straight_[count_] = straight;
                 lengths_[count_] = length;
                 knots_[++count_] = far.knot;
                 near = far;
                 arrived = last;
-                share = straight ? kFirstShare : laterShare;
-                laterShare = straight ? kFirstShare
-                                      : taken * CRVp_Min(kMostGrowth, kCaution * RoughRoot<6>(1.0 / (load + 1e-6)));
-            } else if (load < kUnknown) {
-                share = taken * CRVp_Min(0.8, kCaution * RoughRoot<6>(1.0 / load));
+                share = straight ? FirstShare : laterShare;
+                laterShare =
+                    straight ? FirstShare : taken * CRVp_Min(MostGrowth, Caution * RoughRoot<6>(1.0 / (load + 1e-6)));
+            } else if (load < Unknown) {
+                share = taken * CRVp_Min(0.8, Caution * RoughRoot<6>(1.0 / load));
                 laterShare = share;
             } else {
                 near.reach *= 0.25 * CRVp_Min(1.0, taken);  // less is known there than it seemed
@@ -293,42 +293,42 @@ private:
         }
     }
 
-    // What a piece uses of what it may be off by; above 1 it is too long. kUnknown where it isn't known at all.
+    // What a piece uses of what it may be off by; above 1 it is too long. Unknown where it isn't known at all.
     double Load(Place const& from, Place const& to, double length) const
     {
-        constexpr double kOneIn120 = 1.0 / 120.0;
-        if (from.IsStill() && to.IsStill()) return kUnknown;
+        constexpr double OneIn120 = 1.0 / 120.0;
+        if (from.IsStill() && to.IsStill()) return Unknown;
 
         // The integral by the end values is of the order of the quintic, Gauss's far better: where they agree this well
         // there is nothing between the samples that either has missed.
-        const double h = to.knot.t - from.knot.t;
-        const double toSign = to.IsStill() ? -1.0 : 1.0;
-        const double byEnds =
+        double const h = to.knot.t - from.knot.t;
+        double const toSign = to.IsStill() ? -1.0 : 1.0;
+        double const byEnds =
             h * (0.5 * (from.speed + to.speed) +
-                 h * (0.1 * (from.first - toSign * to.first) + h * kOneIn120 * (from.second + toSign * to.second)));
-        if (!(std::fabs(byEnds - length) <= kSpeedTolerance * length)) return kUnknown;
+                 h * (0.1 * (from.first - toSign * to.first) + h * OneIn120 * (from.second + toSign * to.second)));
+        if (!(std::fabs(byEnds - length) <= SpeedTolerance * length)) return Unknown;
 
-        const bool root = from.IsStill() || to.IsStill();
-        const CRVp_ArcQuintic t = !root            ? CRVp_EvenQuintic(from.knot, to.knot, length)
+        bool const root = from.IsStill() || to.IsStill();
+        CRVp_ArcQuintic const t = !root            ? CRVp_EvenQuintic(from.knot, to.knot, length)
                                   : from.IsStill() ? CRVp_RootQuintic(from.knot, to.knot, length, 1.0)
                                                    : CRVp_RootQuintic(to.knot, from.knot, length, -1.0);
-        const double inverse = 1.0 / (length * length);
+        double const inverse = 1.0 / (length * length);
         double worst = 0.0;
-        for (const double r : {kSteepest, 1.0 - kSteepest}) {
-            const double slope = t.SlopeAt(r);
-            const double even = root ? inverse / (4.0 * r * r) : inverse;
-            const double error = 0.5 * std::fabs(slope * slope * speed_.At(t.At(r)) * even - 1.0);
-            if (!(error < 1.0)) return kUnknown;
+        for (double const r : {Steepest, 1.0 - Steepest}) {
+            double const slope = t.SlopeAt(r);
+            double const even = root ? inverse / (4.0 * r * r) : inverse;
+            double const error = 0.5 * std::fabs(slope * slope * speed_.At(t.At(r)) * even - 1.0);
+            if (!(error < 1.0)) return Unknown;
             worst = CRVp_Max(worst, error);
         }
-        return CRVp_Min(0.5 * kUnknown, worst * CRVp_Max(1.0 / kSpeedTolerance, length * loadByShift_));
+        return CRVp_Min(0.5 * Unknown, worst * CRVp_Max(1.0 / SpeedTolerance, length * loadByShift_));
     }
 
-    static constexpr double kUnknown = 1e5;
-    static constexpr double kFarthest = 4.0;  // more is as good as everywhere
-    static constexpr double kFirstShare = 0.6;
-    static constexpr double kMostGrowth = 3.0;
-    static constexpr double kCaution = 0.9;
+    static constexpr double Unknown = 1e5;
+    static constexpr double Farthest = 4.0;  // more is as good as everywhere
+    static constexpr double FirstShare = 0.6;
+    static constexpr double MostGrowth = 3.0;
+    static constexpr double Caution = 0.9;
 
     SquaredSpeed speed_;
     double loadByShift_;  // of a speed error along the piece's length
@@ -336,9 +336,9 @@ private:
     double negligible_;
     int count_ = 0;
     int trials_ = 0;
-    CRVp_ArcKnot knots_[kMostPieces + 1];
-    double lengths_[kMostPieces];
-    bool straight_[kMostPieces];
+    CRVp_ArcKnot knots_[MostPieces + 1];
+    double lengths_[MostPieces];
+    bool straight_[MostPieces];
 };
 
 // A power of two that brings the coordinates to where no product of squares overflows or vanishes; 1 for nearly all.
@@ -347,12 +347,12 @@ double ScaleFor(CRV_Curve const* curve)
 {
     double step = 0.0;
     for (int i = 0; i < curve->dimension; ++i) {
-        const double low = CRVp_Min(CRVp_Min(curve->p0[i], curve->p1[i]), CRVp_Min(curve->p2[i], curve->p3[i]));
-        const double high = CRVp_Max(CRVp_Max(curve->p0[i], curve->p1[i]), CRVp_Max(curve->p2[i], curve->p3[i]));
+        double const low = CRVp_Min(CRVp_Min(curve->p0[i], curve->p1[i]), CRVp_Min(curve->p2[i], curve->p3[i]));
+        double const high = CRVp_Max(CRVp_Max(curve->p0[i], curve->p1[i]), CRVp_Max(curve->p2[i], curve->p3[i]));
         step = CRVp_Max(step, 0.5 * high - 0.5 * low);
     }
     if (step == 0.0 || (step > 0x1p-100 && step < 0x1p100)) return 1.0;
-    const int exponent = std::ilogb(step) / 2 * 2;
+    int const exponent = std::ilogb(step) / 2 * 2;
     return std::ldexp(1.0, -std::clamp(exponent, -1000, 1000));
 }
 
@@ -360,7 +360,7 @@ double SquaredChord(CRV_Curve const* curve, double scale)
 {
     double squares = 0.0;
     for (int i = 0; i < curve->dimension; ++i) {
-        const double step = scale * curve->p3[i] - scale * curve->p0[i];
+        double const step = scale * curve->p3[i] - scale * curve->p0[i];
         squares += step * step;
     }
     return squares;
@@ -370,10 +370,10 @@ double SquaredChord(CRV_Curve const* curve, double scale)
 
 int CRVp_PrepareArc(CRV_Curve const* curve, double accuracy, CRVp_ArcMeasured& measured)
 {
-    if (const int code = CRVp_CheckPath(curve)) return code;
+    if (int const code = CRVp_CheckPath(curve)) return code;
     if (!CRVp_AllFinite(curve)) return CRV_Err_NotFinite;
 
-    const double scale = ScaleFor(curve);
+    double const scale = ScaleFor(curve);
     double const* const points[] = {curve->p0, curve->p1, curve->p2, curve->p3};
     double steps[3][CRVp_MostCurveDimensions];
     double polygon = 0.0;
@@ -388,9 +388,9 @@ int CRVp_PrepareArc(CRV_Curve const* curve, double accuracy, CRVp_ArcMeasured& m
     // The derivative by t is g0 + g1 t + g2 t^2.
     double q0 = 0.0, q1 = 0.0, q2 = 0.0, q3 = 0.0, q4 = 0.0;
     for (int i = 0; i < curve->dimension; ++i) {
-        const double g0 = 3.0 * steps[0][i];
-        const double g1 = 6.0 * (steps[1][i] - steps[0][i]);
-        const double g2 = 3.0 * ((steps[2][i] - steps[1][i]) - (steps[1][i] - steps[0][i]));
+        double const g0 = 3.0 * steps[0][i];
+        double const g1 = 6.0 * (steps[1][i] - steps[0][i]);
+        double const g2 = 3.0 * ((steps[2][i] - steps[1][i]) - (steps[1][i] - steps[0][i]));
         q0 += g0 * g0;
         q1 += g0 * g1;
         q2 += g1 * g1 + 2.0 * g0 * g2;
@@ -399,15 +399,15 @@ int CRVp_PrepareArc(CRV_Curve const* curve, double accuracy, CRVp_ArcMeasured& m
     }
     q1 *= 2.0;
     q3 *= 2.0;
-    const double squaredChord = SquaredChord(curve, scale);
-    const double chord = std::sqrt(squaredChord);
-    if (polygon - chord <= kRounding * polygon) polygon = chord;
-    if (std::fabs(q1) + std::fabs(q2) + std::fabs(q3) + std::fabs(q4) <= kRounding * q0) {
+    double const squaredChord = SquaredChord(curve, scale);
+    double const chord = std::sqrt(squaredChord);
+    if (polygon - chord <= RoundingShare * polygon) polygon = chord;
+    if (std::fabs(q1) + std::fabs(q2) + std::fabs(q3) + std::fabs(q4) <= RoundingShare * q0) {
         q0 = squaredChord;
         q1 = q2 = q3 = q4 = 0.0;
     }
-    const double finest = kFinestAccuracy * polygon;
-    const double asked = accuracy * scale;
+    double const finest = FinestAccuracy * polygon;
+    double const asked = accuracy * scale;
     measured = {scale, {q0, q1, q2, q3, q4, polygon, asked > finest ? asked : finest}};
     return 0;
 }
@@ -417,8 +417,8 @@ int CRVp_MeasureArc(CRVp_ArcMeasured const& measured, CRVp_ArcTable& table)
     double const* const q = measured.inputs;
     if (q[1] == 0.0 && q[2] == 0.0 && q[3] == 0.0 && q[4] == 0.0) {
         // One straight piece; of a path without length only its end is ever asked for, which is its start then.
-        const double length = std::sqrt(q[0]);
-        const double even[] = {0.0, length, 0.0, 0.0, 0.0, length > 0.0 ? 1.0 : 0.0, 0.0, 0.0};
+        double const length = std::sqrt(q[0]);
+        double const even[] = {0.0, length, 0.0, 0.0, 0.0, length > 0.0 ? 1.0 : 0.0, 0.0, 0.0};
         std::copy(std::begin(even), std::end(even), table.words + 1);
         table.items = CRVp_FewestArcItems;
     } else {

@@ -31,9 +31,9 @@ bool IsTableOf(SEQ_Head const* const* list, CRVp_ArcMeasured const& measured)
 // failure the list is what it was.
 int PutIntoList(CRVp_ArcTable const& table, SEQ_Head**& list)
 {
-    const bool fits = list && WordsOf(list) && (*list)->capacity >= table.items && (*list)->capacity <= 2 * table.items;
+    bool const fits = list && WordsOf(list) && (*list)->capacity >= table.items && (*list)->capacity <= 2 * table.items;
     SEQ_Head** into = list;
-    const int code =
+    int const code =
         fits ? SEQ_SetNumItems(table.items, list, 0) : SEQp_NewInOneBlock(sizeof(CRVp_ArcItem), table.items, &into);
     if (code != 0) return code;
     std::memcpy((*into)->items, table.words, static_cast<std::size_t>(table.items) * sizeof(CRVp_ArcItem));
@@ -87,8 +87,8 @@ int CRV_TFromSSpline(CRV_Curve const* curve, SEQ_Head*** remapTable, double* t, 
 
     CRVp_ArcMeasured measured;
     CRVp_ArcTable table;
-    if (const int code = CRVp_PrepareArc(curve, 0.0, measured)) return code;
-    if (const int code = CRVp_MeasureArc(measured, table)) return code;
+    if (int const code = CRVp_PrepareArc(curve, 0.0, measured)) return code;
+    if (int const code = CRVp_MeasureArc(measured, table)) return code;
     *t = one * CRVp_TAtDistance(table.words, table.items, s);
     return 0;
 }

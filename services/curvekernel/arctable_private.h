@@ -47,10 +47,10 @@ inline constexpr int CRVp_MostArcKnots = 512;
 // on `s`.
 inline int CRVp_ArcPieceAt(double const* starts, int count, double s)
 {
-    constexpr int kCounted = 16;
+    constexpr int Counted = 16;
     int first = 0;
-    while (count > kCounted) {
-        const int half = count / 2;
+    while (count > Counted) {
+        int const half = count / 2;
         first += starts[first + half] <= s ? half : 0;
         count -= half;
     }
@@ -68,9 +68,9 @@ struct CRVp_ArcQuintic {
           slope(d0),
           halfBend(0.5 * dd0)
     {
-        const double rise = f1 - f0 - d0 - halfBend;
-        const double change = d1 - d0 - dd0;
-        const double bend = dd1 - dd0;
+        double const rise = f1 - f0 - d0 - halfBend;
+        double const change = d1 - d0 - dd0;
+        double const bend = dd1 - dd0;
         // The three have the same pattern of signs on purpose: where signs alternate, gcc 12 fuses multiplication and
         // addition on machines that can, also under -ffp-contract=off, and the bits would depend on the machine.
         third = 10.0 * rise - 4.0 * change + 0.5 * bend;
@@ -79,12 +79,12 @@ struct CRVp_ArcQuintic {
     }
     double At(double r) const
     {
-        const double rr = r * r;
+        double const rr = r * r;
         return (value + slope * r) + rr * (halfBend + r * (third + r * (fifth * r - fourth)));
     }
     double SlopeAt(double r) const
     {
-        const double rr = r * r;
+        double const rr = r * r;
         return (slope + 2.0 * halfBend * r) + rr * (3.0 * third + r * (5.0 * fifth * r - 4.0 * fourth));
     }
 };
@@ -101,7 +101,7 @@ inline CRVp_ArcQuintic CRVp_EvenQuintic(CRVp_ArcKnot const& from, CRVp_ArcKnot c
 inline CRVp_ArcQuintic CRVp_RootQuintic(CRVp_ArcKnot const& still, CRVp_ArcKnot const& moving, double length,
                                         double side)
 {
-    const double end = side * 2.0 * length * moving.slope;
+    double const end = side * 2.0 * length * moving.slope;
     return {still.t, -side * still.slope * std::sqrt(length),    still.bend * length, moving.t,
             end,     end + 4.0 * (moving.bend * length * length)};
 }
@@ -118,18 +118,18 @@ inline double CRVp_ArcLength(double const* words, int items)
 // The parameter at s in a table's items: any s that isn't NaN.
 inline double CRVp_TAtDistance(double const* words, int items, double s)
 {
-    const int count = items - CRVp_ArcItemsBesideKnots;
+    int const count = items - CRVp_ArcItemsBesideKnots;
     double const* const starts = words + 1;
     auto const* const knots = reinterpret_cast<CRVp_ArcKnot const*>(starts + count);
 
     s *= words[0];
     if (s >= starts[count - 1]) return knots[count - 1].t;
     if (s <= 0.0) return 0.0;
-    const int piece = CRVp_ArcPieceAt(starts, count - 1, s);
+    int const piece = CRVp_ArcPieceAt(starts, count - 1, s);
     CRVp_ArcKnot const& from = knots[piece];
     CRVp_ArcKnot const& to = knots[piece + 1];
-    const double length = starts[piece + 1] - starts[piece];
-    const double r = (s - starts[piece]) / length;  // a piece without length is never found
+    double const length = starts[piece + 1] - starts[piece];
+    double const r = (s - starts[piece]) / length;  // a piece without length is never found
 
     double t = 0.0;
     if ((from.slope > 0.0) & (to.slope > 0.0)) [[likely]]

@@ -39,6 +39,6 @@ inline bool CRVp_AllFinite(CRV_Curve const* curve)
 // Between a and b at share t, exact at both ends and where the two are equal, without overflow.
 inline double CRVp_Between(double a, double b, double t)
 {
-    const double value = (1.0 - t) * a + t * b;
+    double const value = (1.0 - t) * a + t * b;
     return CRVp_Max(CRVp_Min(a, b), CRVp_Min(CRVp_Max(a, b), value));
 }

@@ -19,23 +19,23 @@ struct Handle {
 
 bool IsMonotone(double a, double d)
 {
-    constexpr double kBeyondEllipse = 1.5;
-    return a >= 0.0 && d >= 0.0 && a < kBeyondEllipse && d < kBeyondEllipse && a + d - 1.0 <= std::sqrt(a * d);
+    constexpr double BeyondEllipse = 1.5;
+    return a >= 0.0 && d >= 0.0 && a < BeyondEllipse && d < BeyondEllipse && a + d - 1.0 <= std::sqrt(a * d);
 }
 
 // The largest A that goes with D, for D from 0 to 1: the bigger root of A - sqrt(D) sqrt(A) + D - 1.
 double LargestBeside(double d)
 {
-    const double root = 0.5 * (std::sqrt(d) + std::sqrt(4.0 - 3.0 * d));
+    double const root = 0.5 * (std::sqrt(d) + std::sqrt(4.0 - 3.0 * d));
     return root * root;
 }
 
 // The handle's height as a share of the rise. Infinite where that doesn't fit.
 double Share(Handle const& handle)
 {
-    const double rise = handle.opposite[1] - handle.own[1];
+    double const rise = handle.opposite[1] - handle.own[1];
     if (CRVp_IsFinite(rise)) return (handle.point[1] - handle.own[1]) / rise;
-    const double origin = 0.25 * handle.own[1];
+    double const origin = 0.25 * handle.own[1];
     return (0.25 * handle.point[1] - origin) / (0.25 * handle.opposite[1] - origin);
 }
 
@@ -56,9 +56,9 @@ void Shorten(Handle const& handle, double share)
 // is left where a height past it doesn't fit a double.
 void ShortenBeside(Handle const& handle, Handle const& other)
 {
-    const double x = handle.point[0];
-    const double y = handle.point[1];
-    const double d = Share(other);
+    double const x = handle.point[0];
+    double const y = handle.point[1];
+    double const d = Share(other);
     double share = LargestBeside(d);
     for (double back = 0x1p-52; back < 0x1p-40; back *= 2.0) {
         Shorten(handle, share);
@@ -72,8 +72,8 @@ void ShortenBeside(Handle const& handle, Handle const& other)
 
 bool MoveHandles(CRV_Curve* curve)
 {
-    const Handle out{curve->p1, curve->p0, curve->p3};
-    const Handle in{curve->p2, curve->p3, curve->p0};
+    Handle const out{curve->p1, curve->p0, curve->p3};
+    Handle const in{curve->p2, curve->p3, curve->p0};
     if (curve->p0[1] == curve->p3[1]) {
         Flatten(out);
         Flatten(in);
@@ -83,8 +83,8 @@ bool MoveHandles(CRV_Curve* curve)
 
     if (Share(out) < 0.0) Flatten(out);
     if (Share(in) < 0.0) Flatten(in);
-    const bool outIsLong = Share(out) > 1.0;
-    const bool inIsLong = Share(in) > 1.0;
+    bool const outIsLong = Share(out) > 1.0;
+    bool const inIsLong = Share(in) > 1.0;
     if (outIsLong && inIsLong) {
         Shorten(out, 1.0);
         Shorten(in, 1.0);
@@ -100,11 +100,11 @@ bool MoveHandles(CRV_Curve* curve)
 
 int CRV_CurveSetNonDecreasing(CRV_Curve* curve, unsigned char* changed)
 {
-    if (const int code = CRVp_CheckGraph(curve)) return code;
-    const double y0 = curve->p0[1];
-    const double y1 = curve->p1[1];
-    const double y2 = curve->p2[1];
-    const double y3 = curve->p3[1];
+    if (int const code = CRVp_CheckGraph(curve)) return code;
+    double const y0 = curve->p0[1];
+    double const y1 = curve->p1[1];
+    double const y2 = curve->p2[1];
+    double const y3 = curve->p3[1];
     if (CRVp_IsInside(y0, y1, y2, y3) || CRVp_IsInside(y3, y2, y1, y0)) return 0;
     if (!CRVp_AllFinite(curve)) return CRV_Err_NotFinite;
     if (MoveHandles(curve) && changed) *changed = 1;

@@ -10,25 +10,25 @@
 
 namespace {
 
-constexpr double kLargest = std::numeric_limits<double>::max();
+constexpr double Largest = std::numeric_limits<double>::max();
 
 // dx/dt below this share of the segment counts as vertical.
-constexpr double kVertical = 1e-12;
+constexpr double VerticalSlope = 1e-12;
 
 // Differences of the largest doubles, and six times those, must stay finite.
-constexpr double kScale = 0x1p-6;
+constexpr double Scale = 0x1p-6;
 
-// The derivatives of one coordinate by t, scaled by kScale.
+// The derivatives of one coordinate by t, scaled by Scale.
 struct Derivatives {
     double first, second, third;
     double extent;  // the largest step between neighbouring control coordinates, scaled alike
 
     Derivatives(double c0, double c1, double c2, double c3, double t)
     {
-        const double out = kScale * c1 - kScale * c0;
-        const double across = kScale * c2 - kScale * c1;
-        const double in = kScale * c3 - kScale * c2;
-        const double rest = 1.0 - t;
+        double const out = Scale * c1 - Scale * c0;
+        double const across = Scale * c2 - Scale * c1;
+        double const in = Scale * c3 - Scale * c2;
+        double const rest = 1.0 - t;
         first = 3.0 * (rest * rest * out + 2.0 * rest * t * across + t * t * in);
         second = 6.0 * (rest * (across - out) + t * (in - across));
         third = 6.0 * ((in - across) - (across - out));
@@ -44,22 +44,22 @@ struct Place {
 
     bool HasNoDirection() const
     {
-        return std::fabs(x.first) <= std::fabs(vertical) && std::fabs(y.first) <= kVertical * y.extent;
+        return std::fabs(x.first) <= std::fabs(vertical) && std::fabs(y.first) <= VerticalSlope * y.extent;
     }
     double SafeFirst() const { return std::fabs(x.first) <= std::fabs(vertical) ? vertical : x.first; }
 };
 
 double LimitToDoubles(double value)
 {
-    return value > kLargest ? kLargest : value < -kLargest ? -kLargest : value;
+    return value > Largest ? Largest : value < -Largest ? -Largest : value;
 }
 
 // The slope where the first derivatives vanish together: that of the tangent on the curve's further side.
 double SlopeOfCusp(Place const& place)
 {
-    const double floor = std::fabs(place.vertical);
+    double const floor = std::fabs(place.vertical);
     if (std::fabs(place.x.second) > floor) return place.y.second / place.x.second;
-    if (std::fabs(place.y.second) > kVertical * place.y.extent) {
+    if (std::fabs(place.y.second) > VerticalSlope * place.y.extent) {
         // Vertical again. Leaving the start, and coming to the end, x and t grow together.
         return place.y.second / (place.t < 1.0 ? place.vertical : -place.vertical);
     }
@@ -75,22 +75,22 @@ double Slope(Place const& place)
 template <class Answer>
 int AtPlaceOf(CRV_Curve const* curve, double* result, double x, Answer&& answer)
 {
-    if (const int code = CRVp_CheckGraph(curve)) return code;
+    if (int const code = CRVp_CheckGraph(curve)) return code;
     if (!result) return CRV_Err_NullArgument;
     if (!CRVp_AllFinite(curve) || x != x) return CRV_Err_NotFinite;
 
-    const double x0 = curve->p0[0];
-    const double x1 = curve->p1[0];
-    const double x2 = curve->p2[0];
-    const double x3 = curve->p3[0];
+    double const x0 = curve->p0[0];
+    double const x1 = curve->p1[0];
+    double const x2 = curve->p2[0];
+    double const x3 = curve->p3[0];
     if (x0 == x3) {
         *result = 0.0;
         return 0;
     }
-    const double t = CRVp_Reach(x0, x1, x2, x3, x);
-    const double vertical = kVertical * (kScale * x3 - kScale * x0);
-    const double smallest = std::numeric_limits<double>::min();
-    const Place place{t,
+    double const t = CRVp_Reach(x0, x1, x2, x3, x);
+    double const vertical = VerticalSlope * (Scale * x3 - Scale * x0);
+    double const smallest = std::numeric_limits<double>::min();
+    Place const place{t,
                       {x0, x1, x2, x3, t},
                       {curve->p0[1], curve->p1[1], curve->p2[1], curve->p3[1], t},
                       std::fabs(vertical) < smallest ? (x3 < x0 ? -smallest : smallest) : vertical};
@@ -102,16 +102,19 @@ int AtPlaceOf(CRV_Curve const* curve, double* result, double x, Answer&& answer)
 
 int CRV_Evaluate1dDerivFromX(CRV_Curve const* curve, double* dydx, double x)
 {
-    return AtPlaceOf(curve, dydx, x, [](Place const& place) { return Slope(place); });
+    return AtPlaceOf(
+        curve, dydx, x, [](Place const& place) { return Slope(place); });
 }
 
 int CRV_Evaluate1dDeriv2FromX(CRV_Curve const* curve, double* d2ydx2, double x)
 {
-    return AtPlaceOf(curve, d2ydx2, x, [](Place const& place) {
-        if (place.HasNoDirection()) return 0.0;
-        // (x' y'' - y' x'') / x'^3, one division at a time so that nothing underflows to 0 / 0. The coordinates' scale
-        // cancels in the slope but not in 1 / x', hence the factor.
-        const double bend = place.y.second - Slope(place) * place.x.second;
-        return LimitToDoubles(bend / place.SafeFirst() / place.SafeFirst() * kScale);
-    });
+    return AtPlaceOf(
+        curve, d2ydx2, x,
+        [](Place const& place) {
+            if (place.HasNoDirection()) return 0.0;
+            // (x' y'' - y' x'') / x'^3, one division at a time so that nothing underflows to 0 / 0. The coordinates' scale
+            // cancels in the slope but not in 1 / x', hence the factor.
+            double const bend = place.y.second - Slope(place) * place.x.second;
+            return LimitToDoubles(bend / place.SafeFirst() / place.SafeFirst() * Scale);
+        });
 }

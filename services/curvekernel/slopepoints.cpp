@@ -11,10 +11,10 @@
 
 namespace {
 
-constexpr double kScale = 0x1p-4;        // keeps differences of the largest doubles finite
-constexpr double kVertical = 1e-12;      // dx/dt below this share of the segment counts as vertical
-constexpr double kSameParameter = 1e-9;  // a parameter this near to another is the same
-constexpr double kTouching = 1e-15;      // a discriminant this small, of coefficients up to 1, is a double root
+constexpr double Scale = 0x1p-4;        // keeps differences of the largest doubles finite
+constexpr double Vertical = 1e-12;      // dx/dt below this share of the segment counts as vertical
+constexpr double SameParameter = 1e-9;  // a parameter this near to another is the same
+constexpr double Touching = 1e-15;      // a discriminant this small, of coefficients up to 1, is a double root
 
 // A polynomial of degree up to 2 in Bernstein form, first to last coefficient.
 struct Bernstein {
@@ -52,15 +52,15 @@ Bernstein SlopeExcess(CRV_Curve const* curve, double m)
     double const* points[] = {curve->p0, curve->p1, curve->p2, curve->p3};
     double largest = 0.0;
     for (double const* point : points)
-        largest = CRVp_Max(largest, kScale * std::fabs(point[1]) + kScale * std::fabs(m) * std::fabs(point[0]));
-    const double rounding = 4.0 * std::numeric_limits<double>::epsilon() * largest;
+        largest = CRVp_Max(largest, Scale * std::fabs(point[1]) + Scale * std::fabs(m) * std::fabs(point[0]));
+    double const rounding = 4.0 * std::numeric_limits<double>::epsilon() * largest;
 
     Bernstein excess{{}, 2};
     for (int i = 0; i < 3; ++i) {
-        const double dx = kScale * points[i + 1][0] - kScale * points[i][0];
-        const double dy = kScale * points[i + 1][1] - kScale * points[i][1];
-        const double value = dy - m * dx;
-        const bool exact = dy == 0.0 && (m == 0.0 || dx == 0.0);
+        double const dx = Scale * points[i + 1][0] - Scale * points[i][0];
+        double const dy = Scale * points[i + 1][1] - Scale * points[i][1];
+        double const value = dy - m * dx;
+        bool const exact = dy == 0.0 && (m == 0.0 || dx == 0.0);
         excess.c[i] = exact || std::fabs(value) <= rounding ? 0.0 : value;
     }
     return excess;
@@ -81,19 +81,19 @@ int RootsInUnit(Bernstein const& polynomial, double roots[2])
 
     double found[2];
     int count = 0;
-    const double largest = CRVp_Max(std::fabs(a), CRVp_Max(std::fabs(b), std::fabs(c)));
+    double const largest = CRVp_Max(std::fabs(a), CRVp_Max(std::fabs(b), std::fabs(c)));
     a /= largest;
     b /= largest;
     c /= largest;
     double discriminant = b * b - a * c;
-    if (std::fabs(discriminant) <= kTouching) discriminant = 0.0;
+    if (std::fabs(discriminant) <= Touching) discriminant = 0.0;
     if (discriminant >= 0.0) {
-        const double q = b < 0.0 ? std::sqrt(discriminant) - b : -(std::sqrt(discriminant) + b);
+        double const q = b < 0.0 ? std::sqrt(discriminant) - b : -(std::sqrt(discriminant) + b);
         if (q != 0.0) found[count++] = c / q;
         if (a != 0.0 && !(count == 1 && q / a == found[0])) found[count++] = q / a;
     }
     if (count == 2 && found[1] < found[0]) {
-        const double swap = found[0];
+        double const swap = found[0];
         found[0] = found[1];
         found[1] = swap;
     }
@@ -102,8 +102,8 @@ int RootsInUnit(Bernstein const& polynomial, double roots[2])
     int kept = 0;
     for (int i = 0; i < count; ++i) {
         double root = found[i];
-        if (polynomial.c[0] == 0.0 && std::fabs(root) < kSameParameter) root = 0.0;
-        if (polynomial.c[polynomial.degree] == 0.0 && std::fabs(root - 1.0) < kSameParameter) root = 1.0;
+        if (polynomial.c[0] == 0.0 && std::fabs(root) < SameParameter) root = 0.0;
+        if (polynomial.c[polynomial.degree] == 0.0 && std::fabs(root - 1.0) < SameParameter) root = 1.0;
         if (root >= 0.0 && root <= 1.0) roots[kept++] = root;
     }
     return kept;
@@ -112,20 +112,20 @@ int RootsInUnit(Bernstein const& polynomial, double roots[2])
 // Whether the curve, read as y over x, passes t, and not vertically.
 bool HasSlopeAt(CRV_Curve const* curve, double t, bool atCusp)
 {
-    const double x0 = curve->p0[0];
-    const double x1 = curve->p1[0];
-    const double x2 = curve->p2[0];
-    const double x3 = curve->p3[0];
-    const double rest = 1.0 - t;
-    const double out = kScale * x1 - kScale * x0;
-    const double across = kScale * x2 - kScale * x1;
-    const double in = kScale * x3 - kScale * x2;
-    const double slope = 3.0 * (rest * rest * out + 2.0 * rest * t * across + t * t * in);
-    if (!atCusp && !(std::fabs(slope) > kVertical * std::fabs(kScale * x3 - kScale * x0))) return false;
+    double const x0 = curve->p0[0];
+    double const x1 = curve->p1[0];
+    double const x2 = curve->p2[0];
+    double const x3 = curve->p3[0];
+    double const rest = 1.0 - t;
+    double const out = Scale * x1 - Scale * x0;
+    double const across = Scale * x2 - Scale * x1;
+    double const in = Scale * x3 - Scale * x2;
+    double const slope = 3.0 * (rest * rest * out + 2.0 * rest * t * across + t * t * in);
+    if (!atCusp && !(std::fabs(slope) > Vertical * std::fabs(Scale * x3 - Scale * x0))) return false;
     double turns[2];
     if (CRVp_TurningPoints(x0, x1, x2, x3, turns) == 0) return true;
-    const double reached = CRVp_Reach(x0, x1, x2, x3, CRVp_Blend(x0, x1, x2, x3, t));
-    return std::fabs(reached - t) <= kSameParameter;
+    double const reached = CRVp_Reach(x0, x1, x2, x3, CRVp_Blend(x0, x1, x2, x3, t));
+    return std::fabs(reached - t) <= SameParameter;
 }
 
 }  // namespace
@@ -133,34 +133,34 @@ bool HasSlopeAt(CRV_Curve const* curve, double t, bool atCusp)
 int CRV_EvaluateXFromYPrime(CRV_Curve const* curve, int* count, double* xs, double yPrime)
 {
     if (count) *count = 0;
-    if (const int code = CRVp_CheckGraph(curve)) return code;
+    if (int const code = CRVp_CheckGraph(curve)) return code;
     if (!count || !xs) return CRV_Err_NullArgument;
     if (!CRVp_AllFinite(curve) || !CRVp_IsFinite(yPrime)) return CRV_Err_NotFinite;
     if (curve->p0[0] == curve->p3[0]) return 0;
 
     Bernstein excess = SlopeExcess(curve, yPrime);
-    const bool startIsCusp = SamePoint(curve->p0, curve->p1);
-    const bool endIsCusp = SamePoint(curve->p2, curve->p3);
+    bool const startIsCusp = SamePoint(curve->p0, curve->p1);
+    bool const endIsCusp = SamePoint(curve->p2, curve->p3);
     if (startIsCusp) excess.DivideByT();
     if (endIsCusp) excess.DivideByRest();
-    const bool middleIsPoint = SamePoint(curve->p1, curve->p2);
+    bool const middleIsPoint = SamePoint(curve->p1, curve->p2);
     if (middleIsPoint && startIsCusp && !endIsCusp) excess.DivideByT();
     if (middleIsPoint && endIsCusp && !startIsCusp) excess.DivideByRest();
     if (excess.IsZero()) return 0;
 
     double roots[2];
-    const int found = RootsInUnit(excess, roots);
+    int const found = RootsInUnit(excess, roots);
     int kept = 0;
     for (int i = 0; i < found; ++i) {
-        const bool atCusp = (startIsCusp && roots[i] == 0.0) || (endIsCusp && roots[i] == 1.0);
+        bool const atCusp = (startIsCusp && roots[i] == 0.0) || (endIsCusp && roots[i] == 1.0);
         if (!HasSlopeAt(curve, roots[i], atCusp)) continue;
-        const double x = CRVp_LimitToHull(curve->p0[0], curve->p1[0], curve->p2[0], curve->p3[0],
+        double const x = CRVp_LimitToHull(curve->p0[0], curve->p1[0], curve->p2[0], curve->p3[0],
                                           CRVp_Blend(curve->p0[0], curve->p1[0], curve->p2[0], curve->p3[0], roots[i]));
         if (kept == 1 && x == xs[0]) continue;
         xs[kept++] = x;
     }
     if (kept == 2 && xs[1] < xs[0]) {
-        const double swap = xs[0];
+        double const swap = xs[0];
         xs[0] = xs[1];
         xs[1] = swap;
     }

@@ -15,7 +15,7 @@ struct CRVp_UnitCubic {
     // From the two handles' places a and b on the way from 0 to 1.
     static CRVp_UnitCubic FromHandles(double a, double b)
     {
-        const double apart = b - a;
+        double const apart = b - a;
         return {1.0 - 3.0 * apart, 3.0 * (apart - a), 3.0 * a};
     }
     double Value(double t) const { return ((a3 * t + a2) * t + a1) * t; }
@@ -27,10 +27,10 @@ struct CRVp_UnitCubic {
 inline double CRVp_HalleySteps(CRVp_UnitCubic const& cubic, double u, double t)
 {
     for (int step = 0; step < 3; ++step) {
-        const double at = cubic.a3 * t;
-        const double f = (at + cubic.a2) * (t * t) + (cubic.a1 * t - u);
-        const double slope = (3.0 * at + 2.0 * cubic.a2) * t + cubic.a1;
-        const double halfCurvature = 3.0 * at + cubic.a2;
+        double const at = cubic.a3 * t;
+        double const f = (at + cubic.a2) * (t * t) + (cubic.a1 * t - u);
+        double const slope = (3.0 * at + 2.0 * cubic.a2) * t + cubic.a1;
+        double const halfCurvature = 3.0 * at + cubic.a2;
         t -= f * slope / (slope * slope - f * halfCurvature);
     }
     return t;
@@ -40,8 +40,8 @@ inline double CRVp_HalleySteps(CRVp_UnitCubic const& cubic, double u, double t)
 // has a small residual. False for NaN.
 inline bool CRVp_IsRoot(CRVp_UnitCubic const& cubic, double u, double t)
 {
-    const double residual = cubic.Value(t) - u;
-    const double allowed = 4e-14 * cubic.Slope(t);
+    double const residual = cubic.Value(t) - u;
+    double const allowed = 4e-14 * cubic.Slope(t);
     return (residual <= allowed) & (-residual <= allowed) & (t >= 0.0) & (t <= 1.0);
 }
 
@@ -56,9 +56,9 @@ int CRVp_TurningPoints(double c0, double c1, double c2, double c3, double turns[
 // The weights are formed first, so that no product is larger than its coordinate.
 inline double CRVp_Blend(double c0, double c1, double c2, double c3, double t)
 {
-    const double s = 1.0 - t;
-    const double ss = s * s;
-    const double tt = t * t;
+    double const s = 1.0 - t;
+    double const ss = s * s;
+    double const tt = t * t;
     return (ss * s * c0 + 3.0 * ss * t * c1) + (3.0 * s * tt * c2 + tt * t * c3);
 }
 
@@ -80,8 +80,8 @@ inline double CRVp_LimitToUnit(double t)
 // Rounding may carry a blend an ulp past its control coordinates; a held coordinate must come back as it is.
 inline double CRVp_LimitToHull(double c0, double c1, double c2, double c3, double value)
 {
-    const double low = CRVp_Min(CRVp_Min(c0, c1), CRVp_Min(c2, c3));
-    const double high = CRVp_Max(CRVp_Max(c0, c1), CRVp_Max(c2, c3));
+    double const low = CRVp_Min(CRVp_Min(c0, c1), CRVp_Min(c2, c3));
+    double const high = CRVp_Max(CRVp_Max(c0, c1), CRVp_Max(c2, c3));
     return CRVp_Max(low, CRVp_Min(high, value));
 }
 
@@ -102,15 +102,15 @@ inline bool CRVp_IsFinite(double value)
 // is 0. False where three steps weren't enough, next to a plateau.
 inline bool CRVp_SteepRoot(double a, double b, double u, double& root)
 {
-    const bool turned = 8.0 * u > 1.0 + 3.0 * (a + b);
-    const CRVp_UnitCubic cubic =
+    bool const turned = 8.0 * u > 1.0 + 3.0 * (a + b);
+    CRVp_UnitCubic const cubic =
         turned ? CRVp_UnitCubic::FromHandles(1.0 - b, 1.0 - a) : CRVp_UnitCubic::FromHandles(a, b);
-    const double target = turned ? 1.0 - u : u;
+    double const target = turned ? 1.0 - u : u;
 
     // 0.3 t^2 stands for t^3: the choice that fails least often over random handles.
-    const double discriminant = cubic.a1 * cubic.a1 + 4.0 * (cubic.a2 + 0.3 * cubic.a3) * target;
-    const double start = 2.0 * target / (cubic.a1 + (discriminant > 0.0 ? std::sqrt(discriminant) : 0.0));
-    const double t = CRVp_HalleySteps(cubic, target, start);
+    double const discriminant = cubic.a1 * cubic.a1 + 4.0 * (cubic.a2 + 0.3 * cubic.a3) * target;
+    double const start = 2.0 * target / (cubic.a1 + (discriminant > 0.0 ? std::sqrt(discriminant) : 0.0));
+    double const t = CRVp_HalleySteps(cubic, target, start);
     root = turned ? 1.0 - t : t;
     return CRVp_IsRoot(cubic, target, t);
 }
@@ -119,11 +119,11 @@ inline bool CRVp_SteepRoot(double a, double b, double u, double& root)
 // CRVp_ReachSlow can tell: `t` has no meaning then. A NaN passes no comparison.
 inline bool CRVp_UnitRoot(double a, double b, double u, double& t)
 {
-    const double least = CRVp_Min(CRVp_Min(a, b), u);
-    const double most = CRVp_Max(a, b);
-    const bool ordered = (least >= 0.0) & (most <= 1.0) & (u < 1.0);
+    double const least = CRVp_Min(CRVp_Min(a, b), u);
+    double const most = CRVp_Max(a, b);
+    bool const ordered = (least >= 0.0) & (most <= 1.0) & (u < 1.0);
     if (!ordered) return false;
-    const CRVp_UnitCubic cubic = CRVp_UnitCubic::FromHandles(a, b);
+    CRVp_UnitCubic const cubic = CRVp_UnitCubic::FromHandles(a, b);
 
     // Both influences one third, up to the rounding of the handles: the coordinate is linear in t.
     if (std::fabs(cubic.a3) + std::fabs(cubic.a2) <= 4e-15) {
@@ -137,7 +137,7 @@ inline bool CRVp_UnitRoot(double a, double b, double u, double& t)
 // An extent of 0 and one that overflows end in a NaN here, and so at CRVp_ReachSlow.
 inline double CRVp_Reach(double c0, double c1, double c2, double c3, double v)
 {
-    const double inverse = 1.0 / (c3 - c0);
+    double const inverse = 1.0 / (c3 - c0);
     double t = 0.0;
     return CRVp_UnitRoot((c1 - c0) * inverse, (c2 - c0) * inverse, (v - c0) * inverse, t)
                ? t

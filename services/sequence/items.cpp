@@ -13,7 +13,7 @@ class ScratchItem {
 public:
     explicit ScratchItem(int size) noexcept
     {
-        const std::size_t bytes = static_cast<std::size_t>(size);
+        std::size_t const bytes = static_cast<std::size_t>(size);
         if (bytes > sizeof small_) item_ = big_ = Q_AllocatePtr(SEQp_AllocationId, "sorted item list scratch", bytes);
         if (item_) std::memset(item_, 0, bytes);
     }
@@ -39,7 +39,7 @@ int CopyItem(SEQ_Head const* const* list, void const* source, void* destination)
 
 bool LiesInList(SEQ_Head const& head, void const* address) noexcept
 {
-    const std::less<void const*> before;
+    std::less<void const*> const before;
     return head.count > 0 && !before(address, head.items) && before(address, SEQp_Item(head, head.count));
 }
 
@@ -61,21 +61,21 @@ int InsertItem(void const* source, int index, SEQ_Head** list, bool throughCopyF
     if (index < 0 || index > head.count) return SEQ_Err_BadIndex;
     if (head.count == INT_MAX) return SEQ_Err_TooMany;
 
-    const bool inside = LiesInList(head, source);
-    const std::ptrdiff_t offset = inside ? static_cast<unsigned char const*>(source) - head.items : 0;
-    if (const int code = SEQp_Grow(head, head.count + 1)) return code;
+    bool const inside = LiesInList(head, source);
+    std::ptrdiff_t const offset = inside ? static_cast<unsigned char const*>(source) - head.items : 0;
+    if (int const code = SEQp_Grow(head, head.count + 1)) return code;
     if (inside) source = head.items + offset;  // growing may have moved it
 
-    const bool copies = throughCopyFunc && head.copy;
+    bool const copies = throughCopyFunc && head.copy;
     if (!copies && !inside) {
         PutBytes(head, index, source);
         return 0;
     }
-    const ScratchItem scratch(head.itemSize);
+    ScratchItem const scratch(head.itemSize);
     if (!scratch.get()) return Q_Err_OutOfMemory;
     if (!copies)
         std::memcpy(scratch.get(), source, static_cast<std::size_t>(head.itemSize));
-    else if (const int code = CopyItem(list, source, scratch.get()))
+    else if (int const code = CopyItem(list, source, scratch.get()))
         return code;
     PutBytes(head, index, scratch.get());
     return 0;
@@ -122,10 +122,10 @@ int SEQ_SetItemCopy(void const* source, int index, SEQ_Head** list, long, long)
     SEQ_Head& head = **list;
     if (!SEQp_HasIndex(head, index)) return SEQ_Err_BadIndex;
 
-    const ScratchItem scratch(head.itemSize);
+    ScratchItem const scratch(head.itemSize);
     if (!scratch.get()) return Q_Err_OutOfMemory;
-    if (const int code = CopyItem(list, source, scratch.get())) return code;
-    if (const int code = SEQp_DisposeItem(list, SEQp_Item(head, index))) {
+    if (int const code = CopyItem(list, source, scratch.get())) return code;
+    if (int const code = SEQp_DisposeItem(list, SEQp_Item(head, index))) {
         SEQp_DisposeItem(list, scratch.get());
         return code;
     }
@@ -151,7 +151,7 @@ int SEQ_Remove(int index, SEQ_Head** list, long, void* out)
     unsigned char* const place = SEQp_Item(head, index);
     if (out)
         std::memcpy(out, place, static_cast<std::size_t>(head.itemSize));
-    else if (const int code = SEQp_DisposeItem(list, place))
+    else if (int const code = SEQp_DisposeItem(list, place))
         return code;
     std::memmove(place, place + head.stride, SEQp_Bytes(head, head.count - index - 1));
     --head.count;

@@ -68,13 +68,13 @@ constexpr std::size_t MostBytesBehindHead = 1 << 14;
 // The copy of a list whose items are plain bytes.
 int DuplicateBytes(SEQ_Head const& from, SEQ_Head*** out)
 {
-    const std::size_t bytes = SEQp_Bytes(from, from.count);
+    std::size_t const bytes = SEQp_Bytes(from, from.count);
     SEQ_Head** made = nullptr;
     if (bytes <= MostBytesBehindHead) {
-        if (const int code = SEQp_NewInOneBlock(from.itemSize, from.count, &made)) return code;
+        if (int const code = SEQp_NewInOneBlock(from.itemSize, from.count, &made)) return code;
     } else {
-        if (const int code = SEQ_New(0, static_cast<short>(from.itemSize), 4, 1, &made)) return code;
-        if (const int code = SEQp_SetCapacity(**made, from.count)) {
+        if (int const code = SEQ_New(0, static_cast<short>(from.itemSize), 4, 1, &made)) return code;
+        if (int const code = SEQp_SetCapacity(**made, from.count)) {
             SEQ_Dispose(made, 0);
             return code;
         }
@@ -90,10 +90,10 @@ int CopyAllItems(SEQ_Head const* const* source, SEQ_Head& copy)
 {
     SEQ_Head const& from = **source;
     if (from.count == 0) return 0;
-    if (const int code = SEQp_SetCapacity(copy, from.count)) return code;
+    if (int const code = SEQp_SetCapacity(copy, from.count)) return code;
     std::memset(copy.items, 0, SEQp_Bytes(from, from.count));
     for (int i = 0; i < from.count; ++i) {
-        if (const int code = from.copy(from.refcon, source, SEQp_Item(from, i), SEQp_Item(copy, i))) return code;
+        if (int const code = from.copy(from.refcon, source, SEQp_Item(from, i), SEQp_Item(copy, i))) return code;
         copy.count = i + 1;  // what is made so far is what a failure has to dispose
     }
     return 0;
@@ -105,7 +105,7 @@ int SEQp_SetCapacity(SEQ_Head& head, int capacity) noexcept
 {
     unsigned char* items = nullptr;
     if (capacity > 0) {
-        const std::size_t bytes = SEQp_Bytes(head, capacity);
+        std::size_t const bytes = SEQp_Bytes(head, capacity);
         items = static_cast<unsigned char*>(Q_AllocatePtr(SEQp_AllocationId, ItemsLabel, bytes));
         if (!items) return Q_Err_OutOfMemory;
         if (head.count > 0) std::memcpy(items, head.items, SEQp_Bytes(head, head.count));
@@ -118,8 +118,8 @@ int SEQp_SetCapacity(SEQ_Head& head, int capacity) noexcept
 
 int SEQp_NewInOneBlock(int itemSize, int count, SEQ_Head*** list) noexcept
 {
-    const std::size_t stride = (static_cast<std::size_t>(itemSize) + 7) & ~std::size_t{7};
-    const std::size_t bytes = sizeof(SEQp_List) + stride * static_cast<std::size_t>(count);
+    std::size_t const stride = (static_cast<std::size_t>(itemSize) + 7) & ~std::size_t{7};
+    std::size_t const bytes = sizeof(SEQp_List) + stride * static_cast<std::size_t>(count);
     void* const block = Q_AllocatePtr(SEQp_AllocationId, ListLabel, bytes);
     if (!block) return Q_Err_OutOfMemory;
     SEQ_Head** const made = MakeHead(block, itemSize);
@@ -133,8 +133,8 @@ int SEQp_NewInOneBlock(int itemSize, int count, SEQ_Head*** list) noexcept
 int SEQp_Grow(SEQ_Head& head, int count) noexcept
 {
     if (count <= head.capacity) return 0;
-    const long long roomy = static_cast<long long>(head.capacity) + head.capacity / 2;
-    const long long capacity = std::max({static_cast<long long>(count), roomy, static_cast<long long>(FirstCapacity)});
+    long long const roomy = static_cast<long long>(head.capacity) + head.capacity / 2;
+    long long const capacity = std::max({static_cast<long long>(count), roomy, static_cast<long long>(FirstCapacity)});
     return SEQp_SetCapacity(head, static_cast<int>(std::min<long long>(capacity, INT_MAX)));
 }
 
@@ -154,7 +154,7 @@ int SEQ_Dispose(SEQ_Head** list, long)
     int first = 0;
     if (head.dispose)
         for (int i = 0; i < head.count; ++i)
-            if (const int code = SEQp_DisposeItem(list, SEQp_Item(head, i)); first == 0) first = code;
+            if (int const code = SEQp_DisposeItem(list, SEQp_Item(head, i)); first == 0) first = code;
     FreeItems(head);
     Q_FreePtr(list);  // the handle is the address of the block's first word
     return first;
@@ -167,10 +167,10 @@ int SEQ_Duplicate(SEQ_Head const* const* list, long, SEQ_Head*** out)
     SEQ_Head const& source = **list;
     if (!source.copy && source.count > 0) return DuplicateBytes(source, out);
     SEQ_Head** made = nullptr;
-    if (const int code = SEQ_New(0, static_cast<short>(source.itemSize), 4, 1, &made)) return code;
+    if (int const code = SEQ_New(0, static_cast<short>(source.itemSize), 4, 1, &made)) return code;
     ListOwner owner(made);
     CopyRefconAndFuncs(source, **made);
-    if (const int code = CopyAllItems(list, **made)) return code;
+    if (int const code = CopyAllItems(list, **made)) return code;
     *out = owner.release();
     return 0;
 }
@@ -245,11 +245,11 @@ int SEQ_SetNumItems(int count, SEQ_Head** list, long)
     if (count < 0) return SEQ_Err_BadArgument;
     SEQ_Head& head = **list;
     while (head.count > count) {
-        if (const int code = SEQp_DisposeItem(list, SEQp_Item(head, head.count - 1))) return code;
+        if (int const code = SEQp_DisposeItem(list, SEQp_Item(head, head.count - 1))) return code;
         --head.count;
     }
     if (head.count == count) return 0;
-    if (const int code = SEQp_Grow(head, count)) return code;
+    if (int const code = SEQp_Grow(head, count)) return code;
     std::memset(SEQp_Item(head, head.count), 0, SEQp_Bytes(head, count - head.count));
     head.count = count;
     return 0;

@@ -15,7 +15,7 @@ int CallForEach(List list, long refcon, Func func)
     if (!SEQp_IsList(list)) return SEQ_Err_BadList;
     if (!func) return SEQ_Err_BadArgument;
     for (int i = 0; i < (*list)->count; ++i)
-        if (const int code = CallForItem(list, refcon, func, i)) return code;
+        if (int const code = CallForItem(list, refcon, func, i)) return code;
     return 0;
 }
 
@@ -38,13 +38,13 @@ int SEQ_GetSortedConstItem(SEQ_Head const* const* list, long, void const* probe,
     // own comparison: times come in an order that nothing can predict.
     int first = 0;
     int equal = -1;  // the lowest item known to compare equal
-    const auto isAfter = [&](int item) {
-        const int order = head.sort(head.refcon, list, probe, SEQp_Item(head, item));
+    auto const isAfter = [&](int item) {
+        int const order = head.sort(head.refcon, list, probe, SEQp_Item(head, item));
         if (order == 0) equal = item;
         return order > 0;
     };
     for (int size = head.count; size > 1;) {
-        const int half = size / 2;
+        int const half = size / 2;
         first = isAfter(first + half - 1) ? first + half : first;
         size -= half;
     }
@@ -75,10 +75,10 @@ int SEQ_ForRange(SEQ_Head** list, int first, int last, long refcon, SEQ_IterFunc
     if (!SEQp_IsList(list)) return SEQ_Err_BadList;
     if (!func) return SEQ_Err_BadArgument;
     if (!SEQp_HasIndex(**list, first) || !SEQp_HasIndex(**list, last)) return SEQ_Err_BadIndex;
-    const int step = first <= last ? 1 : -1;
+    int const step = first <= last ? 1 : -1;
     for (int i = first;; i += step) {
         if (lastVisited) *lastVisited = i;
-        if (const int code = CallForItem(list, refcon, func, i)) return code;
+        if (int const code = CallForItem(list, refcon, func, i)) return code;
         if (i == last) return 0;
         if (!SEQp_HasIndex(**list, i + step)) return SEQ_Err_BadIndex;  // the function removed what was to come
     }

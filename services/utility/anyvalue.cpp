@@ -13,10 +13,10 @@ u16str Q_Any::GetAs_Str() const
 std::int64_t Q_Any::GetAs_int() const
 {
     if (std::int64_t const* const number = std::get_if<std::int64_t>(&value_)) return *number;
-    const std::string digits = Q_UTF16ToMBString(GetAs_Str());
+    std::string const digits = Q_UTF16ToMBString(GetAs_Str());
     char const* const end = digits.data() + digits.size();
     std::int64_t number = 0;
-    const std::from_chars_result result = std::from_chars(digits.data(), end, number);
+    std::from_chars_result const result = std::from_chars(digits.data(), end, number);
     if (result.ec != std::errc() || result.ptr != end) throw Q_Err_NotANumber;
     return number;
 }
@@ -28,7 +28,7 @@ u16str Q_MixedValueKey()
 
 void Q_AnyTreeWrapper::put(u16str const& key, Q_AnyTree const& subTree)
 {
-    const Q_AnyTree::assoc_iterator present = tree_->find(key);
+    Q_AnyTree::assoc_iterator const present = tree_->find(key);
     if (present == tree_->not_found())
         tree_->push_back({key, subTree});
     else
@@ -43,7 +43,7 @@ void Q_AnyTreeWrapper::put(u16str const& key, Q_Any const& value)
 Q_Any const& Q_AnyTreeWrapper::get_child_any(u16str const& key) const
 {
     Q_AnyTree const& tree = *tree_;
-    const Q_AnyTree::const_assoc_iterator child = tree.find(key);
+    Q_AnyTree::const_assoc_iterator const child = tree.find(key);
     if (child == tree.not_found()) throw Q_Err_NoChild;
     return child->second.data();
 }

@@ -32,15 +32,16 @@ void AppendValue(std::string& out, Q_Any const& value)
 bool IsArray(Q_AnyTree const& tree)
 {
     return !tree.empty() && tree.data().IsEmpty() &&
-           std::all_of(tree.begin(), tree.end(), [](auto const& child) { return child.first.empty(); });
+           std::all_of(
+               tree.begin(), tree.end(), [](auto const& child) { return child.first.empty(); });
 }
 
 void AppendContainer(std::string& out, Q_AnyTree const& tree, int depth)
 {
     if (depth > Q_MaxJsonDepth) throw Q_Err_BadJson;
-    const bool isArray = IsArray(tree);
+    bool const isArray = IsArray(tree);
     char separator = isArray ? '[' : '{';
-    const auto beginMember = [&](u16str const& key) {
+    auto const beginMember = [&](u16str const& key) {
         out += std::exchange(separator, ',');
         if (isArray) return;
         AppendText(out, key);

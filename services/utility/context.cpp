@@ -56,7 +56,7 @@ ImmutableString ImmutableString::Create(char const* text)
     // Never destroyed: names made at load are used until the very end.
     static std::mutex* const mutex = new std::mutex;
     static std::unordered_set<std::string>* const pool = new std::unordered_set<std::string>;
-    const std::lock_guard<std::mutex> lock(*mutex);
+    std::lock_guard<std::mutex> const lock(*mutex);
     return ImmutableString(pool->emplace(text).first->c_str());
 }
 
@@ -123,7 +123,7 @@ void Q_RenderContext::SetState(boost::shared_ptr<Q_RenderState> const& state)
 {
     if (!state) return;
     NamedState next{state->GetStateName(), state};
-    const auto place =
+    auto const place =
         std::find_if(states_.begin(), states_.end(), [&](NamedState const& named) { return named.name == next.name; });
     if (place == states_.end())
         states_.push_back(std::move(next));
@@ -134,10 +134,10 @@ void Q_RenderContext::SetState(boost::shared_ptr<Q_RenderState> const& state)
 
 void Q_RenderContext::RemoveState(hearth::utility::ImmutableString const& name)
 {
-    const auto place =
+    auto const place =
         std::find_if(states_.begin(), states_.end(), [&](NamedState const& named) { return named.name == name; });
     if (place == states_.end()) return;
-    const NamedState removed = std::move(*place);
+    NamedState const removed = std::move(*place);
     states_.erase(place);
     statesStamp_ = NextStamp();
 }

@@ -21,8 +21,8 @@ DebugDatabase& DebugDatabase::Instance()
 
 bool DebugDatabase::GetEntry(char const* name, std::string* value) const
 {
-    const std::lock_guard<std::mutex> lock(mutex_);
-    const auto entry = entries_.find(std::string_view(name));
+    std::lock_guard<std::mutex> const lock(mutex_);
+    auto const entry = entries_.find(std::string_view(name));
     if (entry == entries_.end()) return false;
     if (value) *value = entry->second;
     return true;
@@ -40,7 +40,7 @@ bool DebugDatabase::GetEntryAs<bool>(char const* name, bool fallback) const
 
 void DebugDatabase::SetEntry(char const* name, char const* value)
 {
-    const std::lock_guard<std::mutex> lock(mutex_);
+    std::lock_guard<std::mutex> const lock(mutex_);
     if (value)
         entries_.insert_or_assign(name, value);
     else

@@ -63,12 +63,14 @@ Q_MemoryLabel* StringLabel() noexcept
 
 void* Q_AllocatePtr(int, char const* label, std::size_t size) noexcept
 {
-    return Allocate(label, size, [](std::size_t bytes) { return std::malloc(bytes); });
+    return Allocate(
+        label, size, [](std::size_t bytes) { return std::malloc(bytes); });
 }
 
 void* Q_AllocatePtrClear(int, char const* label, std::size_t size) noexcept
 {
-    return Allocate(label, size, [](std::size_t bytes) { return std::calloc(1, bytes); });
+    return Allocate(
+        label, size, [](std::size_t bytes) { return std::calloc(1, bytes); });
 }
 
 void Q_FreePtr(void* block) noexcept
@@ -136,7 +138,7 @@ namespace hearth::allocator {
 void* MemoryRecycler::Allocate(std::size_t size, std::size_t* granted) noexcept
 {
     if (MustFail() || size > std::numeric_limits<std::size_t>::max() - Granule) return nullptr;
-    const std::size_t rounded = RoundUp(size);
+    std::size_t const rounded = RoundUp(size);
     void* const block = std::malloc(rounded);
     if (!block) return nullptr;
     StringLabel()->Add(rounded);

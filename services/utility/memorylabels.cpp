@@ -50,8 +50,8 @@ Q_MemoryLabel* Search(std::uint64_t hash, char const* label, std::atomic<Q_Memor
 
 Q_MemoryLabel* FindOrMake(char const* label) noexcept
 {
-    const std::size_t length = std::strlen(label);
-    const std::uint64_t hash = XXH3_64bits(label, length);
+    std::size_t const length = std::strlen(label);
+    std::uint64_t const hash = XXH3_64bits(label, length);
     Q_MemoryLabel* made = nullptr;
     Q_MemoryLabel* entry = nullptr;
     while (!entry) {
@@ -59,12 +59,10 @@ Q_MemoryLabel* FindOrMake(char const* label) noexcept
         entry = Search(hash, label, &slot);
         if (entry) break;
         if (slot && !made) made = MakeEntry(hash, label, length);
-        if (!slot || !made) {
+        if (!slot || !made)
             entry = &overflow;
-        } else if (Q_MemoryLabel* none = nullptr;
-                   slot->compare_exchange_strong(none, made, std::memory_order_acq_rel)) {
+        else if (Q_MemoryLabel* none = nullptr; slot->compare_exchange_strong(none, made, std::memory_order_acq_rel))
             return made;
-        }
         // Another thread took the slot, perhaps for the same label: search again.
     }
     std::free(made);
@@ -92,7 +90,7 @@ Q_MemoryCount Q_MemoryLive(char const* label) noexcept
         return entry ? entry->Live() : Q_MemoryCount{};
     }
     Q_MemoryCount total;
-    const auto add = [](void* context, char const*, Q_MemoryCount const& count) {
+    auto const add = [](void* context, char const*, Q_MemoryCount const& count) {
         Q_MemoryCount& sum = *static_cast<Q_MemoryCount*>(context);
         sum.bytes += count.bytes;
         sum.blocks += count.blocks;
@@ -103,8 +101,8 @@ Q_MemoryCount Q_MemoryLive(char const* label) noexcept
 
 void Q_ForEachMemoryLabel(Q_MemoryVisitor visit, void* context)
 {
-    const auto visitEntry = [&](Q_MemoryLabel const& entry) {
-        const Q_MemoryCount count = entry.Live();
+    auto const visitEntry = [&](Q_MemoryLabel const& entry) {
+        Q_MemoryCount const count = entry.Live();
         if (count != Q_MemoryCount{}) visit(context, entry.Text(), count);
     };
     for (std::atomic<Q_MemoryLabel*> const& place : table)

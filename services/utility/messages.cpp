@@ -8,7 +8,7 @@ std::atomic<Q_TranslateFunc> translateFunc{nullptr};
 // A translation as a text that is valid for ever, or null.
 char const* Translation(std::string_view key)
 {
-    const Q_TranslateFunc translate = translateFunc.load(std::memory_order_acquire);
+    Q_TranslateFunc const translate = translateFunc.load(std::memory_order_acquire);
     char const* const text = translate ? translate(key) : nullptr;
     return text ? hearth::utility::ImmutableString::Create(text).c_str() : nullptr;
 }
@@ -16,8 +16,8 @@ char const* Translation(std::string_view key)
 // What "key=text" says: the translation for the key, else the text. Without a "=" all of it is text.
 char const* TextOfEntry(char const* entry)
 {
-    const std::string_view whole(entry);
-    const std::size_t equals = whole.find('=');
+    std::string_view const whole(entry);
+    std::size_t const equals = whole.find('=');
     if (equals == std::string_view::npos) return entry;
     char const* const translation = Translation(whole.substr(0, equals));
     return translation ? translation : entry + equals + 1;
@@ -45,6 +45,6 @@ char const* Q_ZLookupLStrCache(Q_ZTable const* const* table, int row, int, int)
 
 u16str Q_ZStringToUTF16String(char const* text)
 {
-    const bool hasKey = text && std::string_view(text).starts_with("$$$");
+    bool const hasKey = text && std::string_view(text).starts_with("$$$");
     return Q_MBToUTF16String(hasKey ? TextOfEntry(text) : text);
 }

@@ -55,10 +55,10 @@ void UpdateHashState(Murmur3MixerState& state, void const* data, std::size_t siz
 {
     if (size == 0) return;
     unsigned char const* bytes = static_cast<unsigned char const*>(data);
-    const std::size_t held = state.length_ % BlockSize;
+    std::size_t const held = state.length_ % BlockSize;
     state.length_ += size;
     if (held > 0) {
-        const std::size_t taken = std::min(BlockSize - held, size);
+        std::size_t const taken = std::min(BlockSize - held, size);
         std::memcpy(state.tail_ + held, bytes, taken);
         if (held + taken < BlockSize) return;
         MixBlock(state.h1_, state.h2_, state.tail_);

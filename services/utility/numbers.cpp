@@ -13,7 +13,7 @@ std::string FixedText(double number, int precision)
 {
     // The longest double has 309 digits before the point.
     std::string text(320 + static_cast<std::size_t>(precision), 0);
-    const auto end = std::to_chars(text.data(), text.data() + text.size(), number, std::chars_format::fixed, precision);
+    auto const end = std::to_chars(text.data(), text.data() + text.size(), number, std::chars_format::fixed, precision);
     text.resize(static_cast<std::size_t>(end.ptr - text.data()));
     return text;
 }
@@ -28,10 +28,10 @@ bool IsIn(unsigned short unit, std::string_view set) noexcept
 u16str NumberToString(double number, int width, int precision, int flags, int limit)
 {
     std::string text = FixedText(number, std::max(precision, 0));
-    const std::size_t wanted = static_cast<std::size_t>(std::max(std::min(width, limit), 0));
+    std::size_t const wanted = static_cast<std::size_t>(std::max(std::min(width, limit), 0));
     if (text.size() < wanted) {
-        const bool zeros = (flags & NumberFlag_ZeroPad) != 0 && std::isfinite(number);
-        const std::size_t place = zeros && text.front() == '-' ? 1 : 0;
+        bool const zeros = (flags & NumberFlag_ZeroPad) != 0 && std::isfinite(number);
+        std::size_t const place = zeros && text.front() == '-' ? 1 : 0;
         text.insert(place, wanted - text.size(), zeros ? '0' : ' ');
     }
     return AsciiToUTF16(text.c_str());
@@ -41,7 +41,7 @@ bool StringToNumber(u16str const& text, int* number, int flags)
 {
     const std::string_view skipped = (flags & NumberFlag_SkipAssignment) != 0 ? " \t\r\n=:(" : " \t\r\n";
     auto unit = std::find_if_not(text.begin(), text.end(), [&](unsigned short u) { return IsIn(u, skipped); });
-    const bool negative = unit != text.end() && *unit == '-';
+    bool const negative = unit != text.end() && *unit == '-';
     if (unit != text.end() && IsIn(*unit, "+-")) ++unit;
     if (unit == text.end() || !IsIn(*unit, "0123456789")) return false;
     // Beyond the limits only the sign matters: the magnitude stays at the first value that is too great.

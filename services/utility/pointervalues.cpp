@@ -9,7 +9,7 @@ namespace {
 
 bool IsFlat(void const* pointer) noexcept
 {
-    const std::intptr_t number = reinterpret_cast<std::intptr_t>(pointer);
+    std::intptr_t const number = reinterpret_cast<std::intptr_t>(pointer);
     return number >= INT_MIN && number <= INT_MAX;
 }
 
@@ -24,15 +24,15 @@ class AddressValues {
 public:
     int ValueOf(void const* pointer)
     {
-        const std::lock_guard<std::mutex> lock(mutex_);
+        std::lock_guard<std::mutex> const lock(mutex_);
         if (IsFlat(pointer) && !addresses_.contains(FlatNumber(pointer))) {
             flat_.insert(FlatNumber(pointer));
             return FlatNumber(pointer);
         }
-        const auto known = values_.find(pointer);
+        auto const known = values_.find(pointer);
         if (known != values_.end()) return known->second;
         while (flat_.contains(next_)) ++next_;
-        const auto added = addresses_.emplace(next_, pointer).first;
+        auto const added = addresses_.emplace(next_, pointer).first;
         values_.emplace(pointer, next_);
         ++next_;
         return added->first;
@@ -40,8 +40,8 @@ public:
 
     void const* PointerOf(int value)
     {
-        const std::lock_guard<std::mutex> lock(mutex_);
-        const auto known = addresses_.find(value);
+        std::lock_guard<std::mutex> const lock(mutex_);
+        auto const known = addresses_.find(value);
         if (known != addresses_.end()) return known->second;
         flat_.insert(value);
         return Q_IntPtrToPointer(value);

@@ -25,7 +25,7 @@ public:
     {
         auto shared = next ? std::make_shared<Func>(std::move(next)) : nullptr;
         {
-            const std::lock_guard<std::recursive_mutex> lock(mutex_);
+            std::lock_guard<std::recursive_mutex> const lock(mutex_);
             func_.swap(shared);
             isSet_.store(func_ != nullptr, std::memory_order_relaxed);
         }
@@ -38,8 +38,8 @@ public:
     {
         if (!isSet_.load(std::memory_order_relaxed)) return false;
         try {
-            const std::lock_guard<std::recursive_mutex> lock(mutex_);
-            const std::shared_ptr<Func> func = func_;  // outlives its replacement by itself
+            std::lock_guard<std::recursive_mutex> const lock(mutex_);
+            std::shared_ptr<Func> const func = func_;  // outlives its replacement by itself
             if (!func) return false;
             (*func)(arguments...);
         } catch (...) {
@@ -97,7 +97,7 @@ void PrintReport(Q_Report const& report) noexcept
 void Send(Q_Report const& report) noexcept
 {
     if (!inReport) {
-        const ScInSink mark(inReport);
+        ScInSink const mark(inReport);
         if (ReportSink().Call(report)) return;
     }
     PrintReport(report);
@@ -157,8 +157,8 @@ void Q_ReportFailedVerification(int id, int line, int code, char const* text) no
 
 int Q_TranslateAndReportException(std::exception const& exception) noexcept
 {
-    const bool isMemory = dynamic_cast<std::bad_alloc const*>(&exception) != nullptr;
-    const int code = isMemory ? Q_Err_OutOfMemory : Q_Err_Exception;
+    bool const isMemory = dynamic_cast<std::bad_alloc const*>(&exception) != nullptr;
+    int const code = isMemory ? Q_Err_OutOfMemory : Q_Err_Exception;
     Send({.kind = Q_ReportKind::Exception, .code = code, .text = exception.what()});
     return code;
 }
@@ -171,8 +171,8 @@ Q_LogSink Q_SetLogSink(Q_LogSink sink)
 void XLOG_Log(int level, char const* tag, char const* topic, char const* text) noexcept
 {
     if (inLog) return;
-    const ScInSink mark(inLog);
-    const auto orEmpty = [](char const* part) { return part ? part : ""; };
+    ScInSink const mark(inLog);
+    auto const orEmpty = [](char const* part) { return part ? part : ""; };
     LogSink().Call(level, orEmpty(tag), orEmpty(topic), orEmpty(text));
 }
 

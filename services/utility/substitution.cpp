@@ -28,7 +28,7 @@ Placeholder ReadPlaceholder(Text const& format, std::size_t at, bool shortForm) 
 {
     if (!Has(format, at, '^')) return {0, -1};
     if (Has(format, at + 1, '^')) {
-        const std::size_t digit = Has(format, at + 2, 'L') ? at + 3 : at + 2;
+        std::size_t const digit = Has(format, at + 2, 'L') ? at + 3 : at + 2;
         return ReadDigit(format, digit);
     }
     return shortForm ? ReadDigit(format, at + 1) : Placeholder{0, -1};
@@ -40,7 +40,7 @@ Result Fill(Text const& format, std::span<Q_SubArgument const> arguments, bool s
 {
     Result result;
     for (std::size_t i = 0; i < format.size();) {
-        const Placeholder placeholder = ReadPlaceholder(format, i, shortForm);
+        Placeholder const placeholder = ReadPlaceholder(format, i, shortForm);
         if (placeholder.argument >= 0 && static_cast<std::size_t>(placeholder.argument) < arguments.size()) {
             appendArgument(result, arguments[static_cast<std::size_t>(placeholder.argument)]);
             i = placeholder.end;
@@ -62,14 +62,14 @@ std::string Q_SubArgument::ToMultibyte() const
 int Q_SubStringList(char* destination, long size, char const* format, std::span<Q_SubArgument const> arguments)
 {
     if (!destination || size <= 0) return Q_Err_BadDestination;
-    const auto append = [](std::string& result, Q_SubArgument const& argument) { result += argument.ToMultibyte(); };
+    auto const append = [](std::string& result, Q_SubArgument const& argument) { result += argument.ToMultibyte(); };
     const std::string filled = Fill<std::string>(std::string_view(format ? format : ""), arguments, false, append);
     return Q_CopyString(filled.c_str(), size, destination);
 }
 
 void Q_SubStringList(u16str* destination, u16str const& format, std::span<Q_SubArgument const> arguments)
 {
-    const auto append = [](u16str& result, Q_SubArgument const& argument) {
+    auto const append = [](u16str& result, Q_SubArgument const& argument) {
         result += Q_MBToUTF16String(argument.ToMultibyte());
     };
     *destination = Fill<u16str>(format, arguments, true, append);

@@ -19,7 +19,7 @@ std::atomic<std::uint64_t> mainThread{GetCurrentThreadID()};
 
 std::uint64_t GetCurrentThreadID() noexcept
 {
-    thread_local const std::uint64_t id = NextThreadID();
+    thread_local std::uint64_t const id = NextThreadID();
     return id;
 }
 

@@ -20,7 +20,7 @@ bool FitsValue(Wide value) noexcept
 Wide Gcd(Wide a, Wide b) noexcept
 {
     while (b != 0) {
-        const Wide rest = a % b;
+        Wide const rest = a % b;
         a = b;
         b = rest;
     }
@@ -31,7 +31,7 @@ Wide Gcd(Wide a, Wide b) noexcept
 int Store(Wide value, Wide scale, T_Time* time) noexcept
 {
     if (!FitsValue(value) || scale > UINT_MAX) {
-        const Wide divisor = Gcd(scale, value);
+        Wide const divisor = Gcd(scale, value);
         value /= divisor;
         scale /= divisor;
         if (!FitsValue(value) || scale > UINT_MAX) return T_Err_Overflow;
@@ -43,16 +43,16 @@ int Store(Wide value, Wide scale, T_Time* time) noexcept
 int Add(T_Time const& a, Wide bValue, unsigned int bScale, T_Time* sum) noexcept
 {
     if (a.scale == 0 || bScale == 0) return T_Err_Scale;
-    const unsigned int divisor = std::gcd(a.scale, bScale);
-    const Wide aFactor = bScale / divisor;
-    const Wide bFactor = a.scale / divisor;
+    unsigned int const divisor = std::gcd(a.scale, bScale);
+    Wide const aFactor = bScale / divisor;
+    Wide const bFactor = a.scale / divisor;
     return Store(a.value * aFactor + bValue * bFactor, a.scale * aFactor, sum);
 }
 
 int Multiply(T_Time const& time, Wide numerator, Wide denominator, T_Time* product) noexcept
 {
     if (time.scale == 0 || denominator == 0) return T_Err_Scale;
-    const Wide value = time.value * numerator;
+    Wide const value = time.value * numerator;
     if (value % denominator == 0 && FitsValue(value / denominator)) {
         *product = {static_cast<int>(value / denominator), time.scale};
         return 0;
@@ -69,8 +69,8 @@ T_Time ValueOrThrow(int code, T_Time const& time)
 // Negative, 0 or positive. A value times a scale fits 64 bits: 2 to the 31st times less than 2 to the 32nd.
 int CompareScaled(T_Time const& a, T_Time const& b) noexcept
 {
-    const std::int64_t left = static_cast<std::int64_t>(a.value) * b.scale;
-    const std::int64_t right = static_cast<std::int64_t>(b.value) * a.scale;
+    std::int64_t const left = static_cast<std::int64_t>(a.value) * b.scale;
+    std::int64_t const right = static_cast<std::int64_t>(b.value) * a.scale;
     return (left > right) - (left < right);
 }
 
@@ -81,7 +81,7 @@ bool HasSameFields(T_Time const& a, T_Time const& b) noexcept
 
 T_Time InLowestTerms(T_Time const& time) noexcept
 {
-    const std::int64_t divisor = std::gcd(static_cast<std::int64_t>(time.value), static_cast<std::int64_t>(time.scale));
+    std::int64_t const divisor = std::gcd(static_cast<std::int64_t>(time.value), static_cast<std::int64_t>(time.scale));
     return {static_cast<int>(time.value / divisor), static_cast<unsigned int>(time.scale / divisor)};
 }
 
@@ -90,12 +90,12 @@ bool MakeScaleCommon(T_TimeSpan* span) noexcept
 {
     T_Time& start = span->start;
     T_Time& duration = span->duration;
-    const unsigned int divisor = std::gcd(start.scale, duration.scale);
-    const std::int64_t startFactor = duration.scale / divisor;
-    const std::int64_t durationFactor = start.scale / divisor;
-    const Wide scale = static_cast<Wide>(start.scale) * startFactor;
-    const Wide startValue = static_cast<Wide>(start.value) * startFactor;
-    const Wide durationValue = static_cast<Wide>(duration.value) * durationFactor;
+    unsigned int const divisor = std::gcd(start.scale, duration.scale);
+    std::int64_t const startFactor = duration.scale / divisor;
+    std::int64_t const durationFactor = start.scale / divisor;
+    Wide const scale = static_cast<Wide>(start.scale) * startFactor;
+    Wide const startValue = static_cast<Wide>(start.value) * startFactor;
+    Wide const durationValue = static_cast<Wide>(duration.value) * durationFactor;
     if (scale > UINT_MAX || !FitsValue(startValue) || !FitsValue(durationValue)) return false;
     start = {static_cast<int>(startValue), static_cast<unsigned int>(scale)};
     duration = {static_cast<int>(durationValue), static_cast<unsigned int>(scale)};
@@ -108,11 +108,11 @@ int T_ShortConvTimeGeneral(int value, unsigned int scale, unsigned int newScale,
 {
     if (scale == 0 || newScale == 0) return T_Err_Scale;
     // Rounding works on the magnitude, at most 2 to the 63rd: halves then go away from zero by themselves.
-    const std::uint64_t magnitude = static_cast<std::uint64_t>(value < 0 ? -static_cast<std::int64_t>(value) : value);
-    const std::uint64_t units = (magnitude * newScale + scale / 2) / scale;
-    const std::uint64_t limit = value < 0 ? std::uint64_t{1} << 31 : INT_MAX;
+    std::uint64_t const magnitude = static_cast<std::uint64_t>(value < 0 ? -static_cast<std::int64_t>(value) : value);
+    std::uint64_t const units = (magnitude * newScale + scale / 2) / scale;
+    std::uint64_t const limit = value < 0 ? std::uint64_t{1} << 31 : INT_MAX;
     if (units > limit) return T_Err_Overflow;
-    const std::int64_t converted = static_cast<std::int64_t>(units);
+    std::int64_t const converted = static_cast<std::int64_t>(units);
     *out = static_cast<int>(value < 0 ? -converted : converted);
     return 0;
 }
@@ -120,7 +120,7 @@ int T_ShortConvTimeGeneral(int value, unsigned int scale, unsigned int newScale,
 int T_ConvTime(T_Time const* source, unsigned int newScale, T_Time* destination, int) noexcept
 {
     int value = 0;
-    if (const int code = T_ShortConvTime(source->value, source->scale, newScale, &value)) return code;
+    if (int const code = T_ShortConvTime(source->value, source->scale, newScale, &value)) return code;
     *destination = {value, newScale};
     return 0;
 }
@@ -145,7 +145,7 @@ int T_CompareTime(T_Time const* a, T_Time const* b, int* result) noexcept
 int T_ReduceTime(T_Time const* source, T_Time* reduced, unsigned char* changed) noexcept
 {
     if (source->scale == 0) return T_Err_Scale;
-    const T_Time lowest = InLowestTerms(*source);
+    T_Time const lowest = InLowestTerms(*source);
     if (changed) *changed = HasSameFields(lowest, *source) ? 0 : 1;
     *reduced = lowest;
     return 0;
@@ -153,7 +153,7 @@ int T_ReduceTime(T_Time const* source, T_Time* reduced, unsigned char* changed) 
 
 int T_FpLong2TimeValue(unsigned int scale, double seconds) noexcept
 {
-    const long units = M_RoundDouble(seconds * scale);
+    long const units = M_RoundDouble(seconds * scale);
     return static_cast<int>(std::clamp<long>(units, INT_MIN, INT_MAX));
 }
 
@@ -171,8 +171,8 @@ bool T_TimeSpan::Contains(T_Time const& time) const noexcept
 {
     if (time.scale == 0 || start.scale == 0 || duration.scale == 0) return false;
     // The distance from the start in units of 1 / (time.scale * start.scale) seconds, against the duration.
-    const Wide distance = static_cast<Wide>(time.value) * start.scale - static_cast<Wide>(start.value) * time.scale;
-    const Wide unit = static_cast<Wide>(time.scale) * start.scale;
+    Wide const distance = static_cast<Wide>(time.value) * start.scale - static_cast<Wide>(start.value) * time.scale;
+    Wide const unit = static_cast<Wide>(time.scale) * start.scale;
     return distance >= 0 && distance * duration.scale < duration.value * unit;
 }
 
@@ -191,14 +191,14 @@ bool operator<(T_Time const& a, T_Time const& b) noexcept
 T_Time operator+(T_Time const& a, T_Time const& b)
 {
     T_Time sum{};
-    const int code = Add(a, b.value, b.scale, &sum);
+    int const code = Add(a, b.value, b.scale, &sum);
     return ValueOrThrow(code, sum);
 }
 
 T_Time operator-(T_Time const& a, T_Time const& b)
 {
     T_Time difference{};
-    const int code = Add(a, -static_cast<Wide>(b.value), b.scale, &difference);
+    int const code = Add(a, -static_cast<Wide>(b.value), b.scale, &difference);
     return ValueOrThrow(code, difference);
 }
 
@@ -210,7 +210,7 @@ T_Time& operator+=(T_Time& a, T_Time const& b)
 T_Time operator/(T_Time const& time, int divisor)
 {
     T_Time quotient{};
-    const Wide size = divisor < 0 ? -static_cast<Wide>(divisor) : divisor;
-    const int code = Multiply(time, divisor < 0 ? -1 : 1, size, &quotient);
+    Wide const size = divisor < 0 ? -static_cast<Wide>(divisor) : divisor;
+    int const code = Multiply(time, divisor < 0 ? -1 : 1, size, &quotient);
     return ValueOrThrow(code, quotient);
 }

@@ -35,10 +35,10 @@ constexpr Lead LeadOf(unsigned char byte) noexcept
 // Takes one code point, or one ill-formed sequence up to the byte that breaks it, off the front of a text.
 char32_t TakeUtf8(std::string_view& text) noexcept
 {
-    const unsigned char first = static_cast<unsigned char>(text.front());
+    unsigned char const first = static_cast<unsigned char>(text.front());
     text.remove_prefix(1);
     if (first < 0x80) return first;
-    const Lead lead = LeadOf(first);
+    Lead const lead = LeadOf(first);
     if (lead.following == 0) return Replacement;
     char32_t point = first & lead.bits;
     Range allowed = lead.second;
@@ -75,7 +75,7 @@ bool IsLowSurrogate(char32_t unit) noexcept
 // Takes one code point, or one unpaired surrogate, at an index and moves the index past it.
 char32_t TakeUtf16(u16str const& text, std::size_t& index) noexcept
 {
-    const char32_t unit = text[index++];
+    char32_t const unit = text[index++];
     if (!IsHighSurrogate(unit)) return IsLowSurrogate(unit) ? Replacement : unit;
     if (index == text.size() || !IsLowSurrogate(text[index])) return Replacement;
     return 0x10000 + ((unit - 0xD800) << 10) + (text[index++] - 0xDC00u);
@@ -84,8 +84,8 @@ char32_t TakeUtf16(u16str const& text, std::size_t& index) noexcept
 template <class Bytes>
 void AppendUtf8(Bytes& text, char32_t point)
 {
-    const auto put = [&](char32_t byte) { text.push_back(static_cast<typename Bytes::value_type>(byte)); };
-    const auto putContinuation = [&](int shift) { put(0x80 | ((point >> shift) & 0x3F)); };
+    auto const put = [&](char32_t byte) { text.push_back(static_cast<typename Bytes::value_type>(byte)); };
+    auto const putContinuation = [&](int shift) { put(0x80 | ((point >> shift) & 0x3F)); };
     if (point < 0x80) {
         put(point);
     } else if (point < 0x800) {
@@ -160,8 +160,8 @@ Q_ByteString Q_UTF16To8String(u16str const& text)
 u16str Q_AsciiToUTF16String(char const* text)
 {
     u16str result;
-    for (const char character : OrEmpty(text)) {
-        const unsigned char byte = static_cast<unsigned char>(character);
+    for (char const character : OrEmpty(text)) {
+        unsigned char const byte = static_cast<unsigned char>(character);
         AppendUtf16(result, byte < 0x80 ? byte : Replacement);
     }
     return result;
@@ -175,7 +175,7 @@ u16str hearth::string::AsciiToUTF16(char const* text)
 int Q_CopyString(char const* source, long size, char* destination) noexcept
 {
     if (!destination || size <= 0) return Q_Err_BadDestination;
-    const std::size_t length = source ? strnlen(source, static_cast<std::size_t>(size) - 1) : 0;
+    std::size_t const length = source ? strnlen(source, static_cast<std::size_t>(size) - 1) : 0;
     if (length > 0) std::memmove(destination, source, length);
     destination[length] = 0;
     return 0;

@@ -14,9 +14,7 @@ int Spawn(std::vector<std::string> const& arguments, std::string const& output, 
     std::vector<char*> pointers;
     std::string command = KFS_TEST_COMMAND;
     pointers.push_back(command.data());
-    for (std::string const& argument : arguments) {
-        pointers.push_back(const_cast<char*>(argument.c_str()));
-    }
+    for (std::string const& argument : arguments) pointers.push_back(const_cast<char*>(argument.c_str()));
     pointers.push_back(nullptr);
 
     posix_spawn_file_actions_t actions;
@@ -28,9 +26,8 @@ int Spawn(std::vector<std::string> const& arguments, std::string const& output, 
     int const failed = posix_spawn(&child, command.c_str(), &actions, nullptr, pointers.data(), environ);
     posix_spawn_file_actions_destroy(&actions);
     int status = 0;
-    if (failed != 0 || waitpid(child, &status, 0) != child) {
+    if (failed != 0 || waitpid(child, &status, 0) != child)
         throw std::runtime_error("the command can't be run: " + command);
-    }
     return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
 }
 

@@ -22,9 +22,7 @@ std::vector<std::string> Lines(std::string const& text)
 {
     std::vector<std::string> lines;
     std::istringstream stream(text);
-    for (std::string line; std::getline(stream, line);) {
-        lines.push_back(line);
-    }
+    for (std::string line; std::getline(stream, line);) lines.push_back(line);
     return lines;
 }
 
@@ -32,9 +30,7 @@ std::vector<std::string> Cells(std::string const& line, char separator)
 {
     std::vector<std::string> cells;
     std::istringstream stream(line);
-    for (std::string cell; std::getline(stream, cell, separator);) {
-        cells.push_back(cell);
-    }
+    for (std::string cell; std::getline(stream, cell, separator);) cells.push_back(cell);
     return cells;
 }
 
@@ -155,13 +151,10 @@ TEST(Kfs, PlotDrawsEveryCurveWithItsLegend)
     EXPECT_EQ("", outcome.output + outcome.errors);
     std::string const svg = FileContent(drawing);
     for (char const* part :
-         {"<svg ", "bounce/ball/translation", "bounce/ball/rotation", "bounce/ball/scale", "seconds", "</svg>"}) {
+         {"<svg ", "bounce/ball/translation", "bounce/ball/rotation", "bounce/ball/scale", "seconds", "</svg>"})
         EXPECT_NE(std::string::npos, svg.find(part)) << part;
-    }
     std::size_t curves = 0;
-    for (std::size_t at = 0; (at = svg.find("<polyline", at)) != std::string::npos; ++at) {
-        ++curves;
-    }
+    for (std::size_t at = 0; (at = svg.find("<polyline", at)) != std::string::npos; ++at) ++curves;
     EXPECT_EQ(20U, curves);  // value and speed of 3 + 4 + 3 components
     EXPECT_EQ(std::string::npos, svg.find("nan"));
     EXPECT_EQ(svg, RunKfs({"plot", Sample(), "-o", "-"}).output);
@@ -223,9 +216,8 @@ TEST(Kfs, BadFilesAreOneLineAndCodeTwo)
     for (Row const& row : rows) {
         std::string const file = folder.Write(row.name, row.bytes);
         for (std::vector<std::string> const& command :
-             {std::vector<std::string>{"info", file}, {"eval", file}, {"plot", file, "-o", folder.Path("x.svg")}}) {
+             {std::vector<std::string>{"info", file}, {"eval", file}, {"plot", file, "-o", folder.Path("x.svg")}})
             ExpectFailure(RunKfs(command), file + ": " + row.error);
-        }
     }
     EXPECT_FALSE(std::filesystem::exists(folder.Path("x.svg")));
     ExpectFailure(RunKfs({"info", folder.Path("gone.glb")}),
@@ -275,21 +267,17 @@ TEST(Kfs, HelpTellsTheCommandsAndTheirOptions)
 {
     Outcome const help = RunKfs({"--help"});
     EXPECT_EQ(0, help.code);
-    for (char const* word : {"info", "eval", "plot", "exit code 2"}) {
+    for (char const* word : {"info", "eval", "plot", "exit code 2"})
         EXPECT_NE(std::string::npos, help.output.find(word)) << word;
-    }
     Outcome const eval = RunKfs({"eval", "--help"});
     EXPECT_EQ(0, eval.code);
-    for (char const* word : {"FILE", "--stream", "--from", "--to", "--fps", "--format", "--time-scale"}) {
+    for (char const* word : {"FILE", "--stream", "--from", "--to", "--fps", "--format", "--time-scale"})
         EXPECT_NE(std::string::npos, eval.output.find(word)) << word;
-    }
 }
 
 TEST(Kfs, AFullDiskIsAFailure)
 {
-    if (!std::filesystem::exists("/dev/full")) {
-        GTEST_SKIP() << "there is no /dev/full here";
-    }
+    if (!std::filesystem::exists("/dev/full")) GTEST_SKIP() << "there is no /dev/full here";
     ExpectFailure(RunKfs({"plot", Sample(), "-o", "/dev/full"}),
                   "/dev/full: can't be written: No space left on device");
     ExpectFailure(RunKfs({"eval", Sample()}, "/dev/full"),

@@ -20,9 +20,7 @@ std::string Bvh(int frames)
     std::string text = "HIERARCHY\nROOT hip\n{\nOFFSET 0 0 0\nCHANNELS 3 Xposition Yposition Zposition\n"
                        "End Site\n{\nOFFSET 0 1 0\n}\n}\nMOTION\nFrames: " +
                        std::to_string(frames) + "\nFrame Time: 0.04\n";
-    for (int frame = 0; frame < frames; ++frame) {
-        text += std::to_string(frame % 7) + " 0 1\n";
-    }
+    for (int frame = 0; frame < frames; ++frame) text += std::to_string(frame % 7) + " 0 1\n";
     return text;
 }
 
@@ -31,9 +29,7 @@ template <class Work>
 std::string InAnotherProcess(Work const& work, int* code)
 {
     int ends[2];
-    if (pipe(ends) != 0) {
-        throw std::runtime_error("no pipe for the test");
-    }
+    if (pipe(ends) != 0) throw std::runtime_error("no pipe for the test");
     pid_t const child = fork();
     if (child == 0) {
         close(ends[0]);
@@ -42,9 +38,8 @@ std::string InAnotherProcess(Work const& work, int* code)
     close(ends[1]);
     std::string text;
     char buffer[4096];
-    for (ssize_t got = 0; (got = read(ends[0], buffer, sizeof buffer)) > 0;) {
+    for (ssize_t got = 0; (got = read(ends[0], buffer, sizeof buffer)) > 0;)
         text.append(buffer, static_cast<std::size_t>(got));
-    }
     close(ends[0]);
     int status = 0;
     EXPECT_EQ(child, waitpid(child, &status, 0));
@@ -56,9 +51,8 @@ class KfsFullDisk : public testing::Test {
 protected:
     void SetUp() override
     {
-        for (auto const& [frames, project] : {std::pair{2, old_}, std::pair{4000, new_}}) {
+        for (auto const& [frames, project] : {std::pair{2, old_}, std::pair{4000, new_}})
             ASSERT_EQ(0, RunKfs({"import", folder_.Write("animation.bvh", Bvh(frames)), "-o", project}).code);
-        }
         std::filesystem::remove(folder_.Path("animation.bvh"));
     }
 
@@ -126,9 +120,7 @@ TEST_F(KfsFullDisk, ADiskWithoutRoom)
     int code = -1;
     std::string const found = InAnotherProcess(
         [&](int end) {
-            if (!MountSmallDisk(folder)) {
-                return NotPermitted;
-            }
+            if (!MountSmallDisk(folder)) return NotPermitted;
             std::string const before = FileContent(old_);
             place.Write("project", before);
             Outcome const outcome = RunKfs({"save-as", new_, "-o", target});
@@ -141,9 +133,7 @@ TEST_F(KfsFullDisk, ADiskWithoutRoom)
             return write(end, text.data(), text.size()) == static_cast<ssize_t>(text.size()) ? 0 : 1;
         },
         &code);
-    if (code == NotPermitted) {
-        GTEST_SKIP() << "this process may not mount a file system of its own";
-    }
+    if (code == NotPermitted) GTEST_SKIP() << "this process may not mount a file system of its own";
     EXPECT_EQ(0, code);
     EXPECT_EQ("2 kfs: " + target + ": can't be saved: can't write \"" + target +
                   "\": No space left on device\nthe old file, 1 in the folder, then 0",

@@ -20,9 +20,7 @@ std::string Sample()
 std::size_t Count(std::string const& text, std::string const& part)
 {
     std::size_t count = 0;
-    for (std::size_t at = 0; (at = text.find(part, at)) != std::string::npos; at += part.size()) {
-        ++count;
-    }
+    for (std::size_t at = 0; (at = text.find(part, at)) != std::string::npos; at += part.size()) ++count;
     return count;
 }
 
@@ -47,9 +45,7 @@ std::string Motion(std::vector<std::string> const& rows)
 {
     std::string text = "HIERARCHY\nROOT a\n{\nCHANNELS 3 Xposition Yposition Zposition\n}\nMOTION\nFrames: " +
                        std::to_string(rows.size()) + "\nFrame Time: 1\n";
-    for (std::string const& row : rows) {
-        text += row + '\n';
-    }
+    for (std::string const& row : rows) text += row + '\n';
     return text;
 }
 
@@ -72,9 +68,8 @@ TEST(KfsMotion, SpatialAgreesWithPlainAtKeysAndInAllThatIsNoPosition)
     json const spatial = Eval({Sample(), "--fps", "12", "--as", "spatial"});
     ASSERT_EQ(3U, spatial.at("streams").size());
     json const& places = spatial.at("streams")[0].at("values");
-    for (std::size_t frame : {0U, 6U, 15U, 22U, 27U, 30U}) {
+    for (std::size_t frame : {0U, 6U, 15U, 22U, 27U, 30U})
         EXPECT_EQ(plain.at("streams")[0].at("values")[frame], places[frame]) << frame;
-    }
     EXPECT_NE(plain.at("streams")[0].at("values")[3], places[3]);
     EXPECT_EQ(plain.at("streams")[1], spatial.at("streams")[1]);
     EXPECT_EQ(plain.at("streams")[2], spatial.at("streams")[2]);
@@ -89,9 +84,8 @@ TEST(KfsMotion, RovingMakesEqualStepsOfUnequalLegs)
     ASSERT_EQ(9U, values.size());
     for (std::size_t i = 0; i + 1 < values.size(); ++i) {
         double squares = 0.0;
-        for (std::size_t d = 0; d < 3; ++d) {
+        for (std::size_t d = 0; d < 3; ++d)
             squares += std::pow(values[i + 1][d].get<double>() - values[i][d].get<double>(), 2);
-        }
         EXPECT_NEAR(0.5, std::sqrt(squares), 1e-3) << i;
     }
 }
@@ -112,9 +106,8 @@ TEST(KfsMotion, TheDrawingHasItsMarks)
     EXPECT_EQ(61U + 1U, Count(svg, "r=\"2.3\""));
     EXPECT_EQ(10U + 1U, Count(svg, "r=\"3.5\""));
     EXPECT_EQ(0U, Count(svg, "float key"));
-    for (char const* text : {"from the front", ">route<", ">every 1/24 s<", ">tangent<", ">1.25 s<", ">seconds<"}) {
+    for (char const* text : {"from the front", ">route<", ">every 1/24 s<", ">tangent<", ">1.25 s<", ">seconds<"})
         EXPECT_EQ(1U, Count(svg, text)) << text;
-    }
 }
 
 TEST(KfsMotion, FloatKeysHaveAMarkOfTheirOwn)
@@ -140,9 +133,7 @@ TEST(KfsMotion, ItIsSeenFromTheSideThatShowsMost)
           Row{{"0 0 0", "9 5 4"}, {front, side, above}}, Row{{"7 0 0", "7 0 0"}, {front}}, Row{{"1 2 3"}, {front}}}) {
         std::string const svg = DrawMotion(folder.Write("a.bvh", Motion(row.places)));
         EXPECT_EQ(row.captions.size(), Count(svg, ">from ")) << row.places.back();
-        for (std::string const& caption : row.captions) {
-            EXPECT_EQ(1U, Count(svg, caption)) << row.places.back();
-        }
+        for (std::string const& caption : row.captions) EXPECT_EQ(1U, Count(svg, caption)) << row.places.back();
     }
 }
 
@@ -151,9 +142,7 @@ TEST(KfsMotion, ManyKeysDontHideTheRoute)
 {
     ScratchFolder const folder;
     std::vector<std::string> rows;
-    for (int i = 0; i < 1000; ++i) {
-        rows.push_back(std::to_string(i) + " 0 0");
-    }
+    for (int i = 0; i < 1000; ++i) rows.push_back(std::to_string(i) + " 0 0");
     std::string const svg = DrawMotion(folder.Write("a.bvh", Motion(rows)));
     EXPECT_EQ(2U + 1U, Count(svg, "<path"));
     EXPECT_EQ(1U, Count(svg, ">first, last key<"));

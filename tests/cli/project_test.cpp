@@ -113,9 +113,8 @@ TEST_F(KfsProject, AnswersLikeTheFileThatItWasImportedFrom)
         EXPECT_EQ("", found.errors);
         std::string output = found.output;
         // The file's name stands in what a JSON answer says of itself.
-        for (std::size_t at = 0; (at = output.find(project_)) != std::string::npos;) {
+        for (std::size_t at = 0; (at = output.find(project_)) != std::string::npos;)
             output.replace(at, project_.size(), Sample);
-        }
         EXPECT_TRUE(expected.output == output) << found.output;
     }
 }
@@ -190,9 +189,8 @@ TEST_F(KfsProject, DumpShowsTheChunks)
          {"       0  KFSF proj [", "\n      12    vers [12] version 95.0, encoding 0\n",
           "khti [16] 1/120000 s, exact, off by up to ", "kfsn [13] \"bouncing_ball\"\n",
           "kfmn [40] \"KFS Animation\"\n", "kfsn [6] \"bounce\"\n", "kfb4 [124] dimension 4, 1/120000 s, keys\n",
-          "] 6 keys of 128 bytes, times 0 to 300000\n", "khin [4] 2\n", "khco [7] \"x y z w\"\n"}) {
+          "] 6 keys of 128 bytes, times 0 to 300000\n", "khin [4] 2\n", "khco [7] \"x y z w\"\n"})
         EXPECT_NE(std::string::npos, outcome.output.find(line)) << line << "in\n" << outcome.output;
-    }
 }
 
 TEST_F(KfsProject, DumpShowsWhatIsWrong)

@@ -32,13 +32,13 @@ PathStream& Float(PathStream& stream, std::vector<int> const& indices)
 }
 
 struct FloatCase {
-    const char* why;
+    char const* why;
     std::vector<std::pair<int, double>> keys;  // the first and the last are anchors
     char out, in;                              // of the anchors
     std::vector<int> times;
 };
 
-const FloatCase kFloatCases[] = {
+FloatCase const FloatCases[] = {
     {"linear sides", {{0, 0}, {1, 10}, {2, 40}, {100, 100}}, 1, 1, {0, 10, 40, 100}},
     {"cut off towards the past", {{0, 0}, {1, 1}, {2, 2}, {100, 3}}, 1, 1, {0, 33, 66, 100}},
     {"on the earlier anchor", {{0, 0}, {50, 0}, {100, 8}}, 1, 1, {0, 1, 100}},
@@ -54,7 +54,7 @@ const FloatCase kFloatCases[] = {
 
 TEST_F(FloatKeys, TakeTheTimeAtWhichThePointPasses)
 {
-    for (FloatCase const& c : kFloatCases) {
+    for (FloatCase const& c : FloatCases) {
         for (bool const again : {false, true}) {
             SCOPED_TRACE(testing::Message() << c.why << (again ? ", twice" : ""));
             PathStream stream = Line(c.keys);
@@ -200,7 +200,7 @@ TEST_F(FloatKeys, KeepTheSpeedGraphWhenTheyStop)
 }
 
 struct MoveCase {
-    const char* why;
+    char const* why;
     std::vector<int> keys;
     std::vector<int> floats;
     int index, target;
@@ -209,7 +209,7 @@ struct MoveCase {
     std::array<int, 2> stale;
 };
 
-const MoveCase kMoveCases[] = {
+MoveCase const MoveCases[] = {
     {"between its neighbours", {0, 10, 20, 30}, {}, 1, 15, {0, 15, 20, 30}, 1, {0, 2}},
     {"to its own place", {0, 10, 20, 30}, {}, 1, 10, {0, 10, 20, 30}, 1, {0, 2}},
     {"past its neighbour", {0, 10, 20, 30}, {}, 1, 25, {0, 20, 25, 30}, 2, {0, 3}},
@@ -227,7 +227,7 @@ const MoveCase kMoveCases[] = {
 
 TEST_F(SetKeyTime, MovesTheKeyAndPacksFloatKeys)
 {
-    for (MoveCase const& c : kMoveCases) {
+    for (MoveCase const& c : MoveCases) {
         for (int const finer : {0, 1, 3}) {  // 0: the target as a bare value
             SCOPED_TRACE(testing::Message() << c.why << ", scale x" << finer);
             std::vector<std::pair<int, double>> keys;

@@ -14,7 +14,7 @@ namespace {
 using LazyRepair = StreamTest;
 
 struct Script {
-    const char* why;
+    char const* why;
     StreamOptions options;
     bool nonDecreasing = false;
     bool handles = false;   // temporal handles may be automatic
@@ -31,7 +31,7 @@ StreamOptions Spatial(short dimension, bool automatic)
 
 // Automatic tangents and automatic handles aren't mixed, nor automatic handles and float keys: a handle depends on arcs
 // that depend on tangents that depend on neighbours, and an edit's mark reaches its own neighbours only.
-const Script kScripts[] = {
+Script const Scripts[] = {
     {.why = "plain", .options = {.dimension = 2}, .handles = true},
     {.why = "plain, non-decreasing", .options = {}, .nonDecreasing = true, .handles = true},
     {.why = "chords", .options = Spatial(4, false), .handles = true},
@@ -190,7 +190,7 @@ void ExpectSame(KeyedStream const& expected, KeyedStream const& actual)
 
 TEST_F(LazyRepair, EqualsComputingEverything)
 {
-    for (Script const& script : kScripts) {
+    for (Script const& script : Scripts) {
         for (unsigned int seed = 1; seed <= 8; ++seed) {
             Editor editor(script, seed);
             for (int step = 0; step < 150; ++step) {
@@ -212,7 +212,7 @@ TEST_F(LazyRepair, EqualsComputingEverything)
 
 TEST_F(LazyRepair, DoesNotDependOnWhenItHappensAndIsNotSeenByReads)
 {
-    for (Script const& script : kScripts) {
+    for (Script const& script : Scripts) {
         if (script.floats) continue;  // a stale float key stands at another time, so later edits meet another list
         for (unsigned int seed = 100; seed < 120; ++seed) {
             SCOPED_TRACE(testing::Message() << script.why << ", seed " << seed);

@@ -11,17 +11,17 @@ namespace {
 using SpaceTangents = StreamTest;
 using SpatialFlags = StreamTest;
 
-constexpr double kLeft = -100.0;  // what a tangent held before
+constexpr double Left = -100.0;  // what a tangent held before
 
 struct TangentEdit {
-    const char* why;
+    char const* why;
     bool continuous;
     Vector oldIn, oldOut;
     Vector in, out;  // empty: not given
     Vector newIn, newOut;
 };
 
-const TangentEdit kTangentEdits[] = {
+TangentEdit const TangentEdits[] = {
     {"both", false, {0, 10}, {1, 1}, {1, 2}, {3, 4}, {1, 2}, {3, 4}},
     {"the out side alone", false, {0, 10}, {1, 1}, {}, {3, 4}, {0, 10}, {3, 4}},
     {"the in side alone", false, {0, 10}, {1, 1}, {5, 6}, {}, {5, 6}, {1, 1}},
@@ -36,7 +36,7 @@ const TangentEdit kTangentEdits[] = {
 
 TEST_F(SpaceTangents, AreStoredAndKeptInLine)
 {
-    for (TangentEdit const& edit : kTangentEdits) {
+    for (TangentEdit const& edit : TangentEdits) {
         for (bool const external : {true, false}) {
             SCOPED_TRACE(testing::Message() << edit.why << (external ? ", external type" : ", doubles"));
             PathStream stream({{0, {0, 0}}, {100, {5, 5}}, {200, {9, 0}}});
@@ -56,8 +56,8 @@ TEST_F(SpaceTangents, AreStoredAndKeptInLine)
             EXPECT_EQ(KFS_KeyFlag_TangentsSet, stream.Record(1)->flags & KFS_KeyFlag_TangentsSet);
             EXPECT_EQ(edit.continuous ? KFS_KeySpFlag_Continuous : 0U, stream.Record(1)->spFlags);
 
-            Vector newIn(2, kLeft);
-            Vector newOut(2, kLeft);
+            Vector newIn(2, Left);
+            Vector newOut(2, Left);
             ASSERT_EQ(0, KFS_GetKeySpaceTangentsF(stream, 1, 0, newIn.data(), newOut.data()));
             for (std::size_t i = 0; i < 2; ++i) {
                 EXPECT_NEAR(edit.newIn[i], newIn[i], 1e-14 * std::fabs(edit.newIn[i]));
@@ -157,13 +157,13 @@ TEST_F(SpaceTangents, RefuseWhatHasNone)
 
 // Which arcs a change of the flags makes stale: those around key 2, or none.
 struct FlagEdit {
-    const char* why;
+    char const* why;
     unsigned int mask, values;
     unsigned int before, after;
     bool stale;
 };
 
-const FlagEdit kFlagEdits[] = {
+FlagEdit const FlagEdits[] = {
     {"nothing", 0, 3, 1, 1, false},       {"continuous on", 1, 1, 2, 3, true},
     {"continuous off", 1, 0, 3, 2, true}, {"automatic on", 2, 3, 0, 2, true},
     {"automatic off", 2, 0, 3, 1, true},  {"a bit that is neither", 4, 4, 1, 5, false},
@@ -171,7 +171,7 @@ const FlagEdit kFlagEdits[] = {
 
 TEST_F(SpatialFlags, ReplaceTheBitsOfTheMask)
 {
-    for (FlagEdit const& edit : kFlagEdits) {
+    for (FlagEdit const& edit : FlagEdits) {
         SCOPED_TRACE(edit.why);
         PathStream stream({{0, {0, 0}}, {100, {1, 1}}, {200, {2, 0}}, {300, {3, 1}}, {400, {4, 0}}});
         stream.Record(2)->spFlags = edit.before;
@@ -240,10 +240,10 @@ TEST_F(SpatialFlags, RefuseEmptyAndDamagedStreams)
     unsigned int flags = 0;
     struct Call {
         int damagedOperation, emptyOperation;
-        const char* action;
+        char const* action;
         int (*run)(KFS_Stream*, unsigned int*);
     };
-    const Call calls[] = {
+    Call const calls[] = {
         {75, 72, "inquire about a key value in",
          [](KFS_Stream* s, unsigned int* out) { return KFS_GetKeySpFlags(s, 0, out); }},
         {76, 76, "alter a key value in", [](KFS_Stream* s, unsigned int*) { return KFS_SetKeySpFlags(s, 0, 1, 1); }},

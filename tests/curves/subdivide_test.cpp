@@ -166,14 +166,14 @@ TEST_F(Subdivide, CarriesALineWithHandles)
 
 // What a key gets where nothing is split, whatever was in the record before.
 struct RestCase {
-    const char* why;
+    char const* why;
     char out, in;  // of the segment's keys
     int time;
     char interp;
     double value;
 };
 
-const RestCase kRestCases[] = {
+RestCase const RestCases[] = {
     {"a linear segment", 1, 1, 300, KFS_Interp_None, 20},
     {"linear sides on a linear segment", 1, 1, 150, KFS_Interp_Linear, 15},
     {"a held segment", 3, 1, 300, KFS_Interp_None, 10},
@@ -186,7 +186,7 @@ const RestCase kRestCases[] = {
 
 TEST_F(Subdivide, TakesTheValueAndRestsWhereNothingIsSplit)
 {
-    for (RestCase const& c : kRestCases) {
+    for (RestCase const& c : RestCases) {
         for (double const left : {0.0, 4.5}) {
             SCOPED_TRACE(testing::Message() << c.why << ", the record held " << left);
             KeyedStream stream = MakeKeyed({{0, 10}, {600, 30}}, KFS_Interp_Linear);

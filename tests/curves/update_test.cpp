@@ -19,7 +19,7 @@ PathStream Corner()
 TEST_F(UpdateStream, MeasuresArcsAsTheStreamRunsThroughThem)
 {
     const struct {
-        const char* why;
+        char const* why;
         bool sParametrized;
         double xScale;
         std::array<double, 3> arcs;
@@ -110,7 +110,7 @@ TEST_F(UpdateStream, TouchesNothingOutsideTheMarks)
 TEST_F(UpdateStream, ComputesTheTangentsThatAreAutomatic)
 {
     const struct {
-        const char* why;
+        char const* why;
         unsigned short spInterp;
         bool set, modifiable, computed;
     } rows[] = {
@@ -190,7 +190,7 @@ TEST_F(UpdateStream, ConsumesTheMarksOfARepairThatFails)
 TEST_F(UpdateStream, GuardsRunItForTheMarkedKeysOnly)
 {
     const struct {
-        const char* why;
+        char const* why;
         int index;
         bool floats;
         bool tangents;  // asks UpdateStreamIfStaleTangents, else UpdateStreamIfFloatItem
@@ -252,14 +252,14 @@ TEST_F(UpdateStream, RefusesADamagedStream)
 // Keys stand at 100, 200 ... 600; letters say what a key is: s spline and automatic, m spline and the user's, l linear,
 // h hold.
 struct ReachCase {
-    const char* why;
-    const char* keys;
+    char const* why;
+    char const* keys;
     bool spatial;
     unsigned short action;
     int at, from, to;
 };
 
-const ReachCase kReachCases[] = {
+ReachCase const ReachCases[] = {
     {"no action", "ssssss", false, 0, 300, 300, 300},
     {"an unknown action", "ssssss", false, 7, 300, 300, 300},
     {"between automatic keys", "ssssss", false, 1, 300, 100, 500},
@@ -286,7 +286,7 @@ const ReachCase kReachCases[] = {
 
 TEST_F(PredictInvalid, ReachesAsFarAsTheNeighboursAreAutomatic)
 {
-    for (ReachCase const& c : kReachCases) {
+    for (ReachCase const& c : ReachCases) {
         SCOPED_TRACE(c.why);
         KeyedStream stream(c.spatial ? PathOptions(2, false) : StreamOptions{});
         Vector const value(c.spatial ? 2 : 1, 1.0);

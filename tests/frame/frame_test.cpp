@@ -19,10 +19,10 @@ struct Logged {
 TEST(Frame, LifeCycleIsLoggedAndLeavesNothingBehind)
 {
     std::vector<Logged> log;
-    const Q_LogSink previous = Q_SetLogSink([&log](int level, char const* tag, char const* topic, char const* text) {
+    Q_LogSink const previous = Q_SetLogSink([&log](int level, char const* tag, char const* topic, char const* text) {
         log.push_back({level, tag, topic, text});
     });
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
     EXPECT_EQ(nullptr, Get_VX_StreamFactory());
     EXPECT_EQ(0, KFS_Birth());
     EXPECT_NE(nullptr, Get_VX_StreamFactory());
@@ -31,7 +31,7 @@ TEST(Frame, LifeCycleIsLoggedAndLeavesNothingBehind)
     EXPECT_EQ(before, Q_MemoryLive(nullptr));
     EXPECT_EQ(0, KFS_Death()) << "without a birth before it";
     Q_SetLogSink(previous);
-    const std::vector<Logged> expected = {
+    std::vector<Logged> const expected = {
         {10, "KFS", "Birth", "KFS Birth"}, {10, "KFS", "Birth", "KFS StreamBase Birth"},
         {10, "KFS", "Death", "KFS Death"}, {10, "KFS", "Death", "KFS StreamBase Death"},
         {10, "KFS", "Death", "KFS Death"}, {10, "KFS", "Death", "KFS StreamBase Death"},
@@ -41,12 +41,12 @@ TEST(Frame, LifeCycleIsLoggedAndLeavesNothingBehind)
 
 TEST(Frame, BirthWithoutMemoryAnswers4AndDeathCleansUp)
 {
-    const ReportRecorder reports;
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    ReportRecorder const reports;
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
     int failures = 0;
     for (bool fired = true; fired;) {
         Q_FailAllocation(failures + 1);
-        const int code = KFS_Birth();
+        int const code = KFS_Birth();
         fired = Q_FailAllocationFired();
         Q_FailAllocation(0);
         EXPECT_EQ(fired ? 4 : 0, code);
@@ -80,7 +80,7 @@ TEST(Boundary, TurnsWhatIsThrownIntoAResult)
     EXPECT_NO_REPORT(reports);
     EXPECT_EQ(4, KFSp_Boundary([]() -> int { throw std::bad_alloc(); }));
     EXPECT_NE(0, KFSp_Boundary([]() -> int { throw std::runtime_error("engine stalled"); }));
-    const std::vector<Reported> seen = reports.Take();
+    std::vector<Reported> const seen = reports.Take();
     ASSERT_EQ(2u, seen.size());
     EXPECT_EQ("engine stalled", seen[1].text);
     EXPECT_THROW(KFSp_Boundary([] { throw 'x'; }), char);

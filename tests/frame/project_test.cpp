@@ -17,11 +17,11 @@ TEST_F(Projects, TheCurrentProjectIsTheThreadsContexts)
     EXPECT_EQ(&session.GetProject(), KFS_GetCurrentProject());
     EXPECT_EQ(&session.GetProject(), KFS_GetCurrentConstProject());
     {
-        const Q_ScSetCurrentContext foreign(boost::shared_ptr<Q_Context>(new ForeignContext));
+        Q_ScSetCurrentContext const foreign(boost::shared_ptr<Q_Context>(new ForeignContext));
         EXPECT_EQ(nullptr, KFS_GetCurrentProject()) << "a context that belongs to no project";
     }
     {
-        const Q_ScSetCurrentContext none{boost::shared_ptr<Q_Context>()};
+        Q_ScSetCurrentContext const none{boost::shared_ptr<Q_Context>()};
         EXPECT_EQ(nullptr, KFS_GetCurrentProject());
     }
     kfshost::Project other;
@@ -37,14 +37,14 @@ TEST_F(Projects, TheCurrentRenderContextIsUsedOnlyWhenAsked)
     Q_RenderContext* const own = other.GetRenderContext(false);
     EXPECT_NE(own, Q_RenderContext::PeekCurrent());
     EXPECT_EQ(Q_RenderContext::PeekCurrent(), other.GetRenderContext(true));
-    const Q_ScSetCurrentRenderContext none{boost::shared_ptr<Q_RenderContext>()};
+    Q_ScSetCurrentRenderContext const none{boost::shared_ptr<Q_RenderContext>()};
     EXPECT_EQ(own, other.GetRenderContext(true));
 }
 
 TEST_F(Projects, InitializingAgainReplacesBothContexts)
 {
     kfshost::Project project;
-    const boost::shared_ptr<KFS_Context> context = project.GetContext();
+    boost::shared_ptr<KFS_Context> const context = project.GetContext();
     project.InitializeContexts();
     EXPECT_NE(context, project.GetContext());
     EXPECT_EQ(&project, project.GetContext()->GetProject());
@@ -55,9 +55,8 @@ TEST_F(Projects, InitializingAgainReplacesBothContexts)
 TEST_F(Projects, StatesAreFoundByTheirNames)
 {
     Q_RenderContext const* const context = Q_RenderContext::PeekCurrent();
-    for (char const* const name : {"ExpState", "RenderState", "KFS_CapsuleOverrides", "KFS_StreamCacheState"}) {
+    for (char const* const name : {"ExpState", "RenderState", "KFS_CapsuleOverrides", "KFS_StreamCacheState"})
         EXPECT_NE(nullptr, context->PeekState(hearth::utility::ImmutableString::Create(name))) << name;
-    }
 }
 
 TEST_F(Projects, DetectingErrorsNestsAndTheOutermostClearsTheCount)
@@ -65,9 +64,9 @@ TEST_F(Projects, DetectingErrorsNestsAndTheOutermostClearsTheCount)
     kfshost::ExpState state;
     state.errorCount = 3;
     {
-        const KFS_DetectExpressionErrors outer(&state);
+        KFS_DetectExpressionErrors const outer(&state);
         {
-            const KFS_DetectExpressionErrors inner(&state);
+            KFS_DetectExpressionErrors const inner(&state);
             state.errorCount = 5;
         }
         EXPECT_TRUE(state.detectingErrors);
@@ -81,10 +80,10 @@ TEST_F(Projects, SuspensionsNestWhateverTheOrderOfTheirLastReferences)
 {
     KFS_RenderState state;
     {
-        const KFS_RenderState::Suspension outer = state.SuspendAutoDecanonicalize();
+        KFS_RenderState::Suspension const outer = state.SuspendAutoDecanonicalize();
         {
-            const KFS_RenderState::Suspension inner = state.SuspendAutoDecanonicalize();
-            const KFS_RenderState::Suspension second = inner;
+            KFS_RenderState::Suspension const inner = state.SuspendAutoDecanonicalize();
+            KFS_RenderState::Suspension const second = inner;
             EXPECT_TRUE(state.GetAutoDecanonicalizeIsSuspended());
         }
         EXPECT_TRUE(state.GetAutoDecanonicalizeIsSuspended());
@@ -97,9 +96,7 @@ class FilledBag : public KFS_ParamBag {
 public:
     explicit FilledBag(std::initializer_list<unsigned short> names)
     {
-        for (const unsigned short name : names) {
-            overrides_[u16str(1, name)] = nullptr;
-        }
+        for (unsigned short const name : names) overrides_[u16str(1, name)] = nullptr;
     }
 };
 

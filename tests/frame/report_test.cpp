@@ -16,7 +16,7 @@ struct Sentence {
 
 TEST_F(Reports, EveryCodeHasItsSentence)
 {
-    const Sentence sentences[] = {
+    Sentence const sentences[] = {
         {2, 4, "attempt to get a value from an internally damaged time stream."},
         {7425, 7, "attempt to overwrite an already existing time stream key value."},
         {7426, 13, "attempt to get a key value from a constant time stream."},
@@ -40,7 +40,7 @@ TEST_F(Reports, EveryCodeHasItsSentence)
         {9999, 12, "unknown error (9999)."},
         {-1, 12, "unknown error (-1)."},
     };
-    for (const Sentence& sentence : sentences) {
+    for (Sentence const& sentence : sentences) {
         SCOPED_TRACE(sentence.code);
         EXPECT_EQ(sentence.code, KFSp_ReportErr(36, sentence.code, sentence.argument));
         EXPECT_REPORT(reports, 36, sentence.text);
@@ -62,7 +62,7 @@ TEST_F(Reports, LastErrorAndIdFollowTheKindOfSentence)
     EXPECT_EQ(77, Qp_GetThreadLastError());
     KFSp_ReportErr(0x70024, KFS_Err_NoKeys, 4);
     EXPECT_EQ(0, Qp_GetThreadLastError());
-    const std::vector<Reported> seen = reports.Take();
+    std::vector<Reported> const seen = reports.Take();
     ASSERT_EQ(2u, seen.size());
     EXPECT_EQ(0x1D002D, seen[0].id);
     EXPECT_EQ(0x1D0024, seen[1].id);
@@ -93,7 +93,7 @@ TEST_F(Reports, TableHoldsOneHundredNumberedRowsAndACloser)
 
 TEST_F(Reports, DamagedStreamIsKnownByItsStampAlone)
 {
-    const DamagedStream damaged;
+    DamagedStream const damaged;
     EXPECT_EQ(2, KFSp_CheckStream(23, damaged.get(), 14));
     EXPECT_EQ(std::vector{DamagedReport(23, "inquire about a key value in")}, reports.Take());
     EXPECT_TRUE(damaged.Untouched());

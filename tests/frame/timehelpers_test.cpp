@@ -17,8 +17,8 @@ hearth::utility::Guid MixIn(T_Time const& time)
 
 TEST(TimeHelpers, ConvertIntoTheWantedScale)
 {
-    const T_Time third{1, 3};
-    const T_Time half{1, 2};
+    T_Time const third{1, 3};
+    T_Time const half{1, 2};
     T_Time result{};
     ASSERT_EQ(0, KFS_AddTime(&third, &half, 600, &result));
     EXPECT_EQ(500, result.value);
@@ -26,15 +26,15 @@ TEST(TimeHelpers, ConvertIntoTheWantedScale)
     ASSERT_EQ(0, KFS_SubTime(&third, &half, 600, &result));
     EXPECT_EQ(-100, result.value);
     EXPECT_EQ(1, half.value) << "the argument stays";
-    const M_Ratio twice{2, 1};
+    M_Ratio const twice{2, 1};
     ASSERT_EQ(0, KFS_MulTime(&third, &twice, 30, &result));
     EXPECT_EQ(20, result.value);
 }
 
 TEST(TimeHelpers, WithoutAScaleTheSumIsExact)
 {
-    const T_Time third{1, 3};
-    const T_Time seventh{1, 7};
+    T_Time const third{1, 3};
+    T_Time const seventh{1, 7};
     T_Time sum{};
     ASSERT_EQ(0, KFS_AddTime(&third, &seventh, 0, &sum));
     EXPECT_TRUE(sum == (T_Time{10, 21}));
@@ -42,8 +42,8 @@ TEST(TimeHelpers, WithoutAScaleTheSumIsExact)
 
 TEST(TimeHelpers, AFailedConversionLeavesNoScale)
 {
-    const T_Time large{INT_MAX, 1};
-    const T_Time zero{0, 1};
+    T_Time const large{INT_MAX, 1};
+    T_Time const zero{0, 1};
     T_Time result{7, 7};
     EXPECT_EQ(T_Err_Overflow, KFS_AddTime(&large, &zero, 600, &result));
     EXPECT_EQ(0u, result.scale);

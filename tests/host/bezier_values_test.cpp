@@ -28,9 +28,7 @@ struct CurveKey {
 std::unique_ptr<KFS_Stream> Build(std::vector<CurveKey> const& keys, unsigned int scale)
 {
     StreamBuilder builder(1, scale, "curve");
-    for (CurveKey const& key : keys) {
-        builder.Append(key.time.ToUnits(scale), &key.value, key.in, key.out);
-    }
+    for (CurveKey const& key : keys) builder.Append(key.time.ToUnits(scale), &key.value, key.in, key.out);
     for (std::size_t i = 0; i < keys.size(); ++i) {
         CurveKey const& key = keys[i];
         builder.SetHandles(static_cast<int>(i),
@@ -62,9 +60,7 @@ std::optional<unsigned int> CommonScale(std::vector<Rational> const& times)
     for (Rational const& time : times) {
         scale = std::lcm(scale, time.Denominator());
         longest = std::max(longest, std::abs(time.ToDouble()));
-        if (scale * std::max(longest, 1e-9) > INT_MAX || scale > UINT_MAX) {
-            return std::nullopt;
-        }
+        if (scale * std::max(longest, 1e-9) > INT_MAX || scale > UINT_MAX) return std::nullopt;
     }
     return static_cast<unsigned int>(scale);
 }
@@ -104,9 +100,7 @@ std::vector<CurveKey> KeysOf(json const& curve)
 std::vector<Rational> TimesOf(json const& list)
 {
     std::vector<Rational> times;
-    for (json const& time : list) {
-        times.push_back(TimeOf(time));
-    }
+    for (json const& time : list) times.push_back(TimeOf(time));
     return times;
 }
 
@@ -139,11 +133,10 @@ void CompareCurve(json const& curve)
     for (std::size_t i = 0; i < times.size(); ++i) {
         SCOPED_TRACE(testing::Message() << curve.at("id") << " at " << times[i].ToString() << " s, kind " << kinds[i]);
         bool const isExact = kinds[i] == 'k' || kinds[i] == 'o';
-        if (isExact || exactScale) {
+        if (isExact || exactScale)
             ASSERT_NEAR(values[i], ReadOne(*stream, times[i]), isExact ? 0.0 : 1e-9 * range);
-        } else {
+        else
             ASSERT_TRUE(Reaches(*stream, times[i], 1, values[i], 1e-9 * range));
-        }
     }
 }
 
@@ -154,9 +147,7 @@ TEST_P(HandAuthoredCurves, AreMetEverywhere)
     SKIP_WITHOUT_SHARED_DATA();
     json const file = LoadSharedJson(GetParam());
     ASSERT_FALSE(file.at("curves").empty());
-    for (json const& curve : file.at("curves")) {
-        ASSERT_NO_FATAL_FAILURE(CompareCurve(curve));
-    }
+    for (json const& curve : file.at("curves")) ASSERT_NO_FATAL_FAILURE(CompareCurve(curve));
 }
 
 INSTANTIATE_TEST_SUITE_P(AllFiles, HandAuthoredCurves,
@@ -194,9 +185,8 @@ Rational Decimal(double seconds)
 std::vector<CurveKey> KnotsOf(json const& spline)
 {
     std::vector<CurveKey> keys;
-    for (json const& knot : spline.at("knots")) {
+    for (json const& knot : spline.at("knots"))
         keys.push_back({Decimal(knot.at("time")), knot.at("value"), KFS_Interp_Linear, KFS_Interp_Linear, {}, {}});
-    }
     for (std::size_t i = 0; i + 1 < keys.size(); ++i) {
         json const& segment = spline.at("segments")[i];
         KFS_Interp const code = segment.contains("type") ? CodeOf(segment.at("type")) : KFS_Interp_Spline;
@@ -222,9 +212,7 @@ TEST_F(SampledSplines, BaselinesAreMet)
 {
     int compared = 0;
     for (json const& spline : file_.at("baselines")) {
-        if (!CanBeHeld(spline)) {
-            continue;
-        }
+        if (!CanBeHeld(spline)) continue;
         ++compared;
         std::vector<CurveKey> const keys = KnotsOf(spline);
         bool const isPrinted = spline.at("digits").get<int>() < 17;
@@ -234,9 +222,7 @@ TEST_F(SampledSplines, BaselinesAreMet)
         json const& samples = spline.at("samples");
         for (std::size_t i = 0; i < samples.size(); ++i) {
             Rational const time = Decimal(samples[i][0]);
-            if (std::ranges::find(suspects, i) != suspects.end() || !IsInside(keys, time)) {
-                continue;
-            }
+            if (std::ranges::find(suspects, i) != suspects.end() || !IsInside(keys, time)) continue;
             ASSERT_TRUE(Reaches(*stream, time, isPrinted ? 20 : 2, samples[i][1], isPrinted ? 2e-6 : 1e-9))
                 << spline.at("name") << " at " << samples[i][0] << ": " << samples[i][1] << " against "
                 << ReadOne(*stream, time);
@@ -250,9 +236,7 @@ TEST_F(SampledSplines, OddShapesAreMet)
 {
     int compared = 0;
     for (json const& spline : file_.at("museum")) {
-        if (!CanBeHeld(spline) || !spline.contains("t")) {
-            continue;
-        }
+        if (!CanBeHeld(spline) || !spline.contains("t")) continue;
         ++compared;
         std::vector<CurveKey> const keys = KnotsOf(spline);
         auto const stream = Build(keys, FinestScale(keys));

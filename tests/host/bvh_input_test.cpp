@@ -75,9 +75,7 @@ TEST_F(BvhInput, BecomesAStreamForPositionsAndOneForAngles)
 TEST_F(BvhInput, LineEndsAndBlanksDoNotMatter)
 {
     std::string text = Good;
-    for (std::size_t at = 0; (at = text.find('\n', at)) != std::string::npos; at += 2) {
-        text.replace(at, 1, "\r\n");
-    }
+    for (std::size_t at = 0; (at = text.find('\n', at)) != std::string::npos; at += 2) text.replace(at, 1, "\r\n");
     kfshost::Scene const scene = Import("\n \t" + text + "\n\n");
     ASSERT_EQ(3U, scene.streams.size());
     EXPECT_EQ("motion/Left Leg/angles", scene.streams[2].path);
@@ -135,9 +133,7 @@ TEST_F(BvhInput, SaysWhatIsWrongAndOnWhichLine)
         {With("10 11", "10 nan"), "line 20: \"nan\" isn't a number of a frame"},
         {With("10 11", "10 1e400"), "line 20: \"1e400\" isn't a number of a frame"},
     };
-    for (Row const& row : rows) {
-        EXPECT_EQ(row.error, ErrorOf(row.text)) << row.text.substr(0, 40);
-    }
+    for (Row const& row : rows) EXPECT_EQ(row.error, ErrorOf(row.text)) << row.text.substr(0, 40);
 }
 
 // Joints inside joints cost no stack.
@@ -146,12 +142,8 @@ TEST_F(BvhInput, AnyDepthIsFine)
     constexpr int depth = 20000;
     std::string text = "HIERARCHY\nROOT a { OFFSET 0 0 0 CHANNELS 1 Xrotation\n";
     text.replace(text.find(" {"), 2, "\n{");
-    for (int i = 0; i < depth; ++i) {
-        text += "JOINT b\n{\n";
-    }
-    for (int i = 0; i <= depth; ++i) {
-        text += "}\n";
-    }
+    for (int i = 0; i < depth; ++i) text += "JOINT b\n{\n";
+    for (int i = 0; i <= depth; ++i) text += "}\n";
     EXPECT_EQ(1U, Import(text + "MOTION\nFrames: 1\nFrame Time: 1\n5\n").streams.size());
 }
 
@@ -163,12 +155,8 @@ TEST_F(BvhInput, SurvivesAnything)
     std::uniform_int_distribution<int> byte(0, 255);
     for (int round = 0; round < 300; ++round) {
         std::string text = good;
-        for (int change = 0; change <= round % 3; ++change) {
-            text[place(random)] = static_cast<char>(byte(random));
-        }
-        if (round % 5 == 0) {
-            text.resize(place(random));
-        }
+        for (int change = 0; change <= round % 3; ++change) text[place(random)] = static_cast<char>(byte(random));
+        if (round % 5 == 0) text.resize(place(random));
         std::string const error = ErrorOf(text);
         EXPECT_EQ(std::string::npos, error.find_first_of("\n\r\x1B")) << error;
     }

@@ -24,9 +24,8 @@ Found FindChannel(Scene const& scene, json const& channel)
     std::string const place = "joints[" + std::to_string(channel.at("joint_index").get<int>()) + ']';
     for (StreamItem const& item : scene.streams) {
         auto const name = std::ranges::find(item.components, channel.at("channel").get<std::string>());
-        if (item.place == place && name != item.components.end()) {
+        if (item.place == place && name != item.components.end())
             return {&item, static_cast<std::size_t>(name - item.components.begin())};
-        }
     }
     return {};
 }

@@ -41,9 +41,7 @@ Scene SceneOfKeys(int keys)
 std::string FailureWithin(std::size_t limit, kfshost::SceneGroup const& tree, std::string const& target)
 {
     int ends[2];
-    if (pipe(ends) != 0) {
-        throw std::runtime_error("no pipe for the test");
-    }
+    if (pipe(ends) != 0) throw std::runtime_error("no pipe for the test");
     pid_t const child = fork();
     if (child == 0) {
         std::signal(SIGXFSZ, SIG_IGN);  // so that the write fails instead
@@ -95,9 +93,7 @@ TEST_F(FullDisk, AtAnyByte)
 {
     auto const tree = kfshost::MakeTree(SceneOfKeys(2));
     std::string const whole = BytesOf(*tree);
-    for (std::size_t limit = 0; limit < whole.size(); ++limit) {
-        ASSERT_NO_FATAL_FAILURE(ExpectTheOldFile(limit, *tree));
-    }
+    for (std::size_t limit = 0; limit < whole.size(); ++limit) ASSERT_NO_FATAL_FAILURE(ExpectTheOldFile(limit, *tree));
     EXPECT_EQ("", FailureWithin(whole.size(), *tree, target_));
     EXPECT_TRUE(whole == FileContent(target_));
 }
@@ -111,9 +107,7 @@ TEST_F(FullDisk, BetweenThePieces)
     std::vector<std::size_t> limits{0, 1, 65535, 65536, 65537, 131072, whole.size() - 1};
     std::mt19937 random(5);
     std::generate_n(std::back_inserter(limits), 10, [&] { return random() % whole.size(); });
-    for (std::size_t const limit : limits) {
-        ASSERT_NO_FATAL_FAILURE(ExpectTheOldFile(limit, *tree));
-    }
+    for (std::size_t const limit : limits) ASSERT_NO_FATAL_FAILURE(ExpectTheOldFile(limit, *tree));
     EXPECT_EQ("", FailureWithin(whole.size(), *tree, target_));
     EXPECT_TRUE(whole == FileContent(target_));
 }

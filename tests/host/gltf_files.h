@@ -45,9 +45,8 @@ public:
     {
         nlohmann::json whole = document;
         nlohmann::json& buffer = whole["buffers"][0];
-        if (buffer.is_object() && !buffer.contains("uri")) {
+        if (buffer.is_object() && !buffer.contains("uri"))
             buffer["uri"] = "data:application/octet-stream;base64," + Base64();
-        }
         return whole.dump();
     }
 

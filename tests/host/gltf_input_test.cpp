@@ -115,9 +115,7 @@ TEST_F(GltfInput, NormalizedIntegersBecomeFractions)
     for (Row const& row : rows) {
         GltfFile file;
         file.data.resize(12);
-        for (int key = 0; key < 3; ++key) {
-            file.data += row.bytes;
-        }
+        for (int key = 0; key < 3; ++key) file.data += row.bytes;
         file.document["buffers"][0]["byteLength"] = file.data.size();
         file.document["bufferViews"][1]["byteLength"] = file.data.size() - 12;
         file.document["accessors"][1] = {{"bufferView", 1},
@@ -290,9 +288,7 @@ TEST_F(GltfInput, ASmallFileCannotAskForAnyNumberOfKeys)
     json& channels = file.document["animations"][0]["channels"];
     json const channel = channels[0];
     ASSERT_EQ(1U, Import(file).streams.size());
-    for (int i = 1; i < 700; ++i) {
-        channels.push_back(channel);
-    }
+    for (int i = 1; i < 700; ++i) channels.push_back(channel);
     EXPECT_EQ("animations[0].channels[41]: the file's channels ask for more keys than are accepted",
               ErrorOf("a.gltf", file.Text()));
 }
@@ -307,12 +303,8 @@ TEST_F(GltfInput, SurvivesAnything)
         std::uniform_int_distribution<int> byte(0, 255);
         for (int round = 0; round < 300; ++round) {
             std::string bytes = good;
-            for (int change = 0; change <= round % 3; ++change) {
-                bytes[place(random)] = static_cast<char>(byte(random));
-            }
-            if (round % 5 == 0) {
-                bytes.resize(place(random));
-            }
+            for (int change = 0; change <= round % 3; ++change) bytes[place(random)] = static_cast<char>(byte(random));
+            if (round % 5 == 0) bytes.resize(place(random));
             std::string const error = ErrorOf(isBinary ? "a.glb" : "a.gltf", bytes);
             EXPECT_EQ(std::string::npos, error.find_first_of("\n\r\x1B")) << error;
         }

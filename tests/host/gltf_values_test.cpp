@@ -57,9 +57,7 @@ std::vector<Met> MetAround(StreamItem const& item, Rational const& time, double 
     for (std::int64_t const units :
          {time.ToUnits(scale) - reach, std::int64_t{time.ToUnits(scale)}, time.ToUnits(scale) + reach}) {
         kfshost::ReadAt(*item.stream, Rational(units, scale), row.data());
-        for (std::size_t d = 0; d < row.size(); ++d) {
-            met[d].Add(row[d]);
-        }
+        for (std::size_t d = 0; d < row.size(); ++d) met[d].Add(row[d]);
     }
     return met;
 }
@@ -71,9 +69,7 @@ void CompareChannel(StreamItem const& item, json const& channel, double keyRound
     double const tolerance = std::max(1e-9 * RangeOf(channel.at("v")), 1e-14);
     std::string const kinds = channel.at("kind");
     for (std::size_t i = 0; i < kinds.size(); ++i) {
-        if (kinds[i] == 'n' && !nearKeys) {
-            continue;
-        }
+        if (kinds[i] == 'n' && !nearKeys) continue;
         Rational const time = TimeOf(channel.at("t")[i]);
         bool const isExact = channel.at("interp") == "STEP" || kinds[i] == 'k' || kinds[i] == 'o';
         double const rounding = isExact ? 0.0 : keyRounding + RoundingOf(time, item.stream->GetTimeScale());
@@ -159,19 +155,15 @@ TEST_F(GltfFiles, SplinesAnswerWhatTheirAuthorsPublished)
     int seen = 0;
     for (StreamItem const& item : scene.streams) {
         auto const values = published.find(item.path);
-        if (values == published.end()) {
-            continue;
-        }
+        if (values == published.end()) continue;
         ++seen;
         std::vector<double> row(item.components.size());
         kfshost::ReadAt(*item.stream, Rational(155, 100), row.data());
         double length = 1.0;
-        if (item.kind == kfshost::StreamKind::Rotation) {  // the store doesn't normalise, its caller does
+        if (item.kind == kfshost::StreamKind::Rotation)  // the store doesn't normalise, its caller does
             length = std::sqrt(row[0] * row[0] + row[1] * row[1] + row[2] * row[2] + row[3] * row[3]);
-        }
-        for (std::size_t d = 0; d < row.size(); ++d) {
+        for (std::size_t d = 0; d < row.size(); ++d)
             EXPECT_NEAR(values->second[d], row[d] / length, 1e-6) << item.path << ' ' << d;
-        }
     }
     EXPECT_EQ(3, seen);
 }

@@ -30,9 +30,8 @@ inline std::filesystem::path SharedData(std::string const& name)
 }
 
 #define SKIP_WITHOUT_SHARED_DATA()                                                                                     \
-    if (!std::filesystem::exists(SharedData("README.md"))) {                                                           \
-        GTEST_SKIP() << "the real animation files aren't there: " << KFS_TEST_DATA;                                    \
-    }
+    if (!std::filesystem::exists(SharedData("README.md")))                                                             \
+        GTEST_SKIP() << "the real animation files aren't there: " << KFS_TEST_DATA;
 
 inline nlohmann::json LoadSharedJson(std::string const& name)
 {

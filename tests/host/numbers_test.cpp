@@ -43,9 +43,8 @@ TEST(Rational, RefusesEveryOtherText)
 {
     for (char const* text : {"",     "-",    ".",      "1/0",    "1/",     "/2",  "1.2.3", "--1",
                              "1/-2", "+1",   " 1",     "1 ",     "0x10",   "nan", "inf",   "9223372036854775808",
-                             "1e",   "1e99", "9e18/1", "1e18.5", "100e18", "1,5"}) {
+                             "1e",   "1e99", "9e18/1", "1e18.5", "100e18", "1,5"})
         EXPECT_FALSE(Rational::Parse(text)) << text;
-    }
 }
 
 TEST(Rational, RoundsToUnitsWithHalvesAwayFromZeroAndStaysInRange)
@@ -72,9 +71,7 @@ TEST(Rational, ArithmeticHoldsItselfAgainstIntegers)
         EXPECT_EQ(Rational(a * d + c * b, b * d), x + y);
         EXPECT_EQ(x, x + y - y);
         EXPECT_EQ(a * d < c * b, x < y);
-        if (c != 0) {
-            EXPECT_EQ(x, x * y / y);
-        }
+        if (c != 0) EXPECT_EQ(x, x * y / y);
     }
     EXPECT_THROW(Rational(LLONG_MAX, 1) + Rational(1, 1), std::overflow_error);
     EXPECT_THROW(Rational(1, 1) / Rational(), std::invalid_argument);
@@ -85,9 +82,7 @@ namespace {
 std::vector<float> Frames(int count, double fps)
 {
     std::vector<float> times;
-    for (int i = 0; i < count; ++i) {
-        times.push_back(static_cast<float>(i / fps));
-    }
+    for (int i = 0; i < count; ++i) times.push_back(static_cast<float>(i / fps));
     return times;
 }
 

@@ -52,9 +52,7 @@ std::string Changed(std::string const& chunks, std::string const& dropped, std::
     for (std::size_t at = 0; at < chunks.size();) {
         std::string const found = chunks.substr(at, 4);
         std::size_t size = 0;
-        for (std::size_t i = 4; i < 8; ++i) {
-            size = size << 8 | static_cast<unsigned char>(chunks[at + i]);
-        }
+        for (std::size_t i = 4; i < 8; ++i) size = size << 8 | static_cast<unsigned char>(chunks[at + i]);
         std::string const data = chunks.substr(at + 8, size);
         if (found == "LIST") {
             std::string const type = data.substr(0, 4);
@@ -133,20 +131,13 @@ TEST_F(OldProjects, LoadWhatTheirVersionHas)
     for (auto const& c : cases) {
         SCOPED_TRACE(std::to_string(c.version.major) + '.' + std::to_string(c.version.minor));
         File file(*original);
-        if (!c.flags) {
-            file.Drop("kfsb");
-        }
-        if (!c.names) {
-            file.Drop("kfsn");
-        }
-        if (c.handles) {
-            file.Rename("Utf8", "expr");
-        }
+        if (!c.flags) file.Drop("kfsb");
+        if (!c.names) file.Drop("kfsn");
+        if (c.handles) file.Rename("Utf8", "expr");
         auto tree = file.Of(c.version).Load();
         EXPECT_EQ(c.flags, tree->IsHidden());
-        if (c.flags && c.names) {
+        if (c.flags && c.names)
             EXPECT_TRUE(File(*original).Bytes() == File(*tree).Bytes()) << "what a save makes of it";
-        }
         Scene const scene = kfshost::TakeScene(std::move(tree));
         ASSERT_EQ(1u, scene.streams.size());
         StreamItem const& item = scene.streams.front();

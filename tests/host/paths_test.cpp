@@ -64,9 +64,7 @@ Place Hermite(float const* keys, double seconds, double u)
 double DistanceToHermite(Place const& place, float const* keys, double seconds)
 {
     double least = HUGE_VAL;
-    for (int i = 0; i <= 20000; ++i) {
-        least = std::min(least, Distance(place, Hermite(keys, seconds, i / 20000.0)));
-    }
+    for (int i = 0; i <= 20000; ++i) least = std::min(least, Distance(place, Hermite(keys, seconds, i / 20000.0)));
     return least;
 }
 
@@ -75,9 +73,7 @@ std::vector<float> RandomNumbers(unsigned int seed, std::size_t count)
     std::mt19937 engine(seed);
     std::uniform_real_distribution<float> number(-3.0F, 3.0F);
     std::vector<float> numbers(count);
-    for (float& each : numbers) {
-        each = number(engine);
-    }
+    for (float& each : numbers) each = number(engine);
     return numbers;
 }
 
@@ -93,9 +89,8 @@ TEST_F(Paths, AgreeWithThePlainReadingAtKeysAndBeyond)
             auto const path = kfshost::MakePath(item);
             ASSERT_EQ(3, kfshost::KeyCount(*path));
             for (Rational const& time :
-                 {Rational(-5, 1), Rational(0, 1), Rational(1, 2), Rational(1, 1), Rational(7, 1)}) {
+                 {Rational(-5, 1), Rational(0, 1), Rational(1, 2), Rational(1, 1), Rational(7, 1)})
                 EXPECT_EQ(At(*item.stream, time), At(*path, time)) << time.ToString();
-            }
         }
     }
 }
@@ -166,9 +161,8 @@ TEST_F(Paths, FloatKeysEvenOutTheSpeed)
     EXPECT_EQ(1U, kfshost::FloatKeyCount(*path));
     EXPECT_FALSE(kfshost::IsFloatKey(*path, 0));
     EXPECT_NEAR(0.25, kfshost::KeyTime(*path, 1).ToDouble(), 1e-4);
-    for (int i = 0; i < 8; ++i) {
+    for (int i = 0; i < 8; ++i)
         EXPECT_NEAR(0.5, Distance(At(*path, Rational(i, 8)), At(*path, Rational(i + 1, 8))), 2e-3) << i;
-    }
 }
 
 TEST_F(Paths, WhatNeverMovesStaysThere)
@@ -183,9 +177,8 @@ TEST_F(Paths, WhatNeverMovesStaysThere)
         Scene const scene = Import(interpolation, numbers);
         auto const path = kfshost::MakePath(scene.streams.front());
         kfshost::LetInnerKeysFloat(*path);
-        for (int i = 0; i <= 24; ++i) {
+        for (int i = 0; i <= 24; ++i)
             EXPECT_EQ((Place{5, 6, 7}), At(*path, Rational(i, 24))) << interpolation << ' ' << i;
-        }
     }
 }
 

@@ -24,9 +24,7 @@ std::string const Sample = KFS_TEST_SAMPLES "/bouncing_ball.gltf";
 std::map<std::string, StreamItem const*> ByPath(Scene const& scene)
 {
     std::map<std::string, StreamItem const*> items;
-    for (StreamItem const& item : scene.streams) {
-        EXPECT_TRUE(items.emplace(item.path, &item).second) << item.path;
-    }
+    for (StreamItem const& item : scene.streams) EXPECT_TRUE(items.emplace(item.path, &item).second) << item.path;
     return items;
 }
 
@@ -49,9 +47,7 @@ void ExpectSameStream(KFS_Stream const& expected, KFS_Stream const& found, std::
         ASSERT_EQ(inBefore, inAfter);
         ASSERT_EQ(outBefore, outAfter);
     }
-    if (expected.GetKeyCount() == 0) {
-        return;
-    }
+    if (expected.GetKeyCount() == 0) return;
     constexpr int steps = 61;  // doesn't divide what keys are placed by
     kfshost::Rational const first = kfshost::KeyTime(expected, 0) - kfshost::Rational(1, 10);
     kfshost::Rational const last = kfshost::KeyTime(expected, expected.GetKeyCount() - 1) + kfshost::Rational(1, 10);
@@ -100,9 +96,7 @@ StreamItem Item(std::string const& node, kfshost::StreamKind kind, std::vector<d
     std::vector<double> const end(value.size(), 10.0);
     builder.Append(24, end.data(), KFS_Interp_Linear, KFS_Interp_Linear);
     item.stream = builder.Take();
-    for (std::size_t i = 0; i < value.size(); ++i) {
-        item.components.push_back("c" + std::to_string(i));
-    }
+    for (std::size_t i = 0; i < value.size(); ++i) item.components.push_back("c" + std::to_string(i));
     return item;
 }
 
@@ -177,9 +171,8 @@ TEST_F(ProjectFile, KeepsRealFiles)
 {
     SKIP_WITHOUT_SHARED_DATA();
     for (char const* const name :
-         {"gltf/Fox.glb", "gltf/interpolation_test.gltf", "gltf/MorphStressTest.gltf", "bvh/fair1_dab.bvh"}) {
+         {"gltf/Fox.glb", "gltf/interpolation_test.gltf", "gltf/MorphStressTest.gltf", "bvh/fair1_dab.bvh"})
         ExpectRoundTrip(SharedData(name).string(), folder_);
-    }
 }
 
 // Paths, with keys that float too: what is derived of them isn't believed and comes out the same.
@@ -212,14 +205,10 @@ TEST_F(ProjectFile, ReadsLeaveNoTrace)
 {
     Scene scene = kfshost::ImportFile(Sample);
     std::string const before = FileContent(Save(kfshost::ImportFile(Sample), "before"));
-    for (StreamItem const& item : scene.streams) {
-        ReadOne(*item.stream, kfshost::Rational(7, 5));
-    }
+    for (StreamItem const& item : scene.streams) ReadOne(*item.stream, kfshost::Rational(7, 5));
     EXPECT_TRUE(before == FileContent(Save(std::move(scene), "after")));
     Scene loaded = Load(folder_.Path("after"));
-    for (StreamItem const& item : loaded.streams) {
-        ReadOne(*item.stream, kfshost::Rational(7, 5));
-    }
+    for (StreamItem const& item : loaded.streams) ReadOne(*item.stream, kfshost::Rational(7, 5));
     EXPECT_TRUE(before == FileContent(Save(std::move(loaded), "again")));
 }
 
@@ -241,13 +230,10 @@ TEST_F(ProjectFile, KeepsThePathsOfNodesWithOneName)
     add("Node", kfshost::StreamKind::Scale, "");  // what a node is called that has no name
     add("twin", kfshost::StreamKind::Translation, "#3");
     std::map<std::string, double> expected;
-    for (StreamItem const& item : scene.streams) {
-        expected[item.path] = ReadOne(*item.stream, kfshost::Rational(0, 1));
-    }
+    for (StreamItem const& item : scene.streams) expected[item.path] = ReadOne(*item.stream, kfshost::Rational(0, 1));
     std::map<std::string, double> found;
-    for (StreamItem const& item : Load(Save(std::move(scene), "twins")).streams) {
+    for (StreamItem const& item : Load(Save(std::move(scene), "twins")).streams)
         found[item.path] = ReadOne(*item.stream, kfshost::Rational(0, 1));
-    }
     EXPECT_EQ(expected, found);
 }
 
@@ -279,9 +265,8 @@ TEST_F(ProjectFile, WhatIsNotAnimatedStaysCanonical)
     KFS_StreamBase const* const animation = std::as_const(*tree).GetStream(0u);
     KFS_StreamBase const* const node = animation->GetAsGroup()->GetStream(0u);
     std::vector<bool> canonical;
-    for (unsigned int i = 0; i < node->GetAsGroup()->GetNumStreams(); ++i) {
+    for (unsigned int i = 0; i < node->GetAsGroup()->GetNumStreams(); ++i)
         canonical.push_back(node->GetAsGroup()->GetStream(i)->IsCanonical());
-    }
     EXPECT_EQ((std::vector<bool>{false, true, true, false, true}), canonical);
     EXPECT_EQ(1.0, ReadOne(*node->GetAsGroup()->GetStream(1u)->GetAsLeaf(), kfshost::Rational(0, 1), 3));
     EXPECT_EQ(1.0, ReadOne(*node->GetAsGroup()->GetStream(2u)->GetAsLeaf(), kfshost::Rational(0, 1), 2));
@@ -308,9 +293,8 @@ TEST_F(ProjectFile, ADamagedFileIsReadableOrRefused)
     int refused = 0;
     for (int round = 0; round < 3000; ++round) {
         std::string bytes = whole;
-        for (unsigned damage = 0; damage <= random() % 3; ++damage) {
+        for (unsigned damage = 0; damage <= random() % 3; ++damage)
             bytes[random() % bytes.size()] = static_cast<char>(random() % 4 == 0 ? 0xFF : random());
-        }
         std::string const file = folder_.Write("damaged", bytes);
         try {
             Scene const scene = Load(file);

@@ -34,9 +34,7 @@ void SetNumbers(KFS_Stream& stream, int index, double number)
 
 void RemoveKeys(KFS_Stream& stream)
 {
-    while (stream.GetKeyCount() > 0) {
-        ASSERT_EQ(0, KFS_RemoveKey(&stream, 0, nullptr));
-    }
+    while (stream.GetKeyCount() > 0) ASSERT_EQ(0, KFS_RemoveKey(&stream, 0, nullptr));
 }
 
 std::unique_ptr<KFS_Stream> EndlessPath()

@@ -99,9 +99,8 @@ TEST_F(EveryByte, ProjectsThatAreCutAreRefused)
         SCOPED_TRACE(sample.name);
         auto const isTaken = [&](std::string const& bytes) { return IsTaken<kfshost::ProjectError>(bytes, Load); };
         EXPECT_TRUE(isTaken(sample.bytes));
-        for (std::size_t size = 0; size < sample.bytes.size(); ++size) {
+        for (std::size_t size = 0; size < sample.bytes.size(); ++size)
             EXPECT_FALSE(isTaken(sample.bytes.substr(0, size))) << size << " bytes";
-        }
         EXPECT_FALSE(isTaken(sample.bytes + '\0'));
     }
 }
@@ -129,9 +128,8 @@ TEST_F(EveryByte, TreesMayBeCutAndChangedAnywhere)
     };
     for (Sample const& sample : TreeSamples()) {
         EXPECT_TRUE(isTaken(sample.bytes));
-        for (std::size_t size = 0; size < sample.bytes.size(); ++size) {
+        for (std::size_t size = 0; size < sample.bytes.size(); ++size)
             EXPECT_FALSE(isTaken(sample.bytes.substr(0, size))) << size << " bytes";
-        }
         int const taken = CountTaken(sample.bytes, isTaken);
         EXPECT_LT(0, taken);
         EXPECT_GT(2 * static_cast<int>(sample.bytes.size()), taken);
@@ -149,9 +147,8 @@ TEST_F(EveryByte, ImportsMayBeCutAndChangedAnywhere)
             auto const isTaken = [&](std::string const& bytes) { return IsTaken<kfshost::ImportError>(bytes, import); };
             EXPECT_TRUE(isTaken(sample.bytes));
             int whole = 0;
-            for (std::size_t size = 0; size < sample.bytes.size(); ++size) {
+            for (std::size_t size = 0; size < sample.bytes.size(); ++size)
                 whole += isTaken(sample.bytes.substr(0, size)) ? 1 : 0;
-            }
             EXPECT_GE(2, whole) << "but for the last digit and the last line's end nothing can be missing";
             EXPECT_LT(0, CountTaken(sample.bytes, isTaken));
         }

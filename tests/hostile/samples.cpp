@@ -28,13 +28,10 @@ StreamItem Item(std::string const& node, StreamKind kind, int dimension, int key
     std::vector<double> const third(static_cast<std::size_t>(dimension), 1.0 / 3.0);
     for (int i = 0; i < keys; ++i) {
         std::vector<double> value;
-        for (int j = 0; j < dimension; ++j) {
-            value.push_back(i * 7 % 5 + 0.5 * j);
-        }
+        for (int j = 0; j < dimension; ++j) value.push_back(i * 7 % 5 + 0.5 * j);
         builder.Append(i * 12, value.data(), interp, interp);
-        if (interp == KFS_Interp_Spline) {
+        if (interp == KFS_Interp_Spline)
             builder.SetHandles(i, {value.data(), third.data(), value.data(), third.data()});
-        }
     }
     item.stream = builder.Take();
     return item;
@@ -47,9 +44,7 @@ std::string Saved(std::vector<StreamItem> items, std::function<void(kfshost::Sce
     scene.timeScale = 24;
     scene.streams = std::move(items);
     auto const tree = kfshost::MakeTree(std::move(scene));
-    if (edit) {
-        edit(*tree);
-    }
+    if (edit) edit(*tree);
     std::vector<unsigned char> const bytes = kfshost::SaveProjectToMemory(*tree, "sample");
     return {bytes.begin(), bytes.end()};
 }
@@ -65,9 +60,7 @@ StreamItem Path(int keys, bool floats)
 {
     StreamItem item = Item("ball", StreamKind::Translation, floats ? 2 : 3, keys, KFS_Interp_Linear);
     item.stream = kfshost::MakePath(item);
-    if (floats) {
-        kfshost::LetInnerKeysFloat(*item.stream);
-    }
+    if (floats) kfshost::LetInnerKeysFloat(*item.stream);
     return item;
 }
 
@@ -127,9 +120,7 @@ std::string TreeOfAllKinds()
         list.GetEditableStream(list.AppendStream(&child))->SetDisplayName(Q_AsciiToUTF16String("my own"));
     }
     KFS_StreamGroup& effect = *group.GetEditableStream(1U)->GetAsGroup();
-    for (unsigned int i = 0; i < effect.GetNumStreams(); ++i) {
-        effect.GetEditableStream(i);
-    }
+    for (unsigned int i = 0; i < effect.GetNumStreams(); ++i) effect.GetEditableStream(i);
     KFS_Stream& path = *group.GetEditableStream(2U)->GetAsLeaf();
     static_cast<void>(path.SetConstant(0, 0));
     for (int i = 0; i < 3; ++i) {

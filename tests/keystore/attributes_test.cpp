@@ -23,8 +23,8 @@ TEST_F(Attributes, MergingLeavesBothStreamsAlone)
     TestStream a, b;
     a.Key(0, {1.0});
     b.Key(5, {2.0}).Key(9, {3.0});
-    const auto bytes = a.Bytes();
-    const T_Time at{3, 600};
+    auto const bytes = a.Bytes();
+    T_Time const at{3, 600};
     KFS_Stream* other = b.get();
     EXPECT_EQ(0, KFS_MergeStream(a, &at, &other));
     EXPECT_EQ(b.get(), other);
@@ -35,13 +35,13 @@ TEST_F(Attributes, MergingLeavesBothStreamsAlone)
 TEST_F(Attributes, ASpatialSettingIsPermittedByTheTemporalMask)
 {
     for (unsigned mask = 0; mask < 16; ++mask) {
-        const TestStream stream(
+        TestStream const stream(
             {.dimension = 2, .spatial = true, .interpMask = static_cast<unsigned short>(mask), .spInterpMask = 0});
         for (unsigned code = 0; code < 20; ++code) {
             SCOPED_TRACE(testing::Message() << "mask " << mask << " code " << code);
             ASSERT_EQ(0, KFS_SetStreamSpIMask(stream, code % 2 ? 0 : 0xFFFF)) << "which has no say";
-            const bool permitted = code == 0 || ((mask << 1 >> code) & 1) != 0;
-            const unsigned expected = permitted ? code : stream->GetSpInterp();
+            bool const permitted = code == 0 || ((mask << 1 >> code) & 1) != 0;
+            unsigned const expected = permitted ? code : stream->GetSpInterp();
             EXPECT_EQ(permitted ? 0 : 7431, KFS_SetStreamSpInterp(stream, static_cast<unsigned short>(code)));
             EXPECT_EQ(expected, stream->GetSpInterp());
             if (!permitted) {
@@ -57,9 +57,9 @@ TEST_F(Attributes, ASpatialSettingIsPermittedByTheTemporalMask)
 
 TEST_F(Attributes, AccuracyIsKeptSquared)
 {
-    const TestStream stream;
+    TestStream const stream;
     double accuracy = 0.0;
-    const double half = -0.5;
+    double const half = -0.5;
     EXPECT_EQ(0, KFS_SetStreamAccuracy(stream, &half, &accuracy));
     EXPECT_DOUBLE_EQ(0.01, accuracy);
     EXPECT_EQ(0, KFS_SetStreamAccuracy(stream, nullptr, nullptr));
@@ -70,8 +70,8 @@ TEST_F(Attributes, AccuracyIsKeptSquared)
 
 TEST_F(Attributes, DimensionsShareTheFourComponentsOfTheMultiplier)
 {
-    const TestStream six({.dimension = 6, .spatial = true});
-    const double first[6] = {2.0, 3.0, 4.0, 5.0, 6.0, 7.0};
+    TestStream const six({.dimension = 6, .spatial = true});
+    double const first[6] = {2.0, 3.0, 4.0, 5.0, 6.0, 7.0};
     double old[7] = {77.0, 77.0, 77.0, 77.0, 77.0, 77.0, 77.0};
     ASSERT_EQ(0, KFS_SetStreamMultiplier(six, first, old));
     EXPECT_EQ((std::vector{1.0, 1.0, 1.0, 1.0, 2.0, 3.0, 77.0}), std::vector(old, old + 7))
@@ -79,14 +79,14 @@ TEST_F(Attributes, DimensionsShareTheFourComponentsOfTheMultiplier)
     double now[6];
     ASSERT_EQ(0, KFS_GetStreamMultiplier(six, now));
     EXPECT_EQ((std::vector{6.0, 7.0, 4.0, 5.0, 6.0, 7.0}), std::vector(now, now + 6));
-    const TestStream two(Spatial2D);
+    TestStream const two(Spatial2D);
     ASSERT_EQ(0, KFS_SetStreamMultiplier(two, first, nullptr));
     EXPECT_EQ((M_Vector4T<double>{{2.0, 3.0, 1.0, 1.0}}), two->GetMultiplier());
 }
 
 TEST_F(Attributes, OnlyASpatialStreamHasAMultiplierAndArcs)
 {
-    const TestStream plain({.dimension = 2});
+    TestStream const plain({.dimension = 2});
     double number = 77.0;
     EXPECT_EQ(7434, KFS_GetStreamMultiplier(plain, &number));
     EXPECT_REPORT(reports, 102, "attempt to set multiplier of a non-spatial stream.");
@@ -101,13 +101,13 @@ TEST_F(Attributes, OnlyASpatialStreamHasAMultiplierAndArcs)
 // What a change must not leave behind: the value that was computed before it.
 TEST_F(Attributes, AReadAfterAChangeIsThatOfAStreamThatAlwaysWasSo)
 {
-    const double multiplier[2] = {1.0, 20.0};
+    double const multiplier[2] = {1.0, 20.0};
     const std::function<int(KFS_Stream*)> changes[] = {
         [&](KFS_Stream* stream) { return KFS_SetStreamMultiplier(stream, multiplier, nullptr); },
         [](KFS_Stream* stream) { return KFS_SetStreamSParametrize(stream, 0); },
         [](KFS_Stream* stream) { return KFS_RescaleStream(stream, 1200) + KFS_RescaleStream(stream, 600); },
     };
-    for (const auto& change : changes) {
+    for (auto const& change : changes) {
         TestStream changed(Spatial2D), fresh(Spatial2D);
         FillCurvedPath(changed);
         ASSERT_EQ(0, change(fresh));
@@ -137,7 +137,7 @@ TEST_F(Attributes, AChangedParametrizationMarksAllKeysAndAlwaysNotifies)
     EXPECT_EQ((std::array{0, 2}), stream.ArcStale());
     EXPECT_EQ(1, listener.Take());
     ASSERT_EQ(0, stream->UpdateStream());
-    const double multiplier[2] = {2.0, 2.0};
+    double const multiplier[2] = {2.0, 2.0};
     EXPECT_EQ(0, KFS_SetStreamMultiplier(stream, nullptr, nullptr));
     EXPECT_EQ(TestStream::NotStale, stream.ArcStale());
     EXPECT_EQ(0, listener.Take()) << "nothing was set";
@@ -170,7 +170,7 @@ TEST_F(Attributes, AListenersExceptionBecomesTheResult)
     TestStream stream(Spatial2D);
     FillCurvedPath(stream);
     root.Store(stream);
-    const double multiplier[2] = {2.0, 3.0};
+    double const multiplier[2] = {2.0, 3.0};
     {
         ValueListener listener([] { throw 815; });
         EXPECT_EQ(815, KFS_SetStreamSParametrize(stream, 0));

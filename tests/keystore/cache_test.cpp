@@ -51,7 +51,7 @@ TEST_F(Cache, WhichKeyAnswersWithoutACurve)
         double value;
         int cacheTime;
     };
-    const Row rows[] = {
+    Row const rows[] = {
         {"before the first key, with that key's time", KFS_Interp_Linear, KFS_Interp_Linear, -50, 2.0, 0},
         {"after the last key", KFS_Interp_Linear, KFS_Interp_Linear, 500, 6.0, 100},
         {"a hold on the near side", KFS_Interp_Hold, KFS_Interp_Linear, 50, 2.0, 0},
@@ -59,7 +59,7 @@ TEST_F(Cache, WhichKeyAnswersWithoutACurve)
         {"a hold on the far side takes the later value", KFS_Interp_Linear, KFS_Interp_Hold, 1, 6.0, 100},
         {"on a key", KFS_Interp_Linear, KFS_Interp_Linear, 100, 6.0, 100},
     };
-    for (const Row& row : rows) {
+    for (Row const& row : rows) {
         SCOPED_TRACE(row.why);
         TestStream stream;
         stream.Key(0, {2.0}, KFS_Interp_Linear, row.aOut).Key(100, {6.0}, row.bIn, KFS_Interp_Linear);
@@ -76,7 +76,7 @@ TEST_F(Cache, AConstantFollowsTheAskedTime)
     TestStream stream({.noKeys = true});
     stream.Key(0, {7.0});
     unsigned char atKey = 0;
-    for (const int time : {5, -3, 100000}) {
+    for (int const time : {5, -3, 100000}) {
         KFSp_UpdateStreamCacheToTime(stream, time, 0, &atKey, &atKey, nullptr, 0);
         EXPECT_EQ(time, stream->GetCache()->time);
         EXPECT_EQ(1, atKey);
@@ -127,7 +127,7 @@ TEST_F(Cache, FailedInterpolationLeavesItEmptyAndUnpinned)
     stream.Key(0, {2.0}).Key(100, {6.0});
     stream->SetInterpFunc([](KFS_Stream const*, long, int, int) { return 4711; });
     double value = 0.0;
-    const T_Time at{50, 600};
+    T_Time const at{50, 600};
     EXPECT_EQ(4711, KFS_GetValueFPlus(stream, &at, 0, &value, nullptr, nullptr));
     EXPECT_TRUE(stream.CacheIsEmpty());
     EXPECT_EQ(0, stream.Pins());
@@ -141,12 +141,12 @@ TEST_F(Cache, FailedInterpolationLeavesItEmptyAndUnpinned)
 
 TEST_F(Cache, CustomValuesAreNeverShared)
 {
-    const OwnedValues::Scope owned;
-    const auto stream = OwnedValues::MakeStream(false);
+    OwnedValues::Scope const owned;
+    auto const stream = OwnedValues::MakeStream(false);
     OwnedValues::InsertKey(stream.get(), 0, 5.0);
     EXPECT_EQ(5.0, OwnedValues::Read(stream.get(), 0));
     {
-        const KFS_StreamKeyData copy(*stream->GetKeyData(), stream.get());
+        KFS_StreamKeyData const copy(*stream->GetKeyData(), stream.get());
         EXPECT_NE(nullptr, copy.keys);
         EXPECT_EQ(4, OwnedValues::Live());
     }
@@ -155,13 +155,13 @@ TEST_F(Cache, CustomValuesAreNeverShared)
 
 TEST_F(Cache, AKeyThatCannotBeCopiedLeavesItEmpty)
 {
-    const OwnedValues::Scope owned;
-    const auto stream = OwnedValues::MakeStream(false);
-    for (const int time : {0, 100}) OwnedValues::InsertKey(stream.get(), time, time, KFS_Interp_Linear);
+    OwnedValues::Scope const owned;
+    auto const stream = OwnedValues::MakeStream(false);
+    for (int const time : {0, 100}) OwnedValues::InsertKey(stream.get(), time, time, KFS_Interp_Linear);
     OwnedValues::copyCode = 77;
-    for (const int time : {100, -5}) {
+    for (int const time : {100, -5}) {
         OwnedValues::Ticket out{};
-        const T_Time at{time, 600};
+        T_Time const at{time, 600};
         EXPECT_EQ(77, KFS_GetValue(stream.get(), &at, 0, &out, nullptr, nullptr));
         EXPECT_TRUE(KFSp_CacheIsEmpty(stream->GetCache())) << "its value would be disposed though nobody made it";
     }
@@ -175,14 +175,14 @@ TEST_F(Cache, ARenderReadsItsOwnCopyAndLeavesTheStreamAlone)
 {
     TestStream stream({.dimension = 2, .spatial = true});
     stream.Key(0, {0.0, 0.0}).Key(600, {3.0, 4.0}, KFS_Interp_Spline).Key(1200, {9.0, 4.0});
-    const auto stale = stream.Stale();
-    const auto arcStale = stream.ArcStale();
+    auto const stale = stream.Stale();
+    auto const arcStale = stream.ArcStale();
     ASSERT_NE(TestStream::NotStale, arcStale);
-    const std::vector<unsigned char> bytes = stream.Bytes();
-    const boost::shared_ptr<Q_RenderContext> render = kfshost::MakeRenderContext(true);
+    std::vector<unsigned char> const bytes = stream.Bytes();
+    boost::shared_ptr<Q_RenderContext> const render = kfshost::MakeRenderContext(true);
     std::vector<double> seen;
     {
-        const Q_ScSetCurrentRenderContext current(render);
+        Q_ScSetCurrentRenderContext const current(render);
         EXPECT_NE(stream->GetKeyData()->keys, nullptr);
         seen = stream.At(450);
         EXPECT_EQ(TestStream::NotStale, stream.ArcStale()) << "worked down on the copy";
@@ -193,7 +193,7 @@ TEST_F(Cache, ARenderReadsItsOwnCopyAndLeavesTheStreamAlone)
     EXPECT_TRUE(stream.CacheIsEmpty());
     EXPECT_EQ(bytes, stream.Bytes());
     stream.Key(600, {30.0, 40.0}, KFS_Interp_Spline);
-    const Q_ScSetCurrentRenderContext current(render);
+    Q_ScSetCurrentRenderContext const current(render);
     EXPECT_EQ(seen, stream.At(450)) << "as it stood at the first read";
     static_cast<KFS_StreamCacheState*>(render->PeekState(KFS_StreamCacheState::S_StateName))->FreeCacheData();
     EXPECT_NE(seen, stream.At(450));
@@ -203,11 +203,11 @@ TEST_F(Cache, ACopyOwnsItsArcTables)
 {
     TestStream stream({.dimension = 2, .spatial = true});
     stream.Key(0, {0.0, 0.0}).Key(60, {1.0, 2.0}).Key(120, {5.0, 0.0});
-    const std::vector<double> before = stream.At(100);
-    const std::vector<unsigned char> bytes = stream.Bytes();
-    const Q_MemoryCount all = Q_MemoryLive(nullptr);
-    const auto copyAndDrop = [&](int&) {
-        const KFS_StreamKeyData copy(*stream->GetKeyData(), stream);
+    std::vector<double> const before = stream.At(100);
+    std::vector<unsigned char> const bytes = stream.Bytes();
+    Q_MemoryCount const all = Q_MemoryLive(nullptr);
+    auto const copyAndDrop = [&](int&) {
+        KFS_StreamKeyData const copy(*stream->GetKeyData(), stream);
         void const* item = nullptr;
         EXPECT_EQ(0, SEQ_GetConstAddress(copy.keys, 1, &item));
         auto const* const key = static_cast<KFS_KeyScalar const*>(item);
@@ -215,7 +215,7 @@ TEST_F(Cache, ACopyOwnsItsArcTables)
         EXPECT_NE(stream.Record(1)->remapTable, key->remapTable);
         return 0;
     };
-    const int failures = FailEveryAllocation([] { return std::make_unique<int>(); }, copyAndDrop,
+    int const failures = FailEveryAllocation([] { return std::make_unique<int>(); }, copyAndDrop,
                                              [&](int&, int code, Q_MemoryCount const& live) {
                                                  EXPECT_EQ(4, code);
                                                  EXPECT_EQ(live, Q_MemoryLive(nullptr));

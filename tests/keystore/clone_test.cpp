@@ -32,16 +32,16 @@ TestStream DressedStream()
 
 TEST_F(Cloning, TakesKeysAndExpressionAsAskedAndTheRestAlways)
 {
-    const TestStream source = DressedStream();
-    const std::vector<double> middle = source.At(45);
+    TestStream const source = DressedStream();
+    std::vector<double> const middle = source.At(45);
     ASSERT_NE(nullptr, source.Record(0)->remapTable);
     source->SetDisabledUpdateStream(true);
     source->DisableLegalizeValue(true);
     source->SetExpressionErrorsAreQuiet(true);
-    for (const bool keys : {false, true}) {
-        for (const bool expression : {false, true}) {
+    for (bool const keys : {false, true}) {
+        for (bool const expression : {false, true}) {
             SCOPED_TRACE(testing::Message() << "keys " << keys << ", expression " << expression);
-            const std::unique_ptr<KFS_Stream> clone(source->CloneLeaf({keys, expression}));
+            std::unique_ptr<KFS_Stream> const clone(source->CloneLeaf({keys, expression}));
             EXPECT_EQ(source->GetKFSFlags(), clone->GetKFSFlags());
             EXPECT_EQ(source->GetSpInterp(), clone->GetSpInterp());
             EXPECT_EQ(0xF, clone->GetSpInterpMask());
@@ -72,7 +72,7 @@ TEST_F(Cloning, TakesKeysAndExpressionAsAskedAndTheRestAlways)
             EXPECT_EQ(u16str(), info.GetExpressionErrorShort());
         }
     }
-    const std::unique_ptr<KFS_Stream> bare(source->CloneLeafNoKeysOrExpr());
+    std::unique_ptr<KFS_Stream> const bare(source->CloneLeafNoKeysOrExpr());
     EXPECT_FALSE(bare->HasExpression());
     EXPECT_EQ(nullptr, bare->GetKeys());
     EXPECT_TRUE(bare->HasKeys()) << "a list is made by its first key";
@@ -88,7 +88,7 @@ TEST_F(Cloning, MarksAllKeysStaleHoweverManyThereAre)
     constexpr int Count = 33000;
     for (int i = 0; i < Count; ++i) source.Key(i, {1.0 * i});
     source.At(5);
-    const std::unique_ptr<KFS_Stream> clone(source->CloneLeaf({true, false}));
+    std::unique_ptr<KFS_Stream> const clone(source->CloneLeaf({true, false}));
     for (int const* const range : {clone->GetInvalidKeyIndex(), clone->GetArcInvalidKeyIndex()}) {
         EXPECT_EQ(0, range[0]);
         EXPECT_EQ(Count - 1, range[1]);
@@ -99,26 +99,26 @@ TEST_F(Cloning, ACloneMadeByARenderIsWholeEverywhere)
 {
     TestStream source({.dimension = 2, .spatial = true});
     source.Key(0, {0.0, 0.0}, KFS_Interp_Spline).Key(600, {3.0, 4.0}, KFS_Interp_Spline);
-    const std::vector<double> expected = source.At(200);
+    std::vector<double> const expected = source.At(200);
     std::unique_ptr<KFS_Stream> clone;
     {
-        const Q_ScSetCurrentRenderContext current(kfshost::MakeRenderContext(true));
+        Q_ScSetCurrentRenderContext const current(kfshost::MakeRenderContext(true));
         clone.reset(source->CloneLeaf({true, true}));
     }
     EXPECT_EQ(0, clone->GetArcInvalidKeyIndex()[0]) << "marked in its own key data, not in the render's";
     EXPECT_EQ(1, clone->GetArcInvalidKeyIndex()[1]);
     ASSERT_EQ(0, KFS_RemoveKey(source, 1, nullptr));
     double value[2] = {};
-    const T_Time at{200, 600};
+    T_Time const at{200, 600};
     ASSERT_EQ(0, KFS_GetValueFPlus(clone.get(), &at, 0, value, nullptr, nullptr));
     EXPECT_EQ(expected, (std::vector{value[0], value[1]})) << "with keys of its own";
 }
 
 TEST_F(Cloning, WithoutMemoryThrows4AndLeaksNothing)
 {
-    const TestStream source = DressedStream();
+    TestStream const source = DressedStream();
     source.At(30);
-    const int failures =
+    int const failures =
         FailEveryAllocation([] { return std::make_unique<int>(); }, [&](int&) { return delete source->Clone(true), 0; },
                             [](int&, int, Q_MemoryCount const& before) { EXPECT_EQ(before, Q_MemoryLive(nullptr)); });
     EXPECT_GE(failures, 3);
@@ -135,16 +135,16 @@ int CopySome(KFS_Stream const* stream, long refcon, short kind, void const* sour
 
 TEST_F(Cloning, AFailureAtAnyValueLeavesNothingBehindAndNobodyHearsOfIt)
 {
-    const OwnedValues::Scope owned;
+    OwnedValues::Scope const owned;
     HeardRoot root;
-    const std::unique_ptr<KFS_Stream> source = OwnedValues::MakeStream(false);
-    for (const int time : {0, 100, 200}) OwnedValues::InsertKey(source.get(), time, time);
+    std::unique_ptr<KFS_Stream> const source = OwnedValues::MakeStream(false);
+    for (int const time : {0, 100, 200}) OwnedValues::InsertKey(source.get(), time, time);
     OwnedValues::Read(source.get(), 100);  // fills the cache record
     ASSERT_EQ(0, KFS_SetCustomFuncs(source.get(), CopySome, OwnedValues::Dispose));
     root.Store(source.get());
     ASSERT_EQ(KFS_ListenerState_Heard, source->ProbeListenerState()) << "a clone hears with its source's ears";
     NotificationRecorder recorder;
-    const int live = OwnedValues::Live();
+    int const live = OwnedValues::Live();
     for (int copies = 0; copies < 4; ++copies) {
         S_copiesLeft = copies;
         EXPECT_EQ(77, KFSp_Boundary([&] { delete source->Clone(true); }));
@@ -187,7 +187,7 @@ struct Content {
 TestStream RandomStream(std::mt19937& random, bool noKeys)
 {
     auto const upTo = [&](int n) { return static_cast<int>(random() % static_cast<unsigned>(n)); };
-    const bool spatial = !noKeys && upTo(2) == 1;
+    bool const spatial = !noKeys && upTo(2) == 1;
     TestStream stream(
         {.dimension = static_cast<short>(spatial ? 2 : 1 + upTo(3)), .noKeys = noKeys, .spatial = spatial});
     std::vector<double> value(static_cast<std::size_t>(stream->GetDimension()));
@@ -210,12 +210,12 @@ TEST_F(Swapping, MovesTheWholeContentAndBackAgain)
     std::mt19937 random(20);
     for (int round = 0; round < 60; ++round) {
         SCOPED_TRACE(round);
-        const TestStream a = RandomStream(random, round % 5 == 0);
-        const TestStream b = RandomStream(random, round % 7 == 0);
+        TestStream const a = RandomStream(random, round % 5 == 0);
+        TestStream const b = RandomStream(random, round % 7 == 0);
         // Read once, so that what is derived is there and the marks are gone; then again for the record.
         static_cast<void>(Content(a));
         static_cast<void>(Content(b));
-        const Content ofA(a), ofB(b);
+        Content const ofA(a), ofB(b);
         a->swap(*b);
         EXPECT_EQ(ofB, Content(a));
         EXPECT_EQ(ofA, Content(b));
@@ -232,9 +232,9 @@ TEST_F(Swapping, MovesTheWholeContentAndBackAgain)
 TEST_F(Swapping, MovesStaleMarksUnrepaired)
 {
     TestStream a({.dimension = 2, .spatial = true});
-    const TestStream b({.dimension = 2, .spatial = true});
+    TestStream const b({.dimension = 2, .spatial = true});
     a.Key(0, {0.0, 0.0}).Key(60, {3.0, 4.0}).Key(120, {9.0, 1.0});
-    const auto stale = a.Stale(), arcStale = a.ArcStale();
+    auto const stale = a.Stale(), arcStale = a.ArcStale();
     ASSERT_NE(TestStream::NotStale, arcStale);
     a->swap(*b);
     EXPECT_EQ(stale, b.Stale());
@@ -247,7 +247,7 @@ TEST_F(Swapping, MovesStaleMarksUnrepaired)
 TEST_F(Swapping, LeavesWhatBelongsToThePlace)
 {
     HeardRoot root;
-    const TestStream a, b;
+    TestStream const a, b;
     root.Store(a);
     a->SetInterpMask(1);
     b->SetInterpMask(7);
@@ -275,7 +275,7 @@ TEST_F(Swapping, LeavesWhatBelongsToThePlace)
 TEST_F(Swapping, TellsOfTheFirstStreamOnly)
 {
     HeardRoot root;
-    const TestStream a, b;
+    TestStream const a, b;
     root.Store(a);
     root.Store(b);
     NotificationRecorder recorder;
@@ -295,8 +295,8 @@ TEST_F(Swapping, WithoutMemoryExchangesNothingOrAll)
     struct Pair {
         TestStream a, b;
     };
-    const u16str longText = Text(std::string(300, 'x'));
-    const auto make = [&] {
+    u16str const longText = Text(std::string(300, 'x'));
+    auto const make = [&] {
         auto pair = std::make_unique<Pair>();
         pair->a.Key(0, {1.0});
         pair->b.Key(0, {2.0});
@@ -304,14 +304,14 @@ TEST_F(Swapping, WithoutMemoryExchangesNothingOrAll)
         pair->b->GetExprInfoForModify().SetExpression(longText + longText);
         return pair;
     };
-    const auto check = [&](Pair& pair, int code, Q_MemoryCount) {
+    auto const check = [&](Pair& pair, int code, Q_MemoryCount) {
         EXPECT_NE(0, code);
         EXPECT_EQ(1.0, KFSp_Numbers(pair.a.Record(0))[0]);
         EXPECT_EQ(longText, pair.a->GetExprInfo().GetExpression());
         EXPECT_EQ(2.0, KFSp_Numbers(pair.b.Record(0))[0]);
         EXPECT_EQ(longText + longText, pair.b->GetExprInfo().GetExpression());
     };
-    const int failures = FailEveryAllocation(
+    int const failures = FailEveryAllocation(
         make, [](Pair& pair) { return pair.a->swap(*pair.b), 0; }, check);
     EXPECT_GE(failures, 2);
     reports.Take();  // std::bad_alloc is reported where it is translated

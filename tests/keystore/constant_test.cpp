@@ -10,9 +10,9 @@ class Constants : public StreamTest {};
 
 TEST_F(Constants, AValueBecomesTheFirstKeyIfItIsKept)
 {
-    for (const bool spatial : {false, true}) {
+    for (bool const spatial : {false, true}) {
         SCOPED_TRACE(spatial);
-        const StreamOptions options{.dimension = 2, .noKeys = true, .spatial = spatial};
+        StreamOptions const options{.dimension = 2, .noKeys = true, .spatial = spatial};
         TestStream kept(options), dropped(options);
         kept.Key(70, {4.0, 5.0});
         dropped.Key(70, {4.0, 5.0});
@@ -24,7 +24,7 @@ TEST_F(Constants, AValueBecomesTheFirstKeyIfItIsKept)
         EXPECT_EQ(0, dropped->SetConstant(0, 0));
         EXPECT_EQ(0, dropped.Count());
         EXPECT_TRUE(dropped.CacheIsEmpty());
-        const TestStream empty(options);
+        TestStream const empty(options);
         EXPECT_EQ(0, empty->SetConstant(0, 1));
         EXPECT_TRUE(empty->HasKeys());
         EXPECT_EQ(0, empty.Count());
@@ -33,18 +33,18 @@ TEST_F(Constants, AValueBecomesTheFirstKeyIfItIsKept)
 
 TEST_F(Constants, KeysGoAndTheLastReadValueStays)
 {
-    for (const bool spatial : {false, true}) {
+    for (bool const spatial : {false, true}) {
         SCOPED_TRACE(spatial);
         TestStream stream({.dimension = 2, .spatial = spatial});
         stream.Key(0, {0.0, 0.0}).Key(100, {10.0, 20.0}).Key(200, {0.0, 40.0});
-        const std::vector<double> read = stream.At(50);
-        const Q_MemoryCount before = Q_MemoryLive(nullptr);
+        std::vector<double> const read = stream.At(50);
+        Q_MemoryCount const before = Q_MemoryLive(nullptr);
         EXPECT_EQ(0, stream->SetConstant(1, 0));
         EXPECT_LT(Q_MemoryLive(nullptr).blocks, before.blocks);
         EXPECT_EQ(nullptr, stream->GetKeys());
         EXPECT_EQ(TestStream::NotStale, stream.Stale());
         EXPECT_EQ(TestStream::NotStale, stream.ArcStale());
-        for (const int time : {-5, 50, 999}) EXPECT_EQ(read, stream.At(time));
+        for (int const time : {-5, 50, 999}) EXPECT_EQ(read, stream.At(time));
         // And back again: the value is a key like any other, as if it had been set.
         EXPECT_EQ(0, stream->SetConstant(0, 1));
         EXPECT_EQ(1, stream.Count());
@@ -97,7 +97,7 @@ TEST_F(Constants, AFailureIsTheResultAndIsHeardAllTheSame)
     HeardRoot root;
     KFS_ValueDesc desc{1, 8, 42, [](KFS_Stream const*, long, int, int) { return 0; }};
     KFS_Stream stream(1, 600, 0, 0, KFS_InterpMask_Hold, 0, desc, nullptr, nullptr, false);
-    const long value = 5;
+    long const value = 5;
     ASSERT_EQ(0, KFS_InsertKey(&stream, nullptr, 0, &value, KFS_Interp_Hold, KFS_Interp_Hold));
     ASSERT_EQ(
         0, SEQ_SetFuncs(stream.GetKeys(), 3,
@@ -112,14 +112,14 @@ TEST_F(Constants, AFailureIsTheResultAndIsHeardAllTheSame)
 
 TEST_F(Constants, AFailureOnTheWayToKeysLeavesTheConstant)
 {
-    for (const short dimension : {1, 40}) {  // the wide record needs room to be put aside
-        const auto make = [dimension] {
+    for (short const dimension : {1, 40}) {  // the wide record needs room to be put aside
+        auto const make = [dimension] {
             auto stream = std::make_unique<TestStream>(StreamOptions{.dimension = dimension, .noKeys = true});
             stream->Key(70, std::vector<double>(40, 4.0));
             return stream;
         };
         int failures = 0;
-        const auto check = [&](TestStream const& stream, int code, Q_MemoryCount const& before) {
+        auto const check = [&](TestStream const& stream, int code, Q_MemoryCount const& before) {
             EXPECT_EQ(4.0, stream.At1(0));
             if (code != 0) {  // the packed times are done without
                 EXPECT_TRUE(stream->HasNoKeys());
@@ -132,8 +132,8 @@ TEST_F(Constants, AFailureOnTheWayToKeysLeavesTheConstant)
             make, [](TestStream& stream) { return stream->SetConstant(0, 1); }, check);
         EXPECT_LE(2, failures);
     }
-    const OwnedValues::Scope owned;
-    const auto stream = OwnedValues::MakeStream(true);
+    OwnedValues::Scope const owned;
+    auto const stream = OwnedValues::MakeStream(true);
     OwnedValues::InsertKey(stream.get(), 0, 5.0);
     OwnedValues::copyCode = 9001;
     EXPECT_EQ(9001, stream->SetConstant(0, 1));
@@ -147,11 +147,11 @@ TEST_F(Constants, AFailureOnTheWayToKeysLeavesTheConstant)
 
 TEST_F(Constants, WhatShouldNotBeAnimatedIsReportedAndAnimated)
 {
-    const TestStream still({.noKeys = true, .interpMask = 0});
+    TestStream const still({.noKeys = true, .interpMask = 0});
     EXPECT_EQ(0, still->SetConstant(0, 0));
     EXPECT_REPORT(reports, 10, "attempt to animate a non-animatable stream");
     EXPECT_TRUE(still->HasKeys());
-    const TestStream canonical({.noKeys = true});
+    TestStream const canonical({.noKeys = true});
     canonical->SetCanonical(true);
     EXPECT_EQ(0, canonical->SetConstant(0, 0));
     EXPECT_REPORT(reports, 10, "attempt to animate the canonical instance stream");

@@ -193,13 +193,9 @@ TEST_F(CopyKeys, SpatialKeysTakeTheirPathAndNoTable)
         TestStream destination(options);
         destination.Key(300, {5, 5}).Key(900, {7, 7});
         ASSERT_EQ(0, destination->UpdateStream());
-        if (many) {
-            ASSERT_EQ(0, KFS_CopyKeys(source, nullptr, destination));
-        }
+        if (many) ASSERT_EQ(0, KFS_CopyKeys(source, nullptr, destination));
         for (int i = 0; i < 3; ++i) {
-            if (!many) {
-                ASSERT_EQ(0, KFS_CopyKey(source, i, 1, nullptr, destination, nullptr));
-            }
+            if (!many) ASSERT_EQ(0, KFS_CopyKey(source, i, 1, nullptr, destination, nullptr));
             KFS_KeyScalar const* const from = source.Record(i);
             KFS_KeyScalar const* const to = destination.Record(i);
             EXPECT_EQ(source.Numbers(i), destination.Numbers(i));

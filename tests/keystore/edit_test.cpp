@@ -65,9 +65,7 @@ TEST_F(Edit, TheMaskDecidesAboutCodes)
         SCOPED_TRACE(testing::Message() << "mask " << row.mask << " code " << row.code);
         TestStream const stream({.interpMask = row.mask});
         EXPECT_EQ(row.allowed ? 0 : 7431, KFSp_CanDoInterp(stream, static_cast<char>(row.code)));
-        if (!row.allowed) {
-            EXPECT_REPORT(reports, 13, InterpText(row.code));
-        }
+        if (!row.allowed) EXPECT_REPORT(reports, 13, InterpText(row.code));
     }
 }
 
@@ -284,9 +282,8 @@ TEST_F(Edit, AKeyWithoutAValueTakesTheOneThatIsThereAndKeepsTheCurve)
             for (int const time : {-100, 150, 300, 601, 1199, 1900}) {
                 SCOPED_TRACE(testing::Message() << row.why << " " << kind.spatial << kind.spInterpMask << " " << time);
                 TestStream stream(kind), read(kind);
-                for (TestStream* const each : {&stream, &read}) {
+                for (TestStream* const each : {&stream, &read})
                     each->Key(0, {0, 5}, Spline, row.aOut).Key(1200, {10, -3}, row.bIn, Spline).Key(1800, {4, 4});
-                }
                 std::vector<double> const there = read.At(time);
                 if (time == 300) stream.At(1000);  // after a read
                 T_Time const at = stream.Time(time);

@@ -98,9 +98,7 @@ TEST_F(EditCustom, AFailingItemFunctionLeavesTheKeyAsItWas)
             ASSERT_EQ(0, KFS_InsertKey(stream.get(), &at, 0, &mine, Hold, Hold));
             (copyFails ? OwnedValues::copyCode : OwnedValues::disposeCode) = 9001;
             EXPECT_EQ(9001, KFS_SetKey(stream.get(), 0, &mine, None, None));
-            if (copyFails) {
-                EXPECT_EQ(9001, KFS_InsertKey(stream.get(), &later, 1, &mine, Hold, Hold));
-            }
+            if (copyFails) EXPECT_EQ(9001, KFS_InsertKey(stream.get(), &later, 1, &mine, Hold, Hold));
             OwnedValues::copyCode = OwnedValues::disposeCode = 0;
             EXPECT_EQ(noKeys ? 0 : 1, noKeys ? 0 : (*stream->GetKeys())->count);
             EXPECT_EQ(5.0, OwnedValues::RemoveKey(stream.get(), 0));

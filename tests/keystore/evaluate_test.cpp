@@ -25,7 +25,7 @@ public:
     {
         double number = 0.0;
         Run(stream, time, &number);
-        const short whole = static_cast<short>(number);
+        short const whole = static_cast<short>(number);
         std::memcpy(value, &whole, sizeof whole);
     }
     void EvalExprValueF(KFS_Stream const* stream, int time, int, double* value, KFS_ParamBag const*) override
@@ -60,7 +60,7 @@ public:
 private:
     void Run(KFS_Stream const* stream, int time, double* value)
     {
-        if (const int code = expression(stream, time, value)) throw int{code};
+        if (int const code = expression(stream, time, value)) throw int{code};
     }
 };
 
@@ -78,7 +78,7 @@ protected:
 
 TEST_F(Evaluate, TheStagesGoInTheirOrder)
 {
-    const Q_ScSetCurrentRenderContext current(context);
+    Q_ScSetCurrentRenderContext const current(context);
     TestStream stream;
     stream.Key(0, {1.0}).Key(100, {2.0});
     KFS_ExprInfo& info = stream->GetExprInfoForModify();
@@ -90,7 +90,7 @@ TEST_F(Evaluate, TheStagesGoInTheirOrder)
         double value;
         int atKey;  // 9: untouched
     };
-    const Row rows[] = {
+    Row const rows[] = {
         {"no expression", [] {}, 0, 0, 2.0, 1},
         {"an expression answers, and no key stands there", [&] { info.SetExpression(Text("x")); }, 0, 0, 1100.0, 0},
         {"the flag goes straight to the keys", [] {}, 1, 0, 2.0, 1},
@@ -107,8 +107,8 @@ TEST_F(Evaluate, TheStagesGoInTheirOrder)
         {"any other error is the result",
          [&] { engine->expression = [](KFS_Stream const*, int, double*) { return 99; }; }, 0, 99, -1.0, 9},
     };
-    const T_Time at{100, 600};
-    for (const Row& row : rows) {
+    T_Time const at{100, 600};
+    for (Row const& row : rows) {
         SCOPED_TRACE(row.why);
         row.arrange();
         double value = -1.0;
@@ -121,22 +121,22 @@ TEST_F(Evaluate, TheStagesGoInTheirOrder)
     double value = 0.0;
     EXPECT_NE(0, KFS_GetValueFPlus(stream, &at, 0, &value, nullptr, nullptr));
     EXPECT_EQ("bad token", reports.Take().at(0).text);
-    const int asked = engine->asked;
+    int const asked = engine->asked;
     EXPECT_EQ(0, KFS_GetValueFPlus(stream, &at, 0, nullptr, nullptr, nullptr)) << "nobody wants a value";
     EXPECT_EQ(asked, engine->asked);
 }
 
 TEST_F(Evaluate, AnotherStreamsExpressionIsConvertedThroughDoubles)
 {
-    const Q_ScSetCurrentRenderContext current(context);
+    Q_ScSetCurrentRenderContext const current(context);
     TestStream stream({.type = KFS_Type_Fixed});
-    const TestStream source({.type = KFS_Type_S16});
+    TestStream const source({.type = KFS_Type_S16});
     stream.Key(0, {0.0});
     stream->GetExprInfoForModify().SetExpression(Text("other"));
     engine->target = source;
     engine->expression = [](KFS_Stream const*, int, double* value) { return *value = 3.0, 0; };
     int fixed = 0;
-    const T_Time at{0, 600};
+    T_Time const at{0, 600};
     ASSERT_EQ(0, KFS_GetValuePlus(stream, &at, 0, &fixed, nullptr, nullptr, nullptr, 0));
     EXPECT_EQ(3 * 65536, fixed);
 }
@@ -145,14 +145,14 @@ TEST_F(Evaluate, ExternalFormConvertsAndDoubleFormDoesNot)
 {
     TestStream stream({.dimension = 2, .type = KFS_Type_U8});
     stream.Key(0, {0.0, 10.0}).Key(100, {3.0, 300.0});
-    const T_Time at{50, 600};
+    T_Time const at{50, 600};
     std::array<unsigned char, 2> bytes{};
     ASSERT_EQ(0, KFS_GetValue(stream, &at, 1, bytes.data(), nullptr, nullptr)) << "the third argument has no say";
     EXPECT_EQ((std::array<unsigned char, 2>{2, 155}), bytes) << "halves round away from zero";
     EXPECT_EQ((std::vector{1.5, 155.0}), stream.At(50));
     std::array<unsigned char, 4> four{};
-    const M_Vector4T<double> vector{{1.0, 2.0, 3.4, 254.6}};
-    const TestStream wide({.dimension = 4, .type = KFS_Type_U8});
+    M_Vector4T<double> const vector{{1.0, 2.0, 3.4, 254.6}};
+    TestStream const wide({.dimension = 4, .type = KFS_Type_U8});
     KFS_PostCacheVector4Value(wide, 0, vector, nullptr, four.data());
     EXPECT_EQ((std::array<unsigned char, 4>{1, 2, 3, 255}), four) << "a vector goes into a value buffer";
     void* pointer = nullptr;
@@ -165,27 +165,27 @@ TEST_F(Evaluate, TimesComeInAnyScale)
     TestStream stream;
     stream.Key(0, {0.0}).Key(600, {6.0});
     double value = 0.0;
-    for (const T_Time at : {T_Time{1, 2}, T_Time{300, 600}, T_Time{15, 30}}) {
+    for (T_Time const at : {T_Time{1, 2}, T_Time{300, 600}, T_Time{15, 30}}) {
         ASSERT_EQ(0, KFS_GetValueFPlus(stream, &at, 0, &value, nullptr, nullptr));
         EXPECT_DOUBLE_EQ(3.0, value);
     }
     ASSERT_EQ(0, KFS_GetValueFPlus(stream, nullptr, 0, &value, nullptr, nullptr));
     EXPECT_EQ(0.0, value) << "no time is the origin";
-    const T_Time beyond{2000000000, 1}, noScale{1, 0};
+    T_Time const beyond{2000000000, 1}, noScale{1, 0};
     EXPECT_EQ(T_Err_Overflow, KFS_GetValueFPlus(stream, &beyond, 0, &value, nullptr, nullptr));
     EXPECT_NE(0, KFS_GetValuePlus(stream, &noScale, 0, &value, nullptr, nullptr, nullptr, 0));
 }
 
 TEST_F(Evaluate, WhatHasNoValueSaysSo)
 {
-    const TestStream keyed;
-    const TestStream constant({.noKeys = true});
-    const T_Time at{0, 600};
+    TestStream const keyed;
+    TestStream const constant({.noKeys = true});
+    T_Time const at{0, 600};
     double value = -1.0;
     for (KFS_Stream* const stream : {keyed.get(), constant.get()}) {
         EXPECT_EQ(7427, KFS_GetValueFPlus(stream, &at, 0, &value, nullptr, nullptr));
         EXPECT_EQ(7427, KFS_GetValuePlus(stream, &at, 0, &value, nullptr, nullptr, nullptr, 0));
-        const Q_MemoryCount before = Q_MemoryLive(nullptr);
+        Q_MemoryCount const before = Q_MemoryLive(nullptr);
         EXPECT_THROW(stream->ForceInterpolateAtTime({0, 600}), int);
         EXPECT_EQ(before, Q_MemoryLive(nullptr));
         EXPECT_EQ(
@@ -197,10 +197,10 @@ TEST_F(Evaluate, WhatHasNoValueSaysSo)
 
 TEST_F(Evaluate, DoublesAreRefusedForCustomValues)
 {
-    const KFS_ValueDesc desc{1, 8, 0, [](KFS_Stream const*, long, int, int) { return 0; }};
+    KFS_ValueDesc const desc{1, 8, 0, [](KFS_Stream const*, long, int, int) { return 0; }};
     KFS_Stream stream(1, 600, 0, 0, 7, 0, desc, nullptr, nullptr, false);
     const std::string text = "can#{rsquo}t compute floating point value(s) for a custom value";
-    const T_Time at{0, 600};
+    T_Time const at{0, 600};
     double value = -1.0;
     char** handle = nullptr;
     EXPECT_EQ(7441, KFS_GetValueF(&stream, &at, 0, &value, nullptr, nullptr));
@@ -214,14 +214,14 @@ TEST_F(Evaluate, WithoutAStateThatSaysHowThereIsACodeAndNoCrash)
 {
     TestStream stream;
     stream.Key(0, {1.0});
-    const T_Time at{0, 600};
+    T_Time const at{0, 600};
     double value = -1.0;
     {
-        const Q_ScSetCurrentRenderContext bare(Q_RenderContext::MakeNewContext(false));
+        Q_ScSetCurrentRenderContext const bare(Q_RenderContext::MakeNewContext(false));
         EXPECT_EQ(3, KFS_GetValueFPlus(stream, &at, 0, &value, nullptr, nullptr));
         EXPECT_EQ((std::vector<Reported>{{0x1D0071, 8, "", 3}}), reports.Take());
     }
-    const Q_ScSetCurrentRenderContext none(nullptr);
+    Q_ScSetCurrentRenderContext const none(nullptr);
     EXPECT_EQ(3, KFS_GetValueFPlus(stream, &at, 0, &value, nullptr, nullptr));
     EXPECT_EQ(2U, reports.Take().size()) << "the missing context is reported by itself";
     EXPECT_EQ(-1.0, value);
@@ -233,14 +233,14 @@ TEST_F(Evaluate, AnOverridesValueTakesThePlaceOfTheKeysAndForcedOnesStandInTheCa
 {
     TestStream stream;
     stream.Key(0, {1.0}).Key(100, {2.0});
-    const double overriding = 42.0;
+    double const overriding = 42.0;
     double value = 0.0;
     unsigned char atKey = 0;
     KFS_GetValueFNoExpr(stream, 100, 0, &value, &atKey, &overriding);
     EXPECT_EQ(42.0, value);
     EXPECT_EQ(1, atKey);
     EXPECT_EQ(2.0, stream.At1(100));
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
     stream->ValidateCacheAtTime({50, 600});
     EXPECT_EQ(50, stream->GetCache()->time);
     stream->ForceInterpolateAtTime({20, 600});
@@ -252,7 +252,7 @@ TEST_F(Evaluate, SamplesComeInOneHandle)
 {
     TestStream stream({.dimension = 2});
     stream.Key(0, {0.0, 10.0}).Key(60, {6.0, 16.0});
-    const T_Time start{0, 600}, step{1, 30};
+    T_Time const start{0, 600}, step{1, 30};
     char** handle = nullptr;
     ASSERT_EQ(0, KFS_GetValuesFPlus(stream, &start, &step, 3, 0, &handle));
     ASSERT_EQ(3 * 2 * sizeof(double), Q_GetHandleSize(handle));
@@ -263,8 +263,8 @@ TEST_F(Evaluate, SamplesComeInOneHandle)
     EXPECT_EQ(0u, Q_GetHandleSize(handle));
     Q_FreeHandle(handle);
     handle = nullptr;
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
-    const T_Time hugeStep{1000000000, 600};
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
+    T_Time const hugeStep{1000000000, 600};
     EXPECT_NE(0, KFS_GetValuesFPlus(stream, &start, &hugeStep, 4, 0, &handle)) << "the fourth time can't be held";
     EXPECT_EQ(nullptr, handle);
     EXPECT_EQ(before, Q_MemoryLive(nullptr));
@@ -297,8 +297,8 @@ TEST_F(Evaluate, SeparatedDimensionsAnswerFromTheirFollowers)
     x.Key(0, {10.0}).Key(100, {20.0});
     y.Key(0, {5.0});
     leader.followers = {x.get(), y.get()};
-    const double own[3] = {1.0, 2.0, 3.0};
-    const T_Time at{50, 600};
+    double const own[3] = {1.0, 2.0, 3.0};
+    T_Time const at{50, 600};
     ASSERT_EQ(0, KFS_InsertKeyF(&leader, nullptr, 1, own, KFS_Interp_Linear, KFS_Interp_Linear));
     leader.SetDimensionsSeparated(true);
     std::array<double, 3> value{};
@@ -332,7 +332,7 @@ TEST_F(Evaluate, ReadsAllocateNothing)
     double value[3];
     Q_FailAllocation(1);
     for (int time = -5; time < 200; ++time) {
-        const T_Time at{time, 600};
+        T_Time const at{time, 600};
         ASSERT_EQ(0, KFS_GetValueFPlus(plain, &at, 0, value, nullptr, nullptr));
         ASSERT_EQ(0, KFS_GetValuePlus(spatial, &at, 0, value, nullptr, nullptr, nullptr, 0));
     }

@@ -46,7 +46,7 @@ struct Conversion {
 
 constexpr double Infinity = std::numeric_limits<double>::infinity();
 
-const Conversion Conversions[] = {
+Conversion const Conversions[] = {
     {KFS_Type_S8, -1.0, 0xFF, -1.0},
     {KFS_Type_S8, 200.0, 200, -56.0},  // wraps
     {KFS_Type_U8, 300.0, 44, 44.0},    // wraps
@@ -292,9 +292,8 @@ TEST_F(Items, DisposingArcTablesLeavesKeysAndMarksTheirArcs)
     TestStream stream({.dimension = 2, .spatial = true});
     stream.Key(0, {0, 0}).Key(100, {10, 0}).Key(200, {10, 10});
     ASSERT_EQ(0, stream->UpdateStream());
-    for (int i = 0; i < 3; ++i) {
+    for (int i = 0; i < 3; ++i)
         if (!stream.Record(i)->remapTable) stream.Record(i)->remapTable = MakeTable();
-    }
     EXPECT_EQ(TestStream::NotStale, stream.ArcStale());
     ASSERT_EQ(0, KFS_DisposeRemapTables(stream));
     for (int i = 0; i < 3; ++i) EXPECT_EQ(nullptr, stream.Record(i)->remapTable);

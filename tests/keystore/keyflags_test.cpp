@@ -195,18 +195,14 @@ TEST_F(KeyFlags, EveryFailingAllocationLeavesTheKeysAsTheyWere)
                 fixture->stream->Key(i * 600, std::vector<double>(40, i * i), KFS_Interp_Spline);
                 fixture->stream->Record(i)->flags = 0;
             }
-            if (path) {
-                EXPECT_EQ(0, KFS_SetKeyFlags(*fixture->stream, 1, F, F));
-            }
+            if (path) EXPECT_EQ(0, KFS_SetKeyFlags(*fixture->stream, 1, F, F));
             EXPECT_EQ(0, (*fixture->stream)->UpdateStream());
             fixture->before = fixture->stream->Bytes();
             return fixture;
         };
         auto const edit = [path](Fixture& f) { return KFS_SetKeyFlags(*f.stream, 1, path ? F : C, path ? 0 : C); };
         auto const check = [path](Fixture& fixture, int code, Q_MemoryCount const&) {
-            if (!path || code != 0) {
-                EXPECT_EQ(fixture.before, fixture.stream->Bytes());
-            }
+            if (!path || code != 0) EXPECT_EQ(fixture.before, fixture.stream->Bytes());
             EXPECT_EQ(0, fixture.stream->Pins());
             EXPECT_TRUE(fixture.stream->CacheIsEmpty());
         };

@@ -27,7 +27,7 @@ TEST_F(KeyValues, KeysAreReadInTheStreamsExternalForm)
     stream.Record(1)->flags |= KFS_KeyFlag_Continuous;
     EXPECT_EQ(0, KFS_GetKeyFlags(stream, 1, &flags));
     EXPECT_EQ(stream.Record(1)->flags, flags);
-    for (const int bad : {2, -2}) {
+    for (int const bad : {2, -2}) {
         EXPECT_EQ(SEQ_Err_BadIndex, KFS_GetKeyFlags(stream, bad, &flags));
         EXPECT_EQ(SEQ_Err_BadIndex, KFS_GetKey(stream, bad, value.data(), &in, &out));
         EXPECT_EQ(SEQ_Err_BadIndex, KFS_GetKeyF(stream, bad, numbers.data(), &in, &out));
@@ -67,11 +67,11 @@ int RememberingCopy(KFS_Stream const* stream, long refcon, short kind, void cons
 
 TEST_F(KeyValues, ACustomValueGoesThroughTheClientsFunctionAndNeverAsDoubles)
 {
-    for (const bool noKeys : {false, true}) {
-        for (const long word : {42L, -42L}) {
+    for (bool const noKeys : {false, true}) {
+        for (long const word : {42L, -42L}) {
             KFS_ValueDesc desc{1, 8, word, [](KFS_Stream const*, long, int, int) { return 0; }};
             KFS_Stream stream(1, 600, noKeys, 0, KFS_InterpMask_Hold, 0, desc, nullptr, nullptr, false);
-            const long stored = 0x1122334455667788;
+            long const stored = 0x1122334455667788;
             ASSERT_EQ(0, KFS_InsertKey(&stream, nullptr, 1, &stored, KFS_Interp_Hold, KFS_Interp_Hold));
             stream.SetCopyItemFunc(RememberingCopy);
             long value = 0;

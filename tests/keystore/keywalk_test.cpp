@@ -45,15 +45,15 @@ TEST_F(KeyWalk, WalksTheKeysOfARangeOfTimes)
         std::vector<int> times;
     };
     // What lies between two times is the random test's.
-    const Row rows[] = {
+    Row const rows[] = {
         {Null, Null, {10, 20, 30}}, {Null, 20, {10, 20}}, {20, Null, {20, 30}}, {Null, 9, {}}, {31, Null, {}},
         {10, 30, {10, 20, 30}},     {30, 15, {30, 20}},   {11, 19, {}},
     };
-    for (const Row& row : rows) {
-        for (const unsigned finer : {1u, 5u}) {
+    for (Row const& row : rows) {
+        for (unsigned const finer : {1u, 5u}) {
             SCOPED_TRACE(testing::Message() << row.first << " to " << row.last << " scale x" << finer);
-            const T_Time first{row.first * static_cast<int>(finer), 600 * finer};
-            const T_Time last{row.last, 600};
+            T_Time const first{row.first * static_cast<int>(finer), 600 * finer};
+            T_Time const last{row.last, 600};
             Visitor visitor;
             T_Time lastTime{77, 77};
             EXPECT_EQ(0, KFS_ForRange(stream, row.first == Null ? nullptr : &first, row.last == Null ? nullptr : &last,
@@ -61,9 +61,8 @@ TEST_F(KeyWalk, WalksTheKeysOfARangeOfTimes)
             EXPECT_EQ(row.times, visitor.times);
             EXPECT_EQ(row.times.empty() ? None : row.times.back(), lastTime.value);
             EXPECT_EQ(600u, lastTime.scale);
-            for (std::size_t i = 0; i < visitor.times.size(); ++i) {
+            for (std::size_t i = 0; i < visitor.times.size(); ++i)
                 EXPECT_EQ(visitor.times[i] / 10 - 1, visitor.indices[i]);
-            }
         }
     }
 }
@@ -75,12 +74,12 @@ TEST_F(KeyWalk, AgreesWithAFilterOverRandomKeys)
         TestStream keys;
         for (int i = 0; i < 20; ++i) keys.Key(static_cast<int>(random() % 100), {0.0});
         for (int ask = 0; ask < 20; ++ask) {
-            const int a = static_cast<int>(random() % 120) - 10;
-            const int b = static_cast<int>(random() % 120) - 10;
+            int const a = static_cast<int>(random() % 120) - 10;
+            int const b = static_cast<int>(random() % 120) - 10;
             std::vector<int> expected = keys.Times();
             std::erase_if(expected, [&](int time) { return time < std::min(a, b) || time > std::max(a, b); });
             if (a > b) std::reverse(expected.begin(), expected.end());
-            const T_Time first = keys.Time(a), last = keys.Time(b);
+            T_Time const first = keys.Time(a), last = keys.Time(b);
             Visitor visitor;
             EXPECT_EQ(0, KFS_ForRange(keys, &first, &last, visitor.Word(), Visitor::Visit, nullptr));
             EXPECT_EQ(expected, visitor.times) << a << " to " << b;
@@ -95,11 +94,11 @@ TEST_F(KeyWalk, WalksTheKeysOfARangeOfIndices)
         std::vector<int> times;
         int lastIndex;
     };
-    const Row rows[] = {
+    Row const rows[] = {
         {0, 2, 0, {10, 20, 30}, 2},         {2, 0, 0, {30, 20, 10}, 0},          {1, 1, 0, {20}, 1},
         {0, 3, SEQ_Err_BadIndex, {}, None}, {-1, 1, SEQ_Err_BadIndex, {}, None},
     };
-    for (const Row& row : rows) {
+    for (Row const& row : rows) {
         SCOPED_TRACE(testing::Message() << row.first << " to " << row.last);
         Visitor visitor;
         int lastIndex = 77;
@@ -111,7 +110,7 @@ TEST_F(KeyWalk, WalksTheKeysOfARangeOfIndices)
 
 TEST_F(KeyWalk, TheFunctionEndsTheWalk)
 {
-    for (const auto& [answer, code] : {std::pair{4711, 4711}, {-1, 815}, {-2, static_cast<int>(Q_Err_Exception)}}) {
+    for (auto const& [answer, code] : {std::pair{4711, 4711}, {-1, 815}, {-2, static_cast<int>(Q_Err_Exception)}}) {
         SCOPED_TRACE(code);
         Visitor visitor;
         visitor.stopAt = 20;
@@ -134,7 +133,7 @@ TEST_F(KeyWalk, AConstantIsOneKeyWithoutAnIndex)
     constant.Key(15, {1.0});
     Visitor visitor;
     T_Time lastTime{77, 77};
-    const T_Time early{-99, 600};
+    T_Time const early{-99, 600};
     EXPECT_EQ(0, KFS_ForRange(constant, &early, &early, visitor.Word(), Visitor::Visit, &lastTime));
     EXPECT_EQ(15, lastTime.value);
     int lastIndex = 77;
@@ -146,8 +145,8 @@ TEST_F(KeyWalk, AConstantIsOneKeyWithoutAnIndex)
 
 TEST_F(KeyWalk, NothingToWalkOverIsReported)
 {
-    const TestStream empty;
-    const TestStream unset({.noKeys = true});
+    TestStream const empty;
+    TestStream const unset({.noKeys = true});
     Visitor visitor;
     for (KFS_Stream* const nothing : {empty.get(), unset.get()}) {
         T_Time lastTime{77, 77};
@@ -160,7 +159,7 @@ TEST_F(KeyWalk, NothingToWalkOverIsReported)
         EXPECT_EQ(0u, lastTime.scale);
         EXPECT_EQ(None, lastIndex);
     }
-    const T_Time noScale{0, 0}, fine{0, 600};
+    T_Time const noScale{0, 0}, fine{0, 600};
     EXPECT_NE(0, KFS_ForRange(stream, &noScale, &fine, visitor.Word(), Visitor::Visit, nullptr));
     EXPECT_NE(0, KFS_ForRange(stream, nullptr, &noScale, visitor.Word(), Visitor::Visit, nullptr));
     EXPECT_TRUE(visitor.times.empty());

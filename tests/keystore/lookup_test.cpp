@@ -26,7 +26,7 @@ std::unique_ptr<TestStream> WithKeys(std::vector<int> times, bool backwards = fa
 {
     auto stream = std::make_unique<TestStream>();
     if (backwards) std::reverse(times.begin(), times.end());
-    for (const int time : times) stream->Key(time, {1.0 * time});
+    for (int const time : times) stream->Key(time, {1.0 * time});
     return stream;
 }
 
@@ -72,7 +72,7 @@ TEST_F(Lookup, AnswersAlikeHoweverItIsAsked)
         int at;
         int nearest, nearestTime, atOrBefore, exactly;
     };
-    const Ask asks[] = {
+    Ask const asks[] = {
         {"the only key, from afar", {20}, -9000, 0, 20, None, None},
         {"before the first", {10, 20, 30}, 5, 0, 10, None, None},
         {"exactly on a key", {10, 20, 30}, 20, 1, 20, 1, 1},
@@ -83,14 +83,14 @@ TEST_F(Lookup, AnswersAlikeHoweverItIsAsked)
         {"negative times", {-30, -10}, -20, 0, -30, 0, None},
         {"far apart", {-1000000000, 1000000000}, 1, 1, 1000000000, 0, None},
     };
-    for (const Ask& ask : asks) {
-        for (const bool backwards : {false, true}) {  // the order of insertion must not show
-            for (const int finer : {1, 7}) {          // nor must the scale of the question
+    for (Ask const& ask : asks) {
+        for (bool const backwards : {false, true}) {  // the order of insertion must not show
+            for (int const finer : {1, 7}) {          // nor must the scale of the question
                 if (finer > 1 && std::abs(ask.keys.front()) > 1000000) continue;
                 SCOPED_TRACE(testing::Message() << ask.why << ", backwards " << backwards << ", scale x" << finer);
-                const auto stream = WithKeys(ask.keys, backwards);
-                const T_Time at{ask.at * finer, 600u * static_cast<unsigned>(finer)};
-                const Answers answers = Answers::Of(stream->get(), at);
+                auto const stream = WithKeys(ask.keys, backwards);
+                T_Time const at{ask.at * finer, 600u * static_cast<unsigned>(finer)};
+                Answers const answers = Answers::Of(stream->get(), at);
                 EXPECT_EQ(ask.nearest, answers.nearest);
                 EXPECT_TRUE(Same({ask.nearestTime, 600}, answers.nearestTime));
                 EXPECT_EQ(ask.atOrBefore, answers.atOrBefore);
@@ -107,37 +107,37 @@ TEST_F(Lookup, AgreesWithAPlainWalkOverRandomKeys)
 {
     std::mt19937 random(24);
     for (int round = 0; round < 40; ++round) {
-        const int span = round % 2 ? 100 : 2000000;
-        const auto any = [&] { return static_cast<int>(random() % static_cast<unsigned>(span)) - span / 2; };
+        int const span = round % 2 ? 100 : 2000000;
+        auto const any = [&] { return static_cast<int>(random() % static_cast<unsigned>(span)) - span / 2; };
         std::set<int> keys;
         for (unsigned long count = 1 + random() % 60; count > 0; --count) keys.insert(any());
-        const std::vector<int> times(keys.begin(), keys.end());
-        const auto made = WithKeys(times);
+        std::vector<int> const times(keys.begin(), keys.end());
+        auto const made = WithKeys(times);
         TestStream const& stream = *made;
         for (int ask = 0; ask < 50; ++ask) {
-            const int at = ask % 3 == 0 ? times[random() % times.size()] : any();
+            int const at = ask % 3 == 0 ? times[random() % times.size()] : any();
             SCOPED_TRACE(testing::Message() << "round " << round << " at " << at);
-            const auto next = std::lower_bound(times.begin(), times.end(), at);
-            const bool exactly = next != times.end() && *next == at;
-            const int position = static_cast<int>(next - times.begin());
-            const auto nearest = std::min_element(times.begin(), times.end(),
+            auto const next = std::lower_bound(times.begin(), times.end(), at);
+            bool const exactly = next != times.end() && *next == at;
+            int const position = static_cast<int>(next - times.begin());
+            auto const nearest = std::min_element(times.begin(), times.end(),
                                                   [at](int a, int b) { return std::abs(a - at) < std::abs(b - at); });
-            const Answers answers = Answers::Of(stream, stream.Time(at));
+            Answers const answers = Answers::Of(stream, stream.Time(at));
             EXPECT_EQ(nearest - times.begin(), answers.nearest);
             EXPECT_EQ(exactly ? position : None, answers.at);
             EXPECT_EQ(exactly, answers.exactly != 0);
             EXPECT_EQ(exactly ? position : position > 0 ? position - 1 : None, answers.atOrBefore);
-            const int size = static_cast<int>(times.size());
-            const std::pair<int, int> steps[] = {
+            int const size = static_cast<int>(times.size());
+            std::pair<int, int> const steps[] = {
                 {0, exactly ? position + 1 : position},
                 {KFS_Find_Backward, position - 1},
                 {KFS_Find_AtTime, position},
                 {KFS_Find_AtTime | KFS_Find_Backward, exactly ? position : position - 1},
             };
-            for (const auto& [direction, index] : steps) {
-                const Step step = Step::Of(stream, stream.Time(at), direction);
-                const bool there = index >= 0 && index < size;
-                const T_Time time = there ? T_Time{times[static_cast<std::size_t>(index)], 600} : NoTime;
+            for (auto const& [direction, index] : steps) {
+                Step const step = Step::Of(stream, stream.Time(at), direction);
+                bool const there = index >= 0 && index < size;
+                T_Time const time = there ? T_Time{times[static_cast<std::size_t>(index)], 600} : NoTime;
                 EXPECT_EQ((std::tuple{0, there, there ? index : None}),
                           (std::tuple{step.code, step.found != 0, step.index}));
                 EXPECT_TRUE(Same(time, step.time));
@@ -148,7 +148,7 @@ TEST_F(Lookup, AgreesWithAPlainWalkOverRandomKeys)
 
 TEST_F(Lookup, NullTimeIsTheOriginAndAnswersMayBeNull)
 {
-    const auto stream = WithKeys({-10, 0, 10});
+    auto const stream = WithKeys({-10, 0, 10});
     int index = 77;
     EXPECT_EQ(0, KFS_TimeToIndex(*stream, nullptr, &index));
     EXPECT_EQ(1, index);
@@ -158,7 +158,7 @@ TEST_F(Lookup, NullTimeIsTheOriginAndAnswersMayBeNull)
     EXPECT_EQ(0, KFS_FindKeyTime(*stream, nullptr, 0, nullptr, &index, nullptr));
     EXPECT_EQ(2, index);
     EXPECT_EQ(0, KFS_GetKey(*stream, 1, nullptr, nullptr, nullptr));
-    for (const auto& [at, expected] : {std::pair<int, T_Time>{0, {-10, 600}},
+    for (auto const& [at, expected] : {std::pair<int, T_Time>{0, {-10, 600}},
                                        {2, {10, 600}},
                                        {-1, {10, 600}},
                                        {3, NoTime},
@@ -178,19 +178,19 @@ TEST_F(Lookup, AConstantHasOneKeyWhereverItIsAsked)
     int index = 77;
     unsigned char found = 77;
     T_Time time{77, 77};
-    const T_Time asked{300, 1200};
+    T_Time const asked{300, 1200};
     EXPECT_EQ(0, KFS_FindNearestKeyTime(stream, &asked, &index, &time));
     EXPECT_EQ(0, index);
     EXPECT_TRUE(Same({150, 600}, time)) << "in the stream's scale";
     EXPECT_EQ(0, KFS_IndexToTime(stream, 99, &time));
     EXPECT_TRUE(Same({150, 600}, time)) << "the value has moved there";
-    const T_Time later = stream.Time(42);
+    T_Time const later = stream.Time(42);
     EXPECT_EQ(0, KFS_GetKeyIndex(stream, &later, &index, &found));
     EXPECT_EQ(0, index);
     EXPECT_EQ(1, found);
     EXPECT_EQ(42, stream->GetCache()->time);
     // The one time that would say that there is no value.
-    const T_Time none = stream.Time(KFS_INVALID_INDEX);
+    T_Time const none = stream.Time(KFS_INVALID_INDEX);
     EXPECT_EQ(0, KFS_GetKeyIndex(stream, &none, &index, &found));
     EXPECT_EQ(0, KFS_FindNearestKeyTime(stream, &none, &index, &time));
     double value = 0.0;
@@ -209,8 +209,8 @@ TEST_F(Lookup, AConstantHasOneKeyWhereverItIsAsked)
 // Without a value, and with keys but none there: the same questions, other answers.
 TEST_F(Lookup, WhatThereIsToSayWithoutAnything)
 {
-    const TestStream constant({.noKeys = true}), keyed;
-    const T_Time at = keyed.Time(5);
+    TestStream const constant({.noKeys = true}), keyed;
+    T_Time const at = keyed.Time(5);
     const std::string getText = "attempt to get a value from a time stream with no key values.";
     const std::string inquireText = "attempt to inquire about a key value in a time stream with no key values.";
     int index = 77;
@@ -224,7 +224,7 @@ TEST_F(Lookup, WhatThereIsToSayWithoutAnything)
     EXPECT_EQ(0, KFS_FindNearestKeyTime(keyed, &at, &index, &time));
     EXPECT_EQ(None, index);
     EXPECT_TRUE(Same({KFS_INVALID_INDEX, 600}, time)) << "no time, in the stream's scale";
-    const Step step = Step::Of(keyed, at, 0);
+    Step const step = Step::Of(keyed, at, 0);
     EXPECT_EQ((std::tuple{0, 0, None}), (std::tuple{step.code, int{step.found}, step.index}));
     EXPECT_TRUE(Same(NoTime, step.time));
     EXPECT_EQ(7427, KFS_TimeToIndex(keyed, &at, &index));
@@ -235,7 +235,7 @@ TEST_F(Lookup, WhatThereIsToSayWithoutAnything)
     time = {77, 77};
     EXPECT_EQ(0, KFS_IndexToTime(keyed, -1, &time));
     EXPECT_TRUE(Same(NoTime, time));
-    for (const TestStream* const stream : {&constant, &keyed}) {
+    for (TestStream const* const stream : {&constant, &keyed}) {
         double value = 77.0;
         char in = 77;
         char out = 77;
@@ -259,14 +259,14 @@ TEST_F(Lookup, WhatThereIsToSayWithoutAnything)
 
 TEST_F(Lookup, ATimeThatDoesNotFitIsRefusedWithoutAReport)
 {
-    const auto stream = WithKeys({10, 20});
-    const T_Time tooFar{2000000000, 1}, noTime = NoTime;
+    auto const stream = WithKeys({10, 20});
+    T_Time const tooFar{2000000000, 1}, noTime = NoTime;
     unsigned char found = 77;
     T_Time time{77, 77};
-    const Step step = Step::Of(*stream, tooFar, 0);
+    Step const step = Step::Of(*stream, tooFar, 0);
     EXPECT_EQ((std::tuple{int{T_Err_Overflow}, 0, None}), (std::tuple{step.code, int{step.found}, step.index}));
     EXPECT_TRUE(Same(NoTime, step.time));
-    for (const auto& [bad, code] : {std::pair<T_Time, int>{tooFar, T_Err_Overflow}, {noTime, T_Err_Scale}}) {
+    for (auto const& [bad, code] : {std::pair<T_Time, int>{tooFar, T_Err_Overflow}, {noTime, T_Err_Scale}}) {
         std::array indices{77, 77, 77};
         EXPECT_EQ(code, KFS_FindNearestKeyTime(*stream, &bad, &indices[0], &time));
         EXPECT_EQ(code, KFS_TimeToIndex(*stream, &bad, &indices[1]));
@@ -295,7 +295,7 @@ protected:
     int At(int time)
     {
         int index = 77;
-        const T_Time at = stream.Time(time);
+        T_Time const at = stream.Time(time);
         EXPECT_EQ(0, KFS_TimeToIndex(stream, &at, &index));
         return index;
     }
@@ -312,7 +312,7 @@ TEST_F(Updates, AFloatKeyIsTakenWhereItStands)
     MakeStale();
     stream.Record(2)->time = 190;
     stream->SetKeys(stream->GetKeys());
-    const int moved = At(200);
+    int const moved = At(200);
     EXPECT_FALSE(IsStale()) << "nothing there";
     EXPECT_EQ(stream.Record(2)->time == 200 ? 2 : None, moved) << "the answer is that after the update";
 }
@@ -351,7 +351,7 @@ TEST_F(Updates, NoUpdateStartsInsideAnother)
 // A key that stood at the time before is the answer all the same.
 TEST_F(Updates, AFailedUpdateIsTheResultWhereNoKeyStandsAndIsOverAfterIt)
 {
-    for (const int time : {300, 333}) {
+    for (int const time : {300, 333}) {
         SCOPED_TRACE(time);
         int failures = 0;
         bool fired = true;
@@ -359,9 +359,9 @@ TEST_F(Updates, AFailedUpdateIsTheResultWhereNoKeyStandsAndIsOverAfterIt)
             ASSERT_LT(n, 100);
             ASSERT_EQ(0, KFS_DisposeRemapTables(stream));  // so that the arcs need memory again
             int index = 77;
-            const T_Time at = stream.Time(time);
+            T_Time const at = stream.Time(time);
             Q_FailAllocation(n);
-            const int code = KFS_TimeToIndex(stream, &at, &index);
+            int const code = KFS_TimeToIndex(stream, &at, &index);
             fired = Q_FailAllocationFired();
             Q_FailAllocation(0);
             EXPECT_TRUE(code == 0 || (code == 4 && time == 333)) << code;
@@ -379,9 +379,9 @@ TEST_F(Updates, ARenderAsksItsOwnKeys)
     TestStream constant({.noKeys = true});
     constant.Key(5, {1.0});
     {
-        const Q_ScSetCurrentRenderContext current(kfshost::MakeRenderContext(true));
+        Q_ScSetCurrentRenderContext const current(kfshost::MakeRenderContext(true));
         int index = 77;
-        const T_Time at = constant.Time(99);
+        T_Time const at = constant.Time(99);
         EXPECT_EQ(0, KFS_GetKeyIndex(constant, &at, &index, nullptr));
         EXPECT_EQ(99, constant->GetCache()->time);
         EXPECT_EQ(3, At(300));

@@ -13,7 +13,7 @@ class Queries : public StreamTest {};
 
 TEST_F(Queries, AnimatedMeansKeysOrAnExpressionThatRuns)
 {
-    const TestStream stream({.noKeys = true});
+    TestStream const stream({.noKeys = true});
     struct Row {
         char const* why;
         char const* expression;
@@ -21,14 +21,14 @@ TEST_F(Queries, AnimatedMeansKeysOrAnExpressionThatRuns)
         char const* error;
         bool active, any;
     };
-    const Row rows[] = {
+    Row const rows[] = {
         {"nothing", "", 0, "", false, false},
         {"an expression", "time", 0, "", true, true},
         {"switched off", "time", KFS_ExprFlag_Disabled, "", false, true},
         {"with an error", "time", 0, "no such thing", false, true},
         {"an error alone", "", 0, "no such thing", false, false},
     };
-    for (const Row& row : rows) {
+    for (Row const& row : rows) {
         SCOPED_TRACE(row.why);
         stream->GetExprInfoForModify().SetExpression(Text(row.expression));
         stream->GetExprInfoForModify().SetFlags(row.flags);
@@ -46,10 +46,10 @@ TEST_F(Queries, AnimatedMeansKeysOrAnExpressionThatRuns)
 
 TEST_F(Queries, MasksAndParameterFlagsSayHowItMayBeAnimated)
 {
-    for (const unsigned short mask : {0, 1, 4, 7}) {
-        for (const unsigned flags : {0u, FX_ParamFlag_CannotAnimate, FX_ParamFlag_HoldOnly}) {
+    for (unsigned short const mask : {0, 1, 4, 7}) {
+        for (unsigned const flags : {0u, FX_ParamFlag_CannotAnimate, FX_ParamFlag_HoldOnly}) {
             SCOPED_TRACE(testing::Message() << "mask " << mask << " flags " << flags);
-            const TestStream stream({.interpMask = mask});
+            TestStream const stream({.interpMask = mask});
             FX_ParamDef def{};
             def.paramType = FX_Param_FLOAT_SLIDER;
             def.paramFlags = flags;
@@ -62,14 +62,14 @@ TEST_F(Queries, MasksAndParameterFlagsSayHowItMayBeAnimated)
 
 TEST_F(Queries, WhichKindsCanHaveAnExpression)
 {
-    const TestStream stream, nameless;
+    TestStream const stream, nameless;
     stream->SetMatchName(KFS_MatchName("a kind", true));
     for (int kind = -1; kind < 20; ++kind) {
         FX_ParamDef def{};
         def.paramType = kind;
         stream->SetParamDef(def);
         nameless->SetParamDef(def);
-        const bool cannot = kind == 0 || kind == 8 || kind == 9 || (kind >= 12 && kind <= 14);
+        bool const cannot = kind == 0 || kind == 8 || kind == 9 || (kind >= 12 && kind <= 14);
         EXPECT_EQ(!cannot, stream->CanHaveExpression()) << kind;
         EXPECT_TRUE(nameless->CanHaveExpression()) << kind;
     }
@@ -85,13 +85,13 @@ TEST_F(Queries, SameHoldSameValue)
         int a, b;
         bool same;
     };
-    const Row rows[] = {{10, 19, true},  {19, 20, false}, {5, 10, true}, {-99, 5, true},
+    Row const rows[] = {{10, 19, true},  {19, 20, false}, {5, 10, true}, {-99, 5, true},
                         {30, 999, true}, {5, 25, false},  {20, 20, true}};
     TestStream curve;
     curve.Key(10, {1.0}).Key(20, {1.0});
-    for (const Row& row : rows) {
+    for (Row const& row : rows) {
         SCOPED_TRACE(testing::Message() << row.a << " and " << row.b);
-        const T_Time finer{row.b * 3, 1800};
+        T_Time const finer{row.b * 3, 1800};
         EXPECT_EQ(row.same, hold->SameValueAtTimes(hold.Time(row.a), finer, nullptr));
         EXPECT_EQ(row.a == row.b, curve->SameValueAtTimes(curve.Time(row.a), finer, nullptr))
             << "a curve isn't looked at";
@@ -102,7 +102,7 @@ TEST_F(Queries, SameHoldSameValue)
     TestStream constant({.noKeys = true});
     constant.Key(0, {1.0});
     EXPECT_TRUE(constant->SameValueAtTimes(constant.Time(-5), constant.Time(5), nullptr));
-    const TestStream empty({.interpMask = KFS_InterpMask_Hold});
+    TestStream const empty({.interpMask = KFS_InterpMask_Hold});
     EXPECT_EQ(7427, KFSp_Boundary(
                         [&] { static_cast<void>(empty->SameValueAtTimes(empty.Time(1), empty.Time(2), nullptr)); }));
     EXPECT_EQ(1u, reports.Take().size());
@@ -112,7 +112,7 @@ TEST_F(Queries, ASetValueFindsAKeyAtItsTime)
 {
     TestStream stream;
     stream.Key(0, {0.0}).Key(100, {10.0});
-    const auto bytes = stream.Bytes();
+    auto const bytes = stream.Bytes();
     stream->PrepareSetValue(stream.Time(100));
     EXPECT_EQ(bytes, stream.Bytes()) << "there is one";
     stream->PrepareSetValue({50, 1200});
@@ -143,8 +143,8 @@ TEST_F(Queries, AnExpressionIsEvaluatedAtTheRoot)
 {
     EvaluatingRoot root;
     HeardRoot middle;
-    const TestStream stream;
-    const T_Time at = stream.Time(7);
+    TestStream const stream;
+    T_Time const at = stream.Time(7);
     double value = 0.0;
     EXPECT_EQ(1, stream->EvaluateExpression(&at, &value, nullptr, nullptr)) << "no root, no value";
     middle.SetParent(&root);
@@ -193,7 +193,7 @@ TEST_F(Queries, LimitsComeFromTheParameterRecord)
         double min, max, uiMin, uiMax;
         int precision;
     };
-    const Row rows[] = {
+    Row const rows[] = {
         {FX_Param_INT_SLIDER, -5.0, 6.0, -2.0, 3.0, 0},  {FX_Param_FIXED_SLIDER, -1.5, 1.5, -1.0, 0.5, 2},
         {FX_Param_FIXED_ANGLE, -1.0, 2.0, -1.0, 2.0, 0}, {FX_Param_BOOL, 0.0, 1.0, 0.0, 1.0, 0},
         {FX_Param_CHOICE, 1.0, 5.0, 1.0, 5.0, 0},        {FX_Param_FLOAT_SLIDER, -0.5, 8.25, 0.0, 1.0, 3},
@@ -201,7 +201,7 @@ TEST_F(Queries, LimitsComeFromTheParameterRecord)
         {FX_Param_NotFilledIn, -1e9, 1e9, -1e9, 1e9, 0},
     };
     LimitedStream limited(1, true, true);
-    for (const Row& row : rows) {
+    for (Row const& row : rows) {
         SCOPED_TRACE(row.kind);
         limited.SetParamDef(MakeDef(row.kind));
         EXPECT_EQ(row.min, limited.GetMinValue());
@@ -209,14 +209,14 @@ TEST_F(Queries, LimitsComeFromTheParameterRecord)
         EXPECT_EQ(row.uiMin, limited.GetUIMinValue());
         EXPECT_EQ(row.uiMax, limited.GetUIMaxValue());
         EXPECT_EQ(row.precision, limited.GetPrecision());
-        const bool isSlider = row.uiMin != row.min;
+        bool const isSlider = row.uiMin != row.min;
         limited.SetUIMinValue(-4.0);
         limited.SetUIMaxValue(2.0);
         EXPECT_EQ(isSlider ? -4.0 : row.uiMin, limited.GetUIMinValue());
         EXPECT_EQ(isSlider ? 2.0 : row.uiMax, limited.GetUIMaxValue());
         EXPECT_EQ(row.min, limited.GetMinValue()) << "the valid range is another";
     }
-    const TestStream plain;
+    TestStream const plain;
     plain->SetParamDef(MakeDef(FX_Param_FIXED_ANGLE));
     EXPECT_EQ(-32768.0, plain->GetMinValue()) << "an angle without limits has those of its numbers";
     EXPECT_EQ(32767.99998474121, plain->GetMaxValue());
@@ -233,13 +233,13 @@ TEST_F(Queries, ALegalValueLiesWithinTheLimitsThatThereAre)
 {
     constexpr double nan = std::numeric_limits<double>::quiet_NaN();
     constexpr double infinity = std::numeric_limits<double>::infinity();
-    for (const bool hasMin : {false, true}) {
-        for (const bool hasMax : {false, true}) {
+    for (bool const hasMin : {false, true}) {
+        for (bool const hasMax : {false, true}) {
             SCOPED_TRACE(testing::Message() << hasMin << hasMax);
             LimitedStream stream(5, hasMin, hasMax);
             stream.SetParamDef(MakeDef(FX_Param_FLOAT_SLIDER));
-            const std::vector<double> values{-7.0, 2.0, 8.25, 99.0, infinity};
-            const std::vector<double> legal{hasMin ? -0.5 : -7.0, 2.0, 8.25, hasMax ? 8.25 : 99.0,
+            std::vector<double> const values{-7.0, 2.0, 8.25, 99.0, infinity};
+            std::vector<double> const legal{hasMin ? -0.5 : -7.0, 2.0, 8.25, hasMax ? 8.25 : 99.0,
                                             hasMax ? 8.25 : infinity};
             std::vector<double> result = values;
             stream.LegalizeValue(result.data());
@@ -247,9 +247,7 @@ TEST_F(Queries, ALegalValueLiesWithinTheLimitsThatThereAre)
             std::vector<double> nans(5, nan);
             stream.LegalizeValue(nans.data());
             EXPECT_EQ(!hasMin && !hasMax, std::isnan(nans[0]));
-            if (hasMin || hasMax) {
-                EXPECT_EQ(std::vector<double>(5, hasMin ? -0.5 : 8.25), nans) << "a NaN is a limit";
-            }
+            if (hasMin || hasMax) EXPECT_EQ(std::vector<double>(5, hasMin ? -0.5 : 8.25), nans) << "a NaN is a limit";
             stream.DisableLegalizeValue(true);
             stream.DisableLegalizeValue(true);
             stream.DisableLegalizeValue(false);
@@ -271,7 +269,7 @@ TEST_F(Queries, UnitsAndComponentsHaveNames)
         char const* units;
         std::vector<char const*> components;
     };
-    const Row rows[] = {
+    Row const rows[] = {
         {FX_Param_FIXED_ANGLE, 1, 0, 0, "degrees", {"", ""}},
         {FX_Param_POINT_2D, 2, 0, 0, "pixels", {"X", "Y", "Z", "", ""}},
         {FX_Param_POINT_3D, 3, 0, 0, "pixels", {"X", "Y", "Z", ""}},
@@ -288,9 +286,9 @@ TEST_F(Queries, UnitsAndComponentsHaveNames)
         {FX_Param_BOOL, 2, 0, 0, "", {"", ""}},
         {FX_Param_NotFilledIn, 2, 0, 0, "", {"", ""}},
     };
-    for (const Row& row : rows) {
+    for (Row const& row : rows) {
         SCOPED_TRACE(testing::Message() << row.kind << " min " << row.wholeMin << " flags " << row.displayFlags);
-        const TestStream stream({.dimension = row.dimension});
+        TestStream const stream({.dimension = row.dimension});
         FX_ParamDef def{};
         def.paramType = row.kind;
         if (row.kind == FX_Param_FIXED_SLIDER) {
@@ -303,7 +301,7 @@ TEST_F(Queries, UnitsAndComponentsHaveNames)
         EXPECT_EQ(Text(row.units), stream->GetUnitsName());
         EXPECT_EQ(Text(row.units), stream->GetEnglishUnitsName());
         for (short i = 0; i < static_cast<short>(row.components.size()); ++i) {
-            const u16str name = Text(row.components[static_cast<std::size_t>(i)]);
+            u16str const name = Text(row.components[static_cast<std::size_t>(i)]);
             EXPECT_EQ(name, stream->GetDimensionName(i)) << i;
             EXPECT_EQ(name, stream->GetEnglishDimensionName(i)) << i;
         }

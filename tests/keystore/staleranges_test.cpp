@@ -36,7 +36,7 @@ TEST_F(StaleRanges, AMarkReachesBackFromItsIndex)
         short count;
         Range range;
     };
-    const Row rows[] = {
+    Row const rows[] = {
         {"a key and its neighbours", 4, 2, {2, 4}},
         {"cut at the start", 1, 4, {0, 1}},
         {"no reach, no mark", 3, 0, {None, None}},
@@ -48,9 +48,9 @@ TEST_F(StaleRanges, AMarkReachesBackFromItsIndex)
         {"more than all", -1, 32767, {0, 5}},
         {"nothing from the end", -1, 0, {None, None}},
     };
-    const auto plain = WithKeys(6);
-    const auto spatial = WithKeys(6, true);
-    for (const Row& row : rows) {
+    auto const plain = WithKeys(6);
+    auto const spatial = WithKeys(6, true);
+    for (Row const& row : rows) {
         SCOPED_TRACE(row.why);
         for (TestStream* const stream : {plain.get(), spatial.get()}) {
             Clean(*stream);
@@ -70,23 +70,22 @@ TEST_F(StaleRanges, AMarkReachesBackFromItsIndex)
 TEST_F(StaleRanges, MarksAddUp)
 {
     std::mt19937 random(210);
-    const auto below = [&](int bound) { return static_cast<int>(random() % static_cast<unsigned>(bound)); };
+    auto const below = [&](int bound) { return static_cast<int>(random() % static_cast<unsigned>(bound)); };
     for (int round = 0; round < 60; ++round) {
-        const int keys = 1 + below(12);
-        const auto stream = WithKeys(keys, round % 2 != 0);
+        int const keys = 1 + below(12);
+        auto const stream = WithKeys(keys, round % 2 != 0);
         std::vector<bool> marked(static_cast<std::size_t>(keys));
         for (int mark = 0; mark < 4; ++mark) {
-            const int index = below(keys + 4);
-            const int count = below(6) - 1;
+            int const index = below(keys + 4);
+            int const count = below(6) - 1;
             EXPECT_EQ(0, (*stream)->SetInvalid(index, static_cast<short>(count)));
             EXPECT_EQ(0, (*stream)->SetArcInvalid(index, static_cast<short>(count)));
-            const bool isBehind = index >= keys && index - count >= keys - 1;
-            for (int key = 0; key < keys && count > 0 && !isBehind; ++key) {
+            bool const isBehind = index >= keys && index - count >= keys - 1;
+            for (int key = 0; key < keys && count > 0 && !isBehind; ++key)
                 if (key >= index - count && key <= index) marked[static_cast<std::size_t>(key)] = true;
-            }
-            const auto first = std::find(marked.begin(), marked.end(), true);
-            const auto last = std::find(marked.rbegin(), marked.rend(), true);
-            const Range hull = first == marked.end() ? Range{None, None}
+            auto const first = std::find(marked.begin(), marked.end(), true);
+            auto const last = std::find(marked.rbegin(), marked.rend(), true);
+            Range const hull = first == marked.end() ? Range{None, None}
                                                      : Range{static_cast<int>(first - marked.begin()),
                                                              keys - 1 - static_cast<int>(last - marked.rbegin())};
             EXPECT_EQ(hull, stream->Stale()) << "round " << round << " mark " << mark;
@@ -103,23 +102,22 @@ TEST_F(StaleRanges, ARangeOnASpatialStreamDoesNotEndOnAFloatKey)
         short count;
         Range range;
     };
-    const Row rows[] = {
+    Row const rows[] = {
         {"..f...", 3, 1, {1, 3}},                                  // 2 floats: back to 1
         {"..ff..", 3, 1, {1, 4}},                                  // both ends
         {".ffff.", 3, 1, {0, 5}}, {"ffffff", 3, 1, {0, 5}},        // the ends of the list stop it
         {"....ff", 4, 1, {3, 5}}, {"..f...", 2, 0, {None, None}},  // nothing is marked, nothing is widened
         {".f..f.", 3, 1, {2, 3}},                                  // outside of the range
     };
-    for (const Row& row : rows) {
+    for (Row const& row : rows) {
         SCOPED_TRACE(row.floats);
-        for (const bool spatial : {true, false}) {
-            const auto stream = WithKeys(6, spatial);
-            for (int i = 0; i < 6; ++i) {
+        for (bool const spatial : {true, false}) {
+            auto const stream = WithKeys(6, spatial);
+            for (int i = 0; i < 6; ++i)
                 if (row.floats[i] == 'f') stream->Record(i)->flags |= KFS_KeyFlag_Float;
-            }
             EXPECT_EQ(0, (*stream)->SetInvalid(row.index, row.count));
             EXPECT_EQ(0, (*stream)->SetArcInvalid(row.index, row.count));
-            const Range plain = row.count < 1 ? Range{None, None} : Range{row.index - row.count, row.index};
+            Range const plain = row.count < 1 ? Range{None, None} : Range{row.index - row.count, row.index};
             EXPECT_EQ(spatial ? row.range : plain, stream->Stale());
             EXPECT_EQ(plain, stream->ArcStale()) << "arcs don't depend on times";
             EXPECT_EQ(0, stream->Pins());
@@ -129,7 +127,7 @@ TEST_F(StaleRanges, ARangeOnASpatialStreamDoesNotEndOnAFloatKey)
 
 TEST_F(StaleRanges, WithoutKeysNothingIsStale)
 {
-    const TestStream empty;
+    TestStream const empty;
     TestStream constant({.noKeys = true});
     constant.Key(0, {1.0});
     for (TestStream const* const stream : {&empty, static_cast<TestStream const*>(&constant)}) {
@@ -146,9 +144,9 @@ TEST_F(StaleRanges, WithoutKeysNothingIsStale)
 
 TEST_F(StaleRanges, ARenderMarksItsOwnKeys)
 {
-    const auto stream = WithKeys(4);
+    auto const stream = WithKeys(4);
     {
-        const Q_ScSetCurrentRenderContext current(kfshost::MakeRenderContext(true));
+        Q_ScSetCurrentRenderContext const current(kfshost::MakeRenderContext(true));
         EXPECT_EQ(0, (*stream)->SetInvalid(2, 1));
         EXPECT_EQ(0, (*stream)->SetArcInvalid(2, 1));
         EXPECT_EQ((Range{1, 2}), stream->Stale());

@@ -43,15 +43,15 @@ TEST_F(Streams, ConstructionSetsWhatItsArgumentsAskFor)
         unsigned short flags;
         unsigned short spInterp;
     };
-    const Row rows[] = {
+    Row const rows[] = {
         {1, false, 8, 0, 0},
         {2, true, 0, 0x2 | 0x4 | 0x8, 0},
         {3, true, 8, 0x2 | 0x4 | 0x8, 3},
         {4, true, 8, 0x2 | 0x4, 0},  // no arc length, and no automatic tangents, above three dimensions
     };
-    for (const Row& row : rows) {
+    for (Row const& row : rows) {
         SCOPED_TRACE(row.dimension);
-        const TestStream stream({.dimension = row.dimension, .spatial = row.spatial, .spInterpMask = row.spInterpMask});
+        TestStream const stream({.dimension = row.dimension, .spatial = row.spatial, .spInterpMask = row.spInterpMask});
         EXPECT_EQ(row.flags, stream->GetKFSFlags());
         EXPECT_EQ(row.spInterp, stream->GetSpInterp());
         EXPECT_EQ(nullptr, stream->GetKeys());
@@ -80,7 +80,7 @@ TEST_F(Streams, ConstructionRefusesWhatCannotBe)
 
 TEST_F(Streams, ConstructionWithoutMemoryThrows4AndLeaksNothing)
 {
-    const int failures =
+    int const failures =
         FailEveryAllocation([] { return std::make_unique<int>(); },
                             [](int&) { return ConstructionCode(3, true, 7, 8, Plain(KFS_Type_Double)); },
                             [](int&, int code, Q_MemoryCount const& before) {
@@ -92,15 +92,15 @@ TEST_F(Streams, ConstructionWithoutMemoryThrows4AndLeaksNothing)
 
 TEST_F(Streams, ADescriptionFollowsItsDataType)
 {
-    const TestStream stream;
-    const int sizes[] = {1, 1, 2, 2, 4, 4, 4, 4, 4, 8};
+    TestStream const stream;
+    int const sizes[] = {1, 1, 2, 2, 4, 4, 4, 4, 4, 8};
     for (int type = 0; type <= 9; ++type) {
-        const KFS_ValueDesc desc = Plain(type);
+        KFS_ValueDesc const desc = Plain(type);
         ASSERT_EQ(0, KFS_SetValueDescription(stream, &desc, nullptr));
         EXPECT_EQ(sizes[type], stream->GetValueDesc()->itemSize) << type;
     }
     KFS_ValueDesc old;
-    const KFS_ValueDesc bad = Plain(10);
+    KFS_ValueDesc const bad = Plain(10);
     EXPECT_EQ(7433, KFS_SetValueDescription(stream, &bad, &old));
     EXPECT_EQ(KFS_Type_Double, old.dataType & 0xFF);
     EXPECT_EQ(KFS_Type_Double, stream->GetValueDesc()->dataType & 0xFF) << "a refused description changes nothing";
@@ -114,7 +114,7 @@ TEST_F(Streams, ACustomStreamIsPlainOnlyForAWhile)
     EXPECT_EQ(HoldFirst, stream.GetInterpFunc());
     EXPECT_NE(nullptr, stream.GetCopyItemFunc()) << "bytes are copied where the client has no function";
     EXPECT_EQ(42, stream.GetItemRefcon());
-    const KFS_ValueDesc plain = Plain(KFS_Type_Double);
+    KFS_ValueDesc const plain = Plain(KFS_Type_Double);
     KFS_ValueDesc custom;
     ASSERT_EQ(0, KFS_SetValueDescription(&stream, &plain, &custom));
     EXPECT_TRUE(stream.IsTemporarilyNonCustom());
@@ -132,9 +132,9 @@ TEST_F(Streams, ACustomStreamIsPlainOnlyForAWhile)
 // A negative data type is the word for taking the item functions away.
 TEST_F(Streams, ANegativeDataTypeClearsTheItemFunctions)
 {
-    const TestStream stream;
+    TestStream const stream;
     stream.get()->SetCopyItemFunc(NoCopy);
-    const KFS_ValueDesc negative = Plain(0x80);
+    KFS_ValueDesc const negative = Plain(0x80);
     EXPECT_EQ(0, KFS_SetValueDescription(stream, &negative, nullptr));
     EXPECT_EQ(nullptr, stream->GetCopyItemFunc());
     EXPECT_EQ(8, stream->GetValueDesc()->itemSize) << "the size stays what it was";
@@ -142,7 +142,7 @@ TEST_F(Streams, ANegativeDataTypeClearsTheItemFunctions)
 
 TEST_F(Streams, CountersNest)
 {
-    const TestStream stream;
+    TestStream const stream;
     stream->SetDisabledUpdateStream(true);
     stream->SetDisabledUpdateStream(true);
     stream->SetDisabledUpdateStream(false);
@@ -150,8 +150,8 @@ TEST_F(Streams, CountersNest)
     stream->SetDisabledUpdateStream(false);
     EXPECT_TRUE(stream->CanUpdateStream());
     {
-        const KFS_Stream::QuietExpressionErrorToken outer(stream);
-        const KFS_Stream::QuietExpressionErrorToken inner(stream);
+        KFS_Stream::QuietExpressionErrorToken const outer(stream);
+        KFS_Stream::QuietExpressionErrorToken const inner(stream);
         EXPECT_TRUE(stream->ExpressionErrorsAreQuiet());
     }
     EXPECT_FALSE(stream->ExpressionErrorsAreQuiet());
@@ -169,8 +169,8 @@ TEST_F(Streams, TheNumberOfKeysOfAConstantIsOneLess)
 
 TEST_F(Streams, NothingIsLeftAfterEverything)
 {
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
-    for (const bool spatial : {false, true}) {
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
+    for (bool const spatial : {false, true}) {
         TestStream stream({.dimension = 3, .spatial = spatial});
         for (int i = 0; i < 50; ++i) stream.Key(i * 7, {1.0 * i, 2.0 * (i % 3), 3.0}, KFS_Interp_Spline);
         stream.At(100);

@@ -125,9 +125,8 @@ TEST_F(KeyRecords, ThereAndBack)
         TestStream stream(options);
         int const count = static_cast<int>(random() % 9);
         ASSERT_EQ(0, KFSp_CreateKeyList(stream));
-        for (int i = 0; i < count; ++i) {
+        for (int i = 0; i < count; ++i)
             stream.Key(i * 10 - 30, std::vector<double>(static_cast<std::size_t>(options.dimension), 1.0));
-        }
         for (int i = 0; i < count; ++i) {
             KFS_KeyScalar* const key = stream.Record(i);
             unsigned short const layout = key->flags & KFS_KeyFlag_SpatialBlock;
@@ -147,9 +146,7 @@ TEST_F(KeyRecords, ThereAndBack)
         EXPECT_EQ(stream.Times(), other.Times());
         EXPECT_EQ(items, ToDisk(other));
         EXPECT_EQ(0, other.Pins());
-        for (int i = 0; options.spatial && i < count; ++i) {
-            EXPECT_EQ(nullptr, other.Record(i)->remapTable);
-        }
+        for (int i = 0; options.spatial && i < count; ++i) EXPECT_EQ(nullptr, other.Record(i)->remapTable);
     }
 }
 
@@ -248,15 +245,11 @@ TEST_F(KeyRecords, TheSwapsUndoThemselves)
         TestStream stream({.dimension = 2, .spatial = spatial});
         stream.Key(0, {1, 2}).Key(10, {3, 4});
         std::vector<unsigned char> const before = stream.Bytes();
-        for (int i = 0; i < 2; ++i) {
-            EXPECT_EQ(0, KFSp_KeyScalarDataSwap(stream, stream.Record(i)));
-        }
+        for (int i = 0; i < 2; ++i) EXPECT_EQ(0, KFSp_KeyScalarDataSwap(stream, stream.Record(i)));
         EXPECT_NE(before, stream.Bytes());
         EXPECT_EQ(MemoryFile::Hex(Span(Double(3))),
                   MemoryFile::Hex({static_cast<unsigned char const*>(KFSp_ValueData(stream.Record(1))), 8}));
-        for (int i = 0; i < 2; ++i) {
-            EXPECT_EQ(0, KFSp_KeyScalarDataSwap(stream, stream.Record(i)));
-        }
+        for (int i = 0; i < 2; ++i) EXPECT_EQ(0, KFSp_KeyScalarDataSwap(stream, stream.Record(i)));
         EXPECT_EQ(before, stream.Bytes());
     }
 }

@@ -24,9 +24,7 @@ inline std::string Double(double number)
 inline std::string Doubles(std::vector<double> const& numbers)
 {
     std::string bytes;
-    for (double const number : numbers) {
-        bytes += Double(number);
-    }
+    for (double const number : numbers) bytes += Double(number);
     return bytes;
 }
 
@@ -71,9 +69,7 @@ inline std::string Leaf(std::string const& record, std::string const& rest)
 inline std::string Keys(int itemSize, std::vector<std::string> const& items)
 {
     std::string bytes = Long(static_cast<std::uint32_t>(itemSize)) + Long(static_cast<std::uint32_t>(items.size()));
-    for (std::string const& item : items) {
-        bytes += item;
-    }
+    for (std::string const& item : items) bytes += item;
     return Atom("seql", bytes);
 }
 
@@ -100,9 +96,7 @@ inline int ReadLeaf(KFS_Stream* stream, std::string const& file)
 inline MemoryFile Written(KFS_Stream const* stream, std::function<void(CKF_File*)> const& prepare = {})
 {
     return MemoryFile([&](CKF_File* file) {
-        if (prepare) {
-            prepare(file);
-        }
+        if (prepare) prepare(file);
         EXPECT_EQ(0, Thrown([&] { stream->Write(file); }));
     });
 }
@@ -117,10 +111,7 @@ inline std::string DataOf(std::string const& id, MemoryFile const& file)
 {
     CKF_ChunkWalk walk(file.Bytes());
     CKF_RawChunk chunk;
-    while (walk.Next(&chunk)) {
-        if (Long(static_cast<std::uint32_t>(chunk.id)) == id) {
-            return {chunk.data.begin(), chunk.data.end()};
-        }
-    }
+    while (walk.Next(&chunk))
+        if (Long(static_cast<std::uint32_t>(chunk.id)) == id) return {chunk.data.begin(), chunk.data.end()};
     return "-";
 }

@@ -18,9 +18,8 @@ protected:
         std::vector<double> value(static_cast<std::size_t>(stream->GetDimension()) * 8 + 1);
         for (int const time : {INT_MIN + 1, -7, 0, 1, 50, 100, 101, INT_MAX}) {
             T_Time const at{time, stream->GetTimeScale()};
-            if (!stream->IsCustom()) {
+            if (!stream->IsCustom())
                 static_cast<void>(KFS_GetValueFPlus(stream, &at, 0, value.data(), nullptr, nullptr));
-            }
         }
         static_cast<void>(KFSp_Boundary([&] {
             std::unique_ptr<KFS_Stream> const clone(stream->CloneLeaf({true, true}));
@@ -43,9 +42,7 @@ std::vector<std::string> Samples()
             std::vector<double> const value(static_cast<std::size_t>(options.dimension), i * 3.0 - 2);
             stream.Key(i * 33, value, static_cast<char>(1 + i % 3));
         }
-        if (shape > 1) {
-            KFS_SetStreamExpression(stream, Text("time * 2"));
-        }
+        if (shape > 1) KFS_SetStreamExpression(stream, Text("time * 2"));
         MemoryFile const file = Written(stream);
         samples.emplace_back(file.Bytes().begin(), file.Bytes().end());
     }
@@ -55,9 +52,7 @@ std::vector<std::string> Samples()
 void ReadAny(KFS_Stream* stream, std::string const& bytes)
 {
     CKF_File file;
-    if (file.Open(Span(bytes)) == 0) {
-        static_cast<void>(Thrown([&] { stream->Read(&file, nullptr); }));
-    }
+    if (file.Open(Span(bytes)) == 0) static_cast<void>(Thrown([&] { stream->Read(&file, nullptr); }));
 }
 
 TEST_F(LeafHostile, EveryByteChanged)
@@ -108,12 +103,9 @@ TEST_F(LeafHostile, KeysThatMakeNoSense)
         for (std::size_t i = 0; i < 2 + random() % 6; ++i) {
             std::string item = KeyHead(times[random() % std::size(times)], static_cast<int>(random() % 7) - 2,
                                        static_cast<int>(random() % 7) - 2, random() & 0xFFFF);
-            if (spatial) {
-                item += Long(random()) + Long(0);
-            }
-            for (int n = 0; n < (spatial ? 5 + 3 * dimension : 5); ++n) {
+            if (spatial) item += Long(random()) + Long(0);
+            for (int n = 0; n < (spatial ? 5 + 3 * dimension : 5); ++n)
                 item += Double(values[random() % std::size(values)]);
-            }
             items.push_back(item);
         }
         LeafRecord record;

@@ -216,9 +216,7 @@ TEST_F(LeafRead, ADerivedClassKeepsItsSpatialFlag)
         LeafRecord record;
         record.Flags(KFS_StreamFlag_Spatial | (fileHasKeys ? 0 : KFS_StreamFlag_NoKeys)).HasExpression();
         std::string rest = fileHasKeys ? Keys(80, {std::string(80, '\x11')}) : Value({1, 2, 3});
-        if (fileHasKeys) {
-            record.HasList();
-        }
+        if (fileHasKeys) record.HasList();
         ASSERT_EQ(0, ReadLeaf(&stream, Form(Leaf(record, rest + Atom("Utf8", "time")))));
         EXPECT_FALSE(stream.IsSpatial());
         EXPECT_TRUE(stream.HasNoKeys());
@@ -376,9 +374,7 @@ TEST_F(LeafRead, CorruptLists)
 TEST_F(LeafRead, AllKeysAreStaleHoweverMany)
 {
     std::vector<std::string> items;
-    for (int i = 0; i < 70000; ++i) {
-        items.push_back(ScalarKey(i, i));
-    }
+    for (int i = 0; i < 70000; ++i) items.push_back(ScalarKey(i, i));
     TestStream stream;
     ASSERT_EQ(0, ReadLeaf(stream, Form(Leaf(LeafRecord().Flags(0).HasList(), Keys(48, items)))));
     EXPECT_EQ((std::array<int, 2>{0, 69999}), stream.Stale());
@@ -455,19 +451,13 @@ TEST_F(LeafRead, WrittenAndReadBack)
             std::generate(value.begin(), value.end(), number);
             stream.Key(static_cast<int>(random() % 200), value, static_cast<char>(1 + random() % 3));
         }
-        if (round % 2 == 0) {
-            KFS_SetStreamExpression(stream, Text("a+b"));
-        }
-        if (count > 0) {
-            stream.At(10);  // brings derived data up to date
-        }
+        if (round % 2 == 0) KFS_SetStreamExpression(stream, Text("a+b"));
+        if (count > 0) stream.At(10);  // brings derived data up to date
         MemoryFile const file = Written(stream);
         TestStream other({.dimension = 4});
         ASSERT_EQ(0, ReadLeaf(other, file));
         EXPECT_EQ(file.Bytes(), Written(other).Bytes());
-        for (int time = -5; count > 0 && time < 210; time += 7) {
-            EXPECT_EQ(stream.At(time), other.At(time)) << time;
-        }
+        for (int time = -5; count > 0 && time < 210; time += 7) EXPECT_EQ(stream.At(time), other.At(time)) << time;
         EXPECT_EQ(KFS_GetStreamExpression(stream), KFS_GetStreamExpression(other));
     }
 }

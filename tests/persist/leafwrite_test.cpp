@@ -266,9 +266,7 @@ TEST_F(LeafWrite, EveryWriteMayFail)
         SCOPED_TRACE(noKeys);
         TestStream stream;
         stream.Key(0, {1.0}).Key(60, {5.0});
-        if (noKeys) {
-            stream->SetKFSFlags(KFS_StreamFlag_NoKeys);
-        }
+        if (noKeys) stream->SetKFSFlags(KFS_StreamFlag_NoKeys);
         KFS_SetStreamExpression(stream, Text("1+1"));
         SetParam(stream, FX_Param_FLOAT_SLIDER);
         std::vector<unsigned char> const whole = Written(stream).Bytes();

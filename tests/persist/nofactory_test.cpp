@@ -22,11 +22,8 @@ TEST_F(NoFactory, AStreamInAListIsWrittenWithoutItsName)
     }
     MemoryFile const file([&](CKF_File* into) { list->Write(into); });
     std::vector<std::string> names;
-    for (std::string const& line : file.Lines()) {
-        if (line.starts_with("    kfsn")) {
-            names.push_back(line.substr(9));
-        }
-    }
+    for (std::string const& line : file.Lines())
+        if (line.starts_with("    kfsn")) names.push_back(line.substr(9));
     auto const hex = [](std::string const& text) {
         return MemoryFile::Hex({reinterpret_cast<unsigned char const*>(text.data()), text.size()});
     };

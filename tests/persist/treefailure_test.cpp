@@ -110,9 +110,7 @@ TEST_F(Tree, FilesThatNobodyWrote)
         }
         auto const other = MakeLayers();
         CKF_File file;
-        if (file.Open(bytes) == 0 && Thrown([&] { other->Read(&file, nullptr); }) == 0) {
-            WrittenGroup(other.get());
-        }
+        if (file.Open(bytes) == 0 && Thrown([&] { other->Read(&file, nullptr); }) == 0) WrittenGroup(other.get());
         static_cast<void>(reports.Take());
     }
     // Names that files bring are kept for good, texts of reports too.
@@ -123,9 +121,7 @@ TEST_F(Tree, GroupsInGroupsHaveAnEnd)
 {
     auto const nested = [](int depth) {
         std::string file = Group(Marker, "");
-        for (int i = 1; i < depth; ++i) {
-            file = Group(Marker, MatchName("layers") + file);
-        }
+        for (int i = 1; i < depth; ++i) file = Group(Marker, MatchName("layers") + file);
         return Form(file);
     };
     EXPECT_EQ(0, ReadGroup(MakeLayers().get(), nested(CKF_MaxDepth / 2)));

@@ -46,9 +46,8 @@ inline std::vector<std::string> NamesIn(MemoryFile const& file)
         if (Long(static_cast<std::uint32_t>(chunk.id)) == "kfmn") {
             EXPECT_EQ(40u, chunk.data.size());
             std::string const name = reinterpret_cast<char const*>(chunk.data.data());
-            if (name != "ZQVM Group End") {
+            if (name != "ZQVM Group End")
                 names.push_back(std::string(static_cast<std::size_t>(chunk.depth - 2), ' ') + name);
-            }
         }
     }
     return names;

@@ -38,7 +38,7 @@ TEST(AnyValue, TextAndNumberTurnIntoEachOther)
 {
     constexpr std::int64_t least = std::numeric_limits<std::int64_t>::min();
     constexpr std::int64_t most = std::numeric_limits<std::int64_t>::max();
-    for (const std::int64_t number : {std::int64_t{0}, std::int64_t{-1}, std::int64_t{4294967295}, least, most}) {
+    for (std::int64_t const number : {std::int64_t{0}, std::int64_t{-1}, std::int64_t{4294967295}, least, most}) {
         EXPECT_EQ(std::to_string(number), Narrow(Q_Any(number, true).GetAs_Str()));
         EXPECT_EQ(number, Q_Any(U(std::to_string(number))).GetAs_int());
     }
@@ -88,7 +88,7 @@ struct Parsed {
 
 TEST(AnyTree, ReadsWhatIsJson)
 {
-    const Parsed rows[] = {
+    Parsed const rows[] = {
         {"nothing in it", " { } ", "{}"},
         {"an empty array is an empty tree", "[]", "{}"},
         {"blanks", "{ \"a\" :\t1 ,\r\n\"b\":-2}", "{\"a\":1,\"b\":-2}"},
@@ -114,7 +114,7 @@ TEST(AnyTree, ReadsWhatIsJson)
 
 TEST(AnyTree, RefusesEverythingElseAndStaysAsItWas)
 {
-    const auto expectRefused = [](std::string const& text) {
+    auto const expectRefused = [](std::string const& text) {
         Q_AnyTree tree;
         Q_AnyTreeWrapper wrapper(tree);
         wrapper.put(U("old"), Q_Any(std::int64_t{1}));
@@ -131,7 +131,7 @@ TEST(AnyTree, RefusesEverythingElseAndStaysAsItWas)
         expectRefused("[" + std::string(item) + "]");
     expectRefused("[\"open");
     expectRefused(std::string("{}\0x", 4));
-    const std::string deepest = std::string(Q_MaxJsonDepth, '[') + std::string(Q_MaxJsonDepth, ']');
+    std::string const deepest = std::string(Q_MaxJsonDepth, '[') + std::string(Q_MaxJsonDepth, ']');
     expectRefused("[" + deepest + "]");
     expectRefused(std::string(1000000, '['));
     expectRefused("[" + deepest.substr(1, 200) + ",");
@@ -154,7 +154,7 @@ TEST(AnyTree, DepthIsBoundedWhenWritingToo)
 
 Q_AnyTree RandomTree(std::mt19937& random, int depth)
 {
-    const auto text = [&] {
+    auto const text = [&] {
         u16str result;
         for (unsigned i = random() % 5; i > 0; --i) result.push_back(static_cast<unsigned short>(random() % 0xD800));
         return result;
@@ -171,7 +171,7 @@ TEST(AnyTree, EveryTreeComesBackFromItsText)
     std::mt19937 random(42);
     for (int i = 0; i < 500; ++i) {
         Q_AnyTree tree = RandomTree(random, 4), back;
-        const u16str text = Q_AnyTreeWrapper(tree).GetAs_JSON();
+        u16str const text = Q_AnyTreeWrapper(tree).GetAs_JSON();
         Q_AnyTreeWrapper(back).SetFrom_JSON_HackRecoverMagicMixed(text);
         EXPECT_TRUE(tree == back) << Narrow(text);
     }

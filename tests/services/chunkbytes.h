@@ -42,7 +42,7 @@ inline std::span<unsigned char const> Span(std::string const& bytes)
 
 inline std::string Bytes(CKF_File const& file)
 {
-    const std::span<unsigned char const> bytes = file.GetBytes();
+    std::span<unsigned char const> const bytes = file.GetBytes();
     return {bytes.begin(), bytes.end()};
 }
 
@@ -69,18 +69,18 @@ inline std::string Outline(CKF_File* file, CKF_ChunkInfo const* parent = nullptr
     std::string text;
     for (;;) {
         bool found = false;
-        const CKF_ScDescend descent(file, 0, 0, parent, &found);
+        CKF_ScDescend const descent(file, 0, 0, parent, &found);
         if (!found) return text;
         CKF_ChunkInfo const* const chunk = descent.GetChunkInfo();
-        const auto spell = [](int id) { return Long(static_cast<std::uint32_t>(id)); };
+        auto const spell = [](int id) { return Long(static_cast<std::uint32_t>(id)); };
         if (!text.empty()) text += ' ';
         if (chunk->id == CKF_ListId) {
-            const std::string inner = Outline(file, chunk);
+            std::string const inner = Outline(file, chunk);
             text += "(" + spell(chunk->listType) + (inner.empty() ? "" : " ") + inner + ")";
         } else {
             std::string data(chunk->size, '\0');
             int size = static_cast<int>(chunk->size);
-            if (const int code = CKF_ReadChunkData(file, &size, data.data())) throw code;
+            if (int const code = CKF_ReadChunkData(file, &size, data.data())) throw code;
             text += spell(chunk->id) + ":" + std::to_string(size);
         }
     }
@@ -89,10 +89,10 @@ inline std::string Outline(CKF_File* file, CKF_ChunkInfo const* parent = nullptr
 // A file with a bit of everything: lists in lists, odd sizes, an empty atom, an empty list, texts, a list of items.
 inline std::string NestedSample()
 {
-    const std::string leaf =
+    std::string const leaf =
         List("kfbs", Atom("kfsb", Long(7)) + Atom("kfsn", "odd") + Atom("kfb4", std::string(124, 'b')) +
                          Atom("seql", Long(3) + Long(2) + "abcdef") + Atom("Utf8", "\xC3\xA4"));
-    const std::string inner =
+    std::string const inner =
         List("kfgp", Atom("kfmn", std::string(40, 'm')) + leaf + Atom("none", "") + List("void", ""));
     return Form(Atom("odd1", "x") + List("kfgp", Atom("kfsb", Long(0)) + inner + leaf) + Atom("last", "12345"));
 }

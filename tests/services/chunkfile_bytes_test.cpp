@@ -41,7 +41,7 @@ u16str Units(std::initializer_list<int> units)
     return u16str(units.begin(), units.end());
 }
 
-const std::vector<Golden> Goldens = {
+std::vector<Golden> const Goldens = {
     {"nothing", [](CKF_File*) {},
      std::string("KFSF\0\0\0\x18"
                  "projvers\0\0\0\x0C\0\0\0\x5F\0\0\0\0\0\0\0\0",
@@ -110,12 +110,12 @@ TEST(ChunkFileBytes, VersionAndEncodingStandInTheFile)
 TEST(ChunkFileText, EveryTextComesBackUnitForUnit)
 {
     // Units around all borders of UTF-8 and UTF-16, in all sequences of three.
-    const std::vector<int> units = {0,      'a',    0x7F,   0x80,   0x7FF,  0x800,  0xD7FF,
+    std::vector<int> const units = {0,      'a',    0x7F,   0x80,   0x7FF,  0x800,  0xD7FF,
                                     0xD800, 0xDBFF, 0xDC00, 0xDFFF, 0xE000, 0xFFFD, 0xFFFF};
     std::vector<u16str> texts = {{}};
-    for (const int a : units)
-        for (const int b : units)
-            for (const int c : units) texts.push_back(Units({a, b, c}));
+    for (int const a : units)
+        for (int const b : units)
+            for (int const c : units) texts.push_back(Units({a, b, c}));
 
     CKF_File file;
     ASSERT_EQ(0, file.CreateInMemory());
@@ -200,7 +200,7 @@ TEST(ChunkFileVersions, EffectivePairs)
             << row.major << '.' << row.minor;
     }
     CKF_File file;
-    for (const int major : {0, 56, 71, 72, 95, 200}) {
+    for (int const major : {0, 56, 71, 72, 95, 200}) {
         file.majorVersion = major;
         EXPECT_EQ(major < 72, CKF_Version_Gen7_PreUnicode(&file)) << major;
     }
@@ -259,7 +259,7 @@ TEST(ChunkFileWriting, AMisuseFailsTheWholeSave)
         CKF_File file;
         ASSERT_EQ(0, file.CreateInMemory());
         EXPECT_EQ(row.code, row.call(&file));
-        const std::string text = file.LastErrorText();
+        std::string const text = file.LastErrorText();
         EXPECT_NE("", text);
         EXPECT_EQ(row.code, CKF_WriteAtom(&file, CKF_Id("cdat"), 2, "ok")) << "a good call after it";
         EXPECT_EQ(row.code, Thrown([&] { CKF_WriteUTF16(&file, {}); }));
@@ -290,15 +290,15 @@ TEST(ChunkFileWriting, ScopedListsAreClosedWhileAnExceptionPasses)
 TEST(ChunkFileWriting, TheSizeLimitIsExact)
 {
     const std::size_t whole = Form(List("kfgp", Atom("cdat", "abc"))).size();
-    for (const std::size_t limit : {whole, whole - 1, whole - 2, std::size_t{44}, std::size_t{43}, std::size_t{32},
+    for (std::size_t const limit : {whole, whole - 1, whole - 2, std::size_t{44}, std::size_t{43}, std::size_t{32},
                                     std::size_t{31}, std::size_t{0}}) {
         SCOPED_TRACE(limit);
         CKF_File file;
         file.SetMaxSize(static_cast<std::uint32_t>(limit));
-        const int created = file.CreateInMemory();
+        int const created = file.CreateInMemory();
         EXPECT_EQ(limit < 32 ? CKF_Err_TooBig : 0, created);
         if (created != 0) continue;
-        const int begun = Thrown([&] {
+        int const begun = Thrown([&] {
             const CKF_ScWriteList list(&file, CKF_Id("kfgp"), 0);
             CKF_WriteAtom(&file, CKF_Id("cdat"), 3, "abc");
         });

@@ -36,10 +36,10 @@ int ReadAsATree(CKF_File* file, CKF_ChunkInfo const* parent)
 void TakeEverything(std::string const& bytes)
 {
     CKF_File file;
-    const int opened = file.Open(Span(bytes));
+    int const opened = file.Open(Span(bytes));
     EXPECT_EQ(opened, file.LastError());
     std::string outline;
-    const int outlined = Thrown([&] { outline = Outline(&file); });
+    int const outlined = Thrown([&] { outline = Outline(&file); });
     EXPECT_LE(outline.size(), 4 * bytes.size() + 16);
     if (file.Open(Span(bytes)) == 0) ReadAsATree(&file, nullptr);
 
@@ -59,18 +59,18 @@ void TakeEverything(std::string const& bytes)
 
 TEST(ChunkFileHostile, EveryTruncationIsRefused)
 {
-    const std::string sample = NestedSample();
+    std::string const sample = NestedSample();
     TakeEverything(sample);
     for (std::size_t size = 0; size < sample.size(); ++size) {
         // A block of its own size, so that the sanitizer sees a read behind it.
-        const std::string cut(sample.data(), size);
+        std::string const cut(sample.data(), size);
         CKF_File file;
-        const int code = file.Open(Span(cut));
+        int const code = file.Open(Span(cut));
         EXPECT_TRUE(code == CKF_Err_Corrupt || code == CKF_Err_NotAChunkFile) << size << " gives " << code;
         TakeEverything(cut);
     }
     CKF_File file;
-    const std::string longer = sample + '\0';
+    std::string const longer = sample + '\0';
     EXPECT_EQ(CKF_Err_Corrupt, file.Open(Span(longer)));
     EXPECT_EQ(sample.size(), file.LastErrorOffset());
     TakeEverything(longer);
@@ -78,10 +78,10 @@ TEST(ChunkFileHostile, EveryTruncationIsRefused)
 
 TEST(ChunkFileHostile, EveryBentByteIsSurvived)
 {
-    const std::string sample = NestedSample();
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    std::string const sample = NestedSample();
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
     for (std::size_t at = 0; at < sample.size(); ++at)
-        for (const int mask : {0x01, 0x80, 0xFF}) {
+        for (int const mask : {0x01, 0x80, 0xFF}) {
             std::string bent = sample;
             bent[at] = static_cast<char>(bent[at] ^ mask);
             SCOPED_TRACE(testing::Message() << "byte " << at << " mask " << mask);
@@ -93,13 +93,13 @@ TEST(ChunkFileHostile, EveryBentByteIsSurvived)
 TEST(ChunkFileHostile, RandomBytesAreSurvived)
 {
     std::mt19937 random(20);
-    const std::string sample = NestedSample();
+    std::string const sample = NestedSample();
     char const* const words[] = {
         "LIST", "kfgp", "kfbs", "KFSF", "kfmn", "seql", "Utf8", "\0\0\0\0", "\xFF\xFF\xFF\xFF", "\x7F\xFF\xFF\xFF"};
     for (int round = 0; round < 3000; ++round) {
         std::string bytes = sample;
         for (unsigned i = 0; i < 1 + random() % 6; ++i) {
-            const std::string word(words[random() % std::size(words)], 4);
+            std::string const word(words[random() % std::size(words)], 4);
             bytes.replace(8 + random() % (bytes.size() - 16), 4, round % 2 ? word : Long(random() % 64));
         }
         TakeEverything(bytes);
@@ -108,17 +108,17 @@ TEST(ChunkFileHostile, RandomBytesAreSurvived)
 
 TEST(ChunkFileHostile, ListsNestAsDeepAsTheWriterCanAndNoDeeper)
 {
-    const auto nested = [](int depth) {
+    auto const nested = [](int depth) {
         std::string content = Atom("core", "x");
         for (int i = 0; i < depth; ++i) content = List("kfgp", content);
         return Form(content);
     };
-    const std::string deepest = nested(CKF_MaxDepth);
+    std::string const deepest = nested(CKF_MaxDepth);
     CKF_File file;
     ASSERT_EQ(0, file.Open(Span(deepest)));
     EXPECT_EQ(0, Thrown([&] { Outline(&file); }));
 
-    const std::string deeper = nested(CKF_MaxDepth + 1);
+    std::string const deeper = nested(CKF_MaxDepth + 1);
     ASSERT_EQ(0, file.Open(Span(deeper)));
     EXPECT_EQ(CKF_Err_TooDeep, Thrown([&] { Outline(&file); }));
 
@@ -128,7 +128,7 @@ TEST(ChunkFileHostile, ListsNestAsDeepAsTheWriterCanAndNoDeeper)
     bottomless.reserve(lists * 12);
     for (std::size_t i = 0; i < lists; ++i)
         bottomless += "LIST" + Long(static_cast<std::uint32_t>(12 * (lists - i) - 8)) + "kfgp";
-    const std::string bytes = Form(bottomless);
+    std::string const bytes = Form(bottomless);
     ASSERT_EQ(0, file.Open(Span(bytes)));
     EXPECT_EQ(CKF_Err_TooDeep, Thrown([&] { Outline(&file); }));
     CKF_ChunkWalk walk{Span(bytes)};
@@ -151,22 +151,22 @@ TEST(ChunkFileHostile, ASearchThatFoundNothingIsNotMadeAgain)
     CKF_File file;
     ASSERT_EQ(0, file.Open(Span(bytes)));
     const CKF_ScDescendList group(&file, CKF_Id("kfgp"), nullptr, nullptr);
-    const auto readName = [&] {
+    auto const readName = [&] {
         char name[40];
         return CKF_ReadAtom(&file, CKF_Id("kfmn"), group.GetChunkInfo(), sizeof name, name);
     };
-    const auto isThere = [&](int id, int listType) {
+    auto const isThere = [&](int id, int listType) {
         bool found = true;
-        const CKF_ScDescend descent(&file, id, listType, group.GetChunkInfo(), &found);
+        CKF_ScDescend const descent(&file, id, listType, group.GetChunkInfo(), &found);
         return found;
     };
-    const auto lookForChildren = [&] {
+    auto const lookForChildren = [&] {
         EXPECT_FALSE(isThere(CKF_ListId, CKF_Id("kfgp")) || isThere(CKF_ListId, CKF_Id("kfbs")));
         EXPECT_FALSE(isThere(CKF_Id("seql"), 0) || isThere(CKF_Id("kfsn"), 0));
     };
     ASSERT_EQ(0, readName());
     lookForChildren();
-    const std::size_t last = bytes.size() - 12;
+    std::size_t const last = bytes.size() - 12;
     bytes.replace(last + 4, 4, Long(0xFFFFFFFF));
     for (int i = 1; i < names - 1; ++i) {
         ASSERT_EQ(0, readName());
@@ -192,9 +192,9 @@ TEST(ChunkFileHostile, AClaimCostsNoMemory)
         Q_FailAllocation(1);
         char** handle = nullptr;
         SEQ_Head** made = nullptr;
-        const int code = lie.find("expr") != std::string::npos ? CKF_ReadHandle(&file, nullptr, CKF_Id("expr"), &handle)
+        int const code = lie.find("expr") != std::string::npos ? CKF_ReadHandle(&file, nullptr, CKF_Id("expr"), &handle)
                                                                : SEQ_Read(&file, &made);
-        const bool fired = Q_FailAllocationFired();
+        bool const fired = Q_FailAllocationFired();
         Q_FailAllocation(0);
         EXPECT_FALSE(fired) << "checked before anything is allocated";
         EXPECT_TRUE(code == CKF_Err_Corrupt || code == SEQ_Err_BadChunk) << code;
@@ -207,7 +207,7 @@ TEST(ChunkFileHostile, AClaimCostsNoMemory)
 TEST(ChunkFileHostile, OpeningIsExactAboutTheOuterForm)
 {
     const std::string good = Form("");
-    const auto with = [&](std::size_t at, std::string const& bytes) {
+    auto const with = [&](std::size_t at, std::string const& bytes) {
         return std::string(good).replace(at, bytes.size(), bytes);
     };
     const struct {
@@ -237,7 +237,7 @@ TEST(ChunkFileHostile, OpeningIsExactAboutTheOuterForm)
         EXPECT_EQ(CKF_Err_Corrupt, Thrown([&] { Outline(&file); })) << "a file inside a file";
     }
     // What a later build may add to the version record is stepped over.
-    const std::string longer =
+    std::string const longer =
         "KFSF" + Long(4 + 24 + 10) + "proj" + Atom("vers", Long(95) + Long(0) + Long(0) + "more") + Atom("aaaa", "12");
     ASSERT_EQ(0, file.Open(Span(longer)));
     EXPECT_EQ("aaaa:2", Outline(&file));

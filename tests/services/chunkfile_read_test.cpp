@@ -22,7 +22,7 @@ struct OpenFile {
 std::string ReadAtom(CKF_File* file, int id, CKF_ChunkInfo const* parent = nullptr)
 {
     char data[8] = {};
-    const int code = CKF_ReadAtom(file, id, parent, sizeof data, data);
+    int const code = CKF_ReadAtom(file, id, parent, sizeof data, data);
     return code == 0 ? std::string(data) : "code " + std::to_string(code);
 }
 const std::string None = "code " + std::to_string(CKF_Err_NoSuchChunk);
@@ -55,7 +55,7 @@ TEST(ChunkFileReading, CopiesNoMoreThanTheAtomAndNoMoreThanAsked)
         ASSERT_EQ(0, CKF_ReadAtom(file, CKF_Id("kfsi"), nullptr, row.size, buffer.data()));
         EXPECT_EQ(row.buffer, buffer);
         bool found = false;
-        const CKF_ScDescend next(file, 0, 0, nullptr, &found);
+        CKF_ScDescend const next(file, 0, 0, nullptr, &found);
         EXPECT_EQ(CKF_Id("next"), next.GetChunkInfo()->id) << "the position is behind the whole atom";
     }
 }
@@ -97,14 +97,14 @@ TEST(ChunkFileReading, DescentsAskForIdAndListType)
         EXPECT_EQ(row.enteredType, descent.GetChunkInfo()->listType);
         bool found = row.enteredId == 0;
         OpenFile again(Form(content));
-        const CKF_ScDescend asked(again, row.id, row.listType, nullptr, &found);
+        CKF_ScDescend const asked(again, row.id, row.listType, nullptr, &found);
         EXPECT_EQ(row.enteredId != 0, found);
     }
 }
 
 TEST(ChunkFileReading, ADescentLeftEarlyIsBehindItsChunk)
 {
-    const std::string content =
+    std::string const content =
         List("kfgp", Atom("aaaa", "1") + List("kfbs", Atom("bbbb", "222") + Atom("cccc", "3")) + Atom("dddd", "4")) +
         Atom("eeee", "5");
     // How far the reader goes into the inner list before it gives up.
@@ -134,7 +134,7 @@ TEST(ChunkFileReading, DataOfAnAtomComesInPieces)
 {
     OpenFile file(Form(Atom("kfb4", "abcde") + Atom("next", "n")));
     {
-        const CKF_ScDescend atom(file, 0, 0, nullptr, nullptr);
+        CKF_ScDescend const atom(file, 0, 0, nullptr, nullptr);
         EXPECT_EQ(5u, atom.GetChunkInfo()->size);
         std::string data(5, '.');
         int size = 2;
@@ -159,39 +159,39 @@ struct Failure {
 
 TEST(ChunkFileReading, AFailureStays)
 {
-    const auto readPast = [](CKF_File* f) {
-        const CKF_ScDescend atom(f, 0, 0, nullptr, nullptr);
+    auto const readPast = [](CKF_File* f) {
+        CKF_ScDescend const atom(f, 0, 0, nullptr, nullptr);
         int size = 3;
         char data[4];
         return CKF_ReadChunkData(f, &size, data);
     };
-    const auto searchOutside = [](CKF_File* f) {
-        const CKF_ScDescend list(f, 0, 0, nullptr, nullptr);
+    auto const searchOutside = [](CKF_File* f) {
+        CKF_ScDescend const list(f, 0, 0, nullptr, nullptr);
         CKF_ChunkInfo wrong = *list.GetChunkInfo();
         wrong.offset += 12;
         return CKF_ReadAtom(f, CKF_Id("aaaa"), &wrong, 0, nullptr);
     };
-    const auto searchOuter = [](CKF_File* f) {
-        const CKF_ScDescend outer(f, 0, 0, nullptr, nullptr);
-        const CKF_ScDescend inner(f, 0, 0, nullptr, nullptr);
+    auto const searchOuter = [](CKF_File* f) {
+        CKF_ScDescend const outer(f, 0, 0, nullptr, nullptr);
+        CKF_ScDescend const inner(f, 0, 0, nullptr, nullptr);
         return CKF_ReadAtom(f, CKF_Id("aaaa"), outer.GetChunkInfo(), 0, nullptr);
     };
-    const auto searchInAtom = [](CKF_File* f) {
-        const CKF_ScDescend atom(f, 0, 0, nullptr, nullptr);
+    auto const searchInAtom = [](CKF_File* f) {
+        CKF_ScDescend const atom(f, 0, 0, nullptr, nullptr);
         return CKF_ReadAtom(f, CKF_Id("aaaa"), nullptr, 0, nullptr);
     };
-    const auto readInList = [](CKF_File* f) {
-        const CKF_ScDescend list(f, 0, 0, nullptr, nullptr);
+    auto const readInList = [](CKF_File* f) {
+        CKF_ScDescend const list(f, 0, 0, nullptr, nullptr);
         int size = 0;
         return CKF_ReadChunkData(f, &size, nullptr);
     };
-    const auto useTwice = [](CKF_File* f) {
+    auto const useTwice = [](CKF_File* f) {
         CKF_ScDescend list(f, 0, 0, nullptr, nullptr);
         return Thrown([&] { list.Descend(f, 0, 0, nullptr, nullptr); });
     };
-    const auto find = [](CKF_File* f) { return CKF_ReadAtom(f, CKF_Id("aaaa"), nullptr, 0, nullptr); };
+    auto const find = [](CKF_File* f) { return CKF_ReadAtom(f, CKF_Id("aaaa"), nullptr, 0, nullptr); };
     const std::string list = List("kfgp", List("kfbs", ""));
-    const Failure rows[] = {
+    Failure const rows[] = {
         {"more data than there is", Atom("aaaa", "12"), readPast, CKF_Err_PastEnd, 40},
         {"a list that isn't open", list, searchOutside, CKF_Err_Unbalanced, 44},
         {"a list that isn't the innermost", list, searchOuter, CKF_Err_Unbalanced, 56},
@@ -221,7 +221,7 @@ TEST(ChunkFileReading, AFailureStays)
         EXPECT_STRNE("", file.file.LastErrorText());
         EXPECT_EQ(row.code, find(file));
         bool found = true;
-        EXPECT_EQ(row.code, Thrown([&] { const CKF_ScDescend any(file, 0, 0, nullptr, &found); }));
+        EXPECT_EQ(row.code, Thrown([&] { CKF_ScDescend const any(file, 0, 0, nullptr, &found); }));
         EXPECT_FALSE(found);
         u16str text;
         EXPECT_EQ(row.code, Thrown([&] { CKF_ReadString(file, nullptr, CKF_Id("kfsn"), &text, {}, 0); }));

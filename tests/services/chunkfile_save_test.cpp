@@ -26,7 +26,7 @@ using Names = std::set<std::string>;
 // A save with every kind of write. Looks at no result, as the library does in places; the commit has to know.
 int WriteEverything(CKF_File* file)
 {
-    const int thrown = Thrown([&] {
+    int const thrown = Thrown([&] {
         const CKF_ScWriteList outer(file, CKF_Id("kfgp"), 0);
         CKF_WriteString(file, CKF_Id("kfsn"), Text("name"), 0);
         CKF_ChunkInfo leaf{};
@@ -40,7 +40,7 @@ int WriteEverything(CKF_File* file)
             throw Q_Err_OutOfMemory;
         }
         SEQ_Head** list = nullptr;
-        if (const int code = SEQ_New(0, 3, 4, 1, &list)) throw code;
+        if (int const code = SEQ_New(0, 3, 4, 1, &list)) throw code;
         int inserted = 0;
         for (char const* item : {"abc", "def"})
             if (inserted == 0) inserted = SEQ_Insert(item, -1, list);
@@ -48,10 +48,10 @@ int WriteEverything(CKF_File* file)
         SEQ_Dispose(list, 0);
         if (inserted != 0) throw inserted;
         CKF_EndChunkWrite(file, &leaf);
-        const std::string big(200000, 'B');  // more than is buffered
+        std::string const big(200000, 'B');  // more than is buffered
         CKF_WriteAtom(file, CKF_Id("big_"), static_cast<int>(big.size()), big.data());
     });
-    const int committed = file->Commit();
+    int const committed = file->Commit();
     return thrown != 0 ? thrown : committed;
 }
 
@@ -79,7 +79,7 @@ struct FailNth : CKF_IoHook {
 
 TEST(ChunkFileSave, ReplacesTheTargetWhole)
 {
-    const ScratchFolder folder;
+    ScratchFolder const folder;
     for (bool const exists : {false, true}) {
         if (exists) folder.Write(Project, "the old file");
         CKF_File file;
@@ -100,7 +100,7 @@ TEST(ChunkFileSave, EveryCallThatFailsLeavesTheOldFile)
         for (int n = 1;; ++n) {
             SCOPED_TRACE(testing::Message() << (disk ? "disk " : "memory ") << n);
             ASSERT_LT(n, 1000);
-            const ScratchFolder folder;
+            ScratchFolder const folder;
             folder.Write(Project, "the old file");
             FailNth hook(n);
             CKF_File file;
@@ -126,12 +126,12 @@ TEST(ChunkFileSave, EveryCallThatFailsLeavesTheOldFile)
 
 TEST(ChunkFileSave, EveryAllocationThatFailsIsTold)
 {
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
     for (bool const disk : {false, true})
         for (int n = 1;; ++n) {
             SCOPED_TRACE(testing::Message() << (disk ? "disk " : "memory ") << n);
             ASSERT_LT(n, 1000);
-            const ScratchFolder folder;
+            ScratchFolder const folder;
             folder.Write(Project, "the old file");
             bool fired = false;
             {
@@ -161,9 +161,9 @@ TEST(ChunkFileSave, EveryAllocationThatFailsIsTold)
 
 TEST(ChunkFileSave, WhatIsNotCommittedLeavesNothing)
 {
-    const ScratchFolder folder;
+    ScratchFolder const folder;
     folder.Write(Project, "the old file");
-    const auto begin = [&](CKF_File& file) {
+    auto const begin = [&](CKF_File& file) {
         ASSERT_EQ(0, file.Create(folder.Path(Project).c_str()));
         ASSERT_EQ(0, CKF_WriteAtom(&file, CKF_Id("cdat"), 3, "abc"));
         ASSERT_EQ(2u, folder.Names().size());
@@ -189,7 +189,7 @@ TEST(ChunkFileSave, WhatIsNotCommittedLeavesNothing)
 
 TEST(ChunkFileSave, TwoSavesToOnePlaceDontMeet)
 {
-    const ScratchFolder folder;
+    ScratchFolder const folder;
     CKF_File first, second;
     ASSERT_EQ(0, first.Create(folder.Path(Project).c_str()));
     ASSERT_EQ(0, second.Create(folder.Path(Project).c_str()));
@@ -204,7 +204,7 @@ TEST(ChunkFileSave, TwoSavesToOnePlaceDontMeet)
 
 TEST(ChunkFileSave, ALinkStaysALinkAndRightsStay)
 {
-    const ScratchFolder folder;
+    ScratchFolder const folder;
     folder.Write("real.kfs", "the old file");
     ASSERT_EQ(0, ::chmod(folder.Path("real.kfs").c_str(), 0640));
     fs::create_symlink("real.kfs", folder.Path("link.kfs"));
@@ -219,7 +219,7 @@ TEST(ChunkFileSave, ALinkStaysALinkAndRightsStay)
 
 TEST(ChunkFileSave, APlaceThatCantBeWrittenIsRefusedAtOnce)
 {
-    const ScratchFolder folder;
+    ScratchFolder const folder;
     for (std::string const& path : {folder.Path("no/such/folder.kfs"), folder.Path("new/"), folder.Path("."),
                                     std::string("/dev/null"), std::string()}) {
         CKF_File file;
@@ -233,7 +233,7 @@ TEST(ChunkFileSave, APlaceThatCantBeWrittenIsRefusedAtOnce)
 
 TEST(ChunkFileSave, OnlyRegularProjectFilesAreOpened)
 {
-    const ScratchFolder folder;
+    ScratchFolder const folder;
     folder.Write("text", "KFS is not KFSF");
     folder.Write("empty", "");
     folder.Write("cut", Form("").substr(0, 20));
@@ -255,7 +255,7 @@ TEST(ChunkFileSave, OnlyRegularProjectFilesAreOpened)
 
 TEST(ChunkFileSave, AFileThatIsOpenDoesNotNeedThePathAnyMore)
 {
-    const ScratchFolder folder;
+    ScratchFolder const folder;
     folder.Write(Project, NestedSample());
     const Q_MemoryCount before = Q_MemoryLive("project file");
     {

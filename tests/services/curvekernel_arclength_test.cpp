@@ -18,7 +18,7 @@ using truth::Curve;
 using truth::Dice;
 using truth::Real;
 
-constexpr double kNaN = std::numeric_limits<double>::quiet_NaN();
+constexpr double NaN = std::numeric_limits<double>::quiet_NaN();
 
 // The length of a path by Gauss's five points on ever smaller stretches. It starts from the places where the speed is
 // smallest: a cusp next to the end of a stretch is what such a rule can miss.
@@ -43,7 +43,7 @@ public:
     {
         if (to < from) return -Length(to, from);
         Real sum = 0;
-        for (const Real cut : cuts_)
+        for (Real const cut : cuts_)
             if (cut > from && cut < to) {
                 sum += Refined(from, cut, Rule(from, cut), 0);
                 from = cut;
@@ -66,21 +66,21 @@ private:
     }
     Real Rule(Real from, Real to) const
     {
-        static constexpr Real kPlaces[] = {0, 0.538469310105683091036L, 0.906179845938663992798L};
-        static constexpr Real kWeights[] = {0.568888888888888888889L, 0.478628670499366468041L,
-                                            0.236926885056189087514L};
-        const Real half = (to - from) / 2;
-        const Real middle = (to + from) / 2;
-        Real sum = kWeights[0] * Speed(middle);
+        static constexpr Real Places[] = {0, 0.538469310105683091036L, 0.906179845938663992798L};
+        static constexpr Real Weights[] = {0.568888888888888888889L, 0.478628670499366468041L,
+                                           0.236926885056189087514L};
+        Real const half = (to - from) / 2;
+        Real const middle = (to + from) / 2;
+        Real sum = Weights[0] * Speed(middle);
         for (int k = 1; k < 3; ++k)
-            sum += kWeights[k] * (Speed(middle - kPlaces[k] * half) + Speed(middle + kPlaces[k] * half));
+            sum += Weights[k] * (Speed(middle - Places[k] * half) + Speed(middle + Places[k] * half));
         return half * sum;
     }
     Real Refined(Real from, Real to, Real whole, int depth) const
     {
-        const Real middle = (from + to) / 2;
-        const Real left = Rule(from, middle);
-        const Real right = Rule(middle, to);
+        Real const middle = (from + to) / 2;
+        Real const left = Rule(from, middle);
+        Real const right = Rule(middle, to);
         if (depth > 40 || std::fabs(left + right - whole) <= 1e-13L * polygon_) return left + right;
         return Refined(from, middle, left, depth + 1) + Refined(middle, to, right, depth + 1);
     }
@@ -99,16 +99,14 @@ public:
     }
     ~Table()
     {
-        if (list) {
-            EXPECT_EQ(0, SEQ_Dispose(list, 0));
-        }
+        if (list) EXPECT_EQ(0, SEQ_Dispose(list, 0));
     }
     Table(Table const&) = delete;
     Table& operator=(Table const&) = delete;
 
     double T(double s)
     {
-        double t = kNaN;
+        double t = NaN;
         EXPECT_EQ(0, CRV_TFromSSpline(&kernel_, &list, &t, s, 1.0));
         return t;
     }
@@ -116,7 +114,7 @@ public:
 
     int code = 0;
     SEQ_Head** list = nullptr;
-    double length = kNaN;
+    double length = NaN;
 
 private:
     CRV_Curve kernel_;
@@ -131,12 +129,12 @@ Curve Path(std::array<std::array<double, 3>, 4> const& points, short dimension)
 }
 
 struct Named {
-    const char* name;
+    char const* name;
     Curve curve;
     int mostKnots;
 };
 
-const std::vector<Named> kMuseum = {
+std::vector<Named> const Museum = {
     {"a line at even speed", Path({{{0, 0}, {1, 2}, {2, 4}, {3, 6}}}, 2), 2},
     {"a line without handles", Path({{{0, 0}, {0, 0}, {3, 6}, {3, 6}}}, 2), 9},
     {"a line that turns back twice", Path({{{0, 0}, {30, 0}, {-20, 0}, {10, 0}}}, 2), 20},
@@ -159,7 +157,8 @@ const std::vector<Named> kMuseum = {
 
 Named const& Exhibit(std::string_view name)
 {
-    return *std::find_if(kMuseum.begin(), kMuseum.end(), [name](Named const& piece) { return name == piece.name; });
+    return *std::find_if(
+        Museum.begin(), Museum.end(), [name](Named const& piece) { return name == piece.name; });
 }
 
 // Length and places within the accuracy, and steps alike.
@@ -167,7 +166,7 @@ void CheckTable(Curve curve, double accuracy, int samples)
 {
     Table table(curve, accuracy);
     ASSERT_EQ(0, table.code);
-    const Ruler ruler(curve);
+    Ruler const ruler(curve);
     EXPECT_NEAR(static_cast<double>(ruler.Length(0, 1)), table.length, accuracy);
     EXPECT_EQ(0, table.T(0));
     EXPECT_EQ(1, table.T(table.length));
@@ -175,8 +174,8 @@ void CheckTable(Curve curve, double accuracy, int samples)
     Real reached = 0;
     double before = 0;
     for (int i = 1; i <= samples; ++i) {
-        const double s = table.length * i / samples;
-        const double t = table.T(s);
+        double const s = table.length * i / samples;
+        double const t = table.T(s);
         EXPECT_TRUE(t >= before && t <= 1) << t << " after " << before;
         reached += ruler.Length(before, t);
         EXPECT_NEAR(s, static_cast<double>(reached), accuracy) << "sample " << i << ", t " << t;
@@ -186,8 +185,8 @@ void CheckTable(Curve curve, double accuracy, int samples)
 
 TEST(CurveKernelArc, MuseumIsMeasuredWithinTheAccuracy)
 {
-    for (Named const& piece : kMuseum)
-        for (const double accuracy : {1.0, 1e-2, 1e-4, 1e-6}) {
+    for (Named const& piece : Museum)
+        for (double const accuracy : {1.0, 1e-2, 1e-4, 1e-6}) {
             SCOPED_TRACE(testing::Message() << piece.name << ", accuracy " << accuracy);
             CheckTable(piece.curve, accuracy, 100);
         }
@@ -195,7 +194,7 @@ TEST(CurveKernelArc, MuseumIsMeasuredWithinTheAccuracy)
 
 TEST(CurveKernelArc, TablesAreNoLargerThanTheyNeed)
 {
-    for (Named const& piece : kMuseum) {
+    for (Named const& piece : Museum) {
         Curve curve = piece.curve;
         Table table(curve, 1e-4 * Ruler(curve).Polygon());
         ASSERT_EQ(0, table.code) << piece.name;
@@ -205,17 +204,17 @@ TEST(CurveKernelArc, TablesAreNoLargerThanTheyNeed)
 
 TEST(CurveKernelArc, EqualDistancesAreEqualSteps)
 {
-    for (Named const& piece : kMuseum) {
+    for (Named const& piece : Museum) {
         SCOPED_TRACE(piece.name);
         Curve curve = piece.curve;
-        const Ruler ruler(curve);
+        Ruler const ruler(curve);
         Table table(curve, 1e-3 * ruler.Polygon());
         Real shortest = std::numeric_limits<Real>::max();
         Real longest = 0;
         double before = 0;
         for (int i = 1; i <= 1000; ++i) {
-            const double t = table.T(table.length * i / 1000);
-            const Real step = ruler.Length(before, t);
+            double const t = table.T(table.length * i / 1000);
+            Real const step = ruler.Length(before, t);
             shortest = std::min(shortest, step);
             longest = std::max(longest, step);
             before = t;
@@ -230,8 +229,8 @@ TEST(CurveKernelArc, RandomSegmentsOfAllKinds)
     for (int i = 0; i < 3000; ++i) {
         Curve curve;
         curve.dimension = static_cast<short>(2 + i % 2);
-        const std::size_t dimension = static_cast<std::size_t>(curve.dimension);
-        const double reach = dice.Below(4) ? 1.0 : 1000.0;
+        std::size_t const dimension = static_cast<std::size_t>(curve.dimension);
+        double const reach = dice.Below(4) ? 1.0 : 1000.0;
         for (std::size_t k = 0; k < dimension; ++k) {
             curve.p[0][k] = dice.Between(-100, 100);
             curve.p[3][k] = curve.p[0][k] + dice.Between(-100, 100);
@@ -262,7 +261,7 @@ TEST(CurveKernelArc, CoincidentPointsHaveNoLength)
     ASSERT_EQ(0, table.code);
     EXPECT_EQ(0, table.length);
     ASSERT_NE(nullptr, table.list);
-    for (const double s : {-1.0, 0.0, 1.0}) EXPECT_EQ(0, table.T(s));
+    for (double const s : {-1.0, 0.0, 1.0}) EXPECT_EQ(0, table.T(s));
 }
 
 TEST(CurveKernelArc, AnyFiniteCurveHasATableWithoutNaN)
@@ -274,12 +273,12 @@ TEST(CurveKernelArc, AnyFiniteCurveHasATableWithoutNaN)
         for (auto& point : curve.p)
             for (std::size_t k = 0; k < static_cast<std::size_t>(curve.dimension); ++k)
                 point[k] = dice.Below(5) == 0 ? 0.0 : dice.Wild(306);
-        const double accuracies[] = {1e-4, 0.0, -1.0, kNaN, 1e300, std::numeric_limits<double>::infinity()};
+        double const accuracies[] = {1e-4, 0.0, -1.0, NaN, 1e300, std::numeric_limits<double>::infinity()};
         Table table(curve, accuracies[dice.Below(6)]);
         ASSERT_EQ(0, table.code) << curve;
         EXPECT_TRUE(std::isfinite(table.length) && table.length >= 0) << curve;
-        for (const double share : {-1.0, 0.0, 1e-9, 0.3, 0.7, 1.0, 2.0}) {
-            const double t = table.T(share * table.length);
+        for (double const share : {-1.0, 0.0, 1e-9, 0.3, 0.7, 1.0, 2.0}) {
+            double const t = table.T(share * table.length);
             EXPECT_TRUE(t >= 0 && t <= 1) << curve << t;
         }
         EXPECT_EQ(table.length > 0 ? 1 : 0, table.T(std::numeric_limits<double>::infinity()));
@@ -288,16 +287,16 @@ TEST(CurveKernelArc, AnyFiniteCurveHasATableWithoutNaN)
 
 TEST(CurveKernelArc, PathsNearTheSmallestNumbersHaveATableWithoutNaN)
 {
-    for (const Named& exhibit : kMuseum) {
+    for (Named const& exhibit : Museum) {
         SCOPED_TRACE(exhibit.name);
-        for (const int power : {-1030, -1045, -1070}) {
+        for (int const power : {-1030, -1045, -1070}) {
             Curve curve = exhibit.curve;
             for (auto& point : curve.p)
                 for (double& c : point) c = std::ldexp(c, power);
             Table table(curve, 1e-4);
             ASSERT_EQ(0, table.code) << power;
-            for (const double share : {0.0, 0.5, 1.0}) {
-                const double t = table.T(share * table.length);
+            for (double const share : {0.0, 0.5, 1.0}) {
+                double const t = table.T(share * table.length);
                 EXPECT_TRUE(t >= 0 && t <= 1) << power << ' ' << t;
             }
         }
@@ -309,7 +308,7 @@ TEST(CurveKernelArc, ScaleDoesntMatter)
     const Curve plain = Exhibit("a loop").curve;
     Curve same = plain;
     Table unit(same, 1e-3);
-    for (const int power : {-1000, -500, -20, 20, 500, 1000}) {
+    for (int const power : {-1000, -500, -20, 20, 500, 1000}) {
         Curve curve = plain;
         for (auto& point : curve.p)
             for (double& c : point) c = std::ldexp(c, power);
@@ -323,13 +322,13 @@ TEST(CurveKernelArc, ScaleDoesntMatter)
 
 TEST(CurveKernelArc, ASecondBuildReplacesTheTable)
 {
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
     {
         Curve curve = Exhibit("a cusp in the middle").curve;
         Table table(curve, 1e-6);
-        const int many = table.Knots();
+        int const many = table.Knots();
         Curve line = Exhibit("a line at even speed").curve;
-        const CRV_Curve kernel = line.Get();
+        CRV_Curve const kernel = line.Get();
         ASSERT_EQ(0, CRV_BuildArcSpline(&kernel, &table.list, &table.length, 1e-4));
         EXPECT_LT(table.Knots(), many);
         EXPECT_DOUBLE_EQ(std::sqrt(45.0), table.length);
@@ -345,16 +344,16 @@ TEST(CurveKernelArc, AnyTableCanTakeThePlaceOfAnyOther)
     Curve first = Exhibit("a line at even speed").curve;
     Table table(first, 1e-4);
     for (int i = 0; i < 2000; ++i) {
-        Curve curve = kMuseum[dice.Below(kMuseum.size())].curve;
-        const double accuracies[] = {1e-1, 1e-4, 1e-6};
-        const double accuracy = accuracies[dice.Below(3)];
-        const CRV_Curve kernel = curve.Get();
+        Curve curve = Museum[dice.Below(Museum.size())].curve;
+        double const accuracies[] = {1e-1, 1e-4, 1e-6};
+        double const accuracy = accuracies[dice.Below(3)];
+        CRV_Curve const kernel = curve.Get();
         ASSERT_EQ(0, CRV_BuildArcSpline(&kernel, &table.list, &table.length, accuracy));
         Table fresh(curve, accuracy);
         ASSERT_EQ(fresh.Knots(), table.Knots());
         EXPECT_LE((*table.list)->capacity, 2 * (*table.list)->count);
         EXPECT_EQ(fresh.length, table.length);
-        for (const double share : {0.0, 0.1, 0.37, 0.5, 0.93, 1.0})
+        for (double const share : {0.0, 0.1, 0.37, 0.5, 0.93, 1.0})
             ASSERT_EQ(fresh.T(share * fresh.length), table.T(share * fresh.length));
     }
 }
@@ -363,17 +362,16 @@ TEST(CurveKernelArc, ADragSeldomNeedsMemoryAndAnUnchangedCurveNever)
 {
     Curve curve = Exhibit("a loop").curve;
     Table table(curve, 1e-4);
-    const auto needsMemory = [&] {
-        const CRV_Curve kernel = curve.Get();
+    auto const needsMemory = [&] {
+        CRV_Curve const kernel = curve.Get();
         Q_FailAllocation(1);
-        const int code = CRV_BuildArcSpline(&kernel, &table.list, &table.length, 1e-4);
-        const bool fired = Q_FailAllocationFired();
+        int const code = CRV_BuildArcSpline(&kernel, &table.list, &table.length, 1e-4);
+        bool const fired = Q_FailAllocationFired();
         Q_FailAllocation(0);
-        if (fired) {
+        if (fired)
             EXPECT_EQ(0, CRV_BuildArcSpline(&kernel, &table.list, &table.length, 1e-4));
-        } else {
+        else
             EXPECT_EQ(0, code);
-        }
         return fired;
     };
     int needs = 0;
@@ -389,21 +387,19 @@ TEST(CurveKernelArc, EachFailingAllocationLeavesNothing)
 {
     Curve small = Exhibit("a line at even speed").curve;
     Curve large = Exhibit("a loop").curve;
-    const CRV_Curve smallKernel = small.Get();
-    const CRV_Curve largeKernel = large.Get();
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
-    for (const bool replacing : {false, true}) {
+    CRV_Curve const smallKernel = small.Get();
+    CRV_Curve const largeKernel = large.Get();
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
+    for (bool const replacing : {false, true}) {
         SCOPED_TRACE(replacing);
         int failures = 0;
         for (int n = 1; n < 20; ++n) {
             SEQ_Head** list = nullptr;
             double length = 77;
-            if (replacing) {
-                ASSERT_EQ(0, CRV_BuildArcSpline(&smallKernel, &list, &length, 1e-4));
-            }
+            if (replacing) ASSERT_EQ(0, CRV_BuildArcSpline(&smallKernel, &list, &length, 1e-4));
             Q_FailAllocation(n);
-            const int code = CRV_BuildArcSpline(&largeKernel, &list, &length, 1e-4);
-            const bool fired = Q_FailAllocationFired();
+            int const code = CRV_BuildArcSpline(&largeKernel, &list, &length, 1e-4);
+            bool const fired = Q_FailAllocationFired();
             Q_FailAllocation(0);
             if (!fired) {
                 EXPECT_EQ(0, code);
@@ -424,10 +420,10 @@ TEST(CurveKernelArc, EachFailingAllocationLeavesNothing)
 TEST(CurveKernelArc, AListOfSomethingElseIsReplacedAndNotRead)
 {
     Curve curve = Exhibit("a gentle arc").curve;
-    const CRV_Curve kernel = curve.Get();
-    const Table fresh(curve, 1e-4);
-    for (const short itemSize : {8, 32}) {
-        for (const int count : {0, 1, 3, 500}) {
+    CRV_Curve const kernel = curve.Get();
+    Table const fresh(curve, 1e-4);
+    for (short const itemSize : {8, 32}) {
+        for (int const count : {0, 1, 3, 500}) {
             if (itemSize == 32 && count > 3) continue;
             SEQ_Head** list = nullptr;
             ASSERT_EQ(0, SEQ_New(0, itemSize, 4, 1, &list));
@@ -447,14 +443,14 @@ TEST(CurveKernelArc, AListOfSomethingElseIsReplacedAndNotRead)
 
 TEST(CurveKernelArc, WithoutATableTheCurveItselfIsMeasured)
 {
-    for (Named const& piece : kMuseum) {
+    for (Named const& piece : Museum) {
         Curve curve = piece.curve;
-        const CRV_Curve kernel = curve.Get();
+        CRV_Curve const kernel = curve.Get();
         Table table(curve, 1e-6);
         for (int i = 0; i <= 10; ++i) {
             SEQ_Head** none = nullptr;
-            double t = kNaN;
-            const double s = table.length * i / 10;
+            double t = NaN;
+            double const s = table.length * i / 10;
             ASSERT_EQ(0, CRV_TFromSSpline(&kernel, &none, &t, s, 1.0));
             EXPECT_EQ(nullptr, none);
             EXPECT_NEAR(table.T(s), t, 1e-4) << piece.name;
@@ -465,9 +461,9 @@ TEST(CurveKernelArc, WithoutATableTheCurveItselfIsMeasured)
 TEST(CurveKernelArc, TheFifthArgumentIsTheParameterAtTheEnd)
 {
     Curve curve = Exhibit("a gentle arc").curve;
-    const CRV_Curve kernel = curve.Get();
+    CRV_Curve const kernel = curve.Get();
     Table table(curve, 1e-4);
-    double t = kNaN;
+    double t = NaN;
     ASSERT_EQ(0, CRV_TFromSSpline(&kernel, &table.list, &t, table.length, 4.0));
     EXPECT_EQ(4.0, t);
     ASSERT_EQ(0, CRV_TFromSSpline(&kernel, &table.list, &t, 0.5 * table.length, 4.0));
@@ -478,7 +474,7 @@ TEST(CurveKernelArc, TheFifthArgumentIsTheParameterAtTheEnd)
 TEST(CurveKernelArc, BitsAreTheSameInEveryBuild)
 {
     truth::BitHash hash;
-    for (Named const& piece : kMuseum) {
+    for (Named const& piece : Museum) {
         Curve curve = piece.curve;
         Table table(curve, 1e-4);
         hash.Mix(table.length);
@@ -498,15 +494,15 @@ TEST(CurveKernelArc, RefusalsLeaveNoTable)
     EXPECT_EQ(CRV_Err_NullArgument, CRV_BuildArcSpline(&kernel, &list, nullptr, 1e-4));
     EXPECT_EQ(CRV_Err_NullArgument, CRV_TFromSSpline(&kernel, nullptr, &t, 0, 1.0));
     EXPECT_EQ(CRV_Err_NullArgument, CRV_TFromSSpline(&kernel, &list, nullptr, 0, 1.0));
-    EXPECT_EQ(CRV_Err_NotFinite, CRV_TFromSSpline(&kernel, &list, &t, kNaN, 1.0));
+    EXPECT_EQ(CRV_Err_NotFinite, CRV_TFromSSpline(&kernel, &list, &t, NaN, 1.0));
     EXPECT_EQ(CRV_Err_NullArgument, CRV_TFromSSpline(nullptr, &list, &t, 0, 1.0));
 
     ASSERT_EQ(0, CRV_BuildArcSpline(&kernel, &list, &length, 1e-4));
-    curve.p[2][1] = kNaN;
+    curve.p[2][1] = NaN;
     EXPECT_EQ(CRV_Err_NotFinite, CRV_BuildArcSpline(&kernel, &list, &length, 1e-4));
     EXPECT_EQ(nullptr, list);
     EXPECT_EQ(0, length);
-    for (const short dimension : {-1, 0, 5}) {
+    for (short const dimension : {-1, 0, 5}) {
         kernel.dimension = dimension;
         EXPECT_EQ(CRV_Err_Dimension, CRV_BuildArcSpline(&kernel, &list, &length, 1e-4));
         EXPECT_EQ(CRV_Err_Dimension, CRV_TFromSSpline(&kernel, &list, &t, 0, 1.0));

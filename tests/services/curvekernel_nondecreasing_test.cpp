@@ -17,12 +17,12 @@ using truth::Real;
 // How far y falls back behind its height so far, as a share of the segment's height; sampled densely in t.
 double FallsBack(Curve const& curve)
 {
-    const Real height = std::fabs(static_cast<double>(Real(curve.p[3][1]) - curve.p[0][1]));
-    const Real direction = curve.p[3][1] < curve.p[0][1] ? -1 : 1;
+    Real const height = std::fabs(static_cast<double>(Real(curve.p[3][1]) - curve.p[0][1]));
+    Real const direction = curve.p[3][1] < curve.p[0][1] ? -1 : 1;
     Real top = direction * curve.p[0][1];
     Real worst = 0;
     for (int i = 1; i <= 500; ++i) {
-        const Real y = direction * truth::At(curve, 1, i / 500.0L);
+        Real const y = direction * truth::At(curve, 1, i / 500.0L);
         worst = std::max(worst, top - y);
         top = std::max(top, y);
     }
@@ -32,7 +32,7 @@ double FallsBack(Curve const& curve)
 // Whether the slope of y by t is below 0 somewhere, or as good as.
 bool NearlyFalls(Curve const& curve)
 {
-    const Real height = Real(curve.p[3][1]) - curve.p[0][1];
+    Real const height = Real(curve.p[3][1]) - curve.p[0][1];
     for (int i = 0; i <= 2000; ++i)
         if (truth::FirstAt(curve, 1, i / 2000.0L) / height < 1e-5L) return true;
     return false;
@@ -55,7 +55,7 @@ bool IsBetween(double value, double a, double b)
 TEST(CurveKernelNonDecreasing, RowsThatCanBeCheckedByEye)
 {
     const struct {
-        const char* why;
+        char const* why;
         Curve before, after;
     } rows[] = {
         {"inside the box: untouched", Graph(2, 0.5, 0.25, 0, 8, 1, 10), Graph(2, 0.5, 0.25, 0, 8, 1, 10)},
@@ -74,7 +74,7 @@ TEST(CurveKernelNonDecreasing, RowsThatCanBeCheckedByEye)
     };
     for (auto const& row : rows) {
         bool moved = false;
-        const Curve after = Treated(row.before, &moved);
+        Curve const after = Treated(row.before, &moved);
         EXPECT_EQ(row.after, after) << row.why << ": " << after;
         EXPECT_EQ(row.before != row.after, moved) << row.why;
     }
@@ -85,13 +85,13 @@ TEST(CurveKernelNonDecreasing, RandomCurvesComeOutGrowingAndOtherwiseAsTheyWere)
     Dice dice(41);
     int touched = 0;
     for (int i = 0; i < 20000; ++i) {
-        const double height = dice.Below(10) ? dice.Between(0.1, 5) : dice.Between(-5, -0.1);
-        const double low = dice.Between(-5, 5);
-        const Curve before =
+        double const height = dice.Below(10) ? dice.Between(0.1, 5) : dice.Between(-5, -0.1);
+        double const low = dice.Between(-5, 5);
+        Curve const before =
             Graph(dice.Between(0.1, 5), dice.Between(0, 1.2), dice.Between(0, 1.2), low,
                   low + height * dice.Between(-1, 3), low + height * dice.Between(-2, 2), low + height);
         bool moved = false;
-        const Curve after = Treated(before, &moved);
+        Curve const after = Treated(before, &moved);
         SCOPED_TRACE(testing::Message() << before << "-> " << after);
 
         EXPECT_LE(FallsBack(after), 1e-15);
@@ -117,10 +117,10 @@ TEST(CurveKernelNonDecreasing, AShortenedHandleKeepsItsSlopeAndNoMoreThanNeededI
 {
     Dice dice(42);
     for (int i = 0; i < 5000; ++i) {
-        const double inHeight = dice.Between(0, 1);  // the in handle, harmless
-        const double outHeight = dice.Between(1, 5);
-        const Curve before = Graph(1, 0.8, 0.3, 0, outHeight, 1 - inHeight, 1);
-        const Curve after = Treated(before);
+        double const inHeight = dice.Between(0, 1);  // the in handle, harmless
+        double const outHeight = dice.Between(1, 5);
+        Curve const before = Graph(1, 0.8, 0.3, 0, outHeight, 1 - inHeight, 1);
+        Curve const after = Treated(before);
         EXPECT_NEAR(outHeight / 0.8, after.p[1][1] / after.p[1][0], 1e-12) << before;
         EXPECT_EQ(before.p[2], after.p[2]) << before;
         if (before != after) {
@@ -135,10 +135,10 @@ TEST(CurveKernelNonDecreasing, ASmallMoveOfAHandleMovesTheResultALittle)
 {
     Dice dice(43);
     for (int i = 0; i < 20000; ++i) {
-        const double out = dice.Between(-0.5, 3);
-        const double in = dice.Between(-0.5, 3);
-        const Curve a = Treated(Graph(1, 0.5, 0.5, 0, out, 1 - in, 1));
-        const Curve b = Treated(Graph(1, 0.5, 0.5, 0, out + 1e-7, 1 - in + 1e-7, 1));
+        double const out = dice.Between(-0.5, 3);
+        double const in = dice.Between(-0.5, 3);
+        Curve const a = Treated(Graph(1, 0.5, 0.5, 0, out, 1 - in, 1));
+        Curve const b = Treated(Graph(1, 0.5, 0.5, 0, out + 1e-7, 1 - in + 1e-7, 1));
         for (std::size_t point : {1, 2}) EXPECT_NEAR(a.p[point][1], b.p[point][1], 1e-3) << out << " " << in;
     }
 }
@@ -150,7 +150,7 @@ TEST(CurveKernelNonDecreasing, AnyFiniteCurveStaysFinite)
         Curve curve;
         for (auto& point : curve.p)
             for (std::size_t k = 0; k < 2; ++k) point[k] = dice.Below(6) == 0 ? 0.0 : dice.Wild(308);
-        const Curve after = Treated(curve);
+        Curve const after = Treated(curve);
         for (std::size_t point : {1, 2}) {
             EXPECT_TRUE(std::isfinite(after.p[point][0]) && std::isfinite(after.p[point][1])) << curve;
             EXPECT_TRUE(IsBetween(after.p[point][1], curve.p[0][1], curve.p[3][1]) || after == curve ||
@@ -164,7 +164,7 @@ TEST(CurveKernelNonDecreasing, AnyFiniteCurveStaysFinite)
 
 TEST(CurveKernelNonDecreasing, RefusalsMoveNothingAndTheFlagIsOnlyEverSet)
 {
-    const Curve good = Graph(1, 0.5, 0.5, 0, 5, 1, 1);
+    Curve const good = Graph(1, 0.5, 0.5, 0, 5, 1, 1);
     Curve curve = good;
     CRV_Curve kernel = curve.Get();
     unsigned char changed = 0;

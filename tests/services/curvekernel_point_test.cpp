@@ -11,7 +11,7 @@ namespace {
 using truth::Curve;
 using truth::Dice;
 
-constexpr double kNaN = std::numeric_limits<double>::quiet_NaN();
+constexpr double NaN = std::numeric_limits<double>::quiet_NaN();
 
 Curve RandomPath(Dice& dice, short dimension)
 {
@@ -27,8 +27,8 @@ TEST(CurveKernelPoint, IsDeCasteljausInEveryDimension)
     Dice dice(51);
     for (int round = 0; round < 5000; ++round) {
         Curve curve = RandomPath(dice, static_cast<short>(1 + round % 4));
-        const CRV_Curve kernel = curve.Get();
-        const double t = dice.Between(0, 1);
+        CRV_Curve const kernel = curve.Get();
+        double const t = dice.Between(0, 1);
         double point[5] = {77, 77, 77, 77, 77};
         double vector[5] = {77, 77, 77, 77, 77};
         ASSERT_EQ(0, CRV_EvaluatePoint(&kernel, point, t));
@@ -50,7 +50,7 @@ TEST(CurveKernelPoint, TheEndsAreExactAndHoldOutside)
     Dice dice(52);
     for (int round = 0; round < 1000; ++round) {
         Curve curve = RandomPath(dice, 3);
-        const CRV_Curve kernel = curve.Get();
+        CRV_Curve const kernel = curve.Get();
         const struct {
             double t;
             std::size_t end;
@@ -62,7 +62,7 @@ TEST(CurveKernelPoint, TheEndsAreExactAndHoldOutside)
             ASSERT_EQ(0, CRV_EvaluateDeriv(&kernel, vector, row.t));
             for (std::size_t i = 0; i < 3; ++i) {
                 EXPECT_EQ(curve.p[row.end][i], point[i]) << row.t;
-                const double handle = row.end ? curve.p[3][i] - curve.p[2][i] : curve.p[1][i] - curve.p[0][i];
+                double const handle = row.end ? curve.p[3][i] - curve.p[2][i] : curve.p[1][i] - curve.p[0][i];
                 EXPECT_DOUBLE_EQ(handle, vector[i] / 3.0) << row.t;
             }
         }
@@ -75,10 +75,10 @@ TEST(CurveKernelPoint, AHeldCoordinateStaysToTheBit)
     for (int round = 0; round < 5000; ++round) {
         Curve curve = RandomPath(dice, 3);
         for (auto& point : curve.p) point[2] = 0.1;
-        const CRV_Curve kernel = curve.Get();
+        CRV_Curve const kernel = curve.Get();
         double point[3];
         double rows[15];
-        const double t = dice.Between(0, 1);
+        double const t = dice.Between(0, 1);
         ASSERT_EQ(0, CRV_EvaluatePoint(&kernel, point, t));
         ASSERT_EQ(0, CRV_SubdivideCurve(&kernel, rows, t));
         EXPECT_EQ(0.1, point[2]);
@@ -91,10 +91,10 @@ TEST(CurveKernelSubdivide, BothHalvesRunAlongTheWhole)
     Dice dice(54);
     for (int round = 0; round < 3000; ++round) {
         Curve whole = RandomPath(dice, static_cast<short>(1 + round % 4));
-        const CRV_Curve kernel = whole.Get();
-        const double t = round % 10 == 0 ? round % 20 / 10.0 : dice.Between(0, 1);  // the ends too
+        CRV_Curve const kernel = whole.Get();
+        double const t = round % 10 == 0 ? round % 20 / 10.0 : dice.Between(0, 1);  // the ends too
         double rows[21];
-        const std::size_t dimension = static_cast<std::size_t>(whole.dimension);
+        std::size_t const dimension = static_cast<std::size_t>(whole.dimension);
         rows[5 * dimension] = 77;
         ASSERT_EQ(0, CRV_SubdivideCurve(&kernel, rows, t));
         EXPECT_EQ(77, rows[5 * dimension]);
@@ -115,7 +115,7 @@ TEST(CurveKernelSubdivide, BothHalvesRunAlongTheWhole)
         }
         for (int k = 0; k <= 8; ++k)
             for (std::size_t i = 0; i < dimension; ++i) {
-                const truth::Real at = k / 8.0L;
+                truth::Real const at = k / 8.0L;
                 EXPECT_NEAR(static_cast<double>(truth::At(whole, i, at * t)),
                             static_cast<double>(truth::At(left, i, at)), 1e-12);
                 EXPECT_NEAR(static_cast<double>(truth::At(whole, i, t + at * (1 - truth::Real(t)))),
@@ -132,7 +132,7 @@ TEST(CurveKernelSubdivide, RefusalsWriteNothing)
     double rows[10] = {77};
     EXPECT_EQ(CRV_Err_NullArgument, CRV_SubdivideCurve(nullptr, rows, 0.5));
     EXPECT_EQ(CRV_Err_NullArgument, CRV_SubdivideCurve(&kernel, nullptr, 0.5));
-    EXPECT_EQ(CRV_Err_NotFinite, CRV_SubdivideCurve(&kernel, rows, kNaN));
+    EXPECT_EQ(CRV_Err_NotFinite, CRV_SubdivideCurve(&kernel, rows, NaN));
     kernel.dimension = 0;
     EXPECT_EQ(CRV_Err_Dimension, CRV_SubdivideCurve(&kernel, rows, 0.5));
     kernel.dimension = 5;
@@ -141,7 +141,7 @@ TEST(CurveKernelSubdivide, RefusalsWriteNothing)
     EXPECT_EQ(CRV_Err_Dimension, CRV_EvaluatePoint(&kernel, answer, 0.5));
     EXPECT_EQ(CRV_Err_Dimension, CRV_EvaluateDeriv(&kernel, answer, 0.5));
     kernel.dimension = 2;
-    curve.p[1][1] = kNaN;
+    curve.p[1][1] = NaN;
     EXPECT_EQ(CRV_Err_NotFinite, CRV_SubdivideCurve(&kernel, rows, 0.5));
     EXPECT_EQ(77, rows[0]);
     EXPECT_EQ(77, answer[0]);

@@ -15,28 +15,28 @@ using truth::Dice;
 using truth::Graph;
 using truth::Real;
 
-constexpr double kNaN = std::numeric_limits<double>::quiet_NaN();
+constexpr double NaN = std::numeric_limits<double>::quiet_NaN();
 
 double Slope(Curve curve, double x)
 {
-    const CRV_Curve kernel = curve.Get();
-    double slope = kNaN;
+    CRV_Curve const kernel = curve.Get();
+    double slope = NaN;
     EXPECT_EQ(0, CRV_Evaluate1dDerivFromX(&kernel, &slope, x));
     return slope;
 }
 
 double Bend(Curve curve, double x)
 {
-    const CRV_Curve kernel = curve.Get();
-    double bend = kNaN;
+    CRV_Curve const kernel = curve.Get();
+    double bend = NaN;
     EXPECT_EQ(0, CRV_Evaluate1dDeriv2FromX(&kernel, &bend, x));
     return bend;
 }
 
 std::vector<double> Points(Curve curve, double slope)
 {
-    const CRV_Curve kernel = curve.Get();
-    double xs[3] = {kNaN, kNaN, 77.0};
+    CRV_Curve const kernel = curve.Get();
+    double xs[3] = {NaN, NaN, 77.0};
     int count = -1;
     EXPECT_EQ(0, CRV_EvaluateXFromYPrime(&kernel, &count, xs, slope));
     EXPECT_EQ(77.0, xs[2]);
@@ -48,14 +48,14 @@ TEST(CurveKernelSlope, AgreesWithTheQuotientsOfTheDerivatives)
 {
     Dice dice(31);
     for (int i = 0; i < 20000; ++i) {
-        const Curve curve = Graph(dice.Between(0.1, 5), dice.Between(0.05, 0.9), dice.Between(0.05, 0.9),
+        Curve const curve = Graph(dice.Between(0.1, 5), dice.Between(0.05, 0.9), dice.Between(0.05, 0.9),
                                   dice.Between(-5, 5), dice.Between(-5, 5), dice.Between(-5, 5), dice.Between(-5, 5));
-        const double x = dice.Between(0, curve.p[3][0]);
-        const Real t = truth::FirstReach(curve, 0, x, 1);
-        const Real dx = truth::FirstAt(curve, 0, t);
+        double const x = dice.Between(0, curve.p[3][0]);
+        Real const t = truth::FirstReach(curve, 0, x, 1);
+        Real const dx = truth::FirstAt(curve, 0, t);
         if (dx < 0.05L * curve.p[3][0]) continue;
-        const Real dy = truth::FirstAt(curve, 1, t);
-        const Real bend = (dx * truth::SecondAt(curve, 1, t) - dy * truth::SecondAt(curve, 0, t)) / (dx * dx * dx);
+        Real const dy = truth::FirstAt(curve, 1, t);
+        Real const bend = (dx * truth::SecondAt(curve, 1, t) - dy * truth::SecondAt(curve, 0, t)) / (dx * dx * dx);
         EXPECT_NEAR(static_cast<double>(dy / dx), Slope(curve, x), 1e-8 * (1 + std::fabs(static_cast<double>(dy / dx))))
             << curve << " at " << x;
         EXPECT_NEAR(static_cast<double>(bend), Bend(curve, x), 1e-6 * (1 + std::fabs(static_cast<double>(bend))))
@@ -66,7 +66,7 @@ TEST(CurveKernelSlope, AgreesWithTheQuotientsOfTheDerivatives)
 TEST(CurveKernelSlope, WhereTheCurveStandsStillTheLimitAnswers)
 {
     const struct {
-        const char* why;
+        char const* why;
         Curve curve;
         double x, slope;
     } rows[] = {
@@ -88,7 +88,7 @@ TEST(CurveKernelSlope, WhereTheCurveStandsStillTheLimitAnswers)
 TEST(CurveKernelSlope, VerticalTangentsAreLargeFiniteAndOfTheRightSign)
 {
     const struct {
-        const char* why;
+        char const* why;
         Curve curve;
         double x;
         int sign;
@@ -102,7 +102,7 @@ TEST(CurveKernelSlope, VerticalTangentsAreLargeFiniteAndOfTheRightSign)
         {"values near the largest double", Graph(2, 0, 0.3, -1e308, 1e308, 1e308, 1e308), 0, 1},
     };
     for (auto const& row : rows) {
-        const double slope = Slope(row.curve, row.x);
+        double const slope = Slope(row.curve, row.x);
         EXPECT_TRUE(std::isfinite(slope) && slope * row.sign > 1e6) << row.why << ": " << slope;
         EXPECT_TRUE(std::isfinite(Bend(row.curve, row.x))) << row.why;
     }
@@ -115,10 +115,10 @@ TEST(CurveKernelSlope, AnyFiniteCurveHasFiniteSlopes)
         Curve curve;
         for (auto& point : curve.p)
             for (std::size_t k = 0; k < 2; ++k) point[k] = dice.Below(5) == 0 ? 0.0 : dice.Wild(307);
-        const double x = dice.Below(3) ? dice.Wild(307) : curve.p[static_cast<std::size_t>(dice.Below(4))][0];
+        double const x = dice.Below(3) ? dice.Wild(307) : curve.p[static_cast<std::size_t>(dice.Below(4))][0];
         EXPECT_TRUE(std::isfinite(Slope(curve, x))) << curve << " at " << x;
         EXPECT_TRUE(std::isfinite(Bend(curve, x))) << curve << " at " << x;
-        for (const double point : Points(curve, dice.Wild(20))) EXPECT_TRUE(std::isfinite(point)) << curve;
+        for (double const point : Points(curve, dice.Wild(20))) EXPECT_TRUE(std::isfinite(point)) << curve;
     }
 }
 
@@ -137,7 +137,7 @@ TEST(CurveKernelSlopePoints, RowsThatCanBeCheckedByEye)
 {
     using Xs = std::vector<double>;
     const struct {
-        const char* why;
+        char const* why;
         Curve curve;
         double slope;
         Xs xs;
@@ -161,7 +161,7 @@ TEST(CurveKernelSlopePoints, RowsThatCanBeCheckedByEye)
         {"no in handle, and the limit is flat there", Graph(2, 0.5, 0, 10, 20, 20, 20), 0, {2}},
     };
     for (auto const& row : rows) {
-        const Xs found = Points(row.curve, row.slope);
+        Xs const found = Points(row.curve, row.slope);
         ASSERT_EQ(row.xs.size(), found.size()) << row.why;
         for (std::size_t i = 0; i < found.size(); ++i) EXPECT_NEAR(row.xs[i], found[i], 1e-7) << row.why;
     }
@@ -171,21 +171,21 @@ TEST(CurveKernelSlopePoints, EveryCrossingIsFoundAndHasTheSlope)
 {
     Dice dice(33);
     for (int i = 0; i < 4000; ++i) {
-        const Curve curve = Graph(1, dice.Between(0.02, 1), dice.Between(0.02, 1), dice.Between(-1, 1),
+        Curve const curve = Graph(1, dice.Between(0.02, 1), dice.Between(0.02, 1), dice.Between(-1, 1),
                                   dice.Between(-1, 1), dice.Between(-1, 1), dice.Between(-1, 1));
-        const double slope = dice.Below(2) ? 0.0 : dice.Between(-4, 4);
+        double const slope = dice.Below(2) ? 0.0 : dice.Between(-4, 4);
         SCOPED_TRACE(testing::Message() << curve << " slope " << slope);
-        const std::vector<double> found = Points(curve, slope);
+        std::vector<double> const found = Points(curve, slope);
         EXPECT_TRUE(found.size() < 2 || found[0] < found[1]);
 
         int crossings = 0;
-        const auto excess = [&](int k) {
-            const Real t = k / 2000.0L;
+        auto const excess = [&](int k) {
+            Real const t = k / 2000.0L;
             return truth::FirstAt(curve, 1, t) - slope * truth::FirstAt(curve, 0, t);
         };
         for (int k = 0; k < 2000; ++k) crossings += (excess(k) < 0) != (excess(k + 1) < 0);
         EXPECT_EQ(crossings, static_cast<int>(found.size()));
-        for (const double x : found)
+        for (double const x : found)
             EXPECT_NEAR(slope, Slope(curve, x), 1e-6 * (1 + std::fabs(Bend(curve, x)))) << "at " << x;
     }
 }
@@ -201,7 +201,7 @@ TEST(CurveKernelSlopePoints, RefusalsLeaveACountOfZero)
     EXPECT_EQ(CRV_Err_NullArgument, CRV_EvaluateXFromYPrime(&kernel, nullptr, xs, 0));
     EXPECT_EQ(CRV_Err_NullArgument, CRV_EvaluateXFromYPrime(&kernel, &count, nullptr, 0));
     count = 5;
-    EXPECT_EQ(CRV_Err_NotFinite, CRV_EvaluateXFromYPrime(&kernel, &count, xs, kNaN));
+    EXPECT_EQ(CRV_Err_NotFinite, CRV_EvaluateXFromYPrime(&kernel, &count, xs, NaN));
     EXPECT_EQ(0, count);
     kernel.dimension = 3;
     EXPECT_EQ(CRV_Err_Dimension, CRV_EvaluateXFromYPrime(&kernel, &count, xs, 0));

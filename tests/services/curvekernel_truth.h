@@ -33,7 +33,7 @@ public:
     // Any size: sign, and 10 to a power within the given exponents.
     double Wild(int exponent)
     {
-        const double value = std::pow(10.0, Between(-exponent, exponent));
+        double const value = std::pow(10.0, Between(-exponent, exponent));
         return Below(2) ? value : -value;
     }
 
@@ -97,17 +97,17 @@ inline Real At(Curve const& curve, std::size_t i, Real t)
 // Its derivatives by t.
 inline Real FirstAt(Curve const& curve, std::size_t i, Real t)
 {
-    const Real s = 1 - t;
-    const Real a = Real(curve.p[1][i]) - curve.p[0][i];
-    const Real b = Real(curve.p[2][i]) - curve.p[1][i];
-    const Real c = Real(curve.p[3][i]) - curve.p[2][i];
+    Real const s = 1 - t;
+    Real const a = Real(curve.p[1][i]) - curve.p[0][i];
+    Real const b = Real(curve.p[2][i]) - curve.p[1][i];
+    Real const c = Real(curve.p[3][i]) - curve.p[2][i];
     return 3 * (s * s * a + 2 * s * t * b + t * t * c);
 }
 inline Real SecondAt(Curve const& curve, std::size_t i, Real t)
 {
-    const Real a = Real(curve.p[1][i]) - curve.p[0][i];
-    const Real b = Real(curve.p[2][i]) - curve.p[1][i];
-    const Real c = Real(curve.p[3][i]) - curve.p[2][i];
+    Real const a = Real(curve.p[1][i]) - curve.p[0][i];
+    Real const b = Real(curve.p[2][i]) - curve.p[1][i];
+    Real const c = Real(curve.p[3][i]) - curve.p[2][i];
     return 6 * ((1 - t) * (b - a) + t * (c - b));
 }
 
@@ -122,7 +122,7 @@ inline Real FirstReach(Curve const& curve, std::size_t i, Real value, int steps)
     Real low = Real(step - 1) / steps;
     Real high = Real(step) / steps;
     for (int half = 0; half < 80; ++half) {
-        const Real middle = (low + high) / 2;
+        Real const middle = (low + high) / 2;
         (At(curve, i, middle) < value ? low : high) = middle;
     }
     return high;

@@ -10,7 +10,7 @@ SEQ_Head** MakeList(int itemSize, int count)
     SEQ_Head** list = nullptr;
     EXPECT_EQ(0, SEQ_New(0, static_cast<short>(itemSize), 4, 1, &list));
     for (int i = 0; i < count; ++i) {
-        const std::string item(static_cast<std::size_t>(itemSize), static_cast<char>('a' + i % 26));
+        std::string const item(static_cast<std::size_t>(itemSize), static_cast<char>('a' + i % 26));
         EXPECT_EQ(0, SEQ_Insert(item.data(), -1, list));
     }
     return list;
@@ -29,8 +29,8 @@ std::string Items(SEQ_Head const* const* list)
 
 TEST(SequenceFile, OnlyTheItemsGoIntoTheChunkAndComeBack)
 {
-    for (const int itemSize : {1, 3, 7, 8, 12, 16, 104, 32767})
-        for (const int count : {0, 1, 2, 27}) {
+    for (int const itemSize : {1, 3, 7, 8, 12, 16, 104, 32767})
+        for (int const count : {0, 1, 2, 27}) {
             SCOPED_TRACE(testing::Message() << count << " items of " << itemSize);
             SEQ_Head** const list = MakeList(itemSize, count);
             CKF_File file;
@@ -58,7 +58,7 @@ TEST(SequenceFile, OnlyTheItemsGoIntoTheChunkAndComeBack)
 TEST(SequenceFile, StepsOverOtherChunksAndStaysInItsList)
 {
     const std::string seql = Atom("seql", Long(2) + Long(1) + "ab");
-    const std::string bytes =
+    std::string const bytes =
         Form(List("kfbs", Atom("what", "x") + seql + Atom("next", "n")) + List("kfbs", Atom("what", "x")) + seql);
     CKF_File file;
     ASSERT_EQ(0, file.Open(Span(bytes)));
@@ -79,15 +79,15 @@ TEST(SequenceFile, StepsOverOtherChunksAndStaysInItsList)
 TEST(SequenceFile, OutOfMemoryLeavesNothing)
 {
     const std::string bytes = Form(Atom("seql", Long(3) + Long(2) + "abcdef"));
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
     for (int n = 1;; ++n) {
         ASSERT_LT(n, 100);
         CKF_File file;
         ASSERT_EQ(0, file.Open(Span(bytes)));
         SEQ_Head** list = nullptr;
         Q_FailAllocation(n);
-        const int code = SEQ_Read(&file, &list);
-        const bool fired = Q_FailAllocationFired();
+        int const code = SEQ_Read(&file, &list);
+        bool const fired = Q_FailAllocationFired();
         Q_FailAllocation(0);
         if (!fired) {
             EXPECT_EQ(0, code);

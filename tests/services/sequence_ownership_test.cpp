@@ -33,7 +33,8 @@ struct Tokens {
     }
     int Alive() const
     {
-        return static_cast<int>(std::count_if(values.begin(), values.end(), [](int value) { return value >= 0; }));
+        return static_cast<int>(std::count_if(
+            values.begin(), values.end(), [](int value) { return value >= 0; }));
     }
     static bool Falls(int& countdown) { return countdown > 0 && --countdown == 0; }
 
@@ -48,9 +49,9 @@ struct Tokens {
         Tokens& tokens = *static_cast<Tokens*>(refcon);
         EXPECT_EQ(refcon, (*list)->refcon) << "the callback finds the owner from the list it is given";
         if (Falls(tokens.failCopyIn)) return CopyFailed;
-        const int value = tokens.values.at(static_cast<std::size_t>(TokenIn(source)));
+        int const value = tokens.values.at(static_cast<std::size_t>(TokenIn(source)));
         EXPECT_GE(value, 0) << "copied after disposal";
-        const int token = tokens.Make(value);
+        int const token = tokens.Make(value);
         std::memcpy(destination, &token, sizeof token);
         return 0;
     }
@@ -69,7 +70,7 @@ class TokenList {
 public:
     TokenList(short itemSize, Tokens& tokens) : tokens_(tokens), size_(static_cast<std::size_t>(itemSize))
     {
-        const SEQ_Funcs funcs{Tokens::Copy, Tokens::Dispose, nullptr};
+        SEQ_Funcs const funcs{Tokens::Copy, Tokens::Dispose, nullptr};
         EXPECT_EQ(0, SEQ_New(0, itemSize, 4, 1, &list_));
         EXPECT_EQ(0, SEQ_SetFuncs(list_, 3, &funcs));
         EXPECT_EQ(0, SEQ_SetRefcon(&tokens, list_));
@@ -111,9 +112,9 @@ private:
 // of memory, and the list must then be what it was, with nothing leaked and nothing disposed twice.
 TEST(SequenceEdits, FollowAVectorThroughSuccessAndFailure)
 {
-    for (const short itemSize : {4, 9, 104, 600}) {  // below, beside and above the alignment and the scratch item
+    for (short const itemSize : {4, 9, 104, 600}) {  // below, beside and above the alignment and the scratch item
         SCOPED_TRACE(testing::Message() << "item size " << itemSize);
-        const Q_MemoryCount before = Q_MemoryLive(nullptr);
+        Q_MemoryCount const before = Q_MemoryLive(nullptr);
         Tokens tokens;
         {
             TokenList list(itemSize, tokens);
@@ -121,12 +122,12 @@ TEST(SequenceEdits, FollowAVectorThroughSuccessAndFailure)
             std::mt19937 random(static_cast<unsigned>(itemSize));
             int failures = 0;
             for (int step = 0; step < 3000; ++step) {
-                const int value = static_cast<int>(random() % 100000);
-                const int count = static_cast<int>(model.size());
-                const int index = static_cast<int>(random() % static_cast<unsigned>(count + 1));
-                const auto place = model.begin() + index;
-                const int source = tokens.Make(value);
-                const std::vector<unsigned char> item = list.ItemOf(source);
+                int const value = static_cast<int>(random() % 100000);
+                int const count = static_cast<int>(model.size());
+                int const index = static_cast<int>(random() % static_cast<unsigned>(count + 1));
+                auto const place = model.begin() + index;
+                int const source = tokens.Make(value);
+                std::vector<unsigned char> const item = list.ItemOf(source);
                 bool tookSource = false;
                 tokens.failCopyIn = random() % 8 == 0 ? 1 : 0;
                 tokens.failDisposeIn = random() % 8 == 0 ? 1 : 0;
@@ -159,7 +160,7 @@ TEST(SequenceEdits, FollowAVectorThroughSuccessAndFailure)
                     if (index == count) break;
                     std::vector<unsigned char> moved(static_cast<std::size_t>(itemSize));
                     tokens.failDisposeIn = 0;
-                    const int alive = tokens.Alive();
+                    int const alive = tokens.Alive();
                     code = SEQ_Remove(index, list.get(), 0, moved.data());
                     EXPECT_EQ(alive, tokens.Alive()) << "what moves out isn't disposed";
                     EXPECT_EQ(*place, tokens.values.at(static_cast<std::size_t>(Tokens::TokenIn(moved.data()))));
@@ -196,10 +197,10 @@ TEST(SequenceDuplicate, HasCopiesOfItsOwnOrLeavesNothingBehind)
     Tokens tokens;
     TokenList list(16, tokens);
     for (int value = 0; value < 6; ++value) SEQ_Insert(list.ItemOf(tokens.Make(value)).data(), -1, list.get());
-    const SEQ_Funcs sorted{nullptr, nullptr, CompareBytes};
+    SEQ_Funcs const sorted{nullptr, nullptr, CompareBytes};
     ASSERT_EQ(0, SEQ_SetFuncs(list.get(), 3, &sorted));
     SEQ_Lock(1, list.get());
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
 
     for (int copy = 1; copy <= 6; ++copy) {
         tokens.failCopyIn = copy;
@@ -213,7 +214,7 @@ TEST(SequenceDuplicate, HasCopiesOfItsOwnOrLeavesNothingBehind)
     for (bool fired = true; fired; ++allocations) {
         Q_FailAllocation(allocations + 1);
         SEQ_Head** made = nullptr;
-        const int code = SEQ_Duplicate(list.get(), 0, &made);
+        int const code = SEQ_Duplicate(list.get(), 0, &made);
         fired = Q_FailAllocationFired();
         Q_FailAllocation(0);
         EXPECT_EQ(fired ? 4 : 0, code);
@@ -238,7 +239,7 @@ TEST(SequenceDispose, DisposesAllItemsAndAnswersTheFirstFailure)
     Tokens tokens;
     TokenList list(4, tokens);
     for (int value = 0; value < 5; ++value) SEQ_Insert(list.ItemOf(tokens.Make(value)).data(), -1, list.get());
-    const SEQ_Funcs withoutCopy{SEQ_RemoveFunc, nullptr, nullptr};
+    SEQ_Funcs const withoutCopy{SEQ_RemoveFunc, nullptr, nullptr};
     ASSERT_EQ(0, SEQ_SetFuncs(list.get(), 3, &withoutCopy));
     int copy = 77;
     EXPECT_EQ(0, SEQ_GetItemCopy(list.get(), 0, 3, &copy));

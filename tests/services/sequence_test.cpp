@@ -20,7 +20,7 @@ public:
     explicit IntList(short itemSize = 8, std::vector<int> const& values = {})
     {
         EXPECT_EQ(0, SEQ_New(0, itemSize, 4, 1, &list_));
-        for (const int value : values) EXPECT_EQ(0, SEQ_Insert(Item(value).data(), -1, list_));
+        for (int const value : values) EXPECT_EQ(0, SEQ_Insert(Item(value).data(), -1, list_));
     }
     explicit IntList(SEQ_Head** list) : list_(list) {}
     IntList(IntList const&) = delete;
@@ -71,7 +71,7 @@ int CompareInts(void*, SEQ_Head const* const*, void const* a, void const* b)
 
 void SetSort(SEQ_Head** list, SEQ_SortFunc sort = CompareInts)
 {
-    const SEQ_Funcs funcs{nullptr, nullptr, sort};
+    SEQ_Funcs const funcs{nullptr, nullptr, sort};
     ASSERT_EQ(0, SEQ_SetFuncs(list, 3, &funcs));
 }
 
@@ -84,10 +84,10 @@ TEST(SequenceSearch, AgreesWithTheStandardLibraryAtEveryCount)
         std::vector<int> items(static_cast<std::size_t>(count));
         for (int& item : items) item = static_cast<int>(random() % 60) * 2;
         std::sort(items.begin(), items.end());
-        const IntList list(count % 2 ? 8 : 12, items);
+        IntList const list(count % 2 ? 8 : 12, items);
         SetSort(list.get());
         for (int probe = -1; probe <= 121; ++probe) {
-            const auto place = std::lower_bound(items.begin(), items.end(), probe);
+            auto const place = std::lower_bound(items.begin(), items.end(), probe);
             unsigned char found = 0;
             int index = -1;
             ASSERT_EQ(0, SEQ_GetSortedConstItem(list.get(), 0, list.Item(probe).data(), &found, 0, &index));
@@ -101,36 +101,36 @@ TEST(SequenceSearch, AgreesWithTheStandardLibraryAtEveryCount)
 
 TEST(SequenceIndex, OnlyIndicesInTheListAreTaken)
 {
-    const int asked[] = {INT_MIN, INT_MIN + 1, -2, -1, 0, 1, 2, 3, INT_MAX};
-    for (const int count : {0, 1, 3})
-        for (const int index : asked) {
+    int const asked[] = {INT_MIN, INT_MIN + 1, -2, -1, 0, 1, 2, 3, INT_MAX};
+    for (int const count : {0, 1, 3})
+        for (int const index : asked) {
             SCOPED_TRACE(testing::Message() << count << " items, index " << index);
             std::vector<int> values(static_cast<std::size_t>(count));
             for (int i = 0; i < count; ++i) values[static_cast<std::size_t>(i)] = 100 + i;
-            const IntList list(8, values);
-            const bool inList = index >= 0 && index < count;
-            const bool namesLast = index == -1 && count > 0;
+            IntList const list(8, values);
+            bool const inList = index >= 0 && index < count;
+            bool const namesLast = index == -1 && count > 0;
 
             void* item = nullptr;
             void const* constItem = nullptr;
             unsigned char copy[8];
-            const int code = inList ? 0 : SEQ_Err_BadIndex;
+            int const code = inList ? 0 : SEQ_Err_BadIndex;
             EXPECT_EQ(code, SEQ_GetAddress(list.get(), index, 1, &item));
             EXPECT_EQ(inList ? 1 : 0, SEQ_GetPinCount(list.get())) << "a failure owes no unlock";
             EXPECT_EQ(namesLast ? 0 : code, SEQ_GetConstAddress(list.get(), index, &constItem));
             EXPECT_EQ(inList, item != nullptr && item == constItem);
             if (constItem) {
-                const int wanted = namesLast ? values.back() : values[static_cast<std::size_t>(index)];
+                int const wanted = namesLast ? values.back() : values[static_cast<std::size_t>(index)];
                 EXPECT_EQ(0, std::memcmp(list.Item(wanted).data(), constItem, 8));
             }
             EXPECT_EQ(code, SEQ_GetItemCopy(list.get(), 0, index, copy));
             if (!inList) {
-                const auto unvisited = [](SEQ_Head**, long, int, void*) { return 77; };
+                auto const unvisited = [](SEQ_Head**, long, int, void*) { return 77; };
                 EXPECT_EQ(code, SEQ_SetItemCopy(list.Item(5).data(), index, list.get(), 0, 0));
                 EXPECT_EQ(code, SEQ_Remove(index, list.get(), 0, nullptr));
                 EXPECT_EQ(code, SEQ_ForRange(list.get(), index, index, 0, unvisited, nullptr));
             }
-            const bool insertable = index >= -1 && index <= count;
+            bool const insertable = index >= -1 && index <= count;
             EXPECT_EQ(insertable ? 0 : SEQ_Err_BadIndex, SEQ_InsertCopy(list.Item(5).data(), index, list.get(), 0));
             EXPECT_EQ(insertable ? count + 1 : count, list.Count());
         }
@@ -138,7 +138,7 @@ TEST(SequenceIndex, OnlyIndicesInTheListAreTaken)
 
 TEST(SequenceNew, RefusesItemSizesThatAreNone)
 {
-    for (const short size : {SHRT_MIN, -1, 0}) {
+    for (short const size : {SHRT_MIN, -1, 0}) {
         SEQ_Head** list = nullptr;
         EXPECT_EQ(SEQ_Err_BadArgument, SEQ_New(0, size, 4, 1, &list));
         EXPECT_EQ(nullptr, list);
@@ -147,15 +147,15 @@ TEST(SequenceNew, RefusesItemSizesThatAreNone)
 
 TEST(SequenceFuncs, NullLeavesAndRemoveTakesAway)
 {
-    const IntList list(8, {1, 2, 3});
+    IntList const list(8, {1, 2, 3});
     unsigned char found = 0;
     int index = 0;
-    const auto search = [&] { return SEQ_GetSortedItem(list.get(), 0, list.Item(9).data(), &found, 0, &index); };
+    auto const search = [&] { return SEQ_GetSortedItem(list.get(), 0, list.Item(9).data(), &found, 0, &index); };
 
     SetSort(list.get());
     EXPECT_EQ(0, search());
     EXPECT_EQ(3, index);
-    const SEQ_Funcs removeOthers{SEQ_RemoveFunc, SEQ_RemoveFunc, nullptr};
+    SEQ_Funcs const removeOthers{SEQ_RemoveFunc, SEQ_RemoveFunc, nullptr};
     EXPECT_EQ(0, SEQ_SetFuncs(list.get(), 3, &removeOthers));
     EXPECT_EQ(0, search());
     EXPECT_EQ(3, index) << "the sort function stays";
@@ -175,11 +175,11 @@ TEST(SequenceFuncs, NullLeavesAndRemoveTakesAway)
 
 TEST(SequenceEdits, AnItemOfTheListCanBeTheSource)
 {
-    const std::vector<int> start = {11, 22, 33, 44};  // a full first block: the insertion moves it
-    for (const bool full : {false, true})
+    std::vector<int> const start = {11, 22, 33, 44};  // a full first block: the insertion moves it
+    for (bool const full : {false, true})
         for (int from = 0; from < 4; ++from)
             for (int to = 0; to <= 4; ++to) {
-                const IntList list(24, start);
+                IntList const list(24, start);
                 if (!full) SEQ_ReserveSpace(40, list.get());
                 void const* source = nullptr;
                 ASSERT_EQ(0, SEQ_GetConstAddress(list.get(), from, &source));
@@ -209,12 +209,12 @@ TEST(SequenceWalk, ARangeGoesEitherWayAndStopsOnOrder)
         {-1, 2, -1, {}, SEQ_Err_BadIndex, 77},
     };
     static std::vector<int> visited;
-    const IntList list(8, {100, 101, 102, 103, 104});
+    IntList const list(8, {100, 101, 102, 103, 104});
     for (auto const& walk : walks) {
         SCOPED_TRACE(testing::Message() << walk.first << " to " << walk.last << ", stop at " << walk.stopAt);
         visited.clear();
         int lastVisited = 77;
-        const auto visit = [](SEQ_Head** handle, long stopAt, int index, void* item) {
+        auto const visit = [](SEQ_Head** handle, long stopAt, int index, void* item) {
             void const* address = nullptr;
             EXPECT_EQ(0, SEQ_GetConstAddress(handle, index, &address));
             EXPECT_EQ(address, item);
@@ -230,8 +230,8 @@ TEST(SequenceWalk, ARangeGoesEitherWayAndStopsOnOrder)
 
 TEST(SequenceWalk, ForEachFollowsAListThatShrinksUnderIt)
 {
-    const IntList list(8, {1, 2, 3, 4, 5, 6});
-    const auto removeEven = [](SEQ_Head** handle, long, int index, void* item) {
+    IntList const list(8, {1, 2, 3, 4, 5, 6});
+    auto const removeEven = [](SEQ_Head** handle, long, int index, void* item) {
         int value;
         std::memcpy(&value, item, sizeof value);
         return value % 2 == 0 ? SEQ_Remove(index, handle, 0, nullptr) : 0;
@@ -240,7 +240,7 @@ TEST(SequenceWalk, ForEachFollowsAListThatShrinksUnderIt)
     EXPECT_EQ((std::vector<int>{1, 3, 5}), list.Values());
 
     long visits = 0;
-    const auto countTo2 = [](SEQ_Head const* const*, long refcon, int index, void const*) {
+    auto const countTo2 = [](SEQ_Head const* const*, long refcon, int index, void const*) {
         ++*reinterpret_cast<long*>(refcon);
         return index == 1 ? 42 : 0;
     };
@@ -252,13 +252,13 @@ TEST(SequenceWalk, ForEachFollowsAListThatShrinksUnderIt)
 
 TEST(SequencePins, NestAndNeverFallBelowZero)
 {
-    const IntList list(8, {1});
+    IntList const list(8, {1});
     SEQ_Head** const handle = list.get();
     void* item = nullptr;
-    const std::vector<int> pinned = {SEQ_Lock(1, handle), SEQ_LockConst(1, handle), SEQ_GetAddress(handle, 0, 1, &item),
+    std::vector<int> const pinned = {SEQ_Lock(1, handle), SEQ_LockConst(1, handle), SEQ_GetAddress(handle, 0, 1, &item),
                                      SEQ_GetAddress(handle, 0, 0, &item), SEQ_GetPinCount(handle)};
     EXPECT_EQ((std::vector<int>{0, 0, 0, 0, 3}), pinned);
-    const std::vector<int> unpinned = {SEQ_Unlock(handle), SEQ_UnlockConst(handle), SEQ_Unlock(handle),
+    std::vector<int> const unpinned = {SEQ_Unlock(handle), SEQ_UnlockConst(handle), SEQ_Unlock(handle),
                                        SEQ_Unlock(handle), SEQ_UnlockConst(handle), SEQ_GetPinCount(handle)};
     EXPECT_EQ((std::vector<int>{0, 0, 0, SEQ_Err_NotPinned, SEQ_Err_NotPinned, 0}), unpinned);
     EXPECT_EQ(0, SEQ_Lock(1, handle));
@@ -267,7 +267,7 @@ TEST(SequencePins, NestAndNeverFallBelowZero)
 
 TEST(SequencePins, HoldAddressesThroughEverythingButGrowth)
 {
-    const IntList list(8, {1, 2, 3});
+    IntList const list(8, {1, 2, 3});
     ASSERT_EQ(0, SEQ_ReserveSpace(10, list.get()));
     void* pinned = nullptr;
     ASSERT_EQ(0, SEQ_GetAddress(list.get(), 0, 1, &pinned));
@@ -283,8 +283,8 @@ TEST(SequencePins, HoldAddressesThroughEverythingButGrowth)
 
 TEST(SequenceRoom, ReservedRoomNeedsNoMemoryAndCompactReturnsIt)
 {
-    const IntList list(104);
-    const Q_MemoryCount empty = Q_MemoryLive(nullptr);
+    IntList const list(104);
+    Q_MemoryCount const empty = Q_MemoryLive(nullptr);
     ASSERT_EQ(0, SEQ_ReserveSpace(50, list.get()));
     EXPECT_EQ(empty.bytes + 50 * 104, Q_MemoryLive(nullptr).bytes);
     Q_FailAllocation(1);
@@ -302,14 +302,14 @@ TEST(SequenceRoom, ReservedRoomNeedsNoMemoryAndCompactReturnsIt)
 
 TEST(SequenceRoom, ADuplicateOfPlainBytesIsOneBlockAndGrowsLikeAnyList)
 {
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
-    for (const short itemSize : {4, 8, 12, 33}) {
-        const IntList source(itemSize, {5, 6, 7});
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
+    for (short const itemSize : {4, 8, 12, 33}) {
+        IntList const source(itemSize, {5, 6, 7});
         for (int removed = 0; removed <= 3; ++removed) {
-            const Q_MemoryCount between = Q_MemoryLive(nullptr);
+            Q_MemoryCount const between = Q_MemoryLive(nullptr);
             SEQ_Head** made = nullptr;
             ASSERT_EQ(0, SEQ_Duplicate(source.get(), 0, &made));
-            const IntList copy(made);
+            IntList const copy(made);
             EXPECT_EQ(between.blocks + 1, Q_MemoryLive(nullptr).blocks);
             EXPECT_EQ((std::vector<int>{5, 6, 7}), copy.Values());
             for (int i = 0; i < removed; ++i) ASSERT_EQ(0, SEQ_Remove(0, made, 0, nullptr));
@@ -334,13 +334,13 @@ TEST(SequenceRoom, ADuplicateOfPlainBytesIsOneBlockAndGrowsLikeAnyList)
 
 TEST(SequenceRoom, ALargeDuplicateThatGrowsKeepsNoRoomThatItLeft)
 {
-    const IntList source(1000);
+    IntList const source(1000);
     for (int i = 0; i < 100; ++i) ASSERT_EQ(0, SEQ_Insert(source.Item(i).data(), -1, source.get()));
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
     SEQ_Head** made = nullptr;
     ASSERT_EQ(0, SEQ_Duplicate(source.get(), 0, &made));
-    const IntList copy(made);
-    const auto head = Q_MemoryLive(nullptr).bytes - before.bytes - 100 * 1000;
+    IntList const copy(made);
+    auto const head = Q_MemoryLive(nullptr).bytes - before.bytes - 100 * 1000;
     ASSERT_EQ(0, SEQ_Insert(copy.Item(100).data(), -1, made));
     ASSERT_EQ(0, SEQ_Compact(made));
     EXPECT_EQ(before.bytes + head + 101 * 1000, Q_MemoryLive(nullptr).bytes);
@@ -350,7 +350,7 @@ TEST(SequenceRoom, ALargeDuplicateThatGrowsKeepsNoRoomThatItLeft)
 
     for (int n = 1; n <= 2; ++n) {
         SEQ_Head** none = nullptr;
-        const Q_MemoryCount between = Q_MemoryLive(nullptr);
+        Q_MemoryCount const between = Q_MemoryLive(nullptr);
         Q_FailAllocation(n);
         EXPECT_EQ(4, SEQ_Duplicate(source.get(), 0, &none));
         EXPECT_TRUE(Q_FailAllocationFired());
@@ -361,8 +361,8 @@ TEST(SequenceRoom, ALargeDuplicateThatGrowsKeepsNoRoomThatItLeft)
 
 TEST(SequenceRoom, NumbersInItemsAreAlignedAndWholeSizesLeaveNoGaps)
 {
-    for (const short itemSize : {1, 4, 8, 9, 16, 24, 61, 104, 600}) {
-        const IntList list(itemSize, {1, 2, 3, 4, 5, 6, 7});
+    for (short const itemSize : {1, 4, 8, 9, 16, 24, 61, 104, 600}) {
+        IntList const list(itemSize, {1, 2, 3, 4, 5, 6, 7});
         std::vector<std::uintptr_t> addresses;
         for (int i = 0; i < list.Count(); ++i) {
             void const* item = nullptr;
@@ -380,10 +380,10 @@ TEST(SequenceRoom, NumbersInItemsAreAlignedAndWholeSizesLeaveNoGaps)
 
 TEST(SequenceRoom, NewItemsAreZeroAlsoWhereOldOnesLay)
 {
-    const IntList list(8, {1, 2, 3, 4, 5});
+    IntList const list(8, {1, 2, 3, 4, 5});
     ASSERT_EQ(0, SEQ_SetNumItems(1, list.get(), 0));
     ASSERT_EQ(0, SEQ_SetNumItems(20, list.get(), 0));
-    const std::vector<unsigned char> zero(8);
+    std::vector<unsigned char> const zero(8);
     for (int i = 1; i < 20; ++i) {
         void const* item = nullptr;
         ASSERT_EQ(0, SEQ_GetConstAddress(list.get(), i, &item));
@@ -395,7 +395,7 @@ TEST(SequenceRoom, NewItemsAreZeroAlsoWhereOldOnesLay)
 
 TEST(SequenceRoom, AppendingMovesTheItemsARareNumberOfTimes)
 {
-    const IntList list(16);
+    IntList const list(16);
     int moves = 0;
     void const* last = nullptr;
     for (int i = 0; i < 100000; ++i) {
@@ -416,8 +416,8 @@ TEST(SequenceHandle, NullIsRefusedEverywhere)
     void const* constItem = nullptr;
     int number = 0;
     unsigned char found = 0;
-    const auto visit = [](SEQ_Head**, long, int, void*) { return 0; };
-    const std::vector<int> codes = {SEQ_Dispose(none, 0),
+    auto const visit = [](SEQ_Head**, long, int, void*) { return 0; };
+    std::vector<int> const codes = {SEQ_Dispose(none, 0),
                                     SEQ_Duplicate(none, 0, &made),
                                     SEQ_SetFuncs(none, 3, &funcs),
                                     SEQ_SetRefcon(nullptr, none),

@@ -27,12 +27,12 @@ public:
 
     unsigned Scale()
     {
-        static const unsigned usual[] = {1, 24, 25, 30, 600, 1001, 24000, 44100, 48000, 90000, UINT_MAX, 0x80000000u};
+        static unsigned const usual[] = {1, 24, 25, 30, 600, 1001, 24000, 44100, 48000, 90000, UINT_MAX, 0x80000000u};
         return random_() % 2 ? usual[random_() % std::size(usual)] : static_cast<unsigned>(random_()) | 1u;
     }
     int Value()
     {
-        static const int ends[] = {INT_MIN, INT_MIN + 1, -1, 0, 1, INT_MAX - 1, INT_MAX};
+        static int const ends[] = {INT_MIN, INT_MIN + 1, -1, 0, 1, INT_MAX - 1, INT_MAX};
         switch (random_() % 4) {
         case 0: return ends[random_() % std::size(ends)];
         case 1: return static_cast<int>(random_());
@@ -54,7 +54,7 @@ Wide Gcd(Wide a, Wide b)
 // Whether value/scale has a form that fits.
 bool Fits(Wide value, Wide scale)
 {
-    const Wide divisor = Gcd(value, scale);
+    Wide const divisor = Gcd(value, scale);
     value /= divisor;
     scale /= divisor;
     return value >= INT_MIN && value <= INT_MAX && scale <= UINT_MAX;
@@ -70,7 +70,7 @@ bool IsSame(T_Time const& time, Wide value, Wide scale)
 TEST(TimeConversion, RoundsToTheNearestOrRefuses)
 {
     const struct {
-        const char* why;
+        char const* why;
         int value;
         unsigned scale, newScale;
         int code, result;
@@ -105,17 +105,17 @@ TEST(TimeConversion, IsNeverMoreThanHalfAUnitOff)
     Times times(1);
     int fitted = 0;
     for (int i = 0; i < 100000; ++i) {
-        const T_Time from = times.Time();
-        const unsigned scale = times.Scale();
+        T_Time const from = times.Time();
+        unsigned const scale = times.Scale();
         int value = 0;
-        const int code = T_ShortConvTime(from.value, from.scale, scale, &value);
-        const Wide exact = static_cast<Wide>(from.value) * scale;  // in units of 1 / from.scale
+        int const code = T_ShortConvTime(from.value, from.scale, scale, &value);
+        Wide const exact = static_cast<Wide>(from.value) * scale;  // in units of 1 / from.scale
         if (code == 0) {
             ++fitted;
-            const Wide twice = 2 * (static_cast<Wide>(value) * from.scale - exact);
+            Wide const twice = 2 * (static_cast<Wide>(value) * from.scale - exact);
             ASSERT_TRUE(twice >= -static_cast<Wide>(from.scale) && twice <= from.scale) << from << " to " << scale;
         } else {
-            const Wide beyond = exact > 0 ? 2 * exact - from.scale * (2 * static_cast<Wide>(INT_MAX) + 1) + 1
+            Wide const beyond = exact > 0 ? 2 * exact - from.scale * (2 * static_cast<Wide>(INT_MAX) + 1) + 1
                                           : from.scale * (2 * static_cast<Wide>(INT_MIN) - 1) - 2 * exact + 1;
             ASSERT_GE(static_cast<long double>(beyond), 1) << from << " to " << scale;
         }
@@ -137,7 +137,7 @@ int Try(Operation operation, T_Time* result)
     }
 }
 
-void ExpectExact(int code, T_Time const& result, Wide value, Wide scale, const char* what, T_Time a, T_Time b)
+void ExpectExact(int code, T_Time const& result, Wide value, Wide scale, char const* what, T_Time a, T_Time b)
 {
     ASSERT_EQ(Fits(value, scale) ? 0 : T_Err_Overflow, code) << what << " " << a << ", " << b;
     ASSERT_TRUE(code != 0 || IsSame(result, value, scale)) << what << " " << a << ", " << b << " gave " << result;
@@ -147,12 +147,12 @@ TEST(TimeArithmetic, IsExactOrSaysThatItDoesNotFit)
 {
     Times times(2);
     for (int i = 0; i < 100000 && !testing::Test::HasFatalFailure(); ++i) {
-        const T_Time a = times.Time();
+        T_Time const a = times.Time();
         T_Time b = times.Time();
         if (i % 3 == 0) b.scale = a.scale;
-        const Wide scale = static_cast<Wide>(a.scale) * b.scale;
-        const Wide left = static_cast<Wide>(a.value) * b.scale;
-        const Wide right = static_cast<Wide>(b.value) * a.scale;
+        Wide const scale = static_cast<Wide>(a.scale) * b.scale;
+        Wide const left = static_cast<Wide>(a.value) * b.scale;
+        Wide const right = static_cast<Wide>(b.value) * a.scale;
         T_Time result{};
 
         ExpectExact(T_AddTime(&a, &b, &result), result, left + right, scale, "add", a, b);
@@ -161,10 +161,10 @@ TEST(TimeArithmetic, IsExactOrSaysThatItDoesNotFit)
         T_Time sum = a;
         ExpectExact(Try([&] { return sum += b; }, &result), result, left + right, scale, "+=", a, b);
 
-        const M_Ratio ratio{b.value, b.scale};
+        M_Ratio const ratio{b.value, b.scale};
         ExpectExact(T_MulTime(&a, &ratio, &result), result, static_cast<Wide>(a.value) * b.value, scale, "mul", a, b);
         if (b.value != 0) {
-            const Wide sign = b.value < 0 ? -1 : 1;
+            Wide const sign = b.value < 0 ? -1 : 1;
             ExpectExact(Try([&] { return a / b.value; }, &result), result, a.value * sign,
                         static_cast<Wide>(a.scale) * (b.value * sign), "/", a, b);
         }
@@ -174,7 +174,7 @@ TEST(TimeArithmetic, IsExactOrSaysThatItDoesNotFit)
 TEST(TimeArithmetic, ChoosesTheScalesItPromises)
 {
     const struct {
-        const char* why;
+        char const* why;
         T_Time a, b;
         int code;
         T_Time sum;
@@ -194,16 +194,16 @@ TEST(TimeArithmetic, ChoosesTheScalesItPromises)
         EXPECT_EQ(row.code ? 77 : row.sum.value, sum.value);
         EXPECT_EQ(row.code ? 77u : row.sum.scale, sum.scale);
     }
-    const T_Time six{6, 600};
-    const T_Time third = six / -3;
+    T_Time const six{6, 600};
+    T_Time const third = six / -3;
     EXPECT_EQ(-2, third.value);
     EXPECT_EQ(600u, third.scale) << "an exact quotient keeps the scale";
-    const T_Time quarter = six / 4;
+    T_Time const quarter = six / 4;
     EXPECT_EQ(6, quarter.value);
     EXPECT_EQ(2400u, quarter.scale);
     T_Time none{};
     EXPECT_EQ(T_Err_Scale, Try([&] { return six / 0; }, &none));
-    const M_Ratio nonsense{1, 0};
+    M_Ratio const nonsense{1, 0};
     EXPECT_EQ(T_Err_Scale, T_MulTime(&six, &nonsense, &none));
 }
 
@@ -213,11 +213,11 @@ TEST(TimeOrder, IsThatOfTheInstants)
 {
     Times times(3);
     for (int i = 0; i < 100000; ++i) {
-        const T_Time a = times.Time();
+        T_Time const a = times.Time();
         T_Time b = times.Time();
         if (i % 4 == 0 && T_ConvTime(&a, times.Scale(), &b, 0) != 0) b = a;  // near or equal
-        const Wide left = static_cast<Wide>(a.value) * b.scale;
-        const Wide right = static_cast<Wide>(b.value) * a.scale;
+        Wide const left = static_cast<Wide>(a.value) * b.scale;
+        Wide const right = static_cast<Wide>(b.value) * a.scale;
         int result = 77;
         ASSERT_EQ(0, T_CompareTime(&a, &b, &result));
         ASSERT_EQ((left > right) - (left < right), result) << a << " and " << b;
@@ -232,15 +232,15 @@ TEST(TimeOrder, IsThatOfTheInstants)
 
 TEST(TimeOrder, IsTotalEvenWithTimesOfNoScale)
 {
-    const T_Time noTime{INT_MIN, 0};
-    const std::vector<T_Time> ascending = {noTime,    {-1, 0}, {0, 0},        {5, 0},      {INT_MIN, 1},
+    T_Time const noTime{INT_MIN, 0};
+    std::vector<T_Time> const ascending = {noTime,    {-1, 0}, {0, 0},        {5, 0},      {INT_MIN, 1},
                                            {-1, 600}, {0, 1},  {1, UINT_MAX}, {INT_MAX, 1}};
     for (std::size_t i = 0; i < ascending.size(); ++i)
         for (std::size_t k = 0; k < ascending.size(); ++k) {
             EXPECT_EQ(i < k, ascending[i] < ascending[k]) << ascending[i] << " and " << ascending[k];
             EXPECT_EQ(i == k, ascending[i] == ascending[k]) << ascending[i] << " and " << ascending[k];
         }
-    const T_Time zero{0, 600};
+    T_Time const zero{0, 600};
     int result = 77;
     EXPECT_EQ(T_Err_Scale, T_CompareTime(&noTime, &zero, &result));
     EXPECT_EQ(T_Err_Scale, T_CompareTime(&zero, &noTime, &result));
@@ -255,7 +255,7 @@ TEST(TimeReduce, EqualInstantsHaveEqualLowestTerms)
 {
     Times times(4);
     for (int i = 0; i < 20000; ++i) {
-        const T_Time time = times.Time();
+        T_Time const time = times.Time();
         T_Time reduced{};
         unsigned char changed = 77;
         ASSERT_EQ(0, T_ReduceTime(&time, &reduced, &changed));
@@ -271,13 +271,13 @@ TEST(TimeReduce, EqualInstantsHaveEqualLowestTerms)
 }
 
 struct Asked {
-    const char* why;
+    char const* why;
     T_TimeSpan span;
     T_Time time;
     bool inside;
 };
 
-const Asked Spans[] = {
+Asked const Spans[] = {
     {"the start belongs to it", {{10, 600}, {20, 600}}, {10, 600}, true},
     {"before the start", {{10, 600}, {20, 600}}, {9, 600}, false},
     {"the last unit", {{10, 600}, {20, 600}}, {29, 600}, true},
@@ -307,9 +307,9 @@ TEST(TimeSpan, NormalIsTheSameSpanInOneScale)
     Times times(5);
     int made = 0;
     for (int i = 0; i < 20000; ++i) {
-        const T_TimeSpan span{times.Time(), times.Time()};
+        T_TimeSpan const span{times.Time(), times.Time()};
         try {
-            const T_TimeSpan normal = T_NormalizeSpan(span);
+            T_TimeSpan const normal = T_NormalizeSpan(span);
             ++made;
             ASSERT_EQ(normal.start.scale, normal.duration.scale);
             ASSERT_EQ(span.start, normal.start);
@@ -320,10 +320,10 @@ TEST(TimeSpan, NormalIsTheSameSpanInOneScale)
     }
     EXPECT_GT(made, 2000);
 
-    const T_TimeSpan same = T_NormalizeSpan({{300, 600}, {0, 600}});
+    T_TimeSpan const same = T_NormalizeSpan({{300, 600}, {0, 600}});
     EXPECT_EQ(300, same.start.value);
     EXPECT_EQ(600u, same.start.scale) << "a common scale stays";
-    const T_TimeSpan reduced = T_NormalizeSpan({{0, UINT_MAX}, {5, UINT_MAX - 1}});
+    T_TimeSpan const reduced = T_NormalizeSpan({{0, UINT_MAX}, {5, UINT_MAX - 1}});
     EXPECT_EQ(UINT_MAX - 1, reduced.start.scale)
         << "where the multiple of the scales doesn't fit, that of the lowest does";
     EXPECT_THROW(T_NormalizeSpan({{0, 0}, {1, 1}}), int);
@@ -334,8 +334,8 @@ TEST(TimeSpan, NormalIsTheSameSpanInOneScale)
 
 TEST(TimeFromSeconds, RoundsAndSaturates)
 {
-    const double infinity = std::numeric_limits<double>::infinity();
-    const double nan = std::numeric_limits<double>::quiet_NaN();
+    double const infinity = std::numeric_limits<double>::infinity();
+    double const nan = std::numeric_limits<double>::quiet_NaN();
     EXPECT_EQ(300, T_FpLong2TimeValue(600, 0.5));
     EXPECT_EQ(1, T_FpLong2TimeValue(2, 0.25));
     EXPECT_EQ(-1, T_FpLong2TimeValue(2, -0.25));
@@ -350,7 +350,7 @@ TEST(TimeFromSeconds, RoundsAndSaturates)
 
 TEST(RoundDouble, IsTheNearestIntegerAtEverySize)
 {
-    const std::pair<double, long> table[] = {
+    std::pair<double, long> const table[] = {
         {0.5, 1},
         {-0.5, -1},
         {2.5, 3},
@@ -371,7 +371,7 @@ TEST(RoundDouble, IsTheNearestIntegerAtEverySize)
     for (auto const& [number, rounded] : table) EXPECT_EQ(rounded, M_RoundDouble(number)) << number;
     std::mt19937_64 random(6);
     for (int i = 0; i < 100000; ++i) {
-        const double number =
+        double const number =
             std::ldexp(static_cast<double>(static_cast<long>(random())), -static_cast<int>(random() % 70));
         ASSERT_EQ(std::lround(number), M_RoundDouble(number)) << number;
     }

@@ -35,7 +35,7 @@ private:
 TEST(ImmutableString, IsTheSameObjectForTheSameText)
 {
     char text[] = "RenderState";
-    const ImmutableString a = ImmutableString::Create(text);
+    ImmutableString const a = ImmutableString::Create(text);
     text[0] = 'X';
     const ImmutableString b = ImmutableString::Create("RenderState");
     EXPECT_EQ(a, b);
@@ -56,16 +56,16 @@ TEST(ImmutableString, IsTheSameObjectForTheSameText)
 
 TEST(Context, ScopesNestAndRestoreAlsoByException)
 {
-    const auto outer = boost::make_shared<Q_Context>();
-    const auto inner = boost::make_shared<Q_Context>();
+    auto const outer = boost::make_shared<Q_Context>();
+    auto const inner = boost::make_shared<Q_Context>();
     EXPECT_FALSE(Q_Context::HasCurrent());
     {
-        const Q_ScSetCurrentContext scope(outer);
+        Q_ScSetCurrentContext const scope(outer);
         try {
-            const Q_ScSetCurrentContext innerScope(inner);
+            Q_ScSetCurrentContext const innerScope(inner);
             EXPECT_EQ(inner, Q_Context::GetCurrent(false));
             EXPECT_EQ(inner.get(), Q_Context::PeekCurrent());
-            const Q_ScSetCurrentContext noneScope(nullptr);
+            Q_ScSetCurrentContext const noneScope(nullptr);
             EXPECT_FALSE(Q_Context::HasCurrent());
             throw std::runtime_error("on the way out");
         } catch (std::runtime_error const&) {}
@@ -80,7 +80,7 @@ TEST(Context, ScopesNestAndRestoreAlsoByException)
 TEST(Context, AskingForNoneIsToleratedOrReported)
 {
     std::vector<std::string> reports;
-    const Q_ReportSink previous = Q_SetReportSink([&](Q_Report const& report) {
+    Q_ReportSink const previous = Q_SetReportSink([&](Q_Report const& report) {
         EXPECT_EQ(Q_ReportKind::Verification, report.kind);
         reports.push_back(report.text);
     });
@@ -98,14 +98,14 @@ TEST(Context, AskingForNoneIsToleratedOrReported)
 
 TEST(RenderContext, IsCurrentPerThread)
 {
-    const auto mine = Q_RenderContext::MakeNewContext(false);
-    const auto theirs = Q_RenderContext::MakeNewContext(true);
+    auto const mine = Q_RenderContext::MakeNewContext(false);
+    auto const theirs = Q_RenderContext::MakeNewContext(true);
     EXPECT_FALSE(mine->GetIsTempCloneContext());
     EXPECT_TRUE(theirs->GetIsTempCloneContext());
-    const Q_ScSetCurrentRenderContext scope(mine);
+    Q_ScSetCurrentRenderContext const scope(mine);
     std::thread([&] {
         EXPECT_EQ(nullptr, Q_RenderContext::PeekCurrent());
-        const Q_ScSetCurrentRenderContext other(theirs);
+        Q_ScSetCurrentRenderContext const other(theirs);
         EXPECT_EQ(theirs.get(), Q_RenderContext::PeekCurrent());
     }).join();
     EXPECT_EQ(mine.get(), Q_RenderContext::PeekCurrent());
@@ -116,16 +116,16 @@ TEST(RenderContext, IsCurrentPerThread)
 TEST(RenderContext, KeepsOneStateOfAName)
 {
     int destroyed = 0;
-    const auto context = Q_RenderContext::MakeNewContext(true);
+    auto const context = Q_RenderContext::MakeNewContext(true);
     const ImmutableString name = ImmutableString::Create("ExpState");
-    const auto first = boost::make_shared<State>("ExpState", &destroyed);
+    auto const first = boost::make_shared<State>("ExpState", &destroyed);
     EXPECT_EQ(nullptr, context->GetState(name));
     context->SetState(first);
     context->SetState(boost::make_shared<State>("Other", &destroyed));
     EXPECT_EQ(first, context->GetState(name));
     EXPECT_EQ(first.get(), context->PeekState(name));
 
-    const auto second = boost::make_shared<State>("ExpState", &destroyed);
+    auto const second = boost::make_shared<State>("ExpState", &destroyed);
     context->SetState(second);
     EXPECT_EQ(second, context->GetState(name));
     EXPECT_EQ(1, first.use_count());
@@ -138,9 +138,9 @@ TEST(RenderContext, KeepsOneStateOfAName)
 TEST(RenderContext, EveryChangeOfStatesHasAStampThatNoOtherHad)
 {
     std::set<std::uint64_t> stamps;
-    const auto isNew = [&](std::uint64_t stamp) { return stamp != 0 && stamps.insert(stamp).second; };
+    auto const isNew = [&](std::uint64_t stamp) { return stamp != 0 && stamps.insert(stamp).second; };
     for (int i = 0; i < 50; ++i) {
-        const auto context = Q_RenderContext::MakeNewContext(i % 2 == 0);  // the next one may lie at the same address
+        auto const context = Q_RenderContext::MakeNewContext(i % 2 == 0);  // the next one may lie at the same address
         EXPECT_TRUE(isNew(context->GetStatesStamp()));
         context->SetState(boost::make_shared<State>("A"));
         EXPECT_TRUE(isNew(context->GetStatesStamp()));
@@ -148,7 +148,7 @@ TEST(RenderContext, EveryChangeOfStatesHasAStampThatNoOtherHad)
         EXPECT_TRUE(isNew(context->GetStatesStamp())) << "a replacement is a change";
         context->RemoveState(ImmutableString::Create("A"));
         EXPECT_TRUE(isNew(context->GetStatesStamp()));
-        const std::uint64_t last = context->GetStatesStamp();
+        std::uint64_t const last = context->GetStatesStamp();
         context->RemoveState(ImmutableString::Create("A"));
         context->SetState(nullptr);
         EXPECT_EQ(nullptr, context->PeekState(ImmutableString::Create("A")));

@@ -18,7 +18,7 @@ namespace {
 std::string Hex(Guid const& guid)
 {
     std::string text;
-    for (const unsigned char byte : guid.GuidToBytes()) {
+    for (unsigned char const byte : guid.GuidToBytes()) {
         char digits[3];
         std::snprintf(digits, sizeof digits, "%02x", byte);
         text += digits;
@@ -96,13 +96,13 @@ TYPED_TEST(HashStates, DoNotDependOnHowTheBytesCome)
 {
     std::mt19937 random(2);
     for (int i = 0; i < 400; ++i) {
-        const std::string bytes = RandomBytes(random, random() % 700);
-        const Guid whole = HashOf<TypeParam>(bytes);
+        std::string const bytes = RandomBytes(random, random() % 700);
+        Guid const whole = HashOf<TypeParam>(bytes);
         MixHashGuidT<TypeParam> mix;
         for (std::size_t at = 0; at < bytes.size();) {
-            const std::size_t piece = std::min<std::size_t>(random() % 40, bytes.size() - at);
+            std::size_t const piece = std::min<std::size_t>(random() % 40, bytes.size() - at);
             ASSERT_EQ(HashOf<TypeParam>(bytes.substr(0, at)), mix.GetGuid());
-            const MixHashGuidT<TypeParam> copy = mix;
+            MixHashGuidT<TypeParam> const copy = mix;
             UpdateHashState(mix, bytes.data() + at, piece);
             mix = piece % 2 ? MixHashGuidT<TypeParam>(mix) : copy;
             if (piece % 2 == 0) mix.Mix(bytes.data() + at, piece);
@@ -120,8 +120,8 @@ TYPED_TEST(HashStates, NumbersAreTheirBytes)
     MixHashGuidT<TypeParam> numbers;
     numbers.MixNumber(0x01020304);
     numbers.MixNumber(1.5);
-    const int integer = 0x01020304;
-    const double real = 1.5;
+    int const integer = 0x01020304;
+    double const real = 1.5;
     std::string bytes(reinterpret_cast<char const*>(&integer), 4);
     bytes.append(reinterpret_cast<char const*>(&real), 8);
     EXPECT_EQ(HashOf<TypeParam>(bytes), numbers.GetGuid());
@@ -131,7 +131,7 @@ TEST(Guid, OrdersByUnsignedBytesFromTheFirst)
 {
     std::vector<Guid> ascending(1);  // not set: all zero
     EXPECT_EQ("00000000000000000000000000000000", Hex(ascending[0]));
-    for (const auto& [at, value] :
+    for (auto const& [at, value] :
          std::vector<std::pair<std::size_t, int>>{{15, 0x01}, {15, 0xFF}, {8, 0x01}, {7, 0x80}, {0, 0x7F}, {0, 0x80}}) {
         std::array<unsigned char, 16> bytes{};
         bytes[at] = static_cast<unsigned char>(value);

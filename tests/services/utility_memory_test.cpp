@@ -28,7 +28,7 @@ struct Derived : Tracked {
 TEST(Memory, IsCountedByTheTextOfItsLabel)
 {
     char label[] = "tests: a label";  // the same text at another address than the literal below
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
     void* const a = Q_AllocatePtr(1, label, 100);
     void* const b = Q_AllocatePtrClear(2, "tests: a label", 11);
     void* const c = Q_AllocatePtr(3, nullptr, 0);
@@ -41,7 +41,7 @@ TEST(Memory, IsCountedByTheTextOfItsLabel)
         Q_MemoryCount count;
         int times = 0;
     } seen;
-    const auto visit = [](void* context, char const* text, Q_MemoryCount const& count) {
+    auto const visit = [](void* context, char const* text, Q_MemoryCount const& count) {
         if (std::strcmp(text, "tests: a label") != 0) return;
         static_cast<Seen*>(context)->count = count;
         ++static_cast<Seen*>(context)->times;
@@ -60,8 +60,8 @@ TEST(Memory, IsCountedByTheTextOfItsLabel)
 
 TEST(Memory, HandlesAreZeroedAndKnowTheirSize)
 {
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
-    for (const std::size_t size : {0u, 1u, 16u, 1000u}) {
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
+    for (std::size_t const size : {0u, 1u, 16u, 1000u}) {
         char** const handle = Q_AllocateHandleClear(1, "tests: handle", size);
         ASSERT_NE(nullptr, handle);
         EXPECT_EQ(size, Q_GetHandleSize(handle));
@@ -76,7 +76,7 @@ TEST(Memory, HandlesAreZeroedAndKnowTheirSize)
 
 TEST(Memory, ImpossibleSizesAreRefused)
 {
-    const std::size_t greatest = std::numeric_limits<std::size_t>::max();
+    std::size_t const greatest = std::numeric_limits<std::size_t>::max();
     EXPECT_EQ(nullptr, Q_AllocatePtr(1, "tests: huge", greatest));
     EXPECT_EQ(nullptr, Q_AllocateHandleClear(1, "tests: huge", greatest - 8));
     EXPECT_EQ(nullptr, hearth::allocator::MemoryRecycler::Allocate(greatest, nullptr));
@@ -87,7 +87,7 @@ TEST(Memory, ImpossibleSizesAreRefused)
 
 TEST(Memory, AccountingBooksWithoutAllocating)
 {
-    const Q_MemoryCount before = Q_MemoryLive(Q_AccountedElsewhere);
+    Q_MemoryCount const before = Q_MemoryLive(Q_AccountedElsewhere);
     Q_AccountAllocationEx(4096, 1);
     EXPECT_EQ((Q_MemoryCount{before.bytes + 4096, before.blocks + 1}), Q_MemoryLive(Q_AccountedElsewhere));
     Q_AccountAllocationEx(4096, 0);
@@ -96,10 +96,10 @@ TEST(Memory, AccountingBooksWithoutAllocating)
 
 TEST(Memory, TrackedObjectsShowAndGoAlsoWhenTheirConstructorFails)
 {
-    const Q_MemoryCount before = Q_MemoryLive(Q_MemTrackedObject::Label);
+    Q_MemoryCount const before = Q_MemoryLive(Q_MemTrackedObject::Label);
     {
-        const auto object = std::make_unique<Derived>();
-        const Q_MemoryCount now = Q_MemoryLive(Q_MemTrackedObject::Label);
+        auto const object = std::make_unique<Derived>();
+        Q_MemoryCount const now = Q_MemoryLive(Q_MemTrackedObject::Label);
         EXPECT_EQ(before.blocks + 1, now.blocks);
         EXPECT_EQ(before.bytes + static_cast<long long>(sizeof(Derived)), now.bytes);
     }
@@ -109,7 +109,7 @@ TEST(Memory, TrackedObjectsShowAndGoAlsoWhenTheirConstructorFails)
 
 // Every way to get memory, each of which must notice the failure that is injected, and leave nothing behind.
 struct Way {
-    const char* why;
+    char const* why;
     bool (*succeeds)();  // tries once and cleans up
 };
 
@@ -137,7 +137,7 @@ bool GetsObject()
     return true;
 }
 
-const Way Ways[] = {
+Way const Ways[] = {
     {"block", GetsBlock<Q_AllocatePtr, Q_FreePtr>},
     {"zeroed block", GetsBlock<Q_AllocatePtrClear, Q_FreePtr>},
     {"handle", GetsBlock<Q_AllocateHandleClear, Q_FreeHandle>},
@@ -151,7 +151,7 @@ TEST(Memory, TheNthAllocationFailsAndOnlyThatOne)
     for (Way const& way : Ways)
         for (int n = 1; n <= 3; ++n) {
             SCOPED_TRACE(testing::Message() << way.why << " " << n);
-            const Q_MemoryCount before = Q_MemoryLive(nullptr);
+            Q_MemoryCount const before = Q_MemoryLive(nullptr);
             Q_FailAllocation(n);
             for (int i = 1; i <= 5; ++i) {
                 EXPECT_EQ(i >= n + 1, Q_FailAllocationFired()) << "before allocation " << i;
@@ -175,9 +175,9 @@ TEST(Memory, AFailureIsTheBusinessOfOneThread)
 
 TEST(Memory, ThreadsThatMeetNewLabelsAgreeOnThem)
 {
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
     constexpr int Labels = 60;
-    const auto name = [](int i) { return "tests: contended " + std::to_string(i); };
+    auto const name = [](int i) { return "tests: contended " + std::to_string(i); };
     std::vector<std::vector<void*>> blocks(4);
     std::vector<std::thread> threads;
     for (std::vector<void*>& mine : blocks)
@@ -193,9 +193,9 @@ TEST(Memory, ThreadsThatMeetNewLabelsAgreeOnThem)
 
 TEST(Memory, RecycledBlocksMayBeReturnedByEitherSize)
 {
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
     for (std::size_t size = 0; size < 70; ++size)
-        for (const bool byGranted : {false, true}) {
+        for (bool const byGranted : {false, true}) {
             std::size_t granted = 0;
             void* const block = hearth::allocator::MemoryRecycler::Allocate(size, &granted);
             ASSERT_NE(nullptr, block);

@@ -27,7 +27,7 @@ TEST(ByteOrder, PutsTheMostSignificantByteFirstOfEveryBitPatternAtAnyAlignment)
     std::mt19937_64 random(1);
     alignas(8) unsigned char bytes[24];
     for (int i = 0; i < 2000; ++i) {
-        const std::uint64_t bits = i % 2 ? random() : 0x7FF0000000000001u + random() % 100;  // signalling NaNs too
+        std::uint64_t const bits = i % 2 ? random() : 0x7FF0000000000001u + random() % 100;  // signalling NaNs too
         unsigned char* const place = bytes + i % 8;
         std::memcpy(place, &bits, 8);
         unsigned char wanted[8];
@@ -38,8 +38,8 @@ TEST(ByteOrder, PutsTheMostSignificantByteFirstOfEveryBitPatternAtAnyAlignment)
         ASSERT_EQ(0, std::memcmp(wanted, &number, 8)) << std::hex << bits;
         Q_FpLongSwap(&number);
         ASSERT_EQ(0, std::memcmp(&bits, &number, 8)) << std::hex << bits;
-        const unsigned short word = Q_ShortSwap(static_cast<unsigned short>(bits));
-        const unsigned int longWord = Q_LongSwap(static_cast<unsigned int>(bits));
+        unsigned short const word = Q_ShortSwap(static_cast<unsigned short>(bits));
+        unsigned int const longWord = Q_LongSwap(static_cast<unsigned int>(bits));
         ASSERT_EQ(0, std::memcmp(wanted + 6, &word, 2)) << std::hex << bits;
         ASSERT_EQ(0, std::memcmp(wanted + 4, &longWord, 4)) << std::hex << bits;
     }
@@ -51,8 +51,8 @@ TEST(PointerValues, AddressesComeBackAndAreTakenForNoNumber)
 {
     static std::list<std::array<double, 300>> kept;  // their addresses are new also when the test is repeated
     std::array<double, 300>& objects = kept.emplace_back();
-    const double& probe = kept.emplace_back()[0];
-    const int next = Q_PointerToInt32(&probe) + 1;  // where the values for addresses are taken from
+    double const& probe = kept.emplace_back()[0];
+    int const next = Q_PointerToInt32(&probe) + 1;  // where the values for addresses are taken from
     Q_PointerToInt32(Q_IntPtrToPointer(next + 2));
     Q_Int32ToPointer(next + 4);
     std::vector<int> values(objects.size());
@@ -68,11 +68,11 @@ TEST(PointerValues, AddressesComeBackAndAreTakenForNoNumber)
         EXPECT_EQ(values[i], Q_PointerToInt32(&objects[i])) << "the same again";
         EXPECT_TRUE(different.insert(values[i]).second);
     }
-    for (const int flat : {next + 2, next + 4}) {
+    for (int const flat : {next + 2, next + 4}) {
         EXPECT_FALSE(different.contains(flat));
         EXPECT_EQ(Q_IntPtrToPointer(flat), Q_Int32ToPointer(flat));
     }
-    for (const int number : {0, 1, -1, 7, INT_MAX, INT_MIN, 123456}) {
+    for (int const number : {0, 1, -1, 7, INT_MAX, INT_MIN, 123456}) {
         EXPECT_EQ(number, Q_PointerToInt32(Q_IntPtrToPointer(number)));
         EXPECT_EQ(Q_IntPtrToPointer(number), Q_Int32ToPointer(number));
     }
@@ -122,7 +122,7 @@ TEST(ScSetReset, WritesBackHoweverTheScopeEnds)
         Q_ScSetReset<std::string> scope;
         scope.Arm(&text);
         text = "changed";
-        const Q_ScSetReset<std::string> inner(&text, "inner");
+        Q_ScSetReset<std::string> const inner(&text, "inner");
         EXPECT_EQ("inner", text);
         throw std::runtime_error("on the way out");
     } catch (std::runtime_error const&) {}
@@ -152,7 +152,7 @@ TEST(Threads, HaveNumbersOfTheirOwn)
     std::set<std::uint64_t> ids{hearth::threads::GetCurrentThreadID()};
     for (int i = 0; i < 20; ++i)
         std::thread([&] {
-            const std::uint64_t id = hearth::threads::GetCurrentThreadID();
+            std::uint64_t const id = hearth::threads::GetCurrentThreadID();
             EXPECT_EQ(id, hearth::threads::GetCurrentThreadID());
             EXPECT_TRUE(id != 0 && ids.insert(id).second) << "never used again, though threads come and go";
         }).join();
@@ -198,7 +198,7 @@ TEST(DebugDatabase, ReadsSwitchesOrTheirDefaults)
                                                  {"0", 0}, {"false", 0}, {"no", 0},    {"off", 0},
                                                  {"", -1}, {"TRUE", -1}, {"maybe", -1}};
     for (auto const& [text, meaning] : table)
-        for (const bool fallback : {false, true}) {
+        for (bool const fallback : {false, true}) {
             database.SetEntry("Tests.Switch", text);
             EXPECT_EQ(meaning < 0 ? fallback : meaning == 1, database.GetEntryAs<bool>("Tests.Switch", fallback))
                 << text;

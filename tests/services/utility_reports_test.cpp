@@ -47,7 +47,7 @@ TEST(Reports, CarryWhatTheCallerSaid)
     Q_ReportFailedVerification(0x1D000A, 997, 0, "broken");
     EXPECT_EQ(4, Q_TranslateAndReportException(std::bad_array_new_length()));
     EXPECT_EQ(Q_Err_Exception, Q_TranslateAndReportException(std::runtime_error("what it was")));
-    const std::vector<Row> wanted = {
+    std::vector<Row> const wanted = {
         {Q_ReportKind::Message, 0x1D0017, 8, 0, 0, "formatted"},
         {Q_ReportKind::Message, 0x1D0001, 4, 0, 0, "text"},
         {Q_ReportKind::Message, 0x1D0000, 8, 7446, 0, "unknown"},
@@ -79,7 +79,7 @@ TEST(Reports, LastErrorAndBufferAreTheThreadsOwn)
 TEST(Reports, ASinkMayThrowReportAndReplaceItself)
 {
     int calls = 0;
-    const Q_ReportSink previous = Q_SetReportSink([&calls, proof = std::string(100, 'x')](Q_Report const&) {
+    Q_ReportSink const previous = Q_SetReportSink([&calls, proof = std::string(100, 'x')](Q_Report const&) {
         ++calls;
         Q_SetReportSink({});
         Q_ReportFailedVerification(0, 1, 0, "from within");
@@ -89,7 +89,7 @@ TEST(Reports, ASinkMayThrowReportAndReplaceItself)
     testing::internal::CaptureStderr();
     Qp_ReportErrString(1, 8, "first");
     Qp_ReportErrString(0x1D0002, 8, "second");
-    const std::string printed = testing::internal::GetCapturedStderr();
+    std::string const printed = testing::internal::GetCapturedStderr();
     Q_SetReportSink(previous);
     EXPECT_EQ(1, calls);
     EXPECT_EQ("failed verification 0x0 severity 8 code 0: from within\nreport 0x1D0002 severity 8 code 0: second\n",
@@ -99,7 +99,7 @@ TEST(Reports, ASinkMayThrowReportAndReplaceItself)
 TEST(Reports, OneAtATimeReachesTheSink)
 {
     int inside = 0, most = 0, calls = 0;  // unguarded on purpose: the thread sanitizer looks on
-    const Q_ReportSink previous = Q_SetReportSink([&](Q_Report const&) {
+    Q_ReportSink const previous = Q_SetReportSink([&](Q_Report const&) {
         most = std::max(most, ++inside);
         ++calls;
         --inside;
@@ -119,7 +119,7 @@ TEST(Log, GoesToItsSinkOrNowhere)
 {
     std::vector<std::string> lines;
     XLOG_Log(10, "KFS", "Birth", "before");
-    const Q_LogSink previous = Q_SetLogSink([&](int level, char const* tag, char const* topic, char const* text) {
+    Q_LogSink const previous = Q_SetLogSink([&](int level, char const* tag, char const* topic, char const* text) {
         lines.push_back(std::to_string(level) + "|" + tag + "|" + topic + "|" + text);
         XLOG_Log(0, "KFS", "again", "and again");
         if (lines.size() == 2) throw 5;

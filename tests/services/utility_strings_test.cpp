@@ -14,7 +14,7 @@ namespace {
 u16str U(std::initializer_list<int> units)
 {
     u16str text;
-    for (const int unit : units) text.push_back(static_cast<unsigned short>(unit));
+    for (int const unit : units) text.push_back(static_cast<unsigned short>(unit));
     return text;
 }
 
@@ -31,12 +31,12 @@ std::string Narrow(u16str const& text)
 // ---- conversions
 
 struct Utf8 {
-    const char* why;
+    char const* why;
     std::string bytes;
     u16str units;
 };
 
-const std::vector<Utf8> WellFormed = {
+std::vector<Utf8> const WellFormed = {
     {"ascii", "a~\x7F", U({'a', '~', 0x7F})},
     {"the first and last of two bytes", "\xC2\x80\xDF\xBF", U({0x80, 0x7FF})},
     {"the first and last of three bytes", "\xE0\xA0\x80\xEF\xBF\xBF", U({0x800, 0xFFFF})},
@@ -47,7 +47,7 @@ const std::vector<Utf8> WellFormed = {
     {"nothing", "", {}},
 };
 
-const std::vector<Utf8> IllFormed = {
+std::vector<Utf8> const IllFormed = {
     {"a continuation alone", "\x80", U({0xFFFD})},
     {"each continuation counts", "\xBF\xBF", U({0xFFFD, 0xFFFD})},
     {"bytes that UTF-8 hasn't", "\xC0\xC1\xF5\xFF", U({0xFFFD, 0xFFFD, 0xFFFD, 0xFFFD})},
@@ -66,7 +66,7 @@ TEST(Strings, Utf8AndUtf16AreTheSameText)
     for (Utf8 const& row : WellFormed) {
         EXPECT_EQ(row.units, Q_MBToUTF16String(row.bytes)) << row.why;
         EXPECT_EQ(row.bytes, Narrow(row.units)) << row.why;
-        const Q_ByteString bytes = Q_UTF16To8String(row.units);
+        Q_ByteString const bytes = Q_UTF16To8String(row.units);
         EXPECT_EQ(row.bytes, std::string(bytes.begin(), bytes.end())) << row.why;
         if (row.bytes.find('\0') == std::string::npos) {
             EXPECT_EQ(row.units, Q_MBToUTF16String(row.bytes.c_str())) << row.why;
@@ -105,7 +105,7 @@ TEST(Strings, EveryCodePointSurvivesAndAnyBytesConverge)
     for (int i = 0; i < 20000; ++i) {
         std::string bytes(random() % 12, 0);
         for (char& byte : bytes) byte = static_cast<char>(random() % 3 ? 0x80 + random() % 0x80 : random());
-        const u16str once = Q_MBToUTF16String(bytes);
+        u16str const once = Q_MBToUTF16String(bytes);
         ASSERT_EQ(once, Q_MBToUTF16String(Narrow(once))) << "what a conversion made is well-formed";
     }
 }
@@ -127,14 +127,14 @@ TEST(Strings, CopyCutsAndTerminates)
     EXPECT_EQ(Q_Err_BadDestination, Q_CopyString("abc", 4, nullptr));
     EXPECT_EQ(0, Q_CopyString(static_cast<char const*>(nullptr), 4, buffer));
     EXPECT_STREQ("", buffer);
-    const char unterminated[3] = {'a', 'b', 'c'};  // the sanitizer sees a read too far
+    char const unterminated[3] = {'a', 'b', 'c'};  // the sanitizer sees a read too far
     EXPECT_EQ(0, Q_CopyString(unterminated, 4, buffer));
     EXPECT_STREQ("abc", buffer);
 }
 
 // ---- messages
 
-const Q_ZRow Rows[] = {
+Q_ZRow const Rows[] = {
     {"$$$/Tests/0000=attempt to %s a #{ldquo}^^1#{rdquo}."},
     {"$$$/Tests/0001=a=b"},
     {"no key at all"},
@@ -160,7 +160,7 @@ TEST(Messages, TheTextFollowsTheFirstEqualsSign)
     EXPECT_STREQ("a=b", Q_ZLookupLStrCache(&tableHandle, 1, 0, 0));
     EXPECT_STREQ("no key at all", Q_ZLookupLStrCache(&tableHandle, 2, 0, 0));
     EXPECT_STREQ("", Q_ZLookupLStrCache(&tableHandle, 3, 0, 0));
-    for (const int row : {5, 6, -1, INT_MIN, INT_MAX}) EXPECT_STREQ("", Q_ZLookupLStrCache(&tableHandle, row, 0, 0));
+    for (int const row : {5, 6, -1, INT_MIN, INT_MAX}) EXPECT_STREQ("", Q_ZLookupLStrCache(&tableHandle, row, 0, 0));
     EXPECT_EQ(Q_ZLookupLStrCache(&tableHandle, 0, 0, 0), Q_ZLookupLStrCache(&tableHandle, 0, 0, 0));
 
     EXPECT_EQ(A("Some, text = more"), Q_ZStringToUTF16String("$$$/Tests/Key=Some, text = more"));
@@ -207,7 +207,7 @@ TEST(SubString, FillsPlaceholdersOnce)
 TEST(SubString, Utf16TakesTheShortFormToo)
 {
     u16str text = A("reading the ^1 parameter ^^1, ^^L2, ^3 and ^0");
-    const u16str name = U({0xD83D, 0xDE00, 0xE4});
+    u16str const name = U({0xD83D, 0xDE00, 0xE4});
     Q_SubString(&text, text, name, -7L);
     u16str wanted = A("reading the ") + name + A(" parameter ") + name + A(", -7, ^3 and ^0");
     EXPECT_EQ(wanted, text);
@@ -221,7 +221,7 @@ TEST(Numbers, AreWrittenAlikeEverywhere)
     const struct {
         double number;
         int width, precision, flags, limit;
-        const char* text;
+        char const* text;
     } table16[] = {
         {7, 3, 0, 4, 31, "007"},
         {-7, 4, 0, 4, 31, "-007"},
@@ -243,7 +243,7 @@ TEST(Numbers, AreReadUpToWhatIsNone)
 {
     constexpr int None = 77777;
     const struct {
-        const char* text;
+        char const* text;
         int plain, assigned;  // None: no number
     } table16[] = {
         {"24", 24, 24},
@@ -265,9 +265,9 @@ TEST(Numbers, AreReadUpToWhatIsNone)
         {"= x5", None, None},
     };
     for (auto const& row : table16)
-        for (const int flags : {0, hearth::string::NumberFlag_SkipAssignment}) {
+        for (int const flags : {0, hearth::string::NumberFlag_SkipAssignment}) {
             SCOPED_TRACE(testing::Message() << "\"" << row.text << "\", flags " << flags);
-            const int wanted = flags ? row.assigned : row.plain;
+            int const wanted = flags ? row.assigned : row.plain;
             int number = None;
             EXPECT_EQ(wanted != None, hearth::string::StringToNumber(A(row.text), &number, flags));
             EXPECT_EQ(wanted, number);
@@ -279,7 +279,7 @@ TEST(Numbers, AreReadUpToWhatIsNone)
 TEST(ReplaceInString, ReplacesEachOccurrenceOfTheSource)
 {
     const struct {
-        const char *text, *what, *with, *result;
+        char const *text, *what, *with, *result;
         int count;
     } table16[] = {
         {"@0_@1", "@0", "Position", "Position_@1", 1},

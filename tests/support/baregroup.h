@@ -33,9 +33,7 @@ public:
     KFS_StreamID SlowGetIDOfChild(KFS_StreamBase const* child) const override
     {
         unsigned int index = 0;
-        while (index < GetNumStreams() && GetStream(index) != child) {
-            ++index;
-        }
+        while (index < GetNumStreams() && GetStream(index) != child) ++index;
         return KFS_StreamID(index, child->GetMatchName());
     }
     bool RemoveChild(KFS_StreamBase*) override { return false; }

@@ -32,9 +32,7 @@ public:
         CKF_RawChunk chunk;
         for (int i = 0; walk.Next(&chunk); ++i) {
             EXPECT_EQ(nullptr, chunk.problem);
-            if (i < 2) {
-                continue;
-            }
+            if (i < 2) continue;
             std::string line(static_cast<std::size_t>(2 * (chunk.depth - 1)), ' ');
             line += Letters(chunk.id) + ' ' + (chunk.id == CKF_ListId ? Letters(chunk.listType) : Hex(chunk.data));
             lines.push_back(line);
@@ -64,9 +62,7 @@ private:
     static std::string Letters(int id)
     {
         std::string text;
-        for (int shift = 24; shift >= 0; shift -= 8) {
-            text += static_cast<char>(id >> shift);
-        }
+        for (int shift = 24; shift >= 0; shift -= 8) text += static_cast<char>(id >> shift);
         return text;
     }
 
@@ -80,9 +76,7 @@ public:
     explicit FailNthAppend(int n) : left_(n) {}
     int Before(CKF_IoCall call, std::size_t) noexcept override
     {
-        if (call != CKF_IoCall::Append || --left_ != 0) {
-            return 0;
-        }
+        if (call != CKF_IoCall::Append || --left_ != 0) return 0;
         fired_ = true;
         return 28;  // no space left on device
     }

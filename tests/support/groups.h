@@ -92,9 +92,7 @@ public:
     }
     void FillCanonicalLayout(KFS_CanonicalLayout* layout) override
     {
-        for (KFS_MatchName const& kind : kinds_) {
-            layout->push_back(this->GetFactory()->GetCanonicalStream(kind));
-        }
+        for (KFS_MatchName const& kind : kinds_) layout->push_back(this->GetFactory()->GetCanonicalStream(kind));
     }
 
 private:

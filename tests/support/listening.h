@@ -45,9 +45,7 @@ public:
     void StreamValueChanged(KFS_Stream*) override
     {
         ++count_;
-        if (reaction_) {
-            reaction_();
-        }
+        if (reaction_) reaction_();
     }
     void StreamFlagsChanged(KFS_StreamBase*, unsigned int, unsigned int) override {}
     void StreamDisplayNameChanged(KFS_StreamBase*) override {}

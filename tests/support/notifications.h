@@ -89,9 +89,7 @@ private:
     void Hear(std::string text, KFS_StreamGroup* group, KFS_StreamBase const* stream)
     {
         heard_.push_back(std::move(text));
-        if (look) {
-            heard_.back() += look(group, stream);
-        }
+        if (look) heard_.back() += look(group, stream);
     }
 
     std::map<KFS_StreamBase const*, std::string> labels_;

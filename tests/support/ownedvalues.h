@@ -56,9 +56,7 @@ public:
 
     static int Copy(KFS_Stream const*, long, short, void const* source, void* destination)
     {
-        if (copyCode != 0) {
-            return copyCode;
-        }
+        if (copyCode != 0) return copyCode;
         Ticket ticket{};
         std::memcpy(&ticket, source, sizeof ticket);
         Ticket const made = Make(Value(ticket));
@@ -69,9 +67,7 @@ public:
     {
         EXPECT_EQ(KFS_StreamValidStamp, stream->GetStamp())
             << "a dying stream is whole until its values are given back";
-        if (disposeCode != 0) {
-            return disposeCode;
-        }
+        if (disposeCode != 0) return disposeCode;
         Ticket ticket{};
         std::memcpy(&ticket, block, sizeof ticket);
         Free(ticket);
@@ -81,9 +77,7 @@ public:
     static int Interpolate(KFS_Stream const* stream, long refcon, int, int keyIndex)
     {
         void const* item = nullptr;
-        if (int const code = SEQ_GetConstAddress(stream->GetKeys(), keyIndex, &item)) {
-            return code;
-        }
+        if (int const code = SEQ_GetConstAddress(stream->GetKeys(), keyIndex, &item)) return code;
         return Copy(stream, refcon, KFS_Item_CacheWhole, KFSp_ValueData(static_cast<KFS_KeyScalar const*>(item)),
                     KFSp_ValueData(stream->GetCache()));
     }

@@ -43,9 +43,7 @@ public:
     ~ReportRecorder()
     {
         Q_SetReportSink(previous_);
-        for (Reported const& report : seen_) {
-            ADD_FAILURE() << "unexpected report: " << report;
-        }
+        for (Reported const& report : seen_) ADD_FAILURE() << "unexpected report: " << report;
     }
     ReportRecorder(ReportRecorder const&) = delete;
     ReportRecorder& operator=(ReportRecorder const&) = delete;

@@ -23,9 +23,7 @@ public:
     ScratchFolder()
     {
         std::string pattern = (std::filesystem::temp_directory_path() / "kfs_test_XXXXXX").string();
-        if (!mkdtemp(pattern.data())) {
-            throw std::runtime_error("no folder for the test");
-        }
+        if (!mkdtemp(pattern.data())) throw std::runtime_error("no folder for the test");
         path_ = pattern;
     }
     ~ScratchFolder()
@@ -49,9 +47,8 @@ public:
     std::set<std::string> Names() const
     {
         std::set<std::string> names;
-        for (std::filesystem::directory_entry const& entry : std::filesystem::directory_iterator(path_)) {
+        for (std::filesystem::directory_entry const& entry : std::filesystem::directory_iterator(path_))
             names.insert(entry.path().filename().string());
-        }
         return names;
     }
 

@@ -79,9 +79,7 @@ public:
     std::vector<int> Times() const
     {
         std::vector<int> times;
-        for (int i = 0; i < Count(); ++i) {
-            times.push_back(Record(i)->time);
-        }
+        for (int i = 0; i < Count(); ++i) times.push_back(Record(i)->time);
         return times;
     }
     // The numbers of a key's value data: five runs, or three on a spatial stream.

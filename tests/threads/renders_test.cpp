@@ -21,9 +21,7 @@ protected:
         for (int i = 0; i < Keys; ++i) {
             plain.Key(i * 60, {value(random), value(random)}, i % 3 ? KFS_Interp_Spline : KFS_Interp_Linear);
             spatial.Key(i * 60, {value(random), value(random), value(random)}, KFS_Interp_Spline);
-            if (i % 4 == 2) {
-                EXPECT_EQ(0, KFS_SetKeyModifiable(plain, 1, i));
-            }
+            if (i % 4 == 2) EXPECT_EQ(0, KFS_SetKeyModifiable(plain, 1, i));
         }
     }
 
@@ -31,8 +29,8 @@ protected:
     {
         std::vector<double> samples;
         for (int time = -30; time < Span + 30; time += 7) {
-            for (const TestStream* const stream : {&plain, &spatial}) {
-                const std::vector<double> value = stream->At(time);
+            for (TestStream const* const stream : {&plain, &spatial}) {
+                std::vector<double> const value = stream->At(time);
                 samples.insert(samples.end(), value.begin(), value.end());
             }
         }
@@ -42,14 +40,13 @@ protected:
     // Only the external forms: the double forms change a stream's description for the length of the call.
     void Edit(std::mt19937& random)
     {
-        const int time = static_cast<int>(random() % static_cast<unsigned>(Span));
-        const double value[3] = {1.0 * time, -1.0 * time, 5.0};
-        const T_Time at{time, 600};
+        int const time = static_cast<int>(random() % static_cast<unsigned>(Span));
+        double const value[3] = {1.0 * time, -1.0 * time, 5.0};
+        T_Time const at{time, 600};
         for (KFS_Stream* const stream : {plain.get(), spatial.get()}) {
             EXPECT_EQ(0, KFS_InsertKey(stream, &at, 1, value, KFS_Interp_Spline, KFS_Interp_Linear));
-            if (stream->GetKeyCount() > Keys) {
+            if (stream->GetKeyCount() > Keys)
                 EXPECT_EQ(0, KFS_RemoveKey(stream, static_cast<int>(random() % Keys), nullptr));
-            }
             double read[3];
             EXPECT_EQ(0, KFS_GetValuePlus(stream, &at, 0, read, nullptr, nullptr, nullptr, 0));
         }
@@ -63,39 +60,32 @@ protected:
 // side by side.
 TEST_F(RenderThreads, RendersSeeTheStreamsAsTheyStoodWhileTheMainThreadEdits)
 {
-    const std::vector<double> asTheyStood = Sample();
+    std::vector<double> const asTheyStood = Sample();
     std::mt19937 random(11);
     Edit(random);  // leaves stale ranges for the copies to repair
-    const std::vector<double> expected = [&] {
-        const Q_ScSetCurrentRenderContext current(kfshost::MakeRenderContext(true));
+    std::vector<double> const expected = [&] {
+        Q_ScSetCurrentRenderContext const current(kfshost::MakeRenderContext(true));
         return Sample();
     }();
     ASSERT_NE(asTheyStood, expected);
-    const auto stale = plain.Stale();
-    const auto arcStale = spatial.ArcStale();
+    auto const stale = plain.Stale();
+    auto const arcStale = spatial.ArcStale();
 
     std::atomic<int> ready{0}, done{0}, differing{0};
     std::atomic<bool> go{false};
     std::vector<std::thread> renders;
     for (int r = 0; r < Renders; ++r) {
         renders.emplace_back([&] {
-            const Q_ScSetCurrentRenderContext current(kfshost::MakeRenderContext(true));
-            const std::vector<double> first = Sample();  // under the gate: nobody edits
+            Q_ScSetCurrentRenderContext const current(kfshost::MakeRenderContext(true));
+            std::vector<double> const first = Sample();  // under the gate: nobody edits
             ++ready;
-            while (!go) {
-                std::this_thread::yield();
-            }
-            for (int pass = 0; pass < 3; ++pass) {
-                if (Sample() != expected || first != expected) {
-                    ++differing;
-                }
-            }
+            while (!go) std::this_thread::yield();
+            for (int pass = 0; pass < 3; ++pass)
+                if (Sample() != expected || first != expected) ++differing;
             ++done;
         });
     }
-    while (ready < Renders) {
-        std::this_thread::yield();
-    }
+    while (ready < Renders) std::this_thread::yield();
     EXPECT_EQ(stale, plain.Stale()) << "renders repair their copies alone";
     EXPECT_EQ(arcStale, spatial.ArcStale());
     go = true;
@@ -104,9 +94,7 @@ TEST_F(RenderThreads, RendersSeeTheStreamsAsTheyStoodWhileTheMainThreadEdits)
         Edit(random);
         ++edits;
     } while (done < Renders);
-    for (std::thread& render : renders) {
-        render.join();
-    }
+    for (std::thread& render : renders) render.join();
     EXPECT_EQ(0, differing);
     EXPECT_GT(edits, 1);
     EXPECT_NE(expected, Sample());
@@ -114,30 +102,24 @@ TEST_F(RenderThreads, RendersSeeTheStreamsAsTheyStoodWhileTheMainThreadEdits)
 
 TEST_F(RenderThreads, ReportsOfRendersDontMix)
 {
-    const TestStream empty;
+    TestStream const empty;
     std::atomic<int> wrong{0};
     std::vector<std::thread> renders;
     for (int r = 0; r < 4; ++r) {
         renders.emplace_back([&] {
-            const Q_ScSetCurrentRenderContext current(kfshost::MakeRenderContext(true));
-            const T_Time at{0, 600};
+            Q_ScSetCurrentRenderContext const current(kfshost::MakeRenderContext(true));
+            T_Time const at{0, 600};
             double value = 0.0;
-            for (int i = 0; i < 100; ++i) {
-                if (KFS_GetValueFPlus(empty, &at, 0, &value, nullptr, nullptr) != 7427) {
-                    ++wrong;
-                }
-            }
+            for (int i = 0; i < 100; ++i)
+                if (KFS_GetValueFPlus(empty, &at, 0, &value, nullptr, nullptr) != 7427) ++wrong;
         });
     }
-    for (std::thread& render : renders) {
-        render.join();
-    }
+    for (std::thread& render : renders) render.join();
     EXPECT_EQ(0, wrong);
-    const std::vector<Reported> seen = reports.Take();
+    std::vector<Reported> const seen = reports.Take();
     EXPECT_EQ(400u, seen.size());
-    for (const Reported& report : seen) {
+    for (Reported const& report : seen)
         ASSERT_EQ(KfsReport(36, "attempt to get a value from a time stream with no key values."), report);
-    }
 }
 
 }  // namespace

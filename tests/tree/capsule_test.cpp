@@ -41,7 +41,7 @@ TEST_F(Capsule, IdsAreTheRootsFollowedByThePath)
     EXPECT_EQ(&root_, root);
     EXPECT_EQ(path, scale->GetStreamCapsuleData().path);
     EXPECT_EQ(3u, path.GetLength());
-    const Q_ScAutoPtr<KFS_StreamBase> alone = TestKinds::Make("opacity");
+    Q_ScAutoPtr<KFS_StreamBase> const alone = TestKinds::Make("opacity");
     EXPECT_EQ(Text("{}"), alone->GetStreamCapsuleData().id);
     alone->SlowGetPathFromRootToMe(&root, &path);
     EXPECT_EQ(nullptr, root) << "a leaf is no group";
@@ -55,12 +55,12 @@ TEST_F(Capsule, IdsStayWhatTheyWereWhenFirstAsked)
 {
     KFS_NamedStreamGroup* const first = AddNode(root_);
     KFS_NamedStreamGroup* const second = AddNode(root_);
-    const u16str id = second->GetStreamCapsuleData().id;
+    u16str const id = second->GetStreamCapsuleData().id;
     root_.ReorderStreams(1, 0);
     EXPECT_EQ(id, second->GetStreamCapsuleData().id);
     EXPECT_EQ(0u, PathOf(second).GetHead().GetIndex()) << "paths are looked for each time";
     EXPECT_EQ(id, first->GetStreamCapsuleData().id) << "asked first after the move";
-    const std::unique_ptr<KFS_StreamBase> clone(second->Clone(true));
+    std::unique_ptr<KFS_StreamBase> const clone(second->Clone(true));
     EXPECT_EQ(Text("node{}"), clone->GetStreamCapsuleData().id) << "a copy stands elsewhere";
 }
 
@@ -77,10 +77,10 @@ TEST_F(Capsule, APathLeadsBackToItsStream)
         }
     }
     int leaves = 0;
-    const auto visit = [&](KFS_Stream* leaf) {
+    auto const visit = [&](KFS_Stream* leaf) {
         ++leaves;
         for (KFS_StreamBase* stream = leaf; stream->GetParent(); stream = stream->GetParent()) {
-            const KFS_StreamIDPath path = PathOf(stream);
+            KFS_StreamIDPath const path = PathOf(stream);
             EXPECT_EQ(stream, root_.FindStream(path));
             EXPECT_EQ(stream, root_.FindEditableStream(path));
             KFS_StreamIDPath read;
@@ -118,7 +118,7 @@ TEST_F(Capsule, ManyThreadsMayAskFirst)
 TEST_F(Capsule, TheHostsValueIsInheritedOnDemandAndKept)
 {
     KFS_StreamBase* const canonical = Get_VX_StreamFactory()->GetCanonicalStream(Name("opacity"));
-    const Q_ScAutoPtr<KFS_StreamBase> early = TestKinds::Make("opacity"), own = TestKinds::Make("opacity");
+    Q_ScAutoPtr<KFS_StreamBase> const early = TestKinds::Make("opacity"), own = TestKinds::Make("opacity");
     EXPECT_TRUE(canonical->GetSMDataPath().empty());
     EXPECT_TRUE(early->GetSMDataPath().empty());
     canonical->SetSMDataPath(17);
@@ -127,9 +127,9 @@ TEST_F(Capsule, TheHostsValueIsInheritedOnDemandAndKept)
     EXPECT_EQ(5, boost::any_cast<int>(own->GetSMDataPath()));
     canonical->SetSMDataPath(18);
     EXPECT_EQ(17, boost::any_cast<int>(early->GetSMDataPath())) << "an answer is kept";
-    const std::unique_ptr<KFS_StreamBase> clone(own->Clone(true));
+    std::unique_ptr<KFS_StreamBase> const clone(own->Clone(true));
     EXPECT_EQ(18, boost::any_cast<int>(clone->GetSMDataPath())) << "a copy asks anew";
-    const TestStream withoutFactory;
+    TestStream const withoutFactory;
     EXPECT_TRUE(withoutFactory->GetSMDataPath().empty());
 }
 

@@ -32,7 +32,7 @@ KFS_FactoryFunc LeafFunc(double value, int* calls = nullptr)
 TEST_F(Factory, TheFirstRegistrationOfANameStands)
 {
     int first = 0, second = 0;
-    const Q_MemoryCount empty = Q_MemoryLive(nullptr);
+    Q_MemoryCount const empty = Q_MemoryLive(nullptr);
     EXPECT_TRUE(factory.RegisterFactoryFunc(Name("blur"), LeafFunc(1.0, &first), false));
     KFS_StreamBase* const canonical = factory.GetCanonicalStream(Name("blur"));
     EXPECT_FALSE(factory.RegisterFactoryFunc(Name("blur"), LeafFunc(2.0, &second), false));
@@ -43,7 +43,7 @@ TEST_F(Factory, TheFirstRegistrationOfANameStands)
     EXPECT_EQ(nullptr, canonical->GetParent());
     EXPECT_EQ(600u, canonical->GetAsLeaf()->GetTimeScale());
     EXPECT_EQ(1.0, static_cast<TestLeaf*>(canonical)->ValueAt(0));
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
     auto* const late = new TestLeaf(Name("blur"), &factory, true, 600, false, 1, 3.0);
     EXPECT_EQ(canonical, factory.RegisterCanonicalInstance(late));
     EXPECT_EQ(before, Q_MemoryLive(nullptr)) << "the late one is deleted";
@@ -57,7 +57,7 @@ TEST_F(Factory, TheFirstRegistrationOfANameStands)
 TEST_F(Factory, AnUnknownKindIsNothing)
 {
     Names log;
-    const auto previous = Q_SetLogSink([&](int level, char const* tag, char const* topic, char const* text) {
+    auto const previous = Q_SetLogSink([&](int level, char const* tag, char const* topic, char const* text) {
         log.push_back(std::to_string(level) + " " + tag + " " + topic + ": " + text);
     });
     EXPECT_EQ(nullptr, factory.GetCanonicalInstance(Name("no such")));
@@ -77,7 +77,7 @@ TEST_F(Factory, AnUnknownKindIsNothing)
 
 TEST_F(Factory, AKindWhoseFunctionGivesNothingIsUnknownAndDoesntRegister)
 {
-    const KFS_FactoryFunc nothing = [](KFS_MatchName const&, KFS_StreamFactory*, bool, unsigned int, bool) {
+    KFS_FactoryFunc const nothing = [](KFS_MatchName const&, KFS_StreamFactory*, bool, unsigned int, bool) {
         return nullptr;
     };
     EXPECT_EQ(KFS_Err_UnknownStream, KFSp_Boundary([&] { factory.RegisterFactoryFunc(Name("void"), nothing, false); }));
@@ -90,9 +90,9 @@ TEST_F(Factory, AKindWhoseFunctionGivesNothingIsUnknownAndDoesntRegister)
 TEST_F(Factory, ALeafIsMadeWithItsDefault)
 {
     kinds.Leaf("blur", 1, 7.0);
-    for (const bool constant : {true, false}) {
-        const unsigned int timeScale = constant ? 600 : 24;
-        const Q_ScAutoPtr<KFS_StreamBase> made(factory.CreateStream(Name("blur"), constant, timeScale, true, false));
+    for (bool const constant : {true, false}) {
+        unsigned int const timeScale = constant ? 600 : 24;
+        Q_ScAutoPtr<KFS_StreamBase> const made(factory.CreateStream(Name("blur"), constant, timeScale, true, false));
         auto const* const leaf = static_cast<TestLeaf*>(made.get());
         EXPECT_FALSE(leaf->IsCanonical());
         EXPECT_EQ(&factory, leaf->GetFactory());
@@ -117,14 +117,14 @@ TEST_F(Factory, AKindRegisteredAsAnObjectIsClonedFromIt)
     EXPECT_EQ(object, factory.RegisterCanonicalInstance(object));
     EXPECT_TRUE(object->IsCanonical());
     {
-        const Q_ScAutoPtr<KFS_StreamBase> made(factory.CreateStream(Name("glow"), true, 30, true, false));
+        Q_ScAutoPtr<KFS_StreamBase> const made(factory.CreateStream(Name("glow"), true, 30, true, false));
         EXPECT_FALSE(made->IsCanonical());
         EXPECT_EQ(30u, made->GetAsLeaf()->GetTimeScale());
         EXPECT_EQ(7.0, static_cast<TestLeaf*>(made.get())->ValueAt(0));
         EXPECT_EQ(Q_MBToUTF16String("Glow"), made->GetDisplayName());
         object->SetSMDataPath(std::string("later data"));
         EXPECT_EQ("glow data", boost::any_cast<std::string>(made->GetSMDataPath()));
-        const Q_ScAutoPtr<KFS_StreamBase> keyed(factory.MakeInstanceFromCanonical(Name("glow"), false, 30));
+        Q_ScAutoPtr<KFS_StreamBase> const keyed(factory.MakeInstanceFromCanonical(Name("glow"), false, 30));
         EXPECT_TRUE(keyed->GetAsLeaf()->HasKeys());
     }
     EXPECT_TRUE(factory.UnregisterCanonicalInstance(object));
@@ -135,14 +135,14 @@ TEST_F(Factory, AKindRegisteredAsAnObjectIsClonedFromIt)
 // Its children are registered after it, and it holds its own kind.
 TEST_F(Factory, ADeferredLayoutMayNameWhatComesLaterAndItself)
 {
-    const auto make = [](KFS_MatchName const& name, KFS_StreamFactory* f, bool, unsigned int, bool canonical) {
+    auto const make = [](KFS_MatchName const& name, KFS_StreamFactory* f, bool, unsigned int, bool canonical) {
         return new TestNamedGroup(name, f, canonical, {Name("late"), Name("nest")});
     };
     EXPECT_TRUE(factory.RegisterFactoryFunc(Name("nest"), make, true));
     EXPECT_TRUE(factory.RegisterFactoryFunc(Name("late"), LeafFunc(0.0), false));
     factory.SetupCanonicalStream(Name("nest"));
     {
-        const auto made = TestKinds::Make("nest");
+        auto const made = TestKinds::Make("nest");
         KFS_StreamGroup const* level = made->GetAsGroup();
         for (int depth = 0; depth < 5; ++depth) {
             ASSERT_EQ(2u, level->GetNumStreams());
@@ -164,7 +164,7 @@ TEST_F(Factory, ABatchUnregistersBackwardsAndOnlyWhatItRegistered)
         using TestLeaf::TestLeaf;
         ~Witness() override { gone.push_back(NameOf(this)); }
     };
-    const auto make = [](KFS_MatchName const& name, KFS_StreamFactory* f, bool constant, unsigned int timeScale,
+    auto const make = [](KFS_MatchName const& name, KFS_StreamFactory* f, bool constant, unsigned int timeScale,
                          bool canonical) { return new Witness(name, f, constant, timeScale, canonical, 1, 5.0); };
     kinds.Leaf("taken", 1, 0.0);
     {
@@ -175,7 +175,7 @@ TEST_F(Factory, ABatchUnregistersBackwardsAndOnlyWhatItRegistered)
         }
         EXPECT_FALSE(batch.IsRegistered(Name("three")));
         {
-            const Q_ScAutoPtr<KFS_StreamBase> made(batch.CreateStream(Name("two")));
+            Q_ScAutoPtr<KFS_StreamBase> const made(batch.CreateStream(Name("two")));
             EXPECT_TRUE(made->GetAsLeaf()->HasKeys());
         }
         EXPECT_EQ(Names{"two"}, gone);
@@ -195,13 +195,13 @@ TEST_F(Factory, ABatchUnregistersBackwardsAndOnlyWhatItRegistered)
 TEST_F(Factory, DataFileGroupsGoWithTheirChildren)
 {
     struct Row {
-        const char* why;
-        std::vector<const char*> containers;
+        char const* why;
+        std::vector<char const*> containers;
         std::function<void(KFS_StreamFactory&)> act;
         Names left;
     };
-    const auto unregisterAll = [](KFS_StreamFactory& f) { f.UnRegisterDataFileContainers(); };
-    const Row rows[] = {
+    auto const unregisterAll = [](KFS_StreamFactory& f) { f.UnRegisterDataFileContainers(); };
+    Row const rows[] = {
         {"both, in either order", {"outer", "inner"}, unregisterAll, {}},
         {"the inner one", {"inner"}, unregisterAll, {"outer", "own"}},
         {"the outer one, whose subgroup goes as a kind", {"outer"}, unregisterAll, {"deep"}},
@@ -212,7 +212,7 @@ TEST_F(Factory, DataFileGroupsGoWithTheirChildren)
          {"deep", "inner", "outer", "own", "shared"}},
         {"a leaf", {"own"}, unregisterAll, {"deep", "inner", "outer", "own", "shared"}},
     };
-    for (const Row& row : rows) {
+    for (Row const& row : rows) {
         SCOPED_TRACE(row.why);
         TestKinds local;
         for (char const* const name : {"shared", "deep", "own"}) local.Leaf(name, 1, 0.0);
@@ -222,9 +222,8 @@ TEST_F(Factory, DataFileGroupsGoWithTheirChildren)
         EXPECT_LE(row.containers.size(), factory.GetDataFileMatchNames().size());
         row.act(factory);
         Names left;
-        for (char const* const name : {"deep", "inner", "outer", "own", "shared"}) {
+        for (char const* const name : {"deep", "inner", "outer", "own", "shared"})
             if (factory.GetCanonicalInstance(Name(name))) left.push_back(name);
-        }
         EXPECT_EQ(row.left, left);
     }
 }
@@ -246,11 +245,10 @@ public:
     using TestNamedGroup::TestNamedGroup;
     void UpgradeChildStream(KFS_StreamBase* obsolete) override
     {
-        const T_Time zero{0, 600};
-        const double value = static_cast<TestLeaf*>(obsolete)->ValueAt(0);
-        for (char const* const name : {"blue", "red"}) {
+        T_Time const zero{0, 600};
+        double const value = static_cast<TestLeaf*>(obsolete)->ValueAt(0);
+        for (char const* const name : {"blue", "red"})
             EXPECT_EQ(0, KFS_InsertKeyF(GetEditableLeafStream(Name(name)), &zero, 1, &value, 0, 0));
-        }
     }
 };
 
@@ -260,7 +258,7 @@ TEST_F(Factory, AnObsoleteStreamIsReplacedByItsGroupsNewChildren)
     kinds.Named("part", {Name("green")});
     kinds.Group<Tint>("tint", {Name("red"), Name("part"), Name("green"), Name("blue")});
     factory.GetCanonicalStream(Name("part"))->GetAsNamedGroup()->EnsureUILayoutComplete();
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
     {
         TestLeaf old(Name("amount"), &factory, true, 600, false, 1, 42.0);
         old.InsertDefaultKey(T_Time{0, 1});
@@ -289,9 +287,9 @@ TEST_F(Factory, AnObsoleteStreamIsReplacedByItsGroupsNewChildren)
 
 TEST_F(Factory, DecanonicalizingMakesTheWholeTreeReal)
 {
-    const SceneKinds scene;
+    SceneKinds const scene;
     KFS_DecanonicalizeAllChildStreamsDeep(nullptr);
-    const auto countReal = [](KFS_StreamGroup& group) {
+    auto const countReal = [](KFS_StreamGroup& group) {
         int real = 0;
         auto count = [&real](KFS_Stream*) { ++real; };
         group.ForEachNonCanonicalLeafStream(count, nullptr);
@@ -328,13 +326,13 @@ TEST_F(Factory, DecanonicalizingMakesTheWholeTreeReal)
 int CountWithTheSwitchOn()
 {
     hearth::debug::DebugDatabase::Instance().SetEntry("VX.DecanonicalizeImmediatelyR", "1");
-    const SceneKinds scene;
-    const auto made = TestKinds::Make("node");
+    SceneKinds const scene;
+    auto const made = TestKinds::Make("node");
     auto* const node = made->GetAsNamedGroup();
     int answer = 0;
     auto count = [&answer](KFS_Stream*) { answer += 10; };
     node->ForEachNonCanonicalLeafStream(count, nullptr);
-    const Q_ScAutoPtr<KFS_StreamBase> left(node->SwapCanonicalForStream(Name("opacity")));
+    Q_ScAutoPtr<KFS_StreamBase> const left(node->SwapCanonicalForStream(Name("opacity")));
     KFS_StreamBase const* const now = node->GetEditableStreamNullOK(Name("opacity"));
     return answer + (left && now && now != left.get() ? 1 : 0);
 }
@@ -348,7 +346,7 @@ TEST_F(Factory, TheDevelopmentSwitchMakesEverythingRealAtOnce)
 TEST_F(Factory, NoFailedAllocationLeavesAHalfRegisteredKind)
 {
     struct Nothing {};
-    const KFS_FactoryFunc group = [](KFS_MatchName const& name, KFS_StreamFactory* f, bool, unsigned int,
+    KFS_FactoryFunc const group = [](KFS_MatchName const& name, KFS_StreamFactory* f, bool, unsigned int,
                                      bool canonical) { return new TestNamedGroup(name, f, canonical, {Name("part")}); };
     kinds.Leaf("part", 1, 0.0);
     for (KFS_FactoryFunc const& func : {LeafFunc(0.0), group}) {
@@ -370,10 +368,10 @@ TEST_F(Factory, NoFailedAllocationLeavesAHalfRegisteredKind)
 TEST_F(Factory, ALayoutOfUnknownKindsIsRefusedWithItsGroup)
 {
     bool defer = false;
-    const auto make = [](KFS_MatchName const& name, KFS_StreamFactory* f, bool, unsigned int, bool canonical) {
+    auto const make = [](KFS_MatchName const& name, KFS_StreamFactory* f, bool, unsigned int, bool canonical) {
         return new TestNamedGroup(name, f, canonical, {Name("early"), Name("late")});
     };
-    const auto tryIt = [&] { factory.RegisterFactoryFunc(Name("group"), make, defer); };
+    auto const tryIt = [&] { factory.RegisterFactoryFunc(Name("group"), make, defer); };
     kinds.Leaf("early", 1, 0.0);
     ExpectBroken(reports, "UI layout has an unregistered child", tryIt);
     EXPECT_EQ(nullptr, factory.GetCanonicalStream(Name("group")));

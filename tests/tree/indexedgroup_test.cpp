@@ -34,8 +34,8 @@ protected:
     static Q_ScAutoPtr<KFS_StreamBase> Letter(char letter)
     {
         auto made = TestKinds::Make("opacity");
-        const T_Time zero{0, 1};
-        const double value = letter;
+        T_Time const zero{0, 1};
+        double const value = letter;
         EXPECT_EQ(0, KFS_InsertKeyF(made->GetAsLeaf(), &zero, 1, &value, 0, 0));
         return made;
     }
@@ -48,11 +48,11 @@ protected:
 TEST_F(IndexedGroup, BadPlacesAndNamesAreRefusedAndLeaveTheListAlone)
 {
     struct Row {
-        const char* text;
+        char const* text;
         std::function<void(List&)> edit;
     };
     Q_ScAutoPtr<KFS_StreamBase> x = Letter('x'), foreign = TestKinds::Make("scale");
-    const Row rows[] = {
+    Row const rows[] = {
         {"invalid index for insert in indexed group", [&](List& l) { l->InsertStream(3, &x); }},
         {"invalid index for swap in indexed group", [&](List& l) { l->SwapStream(2, &x); }},
         {"invalid name for storing in this named group", [&](List& l) { l->SwapStream(0, &foreign); }},
@@ -71,7 +71,7 @@ TEST_F(IndexedGroup, BadPlacesAndNamesAreRefusedAndLeaveTheListAlone)
         {"child not found in parent", [&](List& l) { l->SlowGetIDOfChild(x.get()); }},
     };
     List list("ab");
-    for (const Row& row : rows) {
+    for (Row const& row : rows) {
         ExpectBroken(reports, row.text, [&] { row.edit(list); });
         EXPECT_EQ("ab", list.Letters());
     }
@@ -126,7 +126,7 @@ TEST_F(IndexedGroup, WhatComesInTakesTheScaleOfItsPlace)
     EXPECT_EQ(25u, opacity->GetTimeScale());
     auto swapped = Letter('x');
     KFS_Stream const* const leaf = swapped->GetAsLeaf();
-    const Q_ScAutoPtr<KFS_StreamBase> left(root.SwapStream(0, &swapped));
+    Q_ScAutoPtr<KFS_StreamBase> const left(root.SwapStream(0, &swapped));
     EXPECT_EQ(25u, leaf->GetTimeScale());
     EXPECT_EQ(600u, Canonical("opacity")->GetAsLeaf()->GetTimeScale());
 }
@@ -136,7 +136,7 @@ TEST_F(IndexedGroup, ADuplicateAndACloneAreWholeSubtreesOfTheirOwn)
     List list("ab");
     auto* const opacity = AddNode(*list.group)->GetEditableLeafStream(Name("opacity"));
     ASSERT_EQ(0, opacity->SetConstant(false, true));
-    const Q_ScAutoPtr<KFS_StreamBase> made(list->CloneStream(KFS_CloneStreamParams{true, true}));
+    Q_ScAutoPtr<KFS_StreamBase> const made(list->CloneStream(KFS_CloneStreamParams{true, true}));
     auto* const copy = made->GetAsIndexedGroup();
     KFS_StreamBase const* const duplicate = list->DuplicateStream(2);
     EXPECT_EQ(duplicate, list->GetStream(3));
@@ -165,9 +165,9 @@ TEST_F(IndexedGroup, ACanonicalEntryStaysTheFactorys)
         EXPECT_EQ(canonical, list->GetEditableStream(1u)) << "there is no upgrade here";
         EXPECT_EQ(canonical, list->GetEditableStreamNullOK(1u));
         EXPECT_EQ(list.group.get(), canonical->GetParent());
-        const Q_ScAutoPtr<KFS_StreamBase> copy(list->CloneStream(KFS_CloneStreamParams{true, true}));
+        Q_ScAutoPtr<KFS_StreamBase> const copy(list->CloneStream(KFS_CloneStreamParams{true, true}));
         EXPECT_EQ(canonical, copy->GetAsIndexedGroup()->GetStream(1)) << "a clone shares it";
-        const Q_MemoryCount before = Q_MemoryLive(nullptr);
+        Q_MemoryCount const before = Q_MemoryLive(nullptr);
         EXPECT_FALSE(list->DuplicateStream(1)->IsCanonical());
         delete list->RemoveStream(2);
         EXPECT_EQ(before.blocks, Q_MemoryLive(nullptr).blocks) << "a duplicate is the list's own";
@@ -185,7 +185,7 @@ TEST_F(IndexedGroup, AStreamMovedPastTheEndIsLostUnlessItIsTheFactorys)
     ExpectBroken(reports, "invalid index for insert in indexed group", [&] { list->ReorderStreams(2, 3); });
     EXPECT_EQ("ab", list.Letters());
     EXPECT_EQ(100.0, static_cast<TestLeaf*>(canonical)->ValueAt(0));
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
     ExpectBroken(reports, "invalid index for insert in indexed group", [&] { list->ReorderStreams(0, 2); });
     EXPECT_EQ("b", list.Letters());
     EXPECT_LT(Q_MemoryLive(nullptr).bytes, before.bytes) << "and deleted";
@@ -209,15 +209,15 @@ TEST_F(IndexedGroup, AGroupWithoutAFactoryReadsNoChildren)
 TEST_F(IndexedGroup, RandomEditsFollowAPlainList)
 {
     std::mt19937 random(20240607);
-    const auto upTo = [&random](std::size_t n) { return static_cast<unsigned int>(random() % (n + 1)); };
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    auto const upTo = [&random](std::size_t n) { return static_cast<unsigned int>(random() % (n + 1)); };
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
     for (int run = 0; run < 20; ++run) {
         List list("");
         std::string model;
         for (int step = 0; step < 60; ++step) {
-            const char letter = static_cast<char>('a' + random() % 26);
-            const unsigned int kind = model.empty() ? upTo(1) : upTo(6);
-            const unsigned int at = upTo(kind == 0 ? model.size() : std::max<std::size_t>(model.size(), 1) - 1);
+            char const letter = static_cast<char>('a' + random() % 26);
+            unsigned int const kind = model.empty() ? upTo(1) : upTo(6);
+            unsigned int const at = upTo(kind == 0 ? model.size() : std::max<std::size_t>(model.size(), 1) - 1);
             auto made = Letter(letter);
             Q_ScAutoPtr<KFS_StreamBase> left;
             if (kind == 0) {
@@ -234,9 +234,9 @@ TEST_F(IndexedGroup, RandomEditsFollowAPlainList)
                 EXPECT_EQ(model[at], LetterOf(list->DuplicateStream(at)));
                 model.insert(at + 1, 1, model[at]);
             } else if (kind == 4) {
-                const unsigned int to = upTo(model.size() - 1);
+                unsigned int const to = upTo(model.size() - 1);
                 list->ReorderStreams(at, to);
-                const char moved = model[at];
+                char const moved = model[at];
                 model.erase(at, 1);
                 model.insert(to, 1, moved);
             } else {
@@ -250,7 +250,7 @@ TEST_F(IndexedGroup, RandomEditsFollowAPlainList)
             ASSERT_EQ(model, list.Letters()) << "run " << run << " step " << step;
             for (unsigned int i = 0; i < list->GetNumStreams(); ++i) {
                 EXPECT_EQ(list.group.get(), list->GetStream(i)->GetParent());
-                const KFS_StreamID id = list->SlowGetIDOfChild(list->GetStream(i));
+                KFS_StreamID const id = list->SlowGetIDOfChild(list->GetStream(i));
                 EXPECT_EQ((std::pair{i, Name("opacity")}), (std::pair{id.GetIndex(), id.GetMatchName()}));
             }
         }

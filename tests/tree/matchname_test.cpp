@@ -35,18 +35,17 @@ TEST(MatchName, HashIsOfTheWholeText)
     EXPECT_FALSE(empty.IsValid()) << "the hash of no bytes is all zero, like a name that was never set";
     EXPECT_EQ(empty, KFS_MatchName(static_cast<char const*>(nullptr), true));
     // h1 and h2 of a well-known vector
-    const hearth::utility::Guid published(
+    hearth::utility::Guid const published(
         {0x6c, 0x1b, 0x07, 0xbc, 0x7b, 0xbc, 0x4b, 0xe3, 0x47, 0x93, 0x9a, 0xc4, 0xa9, 0x3c, 0x43, 0x7a});
     EXPECT_TRUE(published == KFS_MatchName("The quick brown fox jumps over the lazy dog", true).GetGuid());
-    const std::string common(45, 'x');
+    std::string const common(45, 'x');
     EXPECT_NE(KFS_MatchName((common + "1").c_str(), true), KFS_MatchName((common + "2").c_str(), true));
 }
 
 TEST(MatchName, LongTextsKeepWhatFitsTheirPlace)
 {
-    for (const std::size_t length : {39u, 60u}) {
+    for (std::size_t const length : {39u, 60u})
         EXPECT_EQ(std::string(39, 'k'), Text(KFS_MatchName(std::string(length, 'k').c_str(), true)));
-    }
 }
 
 TEST(MatchName, UnsetAndForeignHashesAndTheEndOfAGroup)
@@ -72,7 +71,7 @@ TEST(MatchNameThreads, ManyThreadsInternOneEntryAText)
         threads.emplace_back([&, t] {
             for (int i = 0; i < Texts; ++i) {
                 const std::string text = "interned at once " + std::to_string(i);
-                const KFS_MatchName name(text.c_str(), true);
+                KFS_MatchName const name(text.c_str(), true);
                 differing += text != Text(name);
                 if (t == 0) first[static_cast<std::size_t>(i)] = name.GetName();
             }

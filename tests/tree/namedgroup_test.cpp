@@ -47,7 +47,7 @@ TEST_F(NamedGroup, ANewOneHasAllItsChildrenInDisplayOrder)
 TEST_F(NamedGroup, LookingNeverMakesAStreamAndAskingForAnEditableOneMakesItOnce)
 {
     auto const node = MakeNode();
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
     EXPECT_EQ(nullptr, node->GetEditableStreamNullOK(Name("opacity")));
     EXPECT_EQ(nullptr, node->GetEditableStreamNullOK(0u));
     EXPECT_EQ(nullptr, node->GetEditableLeafStreamNullOK(Name("opacity")));
@@ -62,9 +62,8 @@ TEST_F(NamedGroup, LookingNeverMakesAStreamAndAskingForAnEditableOneMakesItOnce)
     EXPECT_EQ(100.0, static_cast<TestLeaf*>(opacity)->ValueAt(0));
     EXPECT_TRUE(opacity->HasNoKeys());
     for (KFS_StreamBase* const again :
-         {node->GetEditableStream(0u), node->GetEditableStream(Name("opacity")), node->GetEditableStreamNullOK(0u)}) {
+         {node->GetEditableStream(0u), node->GetEditableStream(Name("opacity")), node->GetEditableStreamNullOK(0u)})
         EXPECT_EQ(opacity, again);
-    }
     EXPECT_EQ(opacity, node->GetEditableLeafStreamNullOK(Name("opacity")));
     EXPECT_EQ(SceneOrder, NamesOf(*node));
 }
@@ -82,7 +81,7 @@ TEST_F(NamedGroup, AStreamMadeRealHasItsGroupsTimeScale)
 
 TEST_F(NamedGroup, AKindThatWantsItGetsItsDefaultAgainOnceItIsStored)
 {
-    for (const bool wants : {false, true}) {
+    for (bool const wants : {false, true}) {
         TestLeaf::needsReset = wants;
         auto const node = MakeNode();
         auto const* const leaf = static_cast<TestLeaf*>(node->GetEditableStream(Name("rotation")));
@@ -99,7 +98,7 @@ TEST_F(NamedGroup, IdentifiersGoByIndexAndCheckTheName)
         EXPECT_EQ("position", NameOf(std::as_const(*node).GetStream(id)));
         EXPECT_EQ("position", NameOf(node->GetEditableStream(id)));
     }
-    const std::pair<KFS_StreamID, char const*> bad[] = {
+    std::pair<KFS_StreamID, char const*> const bad[] = {
         {KFS_StreamID(2, Name("rotation")), "stream at index has wrong matchname"},
         {KFS_StreamID(4), "invalid index in named group"},
         {KFS_StreamID(0xFFFFFFFE, Name("position")), "invalid index in named group"},
@@ -107,14 +106,17 @@ TEST_F(NamedGroup, IdentifiersGoByIndexAndCheckTheName)
         {KFS_StreamID(), "unexpected match name searched for in group"},
     };
     for (auto const& [id, text] : bad) {
-        ExpectBroken(reports, text, [&, &id = id] { return std::as_const(*node).GetStream(id); });
+        ExpectBroken(
+            reports, text, [&, &id = id] { return std::as_const(*node).GetStream(id); });
         ExpectBroken(reports, text, [&, &id = id] { return node->GetEditableStream(id); });
     }
     EXPECT_EQ(nullptr, node->GetStream(Name("scale"), false)) << "an unknown name may be asked for";
-    ExpectBroken(reports, "invalid index in named group", [&] { return node->GetStream(4); });
-    ExpectBroken(reports, "invalid index in named group", [&] { return node->GetEditableStreamNullOK(4); });
-    ExpectBroken(reports, "unexpected match name searched for in group",
-                 [&] { return node->IsModifiedByName(Name("scale")); });
+    ExpectBroken(
+        reports, "invalid index in named group", [&] { return node->GetStream(4); });
+    ExpectBroken(
+        reports, "invalid index in named group", [&] { return node->GetEditableStreamNullOK(4); });
+    ExpectBroken(
+        reports, "unexpected match name searched for in group", [&] { return node->IsModifiedByName(Name("scale")); });
     ExpectBroken(reports, "match name isn't in UI layout", [&] { return node->GetIndexInUILayout(Name("scale")); });
     KFS_StreamID const id = node->SlowGetIDOfChild(node->GetStream(2));
     EXPECT_EQ(KFS_StreamID::NoIndex, id.GetIndex());
@@ -130,7 +132,7 @@ TEST_F(NamedGroup, ASwapGivesBackWhatWasReal)
     EXPECT_EQ(nullptr, first.get());
     EXPECT_EQ(node.get(), a->GetParent());
     EXPECT_EQ(a, node->GetStream(3));
-    const Q_ScAutoPtr<KFS_StreamBase> left(node->SwapStream(&second));
+    Q_ScAutoPtr<KFS_StreamBase> const left(node->SwapStream(&second));
     EXPECT_EQ(a, left.get());
     EXPECT_EQ(nullptr, a->GetParent());
     EXPECT_EQ(b, node->GetStream(3));
@@ -148,12 +150,12 @@ TEST_F(NamedGroup, ASlotCanBeMadeCanonicalAgain)
     auto const node = MakeNode();
     EXPECT_EQ(nullptr, node->SwapCanonicalForStream(Name("opacity"))) << "it is";
     KFS_StreamBase* const opacity = node->GetEditableStream(Name("opacity"));
-    const Q_ScAutoPtr<KFS_StreamBase> left(node->SwapCanonicalForStream(Name("opacity")));
+    Q_ScAutoPtr<KFS_StreamBase> const left(node->SwapCanonicalForStream(Name("opacity")));
     EXPECT_EQ(opacity, left.get());
     EXPECT_EQ(nullptr, opacity->GetParent());
     EXPECT_EQ(Canonical("opacity"), node->GetStream(0));
     EXPECT_EQ(nullptr, Canonical("opacity")->GetParent());
-    const Q_ScAutoPtr<KFS_StreamBase> transform(node->SwapCanonicalForStream(Name("transform")));
+    Q_ScAutoPtr<KFS_StreamBase> const transform(node->SwapCanonicalForStream(Name("transform")));
     EXPECT_EQ(Canonical("transform"), node->GetStream(1));
     EXPECT_FALSE(node->GetEditableStream(Name("transform"))->IsCanonical());
 }
@@ -162,12 +164,12 @@ TEST_F(NamedGroup, ACloneCopiesWhatIsRealAndSharesTheRest)
 {
     auto const node = MakeNode();
     auto* const opacity = node->GetEditableLeafStream(Name("opacity"));
-    const T_Time at{300, 600};
-    const double value = 25.0;
+    T_Time const at{300, 600};
+    double const value = 25.0;
     ASSERT_EQ(0, opacity->SetConstant(false, true));
     ASSERT_EQ(0, KFS_InsertKeyF(opacity, &at, 1, &value, KFS_Interp_Linear, KFS_Interp_Linear));
-    for (const bool withKeys : {true, false}) {
-        const Q_ScAutoPtr<KFS_StreamBase> copy(node->CloneStream(KFS_CloneStreamParams{withKeys, true}));
+    for (bool const withKeys : {true, false}) {
+        Q_ScAutoPtr<KFS_StreamBase> const copy(node->CloneStream(KFS_CloneStreamParams{withKeys, true}));
         auto* const group = copy->GetAsNamedGroup();
         EXPECT_EQ(nullptr, group->GetParent());
         EXPECT_EQ(NamesOf(*node), NamesOf(*group));
@@ -221,7 +223,7 @@ TEST_F(NamedGroup, PathsLeadThroughGroupsOnly)
 TEST_F(NamedGroup, TheWalkMeetsRealLeavesDepthFirstWithTheirPaths)
 {
     auto const node = MakeNode();
-    const auto walk = [&] {
+    auto const walk = [&] {
         Names met;
         KFS_StreamIDPath path(KFS_StreamID(7));  // what was there stays in front
         auto note = [&](KFS_Stream* leaf) {
@@ -251,8 +253,8 @@ TEST_F(NamedGroup, WhatAChildIsItsGroupIs)
     auto* const transform = node->GetEditableStream(Name("transform"))->GetAsNamedGroup();
     auto* const scale = transform->GetEditableLeafStream(Name("scale"));
     EXPECT_FALSE(node->IsModified()) << "a real stream with its default value changes nothing";
-    const T_Time zero{0, 600};
-    const double value[2] = {2.0, 3.0};
+    T_Time const zero{0, 600};
+    double const value[2] = {2.0, 3.0};
     ASSERT_EQ(0, KFS_InsertKeyF(scale, &zero, 1, value, 0, 0));
     EXPECT_TRUE(node->IsModified());
     EXPECT_TRUE(node->IsModifiedByName(Name("transform")));
@@ -301,8 +303,8 @@ TEST_F(NamedGroup, AcceptableStreamsAreClonedOver)
     kinds.Named("flat", {Name("rotation"), Name("scale")});
     auto const node = MakeNode();
     auto* const rotation = node->GetEditableLeafStream(Name("rotation"));
-    const T_Time zero{0, 600};
-    const double value = 45.0;
+    T_Time const zero{0, 600};
+    double const value = 45.0;
     ASSERT_EQ(0, KFS_InsertKeyF(rotation, &zero, 1, &value, 0, 0));
     node->GetEditableStream(Name("opacity"));  // has no place there
     auto const made = TestKinds::Make("flat");
@@ -319,7 +321,7 @@ TEST_F(NamedGroup, AcceptableStreamsAreClonedOver)
 TEST_F(NamedGroup, AChildOnItsWayOutLeavesAnEmptySlot)
 {
     auto const node = MakeNode();
-    const Q_ScAutoPtr<KFS_StreamBase> rotation(node->GetEditableStream(Name("rotation")));
+    Q_ScAutoPtr<KFS_StreamBase> const rotation(node->GetEditableStream(Name("rotation")));
     auto const stranger = TestKinds::Make("rotation");
     EXPECT_FALSE(node->RemoveChild(stranger.get()));
     EXPECT_TRUE(node->RemoveChild(rotation.get()));
@@ -367,29 +369,29 @@ TEST_F(NamedGroup, AListenersFailureLosesNoStream)
     using List = KFS_IndexedStreamGroup;
     using Node = KFS_NamedStreamGroup;
     struct Row {
-        const char* at;  // the notification from which the listener throws
-        const char* edit;
+        char const* at;  // the notification from which the listener throws
+        char const* edit;
         std::function<void(List&, Node&)> act;
         unsigned int children;  // of the list, afterwards
         bool real;              // whether the node's "opacity" is so afterwards
     };
-    const auto insert = [](List& l, Node&) {
+    auto const insert = [](List& l, Node&) {
         auto made = TestKinds::Make("opacity");
         l.InsertStream(0, &made);
     };
-    const auto swapInList = [](List& l, Node&) {
+    auto const swapInList = [](List& l, Node&) {
         auto made = TestKinds::Make("opacity");
         delete l.SwapStream(0, &made);
     };
-    const auto remove = [](List& l, Node&) { delete l.RemoveStream(0); };
-    const auto upgrade = [](List&, Node& n) { n.GetEditableStream(Name("rotation")); };
-    const auto swap = [](List&, Node& n) {
+    auto const remove = [](List& l, Node&) { delete l.RemoveStream(0); };
+    auto const upgrade = [](List&, Node& n) { n.GetEditableStream(Name("rotation")); };
+    auto const swap = [](List&, Node& n) {
         auto made = TestKinds::Make("opacity");
         delete n.SwapStream(&made);
     };
-    const auto downgrade = [](List&, Node& n) { delete n.SwapCanonicalForStream(Name("opacity")); };
-    const auto reset = [](List&, Node& n) { n.ResetAllStreamsToCanonical(true); };
-    const Row rows[] = {
+    auto const downgrade = [](List&, Node& n) { delete n.SwapCanonicalForStream(Name("opacity")); };
+    auto const reset = [](List&, Node& n) { n.ResetAllStreamsToCanonical(true); };
+    Row const rows[] = {
         {"before-insert", "insert", insert, 2, true},
         {"after-insert", "insert", insert, 3, true},
         {"before-swap", "swap in the list", swapInList, 2, true},
@@ -407,9 +409,9 @@ TEST_F(NamedGroup, AListenersFailureLosesNoStream)
     };
     auto* const canonical = Get_VX_StreamFactory()->GetCanonicalStream(Name("opacity"));
     MakeNode();  // fills canonical groups in
-    for (const Row& row : rows) {
+    for (Row const& row : rows) {
         SCOPED_TRACE(testing::Message() << row.edit << ", " << row.at);
-        const Q_MemoryCount before = Q_MemoryLive(nullptr);
+        Q_MemoryCount const before = Q_MemoryLive(nullptr);
         {
             TestRoot<TestIndexedGroup> root("layers");
             auto opacity = TestKinds::Make("opacity");
@@ -445,13 +447,13 @@ TEST_F(NamedGroup, NoFailedAllocationLeavesAnythingBehindOrASlotEmpty)
     };
     for (auto const& [what, edit] : edits) {
         SCOPED_TRACE(what);
-        const auto make = [] {
+        auto const make = [] {
             auto node = MakeNode();
             node->GetEditableStream(Name("opacity"));
             node->GetEditableStream(Name("transform"))->GetAsNamedGroup()->GetEditableStream(Name("anchor"));
             return node;
         };
-        const auto check = [&](Node& node, int, Q_MemoryCount const& before) {
+        auto const check = [&](Node& node, int, Q_MemoryCount const& before) {
             if (!node.GetEditableStreamNullOK(Name("position"))) {
                 EXPECT_LE(Q_MemoryLive(nullptr).bytes, before.bytes);
                 EXPECT_LE(Q_MemoryLive(nullptr).blocks, before.blocks);
@@ -471,20 +473,19 @@ TEST_F(NamedGroup, NoFailedAllocationLeavesAnythingBehindOrASlotEmpty)
 TEST_F(NamedGroup, ARenamedChildIsRemovedLikeTheOthers)
 {
     MakeNode();  // fills canonical groups in
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
     {
         NotificationRecorder recorder;
         TestRoot<TestIndexedGroup> root("layers");
         auto* const node = AddNode(root);
-        for (char const* const name : {"opacity", "position", "rotation"}) {
+        for (char const* const name : {"opacity", "position", "rotation"})
             recorder.Label(node->GetEditableStream(Name(name)), name);
-        }
         node->GetEditableStream(Name("opacity"))->SetMatchName(Name("position"));
         node->GetEditableStream(Name("rotation"))->SetMatchName(Name("no kind"));
         recorder.Take();
         node->ResetAllStreamsToCanonical(false);
         EXPECT_EQ(SceneOrder, NamesOf(*node));
-        const Notifications heard = recorder.Take();
+        Notifications const heard = recorder.Take();
         EXPECT_EQ(4, std::count_if(heard.begin(), heard.end(),
                                    [](std::string const& line) { return line.starts_with("after-remove node "); }));
     }
@@ -495,7 +496,7 @@ TEST_F(NamedGroup, ARenamedChildIsRemovedLikeTheOthers)
 TEST_F(NamedGroup, WhatAListenerMakesRealInADyingGroupDiesWithIt)
 {
     MakeNode();  // fills canonical groups in
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
     {
         TestRoot<TestIndexedGroup> root("layers");
         auto* const node = AddNode(root);
@@ -520,9 +521,8 @@ public:
     using TestNamedGroup::TestNamedGroup;
     void FillCanonicalLayout(KFS_CanonicalLayout* layout) override
     {
-        for (char const* const kind : {"opacity", "rotation", "scale"}) {
+        for (char const* const kind : {"opacity", "rotation", "scale"})
             if (layout->size() < kindCount) layout->push_back(GetFactory()->GetCanonicalStream(Name(kind)));
-        }
     }
     static inline std::size_t kindCount = 0;
 };

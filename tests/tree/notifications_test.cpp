@@ -24,16 +24,14 @@ protected:
     }
     static std::string SortedIndex(char const* name)
     {
-        const auto sorted = SortedNames();
+        auto const sorted = SortedNames();
         return std::to_string(std::find(sorted.begin(), sorted.end(), Name(name)) - sorted.begin());
     }
     // What each record says of the tree at its moment: the children of the group with `watched` among them as *, and
     // whether the stream has a parent and is independent.
     static std::string Look(KFS_StreamGroup* group, KFS_StreamBase const* stream)
     {
-        if (!group) {
-            return {};
-        }
+        if (!group) return {};
         std::string text = " [";
         for (unsigned int i = 0; i < group->GetNumStreams(); ++i) {
             KFS_StreamBase const* const child = group->GetStream(i);
@@ -62,11 +60,11 @@ struct ListScene {
 TEST_F(NotificationsTest, OfAnIndexedGroupsEdits)
 {
     struct Row {
-        const char* edit;
+        char const* edit;
         std::function<void(ListScene&)> act;
         Notifications heard;
     };
-    const Row rows[] = {
+    Row const rows[] = {
         {"insert",
          [](ListScene& s) { s.root.InsertStream(1, &s.x); },
          {"before-insert layers x 1 [rr] out", "after-insert layers x 1 [r*r] in"}},
@@ -95,7 +93,7 @@ TEST_F(NotificationsTest, OfAnIndexedGroupsEdits)
          {"before-remove layers a 0 [*r] in", "after-remove layers a 0 [r] out"}},
         {"remove a child: still in the list when the second is told",
          [](ListScene& s) {
-             const Q_ScAutoPtr<KFS_StreamBase> child(s.root.GetEditableStream(1u));
+             Q_ScAutoPtr<KFS_StreamBase> const child(s.root.GetEditableStream(1u));
              s.root.RemoveChild(child.get());
          },
          {"before-remove layers b 1 [r*] in", "after-remove layers b 1 [r*] out"}},
@@ -104,7 +102,7 @@ TEST_F(NotificationsTest, OfAnIndexedGroupsEdits)
          [](ListScene& s) { s.root.ReorderStreams(0, 1); },
          {"before-reorder layers a 0 1 [*r] in", "after-reorder layers a 0 1 [r*] in"}},
     };
-    for (const Row& row : rows) {
+    for (Row const& row : rows) {
         SCOPED_TRACE(row.edit);
         NotificationRecorder recorder;
         ListScene scene(recorder);
@@ -120,7 +118,7 @@ TEST_F(NotificationsTest, OfAnIndexedGroupsEdits)
 TEST_F(NotificationsTest, OfANamedGroupsEdits)
 {
     struct Row {
-        const char* edit;
+        char const* edit;
         std::function<void(KFS_NamedStreamGroup&, Q_ScAutoPtr<KFS_StreamBase>&)> act;
         Notifications heard;
     };
@@ -128,7 +126,7 @@ TEST_F(NotificationsTest, OfANamedGroupsEdits)
     using New = Q_ScAutoPtr<KFS_StreamBase>;
     const std::string opacityAt = SortedIndex("opacity");
     // "opacity" is real, at place 0 of [*ccr] or so: c canonical, r real, * the stream of the notification.
-    const Row rows[] = {
+    Row const rows[] = {
         {"ask for a real one", [](Node& n, New&) { n.GetEditableStream(Name("opacity")); }, {}},
         {"make one real: the second tells of the canonical one that left",
          [](Node& n, New&) { n.GetEditableStream(Name("rotation")); },
@@ -157,7 +155,7 @@ TEST_F(NotificationsTest, OfANamedGroupsEdits)
          },
          {"before-remove node old " + opacityAt + " [*rcc] in", "after-remove node old " + opacityAt + " [*rcc] out"}},
     };
-    for (const Row& row : rows) {
+    for (Row const& row : rows) {
         SCOPED_TRACE(row.edit);
         NotificationRecorder recorder;
         TestRoot<TestIndexedGroup> root("layers");
@@ -233,15 +231,15 @@ TEST_F(NotificationsTest, OfAGroupsEnd)
 TEST_F(NotificationsTest, OfEditsOfALeaf)
 {
     struct Row {
-        const char* edit;
+        char const* edit;
         std::function<int(KFS_Stream*)> act;
         Notifications heard;
         bool spatial = false;
     };
-    static const T_Time at{150, 600}, last{300, 600};
-    static const double value[3] = {7.0, 8.0, 9.0}, half[3] = {0.5, 0.5, 0.5};
+    static T_Time const at{150, 600}, last{300, 600};
+    static double const value[3] = {7.0, 8.0, 9.0}, half[3] = {0.5, 0.5, 0.5};
     const Notifications once{"value leaf"};
-    const Row rows[] = {
+    Row const rows[] = {
         {"insert a key", [](KFS_Stream* s) { return KFS_InsertKeyF(s, &at, 0, value, 0, 0); }, once},
         {"replace a key", [](KFS_Stream* s) { return KFS_InsertKey(s, &last, 1, value, 0, 0); }, once},
         {"set a key", [](KFS_Stream* s) { return KFS_SetKeyF(s, 0, value, 0, 0); }, once},
@@ -293,7 +291,7 @@ TEST_F(NotificationsTest, OfEditsOfALeaf)
         {"to set one that isn't there", [](KFS_Stream* s) { return KFS_SetKey(s, 9, value, 0, 0); }, {}},
         {"a key in the way", [](KFS_Stream* s) { return KFS_InsertKeyF(s, &last, 0, value, 0, 0); }, {}},
     };
-    for (const Row& row : rows) {
+    for (Row const& row : rows) {
         SCOPED_TRACE(row.edit);
         NotificationRecorder recorder;
         TestRoot<TestIndexedGroup> root("layers");
@@ -303,9 +301,9 @@ TEST_F(NotificationsTest, OfEditsOfALeaf)
         TestStream leaf(options);
         leaf->SetParent(&root);
         recorder.Label(leaf, "leaf");
-        for (const int time : {0, 300, 600}) leaf.Key(time, {time / 100.0, 1.0}, KFS_Interp_Spline);
+        for (int const time : {0, 300, 600}) leaf.Key(time, {time / 100.0, 1.0}, KFS_Interp_Spline);
         recorder.Take();
-        const int code = row.act(leaf);
+        int const code = row.act(leaf);
         EXPECT_EQ(row.heard, recorder.Take()) << "code " << code;
         EXPECT_TRUE(code != 0 || reports.Take().empty());
         reports.Take();
@@ -367,7 +365,7 @@ TEST_F(NotificationsTest, AnEmptyCallIsRefusedAtTheFirstListener)
 {
     TestRoot<TestIndexedGroup> root("layers");
     EXPECT_NO_THROW(KFS_NotifyListeners(&root, KFS_Notification())) << "nobody listens";
-    const NotificationRecorder recorder;
+    NotificationRecorder const recorder;
     EXPECT_THROW(KFS_NotifyListeners(&root, KFS_Notification()), boost::bad_function_call);
 }
 
@@ -396,9 +394,9 @@ private:
 
 TEST_F(NotificationsTest, NothingIsPutTogetherForASilentTree)
 {
-    const NotificationRecorder recorder;
+    NotificationRecorder const recorder;
     TestRoot<TestIndexedGroup> heard("layers");
-    const auto silent = MakeNode();
+    auto const silent = MakeNode();
     int copies = 0;
     KFSp_Notify(silent.get(), CountedCall(copies));
     EXPECT_EQ(0, copies);
@@ -408,13 +406,13 @@ TEST_F(NotificationsTest, NothingIsPutTogetherForASilentTree)
 
 TEST_F(NotificationsTest, EditsOfASilentTreeTakeNoMemory)
 {
-    const NotificationRecorder recorder;
-    const auto node = MakeNode();
+    NotificationRecorder const recorder;
+    auto const node = MakeNode();
     auto* const opacity = node->GetEditableLeafStream(Name("opacity"));
     Q_FailAllocation(1);
     opacity->SetHidden(true);
     opacity->NotifyValueChanged();
-    const Q_ScAutoPtr<KFS_StreamBase> left(node->SwapCanonicalForStream(Name("opacity")));
+    Q_ScAutoPtr<KFS_StreamBase> const left(node->SwapCanonicalForStream(Name("opacity")));
     EXPECT_FALSE(Q_FailAllocationFired());
     Q_FailAllocation(0);
     EXPECT_EQ(opacity, left.get());

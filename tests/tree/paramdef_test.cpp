@@ -17,8 +17,8 @@ FX_ParamDef OfKind(int kind)
 TEST(ParamDef, OnlyThreeKindsOwnAName)
 {
     for (int kind = -1; kind < 40; ++kind) {
-        const FX_ParamDef def = OfKind(kind);
-        const bool owns = kind == FX_Param_BOOL || kind == FX_Param_CHOICE || kind == FX_Param_LABEL;
+        FX_ParamDef const def = OfKind(kind);
+        bool const owns = kind == FX_Param_BOOL || kind == FX_Param_CHOICE || kind == FX_Param_LABEL;
         EXPECT_EQ(owns, FX_ParamDef_HasParamName(&def)) << kind;
     }
 }
@@ -26,7 +26,7 @@ TEST(ParamDef, OnlyThreeKindsOwnAName)
 TEST(ParamDef, CopiesAreDeepAndLeaveNothingBehind)
 {
     const Q_MemoryCount before = Q_MemoryLive("paramdef name field");
-    for (const int kind : {FX_Param_BOOL, FX_Param_CHOICE, FX_Param_LABEL}) {
+    for (int const kind : {FX_Param_BOOL, FX_Param_CHOICE, FX_Param_LABEL}) {
         FX_ParamDef source = OfKind(kind);
         FX_ParamDef copy = OfKind(FX_Param_CHOICE);
         FX_ParamDef_SetParamName(&copy, Text("to be replaced"), false);

@@ -59,7 +59,7 @@ class StreamBase : public StreamTest {};
 
 TEST_F(StreamBase, ANewNodeIsActiveAndConstrained)
 {
-    const TestStream stream;
+    TestStream const stream;
     EXPECT_EQ(1u, stream->GetStreamBaseFlags());
     EXPECT_TRUE(stream->AreDimensionsConstrained());
     stream->SetDimensionsConstrained(false);
@@ -72,14 +72,14 @@ TEST_F(StreamBase, ANewNodeIsActiveAndConstrained)
 
 TEST_F(StreamBase, FlagAccessorsHoldTheirBits)
 {
-    const TestStream stream;
+    TestStream const stream;
     struct Row {
         void (KFS_StreamBase::*set)(bool);
         bool (KFS_StreamBase::*get)() const;
         unsigned int bit;
     };
     using B = KFS_StreamBase;
-    const Row rows[] = {
+    Row const rows[] = {
         {&B::SetActive, &B::IsActive, 0x1},
         {&B::SetHidden, &B::IsHidden, 0x2},
         {&B::SetCanonical, &B::IsCanonical, 0x4},
@@ -96,8 +96,8 @@ TEST_F(StreamBase, FlagAccessorsHoldTheirBits)
         {&B::SetNamesSame, &B::NamesSame, 0x80000},
     };
     KFS_StreamBase* const base = stream.get();
-    for (const Row& row : rows) {
-        for (const bool on : {true, false}) {
+    for (Row const& row : rows) {
+        for (bool const on : {true, false}) {
             SCOPED_TRACE(testing::Message() << std::hex << row.bit << " " << on);
             base->SetStreamBaseFlags(on ? 0 : 0xFFFFFFFF, 0xFFFFFFFF);
             (base->*row.set)(on);
@@ -110,7 +110,7 @@ TEST_F(StreamBase, FlagAccessorsHoldTheirBits)
 TEST_F(StreamBase, WalksUpToTheRoot)
 {
     Group root, middle;
-    const TestStream leaf;
+    TestStream const leaf;
     root.Store(&middle);
     middle.Store(leaf);
     EXPECT_EQ(&root, leaf->GetRoot());
@@ -136,7 +136,7 @@ TEST_F(StreamBase, ARealStreamHasItsRootsProjectAndACanonicalOneTheCurrent)
     kfshost::Project other;
     ProjectRoot root(&other);
     Group middle;
-    const TestStream leaf;
+    TestStream const leaf;
     root.Store(&middle);
     middle.Store(leaf);
     KFS_Stream const* const constLeaf = leaf;
@@ -165,7 +165,7 @@ TEST_F(StreamBase, AnArrivingTreeTakesTheScaleOfItsPlace)
 TEST_F(StreamBase, AncestorsHearOfAStoredStreamOnce)
 {
     Group root, middle;
-    const TestStream leaf, second;
+    TestStream const leaf, second;
     root.Store(&middle);
     root.stored.clear();
     root.alsoStore = second;  // stores a further stream from inside the notification
@@ -178,7 +178,7 @@ TEST_F(StreamBase, AncestorsHearOfAStoredStreamOnce)
 
 TEST_F(StreamBase, NamesAreFilledInOnDemandAndCompared)
 {
-    const TestStream stream;
+    TestStream const stream;
     stream->SetMatchName(KFS_MatchName("scale", true));
     EXPECT_EQ(Text("scale"), stream->GetMatchName16Str());
     stream->SetMatchName(KFS_MatchName("rotation", true));
@@ -199,12 +199,12 @@ TEST_F(StreamBase, ListenersHearOnlyTreesThatAskToBeHeard)
     NotificationRecorder recorder;
     HeardRoot root;
     {
-        const TestStream leaf;
+        TestStream const leaf;
         leaf->SetHidden(true);
         leaf->NotifyValueChanged();
         EXPECT_EQ(KFS_ListenerState_Unknown, leaf->GetListenerState()) << "without a parent the answer stays open";
         EXPECT_EQ(Notifications{}, recorder.Take());
-        const TestStream canonical;
+        TestStream const canonical;
         canonical->SetCanonical(true);
         EXPECT_EQ(KFS_ListenerState_Silent, canonical->ProbeListenerState());
         root.Store(leaf);
@@ -227,7 +227,7 @@ TEST_F(StreamBase, ComparedNamesAreAChangeOfFlagsAndFilledInOnesNoNews)
 {
     NotificationRecorder recorder;
     HeardRoot root;
-    const TestStream leaf;
+    TestStream const leaf;
     root.Store(leaf);
     leaf->SetMatchName(KFS_MatchName("blur", true));
     leaf->pSetDisplayName(Text("blur"));
@@ -246,10 +246,10 @@ TEST_F(StreamBase, AListenersFailureDoesntKeepAStreamAlive)
 {
     NotificationRecorder recorder;
     HeardRoot root;
-    const Q_MemoryCount before = Q_MemoryLive(nullptr);
-    for (const bool isInt : {true, false}) {
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
+    for (bool const isInt : {true, false}) {
         {
-            const TestStream leaf;
+            TestStream const leaf;
             root.Store(leaf);
             recorder.look = [isInt](KFS_StreamGroup*, KFS_StreamBase const*) -> std::string {
                 if (isInt) throw int{77};
@@ -257,22 +257,20 @@ TEST_F(StreamBase, AListenersFailureDoesntKeepAStreamAlive)
             };
         }
         EXPECT_EQ(Notifications{"destroyed "}, recorder.Take());
-        const std::vector<Reported> seen = reports.Take();
+        std::vector<Reported> const seen = reports.Take();
         ASSERT_EQ(isInt ? 0u : 1u, seen.size());
-        if (!isInt) {
-            EXPECT_EQ("the panel is gone", seen[0].text);
-        }
+        if (!isInt) EXPECT_EQ("the panel is gone", seen[0].text);
     }
     EXPECT_EQ(before, Q_MemoryLive(nullptr));
 }
 
 TEST_F(StreamBase, IndependenceIsHeldForAScope)
 {
-    const TestStream stream;
+    TestStream const stream;
     {
-        const KFS_ScSetResetIndependent outer(stream, true);
+        KFS_ScSetResetIndependent const outer(stream, true);
         EXPECT_TRUE(stream->IsIndependent());
-        const KFS_ScSetResetIndependent inner(stream, true);
+        KFS_ScSetResetIndependent const inner(stream, true);
         stream->MakeIndependent(false);
     }
     EXPECT_FALSE(stream->IsIndependent());

@@ -29,7 +29,7 @@ TEST(StreamID, EqualityGoesByIndexThenByName)
         KFS_StreamID first, second;
         bool equal;
     };
-    const Row rows[] = {
+    Row const rows[] = {
         {"nothing in common with itself", {}, {}, false},
         {"indices", {3}, {3}, true},
         {"other indices", {3}, {4}, false},
@@ -46,7 +46,7 @@ TEST(StreamID, EqualityGoesByIndexThenByName)
         {"no index is no index", {KFS_StreamID::NoIndex}, {KFS_StreamID::NoIndex}, false},
         {"no index leaves it to the names", {KFS_StreamID::NoIndex, a}, {2, a}, true},
     };
-    for (const Row& row : rows) {
+    for (Row const& row : rows) {
         SCOPED_TRACE(row.why);
         EXPECT_EQ(row.equal, row.first == row.second);
         EXPECT_EQ(row.equal, row.second == row.first);
@@ -56,14 +56,14 @@ TEST(StreamID, EqualityGoesByIndexThenByName)
 
 TEST(StreamID, OrderGoesByIndexThenByHash)
 {
-    const bool aFirst = Name("a") < Name("b");
+    bool const aFirst = Name("a") < Name("b");
     const KFS_MatchName low = Name(aFirst ? "a" : "b"), high = Name(aFirst ? "b" : "a");
     struct Row {
         char const* why;
         KFS_StreamID first, second;
         bool less, greater;
     };
-    const Row rows[] = {
+    Row const rows[] = {
         {"indices", {3}, {4}, true, false},
         {"indices as unsigned numbers", {1}, {0xFFFFFFFE}, true, false},
         {"indices before names", {3, high}, {4, low}, true, false},
@@ -73,7 +73,7 @@ TEST(StreamID, OrderGoesByIndexThenByHash)
         {"nothing in common", {3}, {low}, false, false},
         {"nothing at all", {}, {}, false, false},
     };
-    for (const Row& row : rows) {
+    for (Row const& row : rows) {
         SCOPED_TRACE(row.why);
         EXPECT_EQ(row.less, row.first < row.second);
         EXPECT_EQ(row.greater, row.second < row.first);
@@ -82,7 +82,7 @@ TEST(StreamID, OrderGoesByIndexThenByHash)
 
 TEST(StreamID, ChunksAreTheseBytes)
 {
-    const MemoryFile file([](CKF_File* out) {
+    MemoryFile const file([](CKF_File* out) {
         KFS_StreamID(0x01020304, Name("position")).Write(out);
         KFS_StreamID(Name(std::string(39, 'n').c_str())).Write(out);
         KFS_StreamID(5).Write(out);
@@ -111,7 +111,7 @@ TEST(StreamID, ChunksAreTheseBytes)
 
 TEST(StreamID, IsReadAmongChunksOfLaterVersions)
 {
-    const MemoryFile file([](CKF_File* out) {
+    MemoryFile const file([](CKF_File* out) {
         CKF_WriteAtom(out, CKF_Id("new1"), 3, "abc");
         const CKF_ScWriteList list(out, CKF_Id("kfsi"), 0);
         CKF_WriteAtom(out, CKF_Id("new2"), 5, "abcde");
@@ -130,8 +130,8 @@ TEST(StreamID, IsReadAmongChunksOfLaterVersions)
 TEST(Longs, AreSignedAndBigEndian)
 {
     constexpr int Id = CKF_Id("long");
-    const int values[] = {0, 1, -1, 0x01020304, INT_MIN, INT_MAX};
-    const MemoryFile file([&](CKF_File* out) {
+    int const values[] = {0, 1, -1, 0x01020304, INT_MIN, INT_MAX};
+    MemoryFile const file([&](CKF_File* out) {
         for (int const value : values) KFSp_WriteLong(out, Id, value);
         CKF_WriteAtom(out, Id, 2, "\x7f\x01");
     });
@@ -149,7 +149,7 @@ TEST(MatchNameAtoms, ANameThatFillsItsAtomEndsThere)
 {
     std::string unknown = "known to no code";
     unknown.resize(40, '\0');
-    const MemoryFile file([&](CKF_File* out) {
+    MemoryFile const file([&](CKF_File* out) {
         CKF_WriteAtom(out, CKF_Id("kfmn"), 40, std::string(40, 'q').data());
         CKF_WriteAtom(out, CKF_Id("kfmn"), 3, "abc");
         CKF_WriteAtom(out, CKF_Id("kfmn"), 8, "ab\0stale");

@@ -42,10 +42,11 @@ std::string Letters(KFS_StreamIDPath const& path)
 // Field by field, which operator== isn't.
 bool Same(KFS_StreamIDPath const& a, KFS_StreamIDPath const& b)
 {
-    return std::equal(a.GetPathConst().begin(), a.GetPathConst().end(), b.GetPathConst().begin(),
-                      b.GetPathConst().end(), [](KFS_StreamID const& x, KFS_StreamID const& y) {
-                          return x.GetIndex() == y.GetIndex() && x.GetMatchName() == y.GetMatchName();
-                      });
+    return std::equal(
+        a.GetPathConst().begin(), a.GetPathConst().end(), b.GetPathConst().begin(), b.GetPathConst().end(),
+        [](KFS_StreamID const& x, KFS_StreamID const& y) {
+            return x.GetIndex() == y.GetIndex() && x.GetMatchName() == y.GetMatchName();
+        });
 }
 
 std::string UidHex(KFS_StreamIDPath const& path)
@@ -102,7 +103,7 @@ TEST_F(StreamPath, MovesSwap)
     a = std::move(b);
     EXPECT_EQ("x", Letters(a));
     EXPECT_EQ("abc", Letters(b));
-    const KFS_StreamIDPath c(std::move(b));
+    KFS_StreamIDPath const c(std::move(b));
     EXPECT_EQ("abc", Letters(c));
     EXPECT_TRUE(b.IsEmpty());
 }
@@ -120,7 +121,7 @@ TEST_F(StreamPath, AskedForWhatIsNotThereReportsAndThrows3)
     };
     for (auto const& ask : questions) {
         EXPECT_EQ(3, KFSp_Boundary(ask));
-        const std::vector<Reported> seen = reports_.Take();
+        std::vector<Reported> const seen = reports_.Take();
         ASSERT_EQ(1u, seen.size());
         EXPECT_EQ("asked for invalid component of property path", seen[0].text);
         EXPECT_EQ(8, seen[0].severity);
@@ -136,20 +137,19 @@ TEST_F(StreamPath, ComparesComponentByComponent)
     EXPECT_NE(Names("ab"), Names("a"));
     EXPECT_NE(Names("ab"), Names("ba"));
     EXPECT_EQ(Path(ID(1, a), ID(2, a)), Path(ID(1, Name("x")), ID(2, Name("y")))) << "indices decide";
-    const Path nothing{KFS_StreamID()};
+    Path const nothing{KFS_StreamID()};
     EXPECT_NE(nothing, nothing);
     // Lexicographic, a prefix first.
-    const Path ordered[] = {Path(), Path(1), Path(1, 1), Path(1, 2), Path(1, 2, 0), Path(2), Path(10)};
-    for (std::size_t i = 0; i < std::size(ordered); ++i) {
+    Path const ordered[] = {Path(), Path(1), Path(1, 1), Path(1, 2), Path(1, 2, 0), Path(2), Path(10)};
+    for (std::size_t i = 0; i < std::size(ordered); ++i)
         for (std::size_t j = 0; j < std::size(ordered); ++j) EXPECT_EQ(i < j, ordered[i] < ordered[j]) << i << ' ' << j;
-    }
 }
 
 TEST_F(StreamPath, NamesAloneDecideWhereTheyAreAskedFor)
 {
     using Path = KFS_StreamIDPath;
     const KFS_MatchName a = Name("a"), b = Name("b");
-    const Path first(ID(1, a), ID(2, b)), otherIndices(ID(7, a), b);
+    Path const first(ID(1, a), ID(2, b)), otherIndices(ID(7, a), b);
     EXPECT_TRUE(first.IsEqualByMatchName(otherIndices));
     EXPECT_NE(first, Path(ID(7, a), ID(2, b)));
     EXPECT_FALSE(first.IsEqualByMatchName(Path(ID(1, a), ID(2, a))));
@@ -166,9 +166,8 @@ TEST_F(StreamPath, APrefixIsStrict)
     };
     const Row rows[] = {{"", "", false},    {"", "a", true},    {"a", "a", false},   {"a", "ab", true},
                         {"b", "ab", false}, {"ab", "a", false}, {"ab", "abc", true}, {"ac", "abc", false}};
-    for (const Row& row : rows) {
+    for (Row const& row : rows)
         EXPECT_EQ(row.prefix, Names(row.first).IsPrefixOf(Names(row.second))) << row.first << ' ' << row.second;
-    }
     using Path = KFS_StreamIDPath;
     EXPECT_TRUE(Path(ID(3, Name("x"))).IsPrefixOf(Path(ID(3, Name("y")), 0))) << "by index where both have one";
     EXPECT_FALSE(Path(KFS_StreamID()).IsPrefixOf(Path(KFS_StreamID(), 0))) << "an empty identifier equals nothing";
@@ -219,7 +218,7 @@ TEST_F(StreamPath, JsonIsThisText)
               Path(Name("say \"hi\"\\"), 0).GetAs_JSON());
     Path ten;
     for (unsigned int i = 0; i < 10; ++i) ten.AddTail(i);
-    const std::string text = Q_UTF16ToMBString(ten.GetAs_JSON());
+    std::string const text = Q_UTF16ToMBString(ten.GetAs_JSON());
     EXPECT_EQ(0u, text.find(R"({"00":{"index":0,)")) << text;
     EXPECT_NE(std::string::npos, text.find(R"("09":{"index":9,)")) << "keys of equal width";
 }
@@ -268,7 +267,7 @@ TEST_F(StreamPath, JsonThatIsNoPathLeavesThePathAlone)
         std::string(100000, '['),
         std::string(100000, '{'),
     };
-    for (const std::string& text : bad) {
+    for (std::string const& text : bad) {
         SCOPED_TRACE(text.substr(0, 80));
         KFS_StreamIDPath path = Names("ab");
         EXPECT_NE(0, KFSp_Boundary([&] { path.SetFrom_JSON(Text(text)); }));
@@ -283,7 +282,7 @@ TEST_F(StreamPath, JsonThatIsNoPathLeavesThePathAlone)
 TEST_F(StreamPath, ChunksAreTheseBytes)
 {
     const MemoryFile file([](CKF_File* out) { KFS_StreamIDPath(ID(2, Name("b")), Name("c")).Write(out); });
-    const std::string zeros(78, '0');
+    std::string const zeros(78, '0');
     EXPECT_EQ((std::vector<std::string>{"LIST kfsp", "  kfot ffffffff", "  kfpl 00000002",          //
                                         "  LIST kfsi", "    kfix 00000002", "    kfmn 62" + zeros,  //
                                         "  LIST kfsi", "    kfix ffffffff", "    kfmn 63" + zeros}),
@@ -298,14 +297,14 @@ TEST_F(StreamPath, ChunksAreTheseBytes)
 
 TEST_F(StreamPath, ARunOfPathsEndsWithTheSentinel)
 {
-    const MemoryFile file([](CKF_File* out) {
+    MemoryFile const file([](CKF_File* out) {
         KFS_StreamIDPath().Write(out);
         Names("abc").Write(out);
         KFS_StreamIDPath::WriteSentinel(out);
     });
     std::string sentinel = "ZQVM End of path sentinel";
     sentinel.resize(40, '\0');
-    const std::string atom =
+    std::string const atom =
         MemoryFile::Hex({reinterpret_cast<unsigned char const*>(sentinel.data()), sentinel.size()});
     EXPECT_EQ("    kfmn " + atom, file.Lines().back());
     file.Read([](CKF_File* in) {
@@ -335,7 +334,7 @@ void FixUp(int oldType, KFS_StreamIDPath* path)
 
 MemoryFile FileWithHead(int oldType, int length, std::string const& names)
 {
-    const KFS_StreamIDPath path = Names(names);
+    KFS_StreamIDPath const path = Names(names);
     return MemoryFile([&](CKF_File* out) {
         const CKF_ScWriteList list(out, CKF_Id("kfsp"), 0);
         KFSp_WriteLong(out, CKF_Id("kfot"), oldType);
@@ -346,10 +345,10 @@ MemoryFile FileWithHead(int oldType, int length, std::string const& names)
 
 TEST_F(StreamPath, AnOldTypeNumberGoesToTheApplication)
 {
-    for (const int oldType : {-1, -2, 0, 12}) {
-        for (const bool hasCallback : {true, false}) {
+    for (int const oldType : {-1, -2, 0, 12}) {
+        for (bool const hasCallback : {true, false}) {
             SCOPED_TRACE(testing::Message() << oldType << ' ' << hasCallback);
-            const bool asked = oldType >= 0 && hasCallback;
+            bool const asked = oldType >= 0 && hasCallback;
             KFS_AppCallbacks callbacks;
             callbacks.oldPathFixupFunc = hasCallback ? FixUp : nullptr;
             KFS_SetCallbacks(callbacks);
@@ -367,7 +366,7 @@ TEST_F(StreamPath, AnOldTypeNumberGoesToTheApplication)
 
 TEST_F(StreamPath, ALengthIsOnlyAClaim)
 {
-    for (const int length : {3, 1000, INT_MAX}) {
+    for (int const length : {3, 1000, INT_MAX}) {
         KFS_StreamIDPath path;
         FileWithHead(-1, length, "ab").Read([&](CKF_File* in) {
             EXPECT_EQ(CKF_Err_NoSuchChunk, KFSp_Boundary([&] { path.Read(in, nullptr); }));
@@ -375,7 +374,7 @@ TEST_F(StreamPath, ALengthIsOnlyAClaim)
         EXPECT_EQ("ab", Letters(path)) << "what was read stays";
         EXPECT_LT(path.GetPath().capacity(), 10u);
     }
-    for (const int length : {0, -1, INT_MIN}) {
+    for (int const length : {0, -1, INT_MIN}) {
         KFS_StreamIDPath path = Names("x");
         FileWithHead(-1, length, "ab").Read([&](CKF_File* in) { path.Read(in, nullptr); });
         EXPECT_TRUE(path.IsEmpty());
@@ -385,7 +384,7 @@ TEST_F(StreamPath, ALengthIsOnlyAClaim)
 TEST_F(StreamPath, EveryTruncatedOrDamagedFileIsAnswered)
 {
     const MemoryFile whole([](CKF_File* out) { Names("abc").Write(out); });
-    const auto tryToRead = [](std::vector<unsigned char> const& bytes) {
+    auto const tryToRead = [](std::vector<unsigned char> const& bytes) {
         KFS_StreamIDPath path;
         CKF_File file;
         return KFSp_Boundary([&] {
@@ -399,7 +398,7 @@ TEST_F(StreamPath, EveryTruncatedOrDamagedFileIsAnswered)
         EXPECT_NE(0, tryToRead(bytes)) << size;
     }
     for (std::size_t at = 0; at < whole.Bytes().size(); ++at) {
-        for (const int bit : {0, 3, 7}) {
+        for (int const bit : {0, 3, 7}) {
             std::vector<unsigned char> bytes = whole.Bytes();
             bytes[at] = static_cast<unsigned char>(bytes[at] ^ (1 << bit));
             tryToRead(bytes);  // an answer, whichever; sanitizers look on
