@@ -5,7 +5,6 @@
 #include "curves/solvesegment_private.h"
 #include "curves/spatial_private.h"
 #include "curves/update.h"
-#include "curves/update_private.h"
 #include "frame/boundary_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/valuedata_private.h"

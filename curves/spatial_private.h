@@ -1,23 +1,18 @@
 #pragma once
 
-#include "keystore/stream.h"
+#include "keystore/curvehooks_private.h"
 
 // A spatial stream is a point on a path. The speed graph, one temporal curve between two anchors, gives the distance at
 // a time; the path's arc tables give the place at a distance. An anchor is a key whose time is given: on a stream
 // parametrised by arc length float keys are none, and the speed graph runs through them.
 //
-// All three are interpolation functions: they write the cache record's value data of the calling thread's key data.
+// All three (KFSp_InterpolateSpatial and the two here) are interpolation functions: they write the cache record's value data of the calling thread's key data.
 // `refCon` isn't used; `keyIndex` is a hint, the key before the time, and any other number costs a search. Derived data
 // must be up to date. The list service's and the curve kernel's codes come through.
 //
 // Behind the result stands the path parameter of the point, which the callers that work on the path read: at number
 // `dimension` of the value data when the point is one of the path's curve, at number 2 * dimension when it was taken
 // from the straight line between the anchors.
-
-// The position. KFS_Err_Only2D3D (operation 45) where arc-length parametrisation or automatic tangents meet another
-// dimension; KFS_Err_InterpNotAllowed, unreported, for codes other than linear, spline and hold.
-// A spatial stream that isn't parametrised by arc length has no arc tables, and runs a forced update each time.
-int KFSp_InterpolateSpatial(KFS_Stream const* stream, long refCon, int time, int keyIndex);
 
 // The speed along the path, distance a second, as number 0. Writes nothing on a segment that is linear on both sides or
 // held.

@@ -4,7 +4,6 @@
 #include "curves/autotangents_private.h"
 #include "curves/floatkeys_private.h"
 #include "curves/segment_private.h"
-#include "curves/update_private.h"
 #include "frame/report_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/pins_private.h"

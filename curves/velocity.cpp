@@ -2,9 +2,11 @@
 #include "curves/keyhandles_private.h"
 #include "curves/neighbours_private.h"
 #include "curves/tangents.h"
+#include "keystore/curvehooks_private.h"
 #include "keystore/edit_private.h"
 #include "keystore/items_private.h"
 #include "keystore/pins_private.h"
+#include "keystore/savedrecords_private.h"
 
 #include <algorithm>
 #include <cmath>
@@ -244,4 +246,13 @@ int KFS_GetKeyVelocityF(KFS_Stream const* stream, int index, unsigned char zeroA
         if (int const code = GetSpeed(asked, KFSp_Side::In, zeroAtEnds, inVelocity)) return code;
     }
     return outVelocity ? GetSpeed(asked, KFSp_Side::Out, zeroAtEnds, outVelocity) : 0;
+}
+
+int KFSp_EqualizeSides(KFS_Stream* stream, int index)
+{
+    KFSp_ScBytes const bytes(static_cast<std::size_t>(std::max<int>(stream->GetDimension(), 1)) * sizeof(double));
+    auto* const velocity = static_cast<double*>(bytes.get());
+    if (!velocity) return KFS_Err_OutOfMemory;
+    if (int const code = KFS_GetKeyVelocityF(stream, index, 0, velocity, nullptr)) return code;
+    return KFS_SetKeyVelocityF(stream, index, nullptr, velocity);
 }

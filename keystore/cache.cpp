@@ -1,10 +1,9 @@
 #include "keystore/cache_private.h"
 
-#include "curves/interpolate_private.h"
-#include "curves/update_private.h"
 #include "frame/boundary_private.h"
 #include "frame/report_private.h"
 #include "frame/services/memory.h"
+#include "keystore/curvehooks_private.h"
 #include "keystore/items.h"
 #include "keystore/items_private.h"
 #include "keystore/keylist_private.h"

@@ -1,17 +1,13 @@
 #include "keystore/keyflags.h"
 
-#include "curves/autotangents_private.h"
-#include "curves/subdivide_private.h"
-#include "curves/tangents.h"
 #include "frame/report_private.h"
 #include "keystore/cache_private.h"
+#include "keystore/curvehooks_private.h"
 #include "keystore/edit_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/pins_private.h"
 #include "keystore/savedrecords_private.h"
 #include "keystore/valuedata_private.h"
-
-#include <algorithm>
 
 namespace {
 
@@ -48,16 +44,6 @@ int ChangeFloat(KFS_Stream* stream, KFS_StreamKeyData const* data, KFS_KeyScalar
     return error.Code();
 }
 
-// The outgoing velocity becomes the incoming one.
-int EqualizeSides(KFS_Stream* stream, int index)
-{
-    KFSp_ScBytes const bytes(static_cast<std::size_t>(std::max<int>(stream->GetDimension(), 1)) * sizeof(double));
-    auto* const velocity = static_cast<double*>(bytes.get());
-    if (!velocity) return KFS_Err_OutOfMemory;
-    if (int const code = KFS_GetKeyVelocityF(stream, index, 0, velocity, nullptr)) return code;
-    return KFS_SetKeyVelocityF(stream, index, nullptr, velocity);
-}
-
 int ChangeFlags(KFS_Stream* stream, KFS_StreamKeyData const* data, KFS_KeyScalar* key, int index, FlagChange change)
 {
     KFSp_FirstError error;
@@ -71,7 +57,8 @@ int ChangeFlags(KFS_Stream* stream, KFS_StreamKeyData const* data, KFS_KeyScalar
         key->flags = change.Apply(key->flags);
         // A custom value has no handles, but for those along a path.
         bool const hasHandles = stream->IsSpatial() || !stream->IsCustom();
-        if (change.Sets(KFS_KeyFlag_Continuous) && index != 0 && hasHandles) error.Keep(EqualizeSides(stream, index));
+        if (change.Sets(KFS_KeyFlag_Continuous) && index != 0 && hasHandles)
+            error.Keep(KFSp_EqualizeSides(stream, index));
     }
     return error.Code();
 }

@@ -50,6 +50,13 @@ inline int KFSp_KeyCount(KFS_Stream const* stream, KFS_StreamKeyData const* data
     return KFSp_ItemCount(data);
 }
 
+// Whether any key of the data waits for KFS_Stream::UpdateStream.
+inline bool KFSp_IsStale(KFS_StreamKeyData const* data)
+{
+    return data->invalidKeyIndex[0] != KFS_INVALID_INDEX || data->invalidKeyIndex[1] != KFS_INVALID_INDEX ||
+           data->arcInvalidKeyIndex[0] != KFS_INVALID_INDEX || data->arcInvalidKeyIndex[1] != KFS_INVALID_INDEX;
+}
+
 // Whether there is nothing to answer: no key, or a constant without a value.
 inline bool KFSp_HasNoValue(KFS_Stream const* stream, KFS_StreamKeyData const* data)
 {

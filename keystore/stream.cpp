@@ -1,7 +1,5 @@
 #include "keystore/stream.h"
 
-#include "curves/interpolate_private.h"
-#include "curves/spatial_private.h"
 #include "frame/boundary_private.h"
 #include "frame/report_private.h"
 #include "frame/services/context.h"
@@ -9,6 +7,7 @@
 #include "keystore/attributes_private.h"
 #include "keystore/cache_private.h"
 #include "keystore/cachestate.h"
+#include "keystore/curvehooks_private.h"
 #include "keystore/edit_private.h"
 #include "keystore/items_private.h"
 #include "keystore/keylist_private.h"
