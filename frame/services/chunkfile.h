@@ -15,6 +15,7 @@
 #pragma once
 
 #include "frame/services/export.h"
+#include "frame/services/filewriter.h"
 #include "frame/services/strings.h"
 
 #include <cstdint>
@@ -75,25 +76,6 @@ static_assert(sizeof(CKF_ChunkInfo) == 20);
 
 // ---- what a host does with files
 
-// Each call that a file makes of the operating system, and each piece of data that goes into the file.
-enum class CKF_IoCall {
-    Append,      // a header or the data of a chunk goes into the file, or into its buffer
-    Create,      // the temporary file is made
-    Write,       // the buffer goes to disk, or a length behind it is put right
-    Sync,        // the temporary file is flushed to disk
-    Close,       // ... and closed
-    Rename,      // ... and takes its target's place
-    SyncFolder,  // the folder is flushed to disk
-};
-
-// Asked before each such call. An errno value makes the call fail with it, unperformed; 0 lets it happen. This is how
-// tests make the n-th write fail, or a disk run full.
-class CKF_IoHook {
-public:
-    virtual ~CKF_IoHook() = default;
-    virtual int Before(CKF_IoCall call, std::size_t bytes) noexcept = 0;
-};
-
 // A project file. Open it, hand it to the library, and read LastError() or the result of Commit().
 //
 //     CKF_File file;                                  CKF_File file;
@@ -120,9 +102,8 @@ struct KFS_SERVICE_API CKF_File {
     // a regular file is taken. The bytes are borrowed: they must stay until the file is closed, and are not copied.
     int Open(char const* path);
     int Open(std::span<unsigned char const> bytes);
-    // Begins a file. With a path, everything goes into a temporary file beside it, so that the target, if there is one,
-    // stays what it is until Commit; a symbolic link is followed, and the target's access rights are kept. The hook may
-    // be null, and must outlive the file.
+    // Begins a file. With a path it is written as frame/services/filewriter.h tells, so that the target, if there is
+    // one, stays what it is until Commit. The hook may be null, and must outlive the file.
     int Create(char const* path, CKF_IoHook* hook = nullptr);
     int CreateInMemory(CKF_IoHook* hook = nullptr);
 

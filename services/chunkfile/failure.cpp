@@ -8,6 +8,16 @@
 #include <string>
 #include <system_error>
 
+void CKFp_DescribeIo(char* text, std::size_t size, int error, char const* what, char const* path) noexcept
+{
+    std::string reason;
+    try {
+        reason = std::generic_category().message(error);
+    } catch (std::exception const&) {  // out of memory: the sentence goes without
+    }
+    std::snprintf(text, size, "can't %s \"%s\": %s", what, path, reason.c_str());
+}
+
 int CKFp_Failure::Set(int code, std::uint64_t offset, char const* format, ...) noexcept
 {
     if (code_ != 0) return code_;
@@ -22,12 +32,9 @@ int CKFp_Failure::Set(int code, std::uint64_t offset, char const* format, ...) n
 
 int CKFp_Failure::SetIo(int error, std::uint64_t offset, char const* what, char const* path) noexcept
 {
-    std::string reason;
-    try {
-        reason = std::generic_category().message(error);
-    } catch (std::exception const&) {  // out of memory: the sentence goes without
-    }
-    return Set(CKF_Err_Io, offset, "can't %s \"%s\": %s", what, path, reason.c_str());
+    char text[sizeof text_];
+    CKFp_DescribeIo(text, sizeof text, error, what, path);
+    return Set(CKF_Err_Io, offset, "%s", text);
 }
 
 int CKFp_Failure::SetOutOfMemory(std::uint64_t offset) noexcept

@@ -1,6 +1,10 @@
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
+
+// Writes "can't <what> "<path>": <the system's text for an errno value>", as far as it fits.
+void CKFp_DescribeIo(char* text, std::size_t size, int error, char const* what, char const* path) noexcept;
 
 // The first failure of a file, kept without memory of its own.
 class CKFp_Failure {
@@ -11,7 +15,7 @@ public:
 
     // Takes a failure unless there is one already, and returns the one that counts.
     [[gnu::format(printf, 4, 5)]] int Set(int code, std::uint64_t offset, char const* format, ...) noexcept;
-    // The same for an errno value: "can't <what> "<path>": <the system's text>".
+    // The same for an errno value.
     int SetIo(int error, std::uint64_t offset, char const* what, char const* path) noexcept;
     int SetOutOfMemory(std::uint64_t offset) noexcept;
     // For what was asked for under an id that only lists have, or none.

@@ -1,10 +1,10 @@
 #include "services/chunkfile/sink_private.h"
 
+#include <cerrno>
 #include <cstring>
 
 int CKFp_Sink::Append(void const* bytes, std::size_t size)
 {
-    if (int const error = Refused(CKF_IoCall::Append, size)) return failure_.SetIo(error, size_, "write", Name());
     if (int const code = DoAppend(bytes, size)) return code;
     size_ += size;
     return 0;
@@ -12,6 +12,8 @@ int CKFp_Sink::Append(void const* bytes, std::size_t size)
 
 int CKFp_MemorySink::DoAppend(void const* bytes, std::size_t size)
 {
+    if (int const error = hook_ ? hook_->Before(CKF_IoCall::Append, size) : 0)
+        return Failure().SetIo(error, Size(), "write", "memory");
     unsigned char const* const first = static_cast<unsigned char const*>(bytes);
     try {
         bytes_.insert(bytes_.end(), first, first + size);
@@ -31,4 +33,11 @@ int CKFp_MemorySink::Commit()
 {
     committed_ = std::move(bytes_);
     return 0;
+}
+
+int CKFp_DiskSink::Told(int error) noexcept
+{
+    if (error == 0) return 0;
+    if (error == ENOMEM) return Failure().SetOutOfMemory(Size());
+    return Failure().Set(CKF_Err_Io, Size(), "%s", file_.LastErrorText());
 }

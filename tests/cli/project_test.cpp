@@ -87,6 +87,7 @@ TEST_F(KfsProject, AKilledSaveLeavesTheOldFileOrTheNewOne)
     }
     EXPECT_EQ(0, RunKfs({"save-as", slower, "-o", target}).code) << "what a dead process left is in nobody's way";
     EXPECT_TRUE(contents[1] == FileContent(target));
+    for (std::string const& name : folder_.Names()) EXPECT_EQ(name.npos, name.find(".saving-")) << name;
 }
 
 // The format, byte for byte: a change of it is a decision, and shows in the dump that stands beside the file.

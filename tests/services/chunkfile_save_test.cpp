@@ -5,10 +5,13 @@
 #include "frame/services/memory.h"
 #include "frame/services/sequence.h"
 
+#include <fcntl.h>
 #include <sys/stat.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 #include <cerrno>
+#include <csignal>
 #include <cstring>
 #include <filesystem>
 #include <set>
@@ -202,19 +205,106 @@ TEST(ChunkFileSave, TwoSavesToOnePlaceDontMeet)
     EXPECT_EQ(Names{Project}, folder.Names());
 }
 
+// The only file that is being written in a folder.
+std::string TemporaryIn(ScratchFolder const& folder)
+{
+    for (std::string const& name : folder.Names())
+        if (name.find(".saving-") != std::string::npos) return folder.Path(name);
+    return {};
+}
+
 TEST(ChunkFileSave, ALinkStaysALinkAndRightsStay)
 {
+    auto const owner = ::geteuid() == 0 ? std::pair<uid_t, gid_t>(12, 34) : std::pair(::geteuid(), ::getegid());
+    for (unsigned const mode : {0600u, 0640u, 0444u, 02755u}) {
+        SCOPED_TRACE(mode);
+        ScratchFolder const folder;
+        std::string const real = folder.Write("deep/real.kfs", "the old file");
+        ASSERT_EQ(0, ::chown(real.c_str(), owner.first, owner.second));
+        ASSERT_EQ(0, ::chmod(real.c_str(), mode));
+        fs::create_symlink("real.kfs", folder.Path("deep/near.kfs"));
+        fs::create_symlink("deep/near.kfs", folder.Path("link.kfs"));
+        for (bool const exists : {true, false}) {
+            if (!exists) fs::remove(real);
+            CKF_File file;
+            ASSERT_EQ(0, file.Create(folder.Path("link.kfs").c_str()));
+            EXPECT_EQ("", TemporaryIn(folder)) << "it is where the file is to be";
+            ASSERT_EQ(0, file.Commit());
+            EXPECT_TRUE(fs::is_symlink(folder.Path("link.kfs")) && fs::is_symlink(folder.Path("deep/near.kfs")));
+            EXPECT_TRUE(!fs::is_symlink(real) && FileContent(real) == Form(""));
+            struct stat now;
+            ASSERT_EQ(0, ::stat(real.c_str(), &now));
+            EXPECT_TRUE(!exists || (now.st_mode & 07777) == mode) << now.st_mode;
+            EXPECT_TRUE(!exists || std::pair(now.st_uid, now.st_gid) == owner) << now.st_uid;
+        }
+    }
+}
+
+// While it is written nobody else may read what will be a private file.
+TEST(ChunkFileSave, WhatIsWrittenIsNeverOpenToMore)
+{
     ScratchFolder const folder;
-    folder.Write("real.kfs", "the old file");
-    ASSERT_EQ(0, ::chmod(folder.Path("real.kfs").c_str(), 0640));
-    fs::create_symlink("real.kfs", folder.Path("link.kfs"));
-    CKF_File file;
-    ASSERT_EQ(0, file.Create(folder.Path("link.kfs").c_str()));
-    ASSERT_EQ(0, file.Commit());
-    EXPECT_TRUE(fs::is_symlink(folder.Path("link.kfs")));
-    EXPECT_EQ(Form(""), FileContent(folder.Path("real.kfs")));
-    EXPECT_EQ(fs::perms(0640), fs::status(folder.Path("real.kfs")).permissions());
-    EXPECT_EQ((Names{"link.kfs", "real.kfs"}), folder.Names());
+    folder.Write(Project, "the old file");
+    ASSERT_EQ(0, ::chmod(folder.Path(Project).c_str(), 0600));
+    CKF_FileWriter file;
+    ASSERT_EQ(0, file.Create(folder.Path(Project).c_str()));
+    EXPECT_EQ(fs::perms(0600), fs::status(TemporaryIn(folder)).permissions());
+}
+
+// A process that begins to write and then dies by a signal; whether it takes care of signals itself.
+void DieWriting(std::string const& path, int signal, bool takesCare)
+{
+    pid_t const child = ::fork();
+    if (child == 0) {
+        if (takesCare) CKF_RemoveTemporariesOnSignals();
+        CKF_FileWriter file;
+        if (file.Create(path.c_str()) == 0) ::raise(signal);
+        ::_exit(1);
+    }
+    int status = 0;
+    ASSERT_EQ(child, ::waitpid(child, &status, 0));
+    ASSERT_TRUE(WIFSIGNALED(status));
+    EXPECT_EQ(signal, WTERMSIG(status));
+}
+
+TEST(ChunkFileSave, WhatADeadProcessLeftGoesWithTheNextSave)
+{
+    ScratchFolder const folder;
+    std::string const other = std::string(250, 'n');  // has no room for what temporary files are called
+    for (int const signal : {SIGINT, SIGTERM, SIGHUP, SIGXFSZ}) {
+        DieWriting(folder.Path(Project), signal, true);
+        EXPECT_EQ(Names{}, folder.Names()) << signal;
+    }
+    for (std::string const& name : {std::string(Project), other}) DieWriting(folder.Path(name), SIGKILL, true);
+    EXPECT_EQ(2u, folder.Names().size());
+    CKF_FileWriter living, file;
+    ASSERT_EQ(0, living.Create(folder.Path(Project).c_str()));
+    EXPECT_EQ(2u, folder.Names().size()) << "the dead one's is gone, that of the other target isn't";
+    ASSERT_EQ(0, file.Create(folder.Path(Project).c_str()));
+    EXPECT_EQ(3u, folder.Names().size()) << "nobody takes it from the living";
+    EXPECT_EQ(0, file.Commit());
+    EXPECT_EQ(0, living.Commit());
+    ASSERT_EQ(0, file.Create(folder.Path(other).c_str()));
+    EXPECT_EQ(0, file.Commit());
+    EXPECT_EQ((Names{Project, other}), folder.Names());
+}
+
+TEST(ChunkFileSave, OnlyWhoAsksForItWritesIntoAPipe)
+{
+    ScratchFolder const folder;
+    std::string const pipe = folder.Path("pipe");
+    ASSERT_EQ(0, ::mkfifo(pipe.c_str(), 0600));
+    CKF_FileWriter file;
+    EXPECT_EQ(EINVAL, file.Create(pipe.c_str()));
+    int const end = ::open(pipe.c_str(), O_RDONLY | O_NONBLOCK);
+    ASSERT_EQ(0, file.Create(pipe.c_str(), CKF_Target::FileOrStream));
+    file.Append("abc", 3);
+    EXPECT_EQ(0, file.Commit());
+    char got[8] = "";
+    EXPECT_EQ(3, ::read(end, got, sizeof got));
+    EXPECT_STREQ("abc", got);
+    ::close(end);
+    EXPECT_EQ(Names{"pipe"}, folder.Names());
 }
 
 TEST(ChunkFileSave, APlaceThatCantBeWrittenIsRefusedAtOnce)
