@@ -47,4 +47,13 @@ foreach(name IN LISTS testFolders)
     kfs_add_test_folder(${name})
 endforeach()
 
+# Fifty digits are slow enough without a debug build or a sanitizer around them.
+set(museum "${PROJECT_SOURCE_DIR}/tests/services/museum")
+add_library(kfs_curve_truth STATIC "${museum}/truth.cpp")
+target_include_directories(kfs_curve_truth PRIVATE "${PROJECT_SOURCE_DIR}")
+target_compile_options(kfs_curve_truth PRIVATE -O2 -fno-sanitize=all)
+target_link_libraries(test_services PRIVATE kfs_curve_truth)
+add_executable(draw_museum EXCLUDE_FROM_ALL "${museum}/draw.cpp")
+target_link_libraries(draw_museum PRIVATE kfs_services)
+
 include(KfsInstallTests)

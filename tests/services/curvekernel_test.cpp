@@ -1,0 +1,534 @@
+// All operations on temporal curves, and places on curves by parameter, against the truth: on the museum, on random
+// curves, and at the ends of the range of doubles.
+#include "tests/services/museum/truth.h"
+#include "tests/support/dice.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cmath>
+#include <cstring>
+#include <functional>
+#include <limits>
+
+namespace {
+
+using truth::Real;
+using Operation = int (*)(CRV_Curve const*, double*, double);
+
+constexpr double NaN = std::numeric_limits<double>::quiet_NaN();
+constexpr double Infinite = std::numeric_limits<double>::infinity();
+constexpr double Huge = std::numeric_limits<double>::max();
+
+double Ask(Operation operation, Curve curve, double argument)
+{
+    CRV_Curve const kernel = curve.Get();
+    double answer = NaN;
+    EXPECT_EQ(0, operation(&kernel, &answer, argument));
+    return answer;
+}
+
+std::vector<double> PlacesOfSlope(Curve curve, double slope)
+{
+    CRV_Curve const kernel = curve.Get();
+    double xs[3] = {NaN, NaN, 77.0};
+    int count = -1;
+    EXPECT_EQ(0, CRV_EvaluateXFromYPrime(&kernel, &count, xs, slope));
+    EXPECT_EQ(77.0, xs[2]);
+    EXPECT_TRUE(count >= 0 && count <= 2) << count;
+    return {xs, xs + std::clamp(count, 0, 2)};
+}
+
+Curve Treated(Curve curve, bool* moved = nullptr)
+{
+    CRV_Curve kernel = curve.Get();
+    unsigned char changed = 0;
+    EXPECT_EQ(0, CRV_CurveSetNonDecreasing(&kernel, &changed));
+    if (moved) *moved = changed != 0;
+    return curve;
+}
+
+// The longest step between neighbouring control points in one coordinate, and the largest coordinate.
+double Step(Curve const& curve, std::size_t i)
+{
+    double step = 0;
+    for (std::size_t k = 0; k < 3; ++k) step = std::max(step, std::fabs(curve.p[k + 1][i] - curve.p[k][i]));
+    return step;
+}
+double Size(Curve const& curve, std::size_t i)
+{
+    double size = 0;
+    for (auto const& point : curve.p) size = std::max(size, std::fabs(point[i]));
+    return size;
+}
+
+// Slope and bend at the parameter that the kernel has for x: quotients of the exact derivatives, their limits where the
+// curve stands still at an end, and a millionth of a millionth of the segment where it is vertical.
+void CheckSlopes(Curve const& curve, double x, Real t)
+{
+    double const slope = Ask(CRV_Evaluate1dDerivFromX, curve, x);
+    double const bend = Ask(CRV_Evaluate1dDeriv2FromX, curve, x);
+    EXPECT_TRUE(std::isfinite(slope) && std::isfinite(bend));
+    Real const dt = Real(curve.p[3][0]) - curve.p[0][0];
+    if (dt == 0) {
+        EXPECT_EQ(0, slope);
+        EXPECT_EQ(0, bend);
+        return;
+    }
+    Real const least = 1e-12L * dt;
+    Real dx = truth::FirstAt(curve, 0, t), ddx = truth::SecondAt(curve, 0, t);
+    Real dy = truth::FirstAt(curve, 1, t), ddy = truth::SecondAt(curve, 1, t);
+    Real const noiseX = 1e-15L * Step(curve, 0), noiseY = 1e-15L * Step(curve, 1);
+    Real const share = std::fabs(dx / least);
+    if (share > 0.4L && share < 2.5L) return;
+    if (share <= 1 && std::fabs(dy) <= 1e3L * noiseY) {
+        EXPECT_EQ(0, bend);
+        if (t > 0 && t < 1) return;
+        Real const limit = std::fabs(ddx) > std::fabs(least) ? ddy / ddx : (curve.p[3][1] - Real(curve.p[0][1])) / dt;
+        if (std::fabs(ddx) > std::fabs(least) || std::fabs(ddy) <= noiseY)
+            EXPECT_NEAR(static_cast<double>(limit), slope, 1e-12 * (1 + std::fabs(static_cast<double>(limit))));
+        return;
+    }
+    if (share <= 1) dx = least;
+    Real const wanted = dy / dx;
+    Real const noise =
+        8 * (noiseY + std::fabs(wanted) * (share > 1 ? noiseX : 0)) / std::fabs(dx) + 1e-15L * std::fabs(wanted);
+    EXPECT_NEAR(static_cast<double>(wanted), slope, static_cast<double>(noise));
+    Real const wantedBend = (ddy - wanted * ddx) / dx / dx;
+    Real const noiseBend = (64 * (noiseY + std::fabs(wanted) * noiseX) + noise * std::fabs(ddx)) / dx / dx +
+                           16 * std::fabs(wantedBend) * ((share > 1 ? noiseX / std::fabs(dx) : 0) + 1e-15L);
+    EXPECT_NEAR(static_cast<double>(wantedBend), bend, static_cast<double>(noiseBend));
+}
+
+// The parameter at x is the smallest whose x reaches it, to 1e-13 of the segment, and y is the curve's there.
+void CheckSolve(Curve const& curve, double x)
+{
+    SCOPED_TRACE(testing::Message() << "x " << x);
+    double const t = Ask(CRV_TFromX, curve, x), y = Ask(CRV_EvaluateYFromX, curve, x);
+    double const dt = curve.p[3][0] - curve.p[0][0];
+    if (dt == 0) {
+        EXPECT_EQ(curve.p[x > curve.p[0][0] ? 3 : 0][1], y);
+        return;
+    }
+    Real const slack = 1.01e-13L * dt;
+    if (dt > 0 ? x <= curve.p[0][0] : x >= curve.p[0][0]) {
+        EXPECT_EQ(0, t);
+    } else if (dt > 0 ? x >= curve.p[3][0] : x <= curve.p[3][0]) {
+        EXPECT_EQ(1, t);
+    } else {
+        EXPECT_LE(std::fabs(truth::At(curve, 0, t) - x), std::fabs(slack)) << "t " << t;
+        EXPECT_GE(t, truth::FirstReach(curve, 0, x - slack) - 1e-15L);
+        EXPECT_LE(t, truth::FirstReach(curve, 0, x + slack) + 1e-15L);
+    }
+    EXPECT_NEAR(static_cast<double>(truth::At(curve, 1, t)), y, 1e-15 * Size(curve, 1));
+    CheckSlopes(curve, x, t);
+}
+
+// A height of a curve that doesn't fall: the first x that reaches it, which is the turn where x turns back.
+void CheckInverse(Curve const& curve, double y)
+{
+    Real const height = Real(curve.p[3][1]) - curve.p[0][1], slack = 1e-13L * height;
+    double const x = Ask(CRV_EvaluateXFromY, curve, y);
+    Real const low = truth::FurthestX(curve, truth::FirstReach(curve, 1, y - slack));
+    Real const high = truth::FurthestX(curve, truth::FirstReach(curve, 1, y + slack));
+    Real const rounding = 1e-13L * (curve.p[3][0] - curve.p[0][0]);
+    EXPECT_TRUE(std::min(low, high) - std::fabs(rounding) <= x && x <= std::max(low, high) + std::fabs(rounding))
+        << x << " isn't between " << low << " and " << high << ", y " << y;
+}
+
+bool IsBetween(double value, double a, double b)
+{
+    return value >= std::min(a, b) && value <= std::max(a, b);
+}
+
+// The treatment leaves what grows to the bit, makes the rest grow, keeps the ends and moves handles towards them only.
+void CheckNonDecreasing(Curve const& before)
+{
+    bool moved = false, again = false;
+    Curve const after = Treated(before, &moved);
+    SCOPED_TRACE(testing::Message() << "-> " << after);
+    double const height = std::fabs(before.p[3][1] - before.p[0][1]);
+    EXPECT_LE(truth::FallsBack(after), 1e-15L * height);
+    EXPECT_EQ(before != after, moved);
+    EXPECT_TRUE(moved || truth::FallsBack(before) <= 1e-9L * height);
+    if (moved) {
+        // A handle a thousandth steeper on each side would fall, or just about: there was something to do.
+        Curve steeper = before;
+        for (std::size_t k : {1, 2}) steeper.p[k][1] += 1e-5 * (before.p[k][1] - before.p[k == 1 ? 0 : 3][1]);
+        EXPECT_GT(truth::FallsBack(steeper), 0) << "there was nothing to do";
+    }
+    for (std::size_t end : {0, 3}) {
+        std::size_t const handle = end ? 2 : 1;
+        EXPECT_EQ(before.p[end], after.p[end]);
+        EXPECT_TRUE(IsBetween(after.p[handle][0], before.p[end][0], before.p[handle][0]));
+    }
+    EXPECT_EQ(after, Treated(after, &again));
+    EXPECT_FALSE(again);
+}
+
+// Point, derivative and split at t; nothing behind the coordinates is written.
+void CheckPlace(Curve curve, double t)
+{
+    SCOPED_TRACE(testing::Message() << "t " << t);
+    CRV_Curve const kernel = curve.Get();
+    double point[5], vector[5], rows[21];
+    for (double* answer : {point, vector}) std::fill_n(answer, 5, 77.0);
+    std::fill_n(rows, 21, 77.0);
+    ASSERT_EQ(0, CRV_EvaluatePoint(&kernel, point, t));
+    ASSERT_EQ(0, CRV_EvaluateDeriv(&kernel, vector, t));
+    ASSERT_EQ(0, CRV_SubdivideCurve(&kernel, rows, t));
+    EXPECT_TRUE(point[curve.Size()] == 77 && vector[curve.Size()] == 77 && rows[5 * curve.Size()] == 77);
+    double const limited = std::clamp(t, 0.0, 1.0);
+    auto const split = truth::Split(curve, limited);
+    for (std::size_t i = 0; i < curve.Size(); ++i) {
+        double const noise = 1e-15 * Size(curve, i);
+        double const wanted[] = {curve.p[0][i], curve.p[1][i], curve.p[2][i], curve.p[3][i]};
+        auto const [low, high] = std::minmax_element(wanted, wanted + 4);
+        EXPECT_NEAR(static_cast<double>(split[2][i]), point[i], noise);
+        EXPECT_NEAR(static_cast<double>(truth::FirstAt(curve, i, limited)), vector[i], 12 * noise);
+        EXPECT_TRUE(point[i] >= *low && point[i] <= *high) << "a held coordinate stays to the bit";
+        for (std::size_t row = 0; row < 5; ++row) {
+            double const answer = rows[row * curve.Size() + i];
+            EXPECT_NEAR(static_cast<double>(split[row][i]), answer, noise) << "row " << row;
+            EXPECT_TRUE(answer >= *low && answer <= *high) << "row " << row;
+            if (limited == 0 || limited == 1)
+                EXPECT_EQ(limited == 0 ? wanted[row < 3 ? 0 : row - 2] : wanted[row < 3 ? row + 1 : 3], answer) << row;
+        }
+        if (limited == 0 || limited == 1) EXPECT_EQ(wanted[limited == 0 ? 0 : 3], point[i]);
+    }
+}
+
+TEST(CurveKernel, AnswersTheTruthOnTheWholeMuseum)
+{
+    for (Exhibit const& piece : Museum) {
+        SCOPED_TRACE(piece.name);
+        Curve const& curve = piece.curve;
+        for (double const t : {-0.5, 0.0, 1e-9, 0.1, 0.25, 0.5, 0.77, 1.0, 1.0000001, 1e300}) CheckPlace(curve, t);
+        if (curve.dimension != 2) continue;
+        double const x0 = curve.p[0][0], x3 = curve.p[3][0];
+        for (int i = 0; i <= 32; ++i) CheckSolve(curve, x0 + (x3 - x0) * i / 32);
+        for (double const x : {-Infinite, -Huge, -1e9, std::nextafter(x0, x3), std::nextafter(x3, x0), 1e9, Infinite})
+            CheckSolve(curve, x);
+        if (curve.p[0][1] == curve.p[3][1]) continue;
+        CheckNonDecreasing(curve);
+        if (curve.p[3][1] < curve.p[0][1] || x0 == x3) continue;
+        Curve const growing = Treated(curve);
+        double const y0 = curve.p[0][1], y3 = curve.p[3][1];
+        for (int i = 1; i < 32; ++i) CheckInverse(growing, y0 + (y3 - y0) * i / 32);
+        for (double const y : {-Infinite, y0 - 1, y0}) EXPECT_EQ(x0, Ask(CRV_EvaluateXFromY, growing, y));
+        for (double const y : {Infinite, y3 + 1, y3}) EXPECT_EQ(x3, Ask(CRV_EvaluateXFromY, growing, y));
+    }
+    EXPECT_EQ(0, Ask(CRV_EvaluateXFromY, Graph(2, 0.4, 0.4, 10, 10, 10, 10), 10)) << "all heights are equal";
+}
+
+// Coordinates times a power of two give answers times a power of two, to the bit as long as nothing is denormal.
+TEST(CurveKernel, ScaleDoesntMatter)
+{
+    for (Exhibit const& piece : Museum)
+        for (int const power : {-1035, -600, -30, 30, 600, 900}) {
+            SCOPED_TRACE(testing::Message() << piece.name << ", 2^" << power);
+            if (piece.curve.dimension != 2) continue;
+            Curve curve = piece.curve;
+            for (auto& point : curve.p) point[0] = std::ldexp(point[0], power);
+            for (double const share : {0.1, 0.5, 0.9}) {
+                double const x = piece.curve.p[0][0] + share * (piece.curve.p[3][0] - piece.curve.p[0][0]);
+                double const plain = Ask(CRV_EvaluateYFromX, piece.curve, x);
+                double const scaled = Ask(CRV_EvaluateYFromX, curve, std::ldexp(x, power));
+                if (power > -1000)
+                    EXPECT_NEAR(plain, scaled, 1e-9 * Size(curve, 1)) << share;
+                else
+                    EXPECT_TRUE(std::isfinite(scaled));
+            }
+        }
+}
+
+// Influences with 0 and 1 among them, folded curves of all sizes, and paths.
+TEST(CurveKernel, AnswersTheTruthOnRandomCurves)
+{
+    Dice dice(11);
+    for (int i = 0; i < Rounds(1500); ++i) {
+        double const choices[] = {0.0, 1.0, dice.Between(0, 1), dice.Between(0, 1), dice.Between(-3, 4)};
+        double const dt = dice.Between(0.01, 40) * (dice.Below(8) ? 1 : -1);
+        Curve const curve = Graph(dt, choices[dice.Below(5)], choices[dice.Below(5)], dice.Between(-10, 10),
+                                  dice.Between(-10, 10), dice.Between(-10, 10), dice.Between(-10, 10));
+        SCOPED_TRACE(testing::Message() << curve);
+        CheckSolve(curve, dt * dice.Between(0, 1));
+        CheckNonDecreasing(curve);
+
+        Curve path;
+        path.dimension = static_cast<short>(1 + i % 4);
+        for (auto& point : path.p) std::generate_n(point.begin(), path.Size(), [&] { return dice.Between(-100, 100); });
+        if (i % 3 == 0)
+            for (auto& point : path.p) point[0] = 0.1;
+        CheckPlace(path, dice.Between(0, 1));
+    }
+    for (int i = 0; i < Rounds(1000); ++i) {
+        double const height = dice.Between(0.1, 5);
+        double const reach = dice.Below(4) ? 1 : 3;
+        Curve const curve = Treated(Graph(1, dice.Between(0, reach), dice.Between(0, reach), 0,
+                                          height * dice.Between(-1, 3), height * dice.Between(-2, 2), height));
+        SCOPED_TRACE(testing::Message() << curve);
+        CheckInverse(curve, height * dice.Between(0, 1));
+    }
+}
+
+TEST(CurveKernel, InfluencesOfOneThirdMakeXTheParameter)
+{
+    Dice dice(14);
+    for (int i = 0; i < 1000; ++i) {
+        double const dt = dice.Between(0.001, 1000), x = dice.Between(0, dt);
+        EXPECT_NEAR(x / dt, Ask(CRV_TFromX, Graph(dt, 1.0 / 3, 1.0 / 3, 0, 1, 2, 3), x), 4e-16) << dt << " " << x;
+    }
+}
+
+TEST(CurveKernel, AnyFiniteCurveAnswersInsideItsHull)
+{
+    Dice dice(16);
+    double const odd[] = {0.0, -0.0, Huge, -Huge, std::numeric_limits<double>::denorm_min(), 1.0};
+    for (int i = 0; i < Rounds(8000); ++i) {
+        Curve curve;
+        for (auto& point : curve.p)
+            for (std::size_t k = 0; k < 2; ++k) point[k] = dice.Below(4) ? dice.Wild(307) : odd[dice.Below(6)];
+        SCOPED_TRACE(testing::Message() << curve);
+        double const share = dice.Between(0, 1), inside = (1 - share) * curve.p[0][0] + share * curve.p[3][0];
+        for (double const x : {inside, dice.Wild(307), curve.p[static_cast<std::size_t>(dice.Below(4))][0]}) {
+            double const y = Ask(CRV_EvaluateYFromX, curve, x), t = Ask(CRV_TFromX, curve, x);
+            auto const [low, high] = std::minmax({curve.p[0][1], curve.p[1][1], curve.p[2][1], curve.p[3][1]});
+            EXPECT_TRUE(y >= low && y <= high && t >= 0 && t <= 1) << x << " gives " << t << ", " << y;
+            for (Operation const slope : {CRV_Evaluate1dDerivFromX, CRV_Evaluate1dDeriv2FromX})
+                EXPECT_TRUE(std::isfinite(Ask(slope, curve, x))) << x;
+        }
+        for (double const x : PlacesOfSlope(curve, dice.Wild(20))) EXPECT_TRUE(std::isfinite(x));
+        double vector[2];
+        CRV_Curve const kernel = curve.Get();
+        ASSERT_EQ(0, CRV_EvaluatePoint(&kernel, vector, share));
+        EXPECT_TRUE(std::isfinite(vector[0]) && std::isfinite(vector[1]));
+        Curve const after = Treated(curve);
+        for (std::size_t point : {1, 2}) {
+            double const reach = 1.4 * std::max(std::fabs(curve.p[0][1]), std::fabs(curve.p[3][1]));
+            EXPECT_TRUE(after == curve || (std::isfinite(after.p[point][0]) && std::fabs(after.p[point][1]) <= reach));
+        }
+        EXPECT_EQ(after, Treated(after));
+    }
+}
+
+// ---- places with a given slope
+
+TEST(CurveKernelSlopePlaces, RowsThatCanBeCheckedByEye)
+{
+    using Xs = std::vector<double>;
+    const struct {
+        char const* why;
+        Curve curve;
+        double slope;
+        Xs xs;
+    } rows[] = {
+        {"hill and valley, symmetric",
+         Graph(3, 1.0 / 3, 1.0 / 3, 0, 2, -2, 0),
+         0,
+         {3 * (0.5 - std::sqrt(3.0) / 6), 3 * (0.5 + std::sqrt(3.0) / 6)}},
+        {"eased at both keys: the keys themselves", Graph(2, 0.4, 0.4, 10, 10, 20, 20), 0, {0, 2}},
+        {"eased at the end only", Graph(2, 0.4, 0.4, 10, 14, 20, 20), 0, {2}},
+        {"a constant has no distinct point", Graph(2, 0.4, 0.7, 5, 5, 5, 5), 0, {}},
+        {"a constant never climbs", Graph(2, 0.4, 0.7, 5, 5, 5, 5), 1, {}},
+        {"a line has no distinct point", Graph(2, 0.25, 0.25, 10, 12.5, 17.5, 20), 5, {}},
+        {"a line without handles has none either", Graph(2, 0, 0, 10, 10, 20, 20), 5, {}},
+        {"nor another slope", Graph(2, 0, 0, 10, 10, 20, 20), 0, {}},
+        {"x turns back, and y has its hill where nobody comes by", Graph(1, 2, 2, 0, 1, 1, 0), 0, {}},
+        {"the slope touches 0 once", Graph(3, 1.0 / 3, 1.0 / 3, 0, 1, 0, 1), 0, {1.5}},
+        {"a slope other than 0", Graph(3, 1.0 / 3, 1.0 / 3, 0, 2, 2, 3), 1, {1, 3}},
+        {"no out handle: the start isn't flat", Graph(2, 0, 0.5, 10, 10, 16, 20), 0, {}},
+        {"no out handle, but the limit is flat there", Graph(2, 0, 0.5, 10, 10, 10, 20), 0, {0}},
+        {"no in handle, and the limit is flat there", Graph(2, 0.5, 0, 10, 20, 20, 20), 0, {2}},
+        {"without extent in x", {{{{3, 10}, {4, 11}, {2, 12}, {3, 20}}}}, 0, {}},
+    };
+    for (auto const& row : rows) {
+        Xs const found = PlacesOfSlope(row.curve, row.slope);
+        ASSERT_EQ(row.xs.size(), found.size()) << row.why;
+        for (std::size_t i = 0; i < found.size(); ++i) EXPECT_NEAR(row.xs[i], found[i], 1e-7) << row.why;
+    }
+}
+
+TEST(CurveKernelSlopePlaces, AreAllFoundWhereTheyAre)
+{
+    Dice dice(33);
+    int checked = 0;
+    for (int i = 0; i < Rounds(3000); ++i) {
+        Curve const curve = Graph(1, dice.Between(0.02, 1), dice.Between(0.02, 1), dice.Between(-1, 1),
+                                  dice.Between(-1, 1), dice.Between(-1, 1), dice.Between(-1, 1));
+        double const slope = dice.Below(2) ? 0.0 : dice.Between(-4, 4);
+        SCOPED_TRACE(testing::Message() << curve << " slope " << slope);
+        std::vector<double> const found = PlacesOfSlope(curve, slope);
+        truth::SlopePlaces const places = truth::PlacesOfSlope(curve, slope);
+        if (places.apart < 1e-6L) continue;  // whether there are two or none is a matter of the last digit
+        ++checked;
+        ASSERT_EQ(places.ts.size(), found.size());
+        for (std::size_t k = 0; k < found.size(); ++k) {
+            Real const tolerance = 1e-13L / places.apart;
+            EXPECT_NEAR(static_cast<double>(truth::At(curve, 0, places.ts[k])), found[k],
+                        static_cast<double>(tolerance));
+        }
+    }
+    EXPECT_GT(checked, Rounds(2900));
+}
+
+// ---- no falling
+
+TEST(CurveKernelNonDecreasing, RowsThatCanBeCheckedByEye)
+{
+    const struct {
+        char const* why;
+        Curve before, after;
+    } rows[] = {
+        {"inside the box: untouched", Graph(2, 0.5, 0.25, 0, 8, 1, 10), Graph(2, 0.5, 0.25, 0, 8, 1, 10)},
+        {"above the box, but y still grows: untouched", Graph(2, 0.5, 0.5, 0, 12, 7, 10),
+         Graph(2, 0.5, 0.5, 0, 12, 7, 10)},
+        {"out handle down: flat", Graph(2, 0.5, 0.25, 0, -3, 8, 10), Graph(2, 0.5, 0.25, 0, 0, 8, 10)},
+        {"in handle above: flat", Graph(2, 0.5, 0.25, 0, 3, 11, 10), Graph(2, 0.5, 0.25, 0, 3, 10, 10)},
+        {"out handle twice too long, nothing on the other side", Graph(2, 0.5, 0.25, 0, 20, 10, 10),
+         Graph(2, 0.25, 0.25, 0, 10, 10, 10)},
+        {"in handle twice too long", Graph(2, 0.5, 0.5, 0, 0, -10, 10), Graph(2, 0.5, 0.25, 0, 0, 0, 10)},
+        {"both too long", Graph(2, 0.5, 0.5, 0, 20, -30, 10), Graph(2, 0.25, 0.125, 0, 10, 0, 10)},
+        {"up, but too long beside a flat handle", Graph(2, 0.5, 0.25, 0, 40, 12, 10),
+         Graph(2, 0.125, 0.25, 0, 10, 10, 10)},
+        {"between equal values: flat", Graph(2, 0.5, 0.25, 4, 7, 1, 4), Graph(2, 0.5, 0.25, 4, 4, 4, 4)},
+        {"falling steadily: untouched", Graph(2, 0.5, 0.25, 10, 8, 1, 0), Graph(2, 0.5, 0.25, 10, 8, 1, 0)},
+    };
+    for (auto const& row : rows) {
+        bool moved = false;
+        Curve const after = Treated(row.before, &moved);
+        EXPECT_EQ(row.after, after) << row.why << ": " << after;
+        EXPECT_EQ(row.before != row.after, moved) << row.why;
+    }
+}
+
+TEST(CurveKernelNonDecreasing, AShortenedHandleKeepsItsSlopeAndLosesNoMoreThanNeeded)
+{
+    Dice dice(42);
+    for (int i = 0; i < Rounds(3000); ++i) {
+        double const inHeight = dice.Between(0.001, 1), outHeight = dice.Between(1, 5);
+        Curve const before = Graph(1, 0.8, 0.3, 0, outHeight, 1 - inHeight, 1);
+        Curve const after = Treated(before);
+        EXPECT_NEAR(outHeight / 0.8, after.p[1][1] / after.p[1][0], 1e-12) << before;
+        EXPECT_EQ(before.p[2], after.p[2]) << before;
+        if (before != after) {
+            Curve longer = after;
+            longer.p[1][1] *= 1.01;
+            EXPECT_GT(truth::FallsBack(longer), 0) << before << "-> " << after;
+        }
+        double const out = dice.Between(-0.5, 3), in = dice.Between(-0.5, 3);
+        Curve const a = Treated(Graph(1, 0.5, 0.5, 0, out, 1 - in, 1));
+        Curve const b = Treated(Graph(1, 0.5, 0.5, 0, out + 1e-7, 1 - in + 1e-7, 1));
+        for (std::size_t k : {1, 2}) EXPECT_NEAR(a.p[k][1], b.p[k][1], 1e-3) << "a small move moves it a little";
+    }
+}
+
+// ---- refusals
+
+// Every operation in one form, with the dimensions that it takes and the first coordinate that it looks at alone.
+struct Refusing {
+    char const* name;
+    std::function<int(CRV_Curve*, double*, double)> call;
+    int leastDimension, mostDimension;
+    std::size_t coordinates = 2;
+    bool takesArgument = true;
+};
+
+int NonDecreasing(CRV_Curve* curve, double* answer, double)
+{
+    unsigned char changed = 0;
+    int const code = CRV_CurveSetNonDecreasing(curve, &changed);
+    if (changed != 0) *answer = 0;
+    return answer ? code : CRV_Err_NullArgument;  // which may be null here
+}
+
+int SlopePlaces(CRV_Curve* curve, double* xs, double slope)
+{
+    int count = 5;
+    int const code = CRV_EvaluateXFromYPrime(curve, &count, xs, slope);
+    EXPECT_EQ(0, count);
+    return code;
+}
+
+TEST(CurveKernelRefusals, BadInputIsNamedAndLeavesTheAnswerAlone)
+{
+    Refusing const operations[] = {
+        {"YFromX", CRV_EvaluateYFromX, 2, 2},      {"TFromX", CRV_TFromX, 1, 4, 1},
+        {"XFromY", CRV_EvaluateXFromY, 2, 2},      {"slope", CRV_Evaluate1dDerivFromX, 2, 2},
+        {"bend", CRV_Evaluate1dDeriv2FromX, 2, 2}, {"point", CRV_EvaluatePoint, 1, 4},
+        {"derivative", CRV_EvaluateDeriv, 1, 4},   {"split", CRV_SubdivideCurve, 1, 4},
+        {"places of a slope", SlopePlaces, 2, 2},  {"non-decreasing", NonDecreasing, 2, 2, 2, false},
+    };
+    Curve const good = Graph(1, 0.5, 0.3, 0, 5, 1, 1);
+    for (Refusing const& operation : operations) {
+        SCOPED_TRACE(operation.name);
+        Curve curve = good;
+        CRV_Curve kernel = curve.Get();
+        double answers[20];
+        std::fill_n(answers, 20, 77.0);
+        EXPECT_EQ(CRV_Err_NullArgument, operation.call(nullptr, answers, 0.5));
+        EXPECT_EQ(CRV_Err_NullArgument,
+                  operation.takesArgument ? operation.call(&kernel, nullptr, 0.5) : CRV_Err_NullArgument);
+        for (double* CRV_Curve::*point : {&CRV_Curve::p0, &CRV_Curve::p1, &CRV_Curve::p2, &CRV_Curve::p3}) {
+            CRV_Curve broken = kernel;
+            broken.*point = nullptr;
+            EXPECT_EQ(CRV_Err_NullArgument, operation.call(&broken, answers, 0.5));
+        }
+        for (int const dimension : {-1, 0, 1, 3, 5}) {
+            if (dimension >= operation.leastDimension && dimension <= operation.mostDimension) continue;
+            if (dimension == 5 && operation.coordinates == 1) continue;  // any number, the first is taken
+            kernel.dimension = static_cast<short>(dimension);
+            EXPECT_EQ(CRV_Err_Dimension, operation.call(&kernel, answers, 0.5)) << dimension;
+        }
+        kernel.dimension = 2;
+        if (operation.takesArgument) EXPECT_EQ(CRV_Err_NotFinite, operation.call(&kernel, answers, NaN));
+        for (std::size_t i = 0; i < 8; ++i)
+            for (double const bad : {NaN, Infinite, -Infinite}) {
+                if (i % 2 >= operation.coordinates) continue;
+                curve.p[i / 2][i % 2] = bad;
+                if (operation.takesArgument || (i % 2 == 1 && std::isnan(bad)))
+                    EXPECT_EQ(CRV_Err_NotFinite, operation.call(&kernel, answers, 0.5)) << "coordinate " << i;
+                curve.p[i / 2][i % 2] = good.p[i / 2][i % 2];
+                EXPECT_EQ(good, curve);
+            }
+        EXPECT_EQ(20, std::count(answers, answers + 20, 77.0));
+    }
+    Curve curve = good;
+    CRV_Curve kernel = curve.Get();
+    double xs[2];
+    EXPECT_EQ(CRV_Err_NullArgument, CRV_EvaluateXFromYPrime(&kernel, nullptr, xs, 0));
+    EXPECT_EQ(0, CRV_CurveSetNonDecreasing(&kernel, nullptr));
+    EXPECT_EQ(1, curve.p[1][1]) << "treated, though nobody wants to know";
+    unsigned char changed = 9;
+    EXPECT_EQ(0, CRV_CurveSetNonDecreasing(&kernel, &changed));
+    EXPECT_EQ(9, changed) << "nothing left to do";
+}
+
+// ---- bits
+
+// The number is the one of every build so far, with gcc and clang, with and without optimisation. A change means that
+// saved render identities no longer match: it needs a reason.
+TEST(CurveKernelBits, AreTheSameInEveryBuild)
+{
+    std::uint64_t hash = 0xcbf29ce484222325u;
+    auto const mix = [&](double value) {
+        std::uint64_t bits = 0;
+        std::memcpy(&bits, &value, sizeof bits);
+        hash = (hash ^ bits) * 0x100000001b3u;
+        hash ^= hash >> 29;
+    };
+    Dice dice(99);
+    for (int i = 0; i < 20000; ++i) {
+        double const reach = i % 4 == 0 ? 2.0 : 1.0;
+        double n[7];  // in an order of their own: that of arguments is the compiler's
+        for (double& number : n) number = dice.Between(0, 1);
+        Curve curve = Graph(0.1 + 9 * n[0], reach * n[1], reach * n[2], 9 * n[3], 9 * n[4], 9 * n[5], 9 * n[6]);
+        double const x = dice.Between(0, curve.p[3][0]);
+        for (Operation const solve : {CRV_EvaluateYFromX, CRV_Evaluate1dDerivFromX, CRV_Evaluate1dDeriv2FromX})
+            mix(Ask(solve, curve, x));
+        for (auto const& point : Treated(curve).p) mix(point[0] + point[1]);
+    }
+    EXPECT_EQ(14348890206054346473u, hash);
+}
+
+}  // namespace
