@@ -1,5 +1,5 @@
-#include "cli/diff.h"
-
+#include "cli/command.h"
+#include "cli/output.h"
 #include "cli/selection.h"
 #include "host/storeerror.h"
 #include "keystore/lookup.h"
@@ -80,8 +80,7 @@ std::string FirstDifference(StreamItem const& before, StreamItem const& after)
     return text.empty() ? FirstDifferenceOfKeys(*before.stream, *after.stream) : text;
 }
 
-}  // namespace
-
+// What differs between two scenes, a line for each stream. Times are compared as times, whatever their scale.
 std::string DifferencesOf(kfshost::Scene const& before, kfshost::Scene const& after)
 {
     std::unordered_map<std::string, StreamItem const*> others;
@@ -99,3 +98,31 @@ std::string DifferencesOf(kfshost::Scene const& before, kfshost::Scene const& af
         if (others.contains(item.path)) text += "+ " + item.path + '\n';
     return text;
 }
+
+struct Options {
+    Selection before;
+    Selection after;
+};
+
+int Run(Options const& options)
+{
+    std::string const text = DifferencesOf(LoadScene(options.before), LoadScene(options.after));
+    WriteToStandardOutput(text);
+    return text.empty() ? ExitDone : ExitFound;
+}
+
+Work Prepare(CLI::App& command)
+{
+    auto const options = std::make_shared<Options>();
+    command.add_option("BEFORE", options->before.file, "a project, or a .gltf, .glb or .bvh file")->required();
+    command.add_option("AFTER", options->after.file, "another one")->required();
+    command.footer(
+        "A line for each stream that differs: - only in BEFORE, + only in AFTER, ~ in both, with what differs first.\n"
+        "Keys show their values and, like (2/1), how the curve comes in and goes out: 1 linear, 2 spline, 3 hold.\n"
+        "The exit code is 0 if nothing differs and 1 if something does.");
+    return [options] { return Run(*options); };
+}
+
+}  // namespace
+
+Command const DiffCommand{"Look into files", "diff", "Tell how the streams of two files differ", Prepare};

@@ -1,4 +1,5 @@
-#include "cli/commands.h"
+#include "cli/command.h"
+#include "cli/options.h"
 #include "cli/output.h"
 #include "cli/table.h"
 #include "cli/usererror.h"
@@ -17,6 +18,16 @@ namespace {
 constexpr std::int64_t MaxSamples = 1'000'000;
 constexpr std::size_t MaxNumbers = 50'000'000;
 
+enum class Format { Table, Csv, Json };
+
+struct Options {
+    Selection selection;
+    std::string from;  // empty: the first key
+    std::string to;    // empty: the last key
+    std::string fps = "24";
+    Format format = Format::Table;
+};
+
 // Seconds, or frames with an "f" behind.
 Rational ParseTime(std::string const& text, char const* option, Rational const& fps)
 {
@@ -26,7 +37,7 @@ Rational ParseTime(std::string const& text, char const* option, Rational const& 
     return inFrames ? *number / fps : *number;
 }
 
-std::vector<Rational> SampleTimes(EvalOptions const& options, Rational const& fps, std::optional<TimeSpan> const& span)
+std::vector<Rational> SampleTimes(Options const& options, Rational const& fps, std::optional<TimeSpan> const& span)
 {
     TimeSpan const keys = span.value_or(TimeSpan{});
     Rational const from = options.from.empty() ? keys.first : ParseTime(options.from, "--from", fps);
@@ -170,17 +181,7 @@ std::string ToText(Evaluation const& evaluation, Format format)
     return ToTables(evaluation);
 }
 
-}  // namespace
-
-Rational ParseFps(std::string const& text)
-{
-    auto const fps = Rational::Parse(text);
-    if (!fps || *fps <= Rational())
-        throw UserError("--fps", '"' + text + "\" isn't a number of frames a second like 24 or 30000/1001");
-    return *fps;
-}
-
-void RunEval(EvalOptions const& options)
+int Run(Options const& options)
 {
     Rational const fps = ParseFps(options.fps);
     kfshost::Scene const scene = LoadScene(options.selection);
@@ -188,4 +189,38 @@ void RunEval(EvalOptions const& options)
     Evaluation evaluation{fps, SampleTimes(options, fps, SpanOf(items)), {}};
     evaluation.samples = TakeSamples(items, evaluation.times);
     WriteToStandardOutput(ToText(evaluation, options.format));
+    return ExitDone;
 }
+
+Format FormatNamed(std::string const& name)
+{
+    return name == "csv" ? Format::Csv : name == "json" ? Format::Json : Format::Table;
+}
+
+Work Prepare(CLI::App& command)
+{
+    auto const options = std::make_shared<Options>();
+    AddSelection(command, options->selection);
+    command
+        .add_option("--from", options->from,
+                    "first time: seconds like 0.5 or 1/24, or frames like 12f (default: first key)")
+        ->type_name("TIME");
+    command.add_option("--to", options->to, "last time (default: last key)")->type_name("TIME");
+    command.add_option("--fps", options->fps, "samples a second, like 24 or 30000/1001")
+        ->type_name("RATE")
+        ->capture_default_str();
+    command
+        .add_option_function<std::string>(
+            "--format", [options](std::string const& name) { options->format = FormatNamed(name); },
+            "how to print (default: table)")
+        ->check(CLI::IsMember({"table", "csv", "json"}))
+        ->type_name("FORMAT");
+    command.footer(
+        "Numbers are printed with as many digits as it takes to read the same number back. JSON gives times as\n"
+        "[numerator, denominator] in seconds, which is exact; tables print them as fractions or decimals.");
+    return [options] { return Run(*options); };
+}
+
+}  // namespace
+
+Command const EvalCommand{"Look into files", "eval", "Print values at regular times", Prepare};

@@ -1,4 +1,5 @@
-#include "cli/commands.h"
+#include "cli/command.h"
+#include "cli/options.h"
 #include "cli/output.h"
 #include "cli/table.h"
 #include "host/paths.h"
@@ -41,12 +42,10 @@ std::string Joined(std::vector<std::string> const& names)
     return names.size() > mostNames ? text + " ..." : text;
 }
 
-}  // namespace
-
-void RunInfo(InfoOptions const& options)
+int Run(Selection const& selection)
 {
-    kfshost::Scene const scene = LoadScene(options.selection);
-    auto const items = SelectStreams(scene, options.selection);
+    kfshost::Scene const scene = LoadScene(selection);
+    auto const items = SelectStreams(scene, selection);
     Table table({{"stream", Align::Left},
                  {"kind", Align::Left},
                  {"dimension", Align::Right},
@@ -63,4 +62,17 @@ void RunInfo(InfoOptions const& options)
                       keys == 0 ? "-" : TimeText(kfshost::KeyTime(*item->stream, keys - 1)), Interpolation(*item)});
     }
     WriteToStandardOutput(Summary(scene, items) + '\n' + table.ToText());
+    return ExitDone;
 }
+
+Work Prepare(CLI::App& command)
+{
+    auto const selection = std::make_shared<Selection>();
+    AddSelection(command, *selection);
+    return [selection] { return Run(*selection); };
+}
+
+}  // namespace
+
+Command const InfoCommand{"Look into files", "info", "List what is animated: streams, keys, span, interpolation",
+                          Prepare};

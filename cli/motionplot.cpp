@@ -1,7 +1,7 @@
-#include "cli/commands.h"
+#include "cli/drawing.h"
 #include "cli/motionsamples.h"
 #include "cli/motionviews.h"
-#include "cli/output.h"
+#include "cli/panel.h"
 #include "cli/usererror.h"
 #include "host/paths.h"
 
@@ -134,8 +134,8 @@ std::vector<Place> Dots(Motion const& motion, Rational const& step)
 
 class MotionPlot {
 public:
-    MotionPlot(PlotOptions const& options, kfshost::Scene const& scene, std::vector<StreamItem const*> const& all)
-        : fps_(ParseFps(options.fps)),
+    MotionPlot(DrawingOptions const& options, kfshost::Scene const& scene, std::vector<StreamItem const*> const& all)
+        : fps_(options.fps),
           unit_(MakeTimeUnit(options)),
           shown_(all.begin(), all.begin() + static_cast<std::ptrdiff_t>(std::min(all.size(), MostStreams))),
           time_(MakeTimeAxis(unit_, shown_)),
@@ -305,13 +305,12 @@ private:
 
 }  // namespace
 
-void RunMotionPlot(PlotOptions const& options)
+std::string DrawMotions(DrawingOptions const& options, kfshost::Scene const& scene)
 {
-    kfshost::Scene const scene = LoadScene(options.selection);
     auto items = SelectStreams(scene, options.selection);
     std::erase_if(items, [](StreamItem const* item) {
         return !item->stream->IsSpatial() || kfshost::KeyCount(*item->stream) == 0;
     });
     if (items.empty()) throw UserError(options.selection.file, "the chosen streams have no keys to draw");
-    WriteWholeFile(options.output, MotionPlot(options, scene, items).Draw());
+    return MotionPlot(options, scene, items).Draw();
 }

@@ -1,10 +1,9 @@
 #include "cli/panel.h"
 
-TimeUnit MakeTimeUnit(PlotOptions const& options)
+TimeUnit MakeTimeUnit(DrawingOptions const& options)
 {
     if (!options.inFrames) return {"seconds", 1.0, 0.0};
-    auto const fps = ParseFps(options.fps);
-    return {"frames at " + fps.ToString() + " a second", fps.ToDouble(), 1.0};
+    return {"frames at " + options.fps.ToString() + " a second", options.fps.ToDouble(), 1.0};
 }
 
 Axis MakeTimeAxis(TimeUnit const& unit, std::vector<kfshost::StreamItem const*> const& items)

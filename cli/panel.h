@@ -1,7 +1,7 @@
 #pragma once
 
 #include "cli/axis.h"
-#include "cli/commands.h"
+#include "cli/drawing.h"
 #include "cli/svg.h"
 
 #include <string>
@@ -17,8 +17,7 @@ struct TimeUnit {
     double perSecond;
     double leastStep;
 };
-// Throws UserError.
-TimeUnit MakeTimeUnit(PlotOptions const& options);
+TimeUnit MakeTimeUnit(DrawingOptions const& options);
 // The time axis for the keys of some streams.
 Axis MakeTimeAxis(TimeUnit const& unit, std::vector<kfshost::StreamItem const*> const& items);
 

@@ -1,7 +1,9 @@
 #include "cli/selection.h"
 
-#include "cli/usererror.h"
+#include "cli/errors.h"
+#include "host/import.h"
 #include "host/paths.h"
+#include "host/projectfile.h"
 
 #include <fmt/format.h>
 
@@ -34,22 +36,7 @@ void HoldAsPath(StreamItem& item, Selection const& selection)
     if (selection.roving) kfshost::LetInnerKeysFloat(*item.stream);
 }
 
-}  // namespace
-
-std::vector<StreamItem const*> SelectStreams(kfshost::Scene const& scene, Selection const& selection)
-{
-    std::vector<StreamItem const*> items;
-    for (StreamItem const& item : scene.streams)
-        if (Matches(item, selection)) items.push_back(&item);
-    if (scene.streams.empty()) throw UserError(selection.file, "nothing is animated");
-    if (items.empty()) {
-        throw UserError(selection.file,
-                        fmt::format("--stream {}: none of the {} streams has such a path (kfs info lists them)",
-                                    selection.glob, scene.streams.size()));
-    }
-    return items;
-}
-
+// Makes paths of those of the selected streams that are positions.
 void HoldAsPaths(kfshost::Scene& scene, Selection const& selection)
 {
     std::size_t const selected = SelectStreams(scene, selection).size();
@@ -66,6 +53,41 @@ void HoldAsPaths(kfshost::Scene& scene, Selection const& selection)
             selected == 1 ? "the chosen stream isn't a position in 2 or 3 dimensions"
                           : fmt::format("none of the {} chosen streams is a position in 2 or 3 dimensions", selected));
     }
+}
+
+// A project is known by how it begins, whatever its name is.
+kfshost::Scene ReadScene(Selection const& selection)
+{
+    if (!kfshost::IsProjectFile(selection.file)) return kfshost::ImportFile(selection.file, {selection.timeScale});
+    if (selection.timeScale != 0) throw UserError("--time-scale", "a project has the times with which it was imported");
+    return kfshost::TakeScene(kfshost::LoadProject(selection.file));
+}
+
+}  // namespace
+
+std::vector<StreamItem const*> SelectStreams(kfshost::Scene const& scene, Selection const& selection)
+{
+    std::vector<StreamItem const*> items;
+    for (StreamItem const& item : scene.streams)
+        if (Matches(item, selection)) items.push_back(&item);
+    if (scene.streams.empty()) throw UserError(selection.file, "nothing is animated");
+    if (items.empty()) {
+        throw UserError(selection.file,
+                        fmt::format("--stream {}: none of the {} streams has such a path (kfs info lists them)",
+                                    selection.glob, scene.streams.size()));
+    }
+    return items;
+}
+
+kfshost::Scene LoadScene(Selection const& selection)
+{
+    if (selection.roving && !selection.asPaths)
+        throw UserError("--rove", "only paths have keys that can float: add --as spatial");
+    return ReadingFile(selection.file, [&] {
+        kfshost::Scene scene = ReadScene(selection);
+        if (selection.asPaths) HoldAsPaths(scene, selection);
+        return scene;
+    });
 }
 
 std::optional<TimeSpan> SpanOf(std::vector<StreamItem const*> const& items)

@@ -15,11 +15,12 @@ struct Selection {
     bool roving = false;   // and their inner keys are to float; only with asPaths
 };
 
+// The scene of a selection's file, with paths where the selection asks for them. Throws UserError and what loading
+// throws.
+kfshost::Scene LoadScene(Selection const& selection);
+
 // The streams whose paths the pattern matches, in the scene's order. Throws UserError when there are none.
 std::vector<kfshost::StreamItem const*> SelectStreams(kfshost::Scene const& scene, Selection const& selection);
-
-// Makes paths of those of the selected streams that are positions. Throws UserError when there are none.
-void HoldAsPaths(kfshost::Scene& scene, Selection const& selection);
 
 struct TimeSpan {
     kfshost::Rational first;

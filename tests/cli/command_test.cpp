@@ -267,7 +267,7 @@ TEST(Kfs, HelpTellsTheCommandsAndTheirOptions)
 {
     Outcome const help = RunKfs({"--help"});
     EXPECT_EQ(0, help.code);
-    for (char const* word : {"info", "eval", "plot", "exit code 2"})
+    for (char const* word : {"info", "eval", "plot", "Exit codes"})
         EXPECT_NE(std::string::npos, help.output.find(word)) << word;
     Outcome const eval = RunKfs({"eval", "--help"});
     EXPECT_EQ(0, eval.code);

@@ -1,0 +1,43 @@
+// The one place where what went wrong becomes a line for the user and an exit code.
+#include "cli/errors.h"
+
+#include "cli/command.h"
+#include "frame/services/reports.h"
+#include "host/storeerror.h"
+
+#include <cstdio>
+#include <new>
+
+namespace {
+
+// It explains an error code, which alone says little.
+std::string firstReport;
+
+void RememberFirstReport(Q_Report const& report)
+{
+    if (firstReport.empty() && report.text) firstReport = report.text;
+}
+
+int Fail(std::string const& message)
+{
+    std::fprintf(stderr, "kfs: %s\n", message.c_str());
+    return ExitFailed;
+}
+
+}  // namespace
+
+void ListenToReports()
+{
+    Q_SetReportSink(RememberFirstReport);
+}
+
+int RunTold(std::function<int()> const& work)
+try {
+    return work();
+} catch (kfshost::StoreError const& error) {
+    return Fail(firstReport.empty() ? error.what() : error.what() + (": " + firstReport));
+} catch (std::bad_alloc const&) {
+    return Fail("out of memory");
+} catch (std::exception const& error) {
+    return Fail(error.what());
+}

@@ -1,0 +1,25 @@
+#pragma once
+
+#include "cli/usererror.h"
+#include "host/import_error.h"
+
+#include <functional>
+#include <string>
+#include <utility>
+
+// Runs what reads a file, and tells what is wrong with the file together with its name.
+template <class Read>
+auto ReadingFile(std::string const& fileName, Read&& read)
+{
+    try {
+        return std::forward<Read>(read)();
+    } catch (kfshost::ImportError const& error) {
+        throw UserError(fileName, error.what());
+    }
+}
+
+// Keeps what the library reports, for the line that RunTold writes. Of one process's first report.
+void ListenToReports();
+
+// Runs the work and answers its exit code. What it throws becomes one line on the standard error, and ExitFailed.
+int RunTold(std::function<int()> const& work);

@@ -1,0 +1,46 @@
+#include "host/import.h"
+
+#include "cli/command.h"
+#include "cli/errors.h"
+#include "cli/options.h"
+#include "cli/output.h"
+#include "host/projectfile.h"
+
+#include <fmt/format.h>
+
+namespace {
+
+struct Options {
+    std::string file;
+    std::string output;
+    unsigned int timeScale = 0;
+};
+
+int Run(Options const& options)
+{
+    if (options.output == "-") throw UserError("-o", "a project goes into a file, not to the standard output");
+    RefuseToOverwrite(options.file, options.output);
+    kfshost::Scene scene =
+        ReadingFile(options.file, [&] { return kfshost::ImportFile(options.file, {options.timeScale}); });
+    std::size_t keys = 0;
+    for (kfshost::StreamItem const& item : scene.streams)
+        keys += static_cast<std::size_t>(kfshost::KeyCount(*item.stream));
+    std::string const summary = fmt::format(
+        "{}: {}, {}\n", options.output, Plural(scene.streams.size(), "stream", "streams"), Plural(keys, "key", "keys"));
+    kfshost::SaveProject(*kfshost::MakeTree(std::move(scene)), options.output);
+    WriteToStandardOutput(summary);
+    return ExitDone;
+}
+
+Work Prepare(CLI::App& command)
+{
+    auto const options = std::make_shared<Options>();
+    command.add_option("FILE", options->file, "a .gltf, .glb or .bvh file")->required();
+    AddOutput(command, options->output, "the project file", "PROJECT");
+    AddTimeScale(command, options->timeScale);
+    return [options] { return Run(*options); };
+}
+
+}  // namespace
+
+Command const ImportCommand{"Make and check projects", "import", "Save the animation of a file as a project", Prepare};

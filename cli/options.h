@@ -1,0 +1,18 @@
+#pragma once
+
+#include "cli/selection.h"
+#include "host/rational.h"
+
+#include <CLI/CLI.hpp>
+
+#include <string>
+
+// Options that several commands have.
+
+// The file, which streams of it, and in which form.
+void AddSelection(CLI::App& command, Selection& selection);
+void AddTimeScale(CLI::App& command, unsigned int& timeScale);
+CLI::Option* AddOutput(CLI::App& command, std::string& output, std::string const& what, std::string const& typeName);
+
+// "24" or "30000/1001", above 0. Throws UserError.
+kfshost::Rational ParseFps(std::string const& text);
