@@ -23,6 +23,8 @@ foreach(folder IN LISTS installedFolders)
 endforeach()
 file(GLOB topHeader CONFIGURE_DEPENDS "${PROJECT_SOURCE_DIR}/kfs.h")
 install(FILES ${topHeader} DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/kfs)
+# Headers that have moved keep their old names too.
+install(DIRECTORY "${PROJECT_SOURCE_DIR}/cmake/forward/" DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/kfs)
 
 set(packageFolder ${CMAKE_INSTALL_LIBDIR}/cmake/kfs)
 install(EXPORT kfsTargets NAMESPACE kfs:: DESTINATION ${packageFolder})

@@ -3,6 +3,7 @@
 #include "frame/boundary_private.h"
 #include "frame/report_private.h"
 #include "keystore/cache_private.h"
+#include "keystore/check_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/valuedata_private.h"
 

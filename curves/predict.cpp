@@ -1,6 +1,7 @@
 #include "curves/neighbours_private.h"
 #include "curves/update.h"
 #include "frame/report_private.h"
+#include "keystore/check_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/pins_private.h"
 

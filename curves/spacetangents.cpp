@@ -4,6 +4,7 @@
 #include "frame/boundary_private.h"
 #include "frame/report_private.h"
 #include "keystore/cache_private.h"
+#include "keystore/check_private.h"
 #include "keystore/edit_private.h"
 #include "keystore/items_private.h"
 #include "keystore/keylist_private.h"

@@ -7,6 +7,7 @@
 #include "curves/segment_private.h"
 #include "curves/spatial_private.h"
 #include "frame/report_private.h"
+#include "keystore/check_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/pins_private.h"
 #include "keystore/valuedata_private.h"

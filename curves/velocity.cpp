@@ -2,6 +2,7 @@
 #include "curves/keyhandles_private.h"
 #include "curves/neighbours_private.h"
 #include "curves/tangents.h"
+#include "keystore/check_private.h"
 #include "keystore/curvehooks_private.h"
 #include "keystore/edit_private.h"
 #include "keystore/items_private.h"

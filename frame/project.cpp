@@ -1,6 +1,5 @@
 #include "frame/project.h"
 
-#include "keystore/expstate.h"
 #include "overrides/parambag.h"
 #include "tree/streambase.h"
 
@@ -105,21 +104,4 @@ void KFS_CapsuleOverrides::MergeInScopedCapsuleParamBag(Q_ScSetReset<KFS_ParamBa
     KFS_ParamBag const merged(*bag_, bag);
     scope.Arm(bag_.get());
     *bag_ = merged;
-}
-
-KFS_DetectExpressionErrors::KFS_DetectExpressionErrors(KFS_ExpState const* state)
-    : state_(state),
-      saved_(state->detectingErrors)
-{
-    state_->detectingErrors = true;
-}
-
-KFS_DetectExpressionErrors::KFS_DetectExpressionErrors(boost::shared_ptr<KFS_ExpState> const& state)
-    : KFS_DetectExpressionErrors(state.get())
-{}
-
-KFS_DetectExpressionErrors::~KFS_DetectExpressionErrors()
-{
-    state_->detectingErrors = saved_;
-    if (!saved_) state_->errorCount = 0;
 }

@@ -8,7 +8,6 @@
 #include <boost/shared_ptr.hpp>
 
 class KFS_Context;
-class KFS_ExpState;
 class KFS_ParamBag;
 class KFS_StreamBase;
 
@@ -100,19 +99,4 @@ public:
 
 private:
     Q_ScAutoPtr<KFS_ParamBag> bag_;
-};
-
-// For a scope, expression errors are looked for rather than reported. Scopes nest; the end of the outermost clears the
-// error count.
-class KFS_API KFS_DetectExpressionErrors {
-public:
-    explicit KFS_DetectExpressionErrors(KFS_ExpState const* state);
-    explicit KFS_DetectExpressionErrors(boost::shared_ptr<KFS_ExpState> const& state);
-    ~KFS_DetectExpressionErrors();
-    KFS_DetectExpressionErrors(KFS_DetectExpressionErrors const&) = delete;
-    KFS_DetectExpressionErrors& operator=(KFS_DetectExpressionErrors const&) = delete;
-
-private:
-    KFS_ExpState const* state_;
-    bool saved_;
 };

@@ -1,7 +1,6 @@
 #include "frame/report_private.h"
 
 #include "frame/services/reports.h"
-#include "keystore/stream.h"
 
 #include <algorithm>
 #include <array>
@@ -50,13 +49,6 @@ void FormatRow(short row, Value value)
 }
 
 }  // namespace
-
-int KFSp_CheckStream(short operation, KFS_Stream const* stream, short messageIndex)
-{
-    if (stream->GetStamp() == KFS_StreamValidStamp) [[likely]]
-        return 0;
-    return KFSp_ReportErr(operation, KFS_Err_DamagedStream, messageIndex);
-}
 
 int KFSp_ReportErr(int operation, int error, short argument)
 {

@@ -3,8 +3,6 @@
 #include "frame/errors.h"
 #include "frame/messages_private.h"
 
-class KFS_Stream;
-
 // Operation numbers: the low half of a report's id says which operation failed. They are part of the interface towards
 // whoever reads the reports; numbers that no operation uses are free.
 enum KFSp_Op : short {
@@ -97,10 +95,6 @@ constexpr int KFSp_ReportId(int operation)
 {
     return (operation & 0xFFFF) | KFSp_ModuleId;
 }
-
-// 0 if the stream's validity stamp is right, else reports code 2 and returns it. Reads nothing of the stream but the
-// stamp.
-int KFSp_CheckStream(short operation, KFS_Stream const* stream, short messageIndex);
 
 // Reports `error` and returns it; 0 reports nothing. `argument` is the row that fills the sentence's `%s`, or for
 // KFS_Err_InterpNotAllowed the refused code itself.

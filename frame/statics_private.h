@@ -4,8 +4,8 @@
 
 #include <boost/thread/tss.hpp>
 
-// Objects that are made when the library loads and outlive KFS_Birth .. KFS_Death. They stand in one file because their
-// order counts.
+// Objects that are made when the library loads and outlive KFS_Birth .. KFS_Death. They stand in one file, because their
+// order counts, in the highest folder that has some (keystore/statics.cpp).
 
 // Non-zero while a look-up on this thread is inside an update pass; null until first used.
 boost::thread_specific_ptr<int>& KFSp_GetTimeToIndexCheck();

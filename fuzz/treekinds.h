@@ -3,10 +3,10 @@
 #include "frame/boundary_private.h"
 #include "frame/frame.h"
 #include "keystore/edit.h"
+#include "keystore/paramstreams.h"
 #include "tree/factory.h"
 #include "tree/indexedgroup.h"
 #include "tree/namedgroup.h"
-#include "tree/paramstreams.h"
 
 #include <memory>
 #include <vector>

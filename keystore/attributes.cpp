@@ -4,6 +4,7 @@
 #include "frame/report_private.h"
 #include "keystore/attributes_private.h"
 #include "keystore/cache_private.h"
+#include "keystore/check_private.h"
 #include "keystore/items_private.h"
 
 #include <climits>

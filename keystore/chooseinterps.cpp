@@ -1,4 +1,5 @@
 #include "frame/report_private.h"
+#include "keystore/check_private.h"
 #include "keystore/edit.h"
 #include "keystore/edit_private.h"
 #include "keystore/keylist_private.h"

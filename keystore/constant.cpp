@@ -2,6 +2,7 @@
 #include "frame/report_private.h"
 #include "frame/services/reports.h"
 #include "keystore/cache_private.h"
+#include "keystore/check_private.h"
 #include "keystore/edit_private.h"
 #include "keystore/items.h"
 #include "keystore/savedrecords_private.h"

@@ -3,6 +3,7 @@
 #include "frame/report_private.h"
 #include "frame/services/reports.h"
 #include "keystore/cache_private.h"
+#include "keystore/check_private.h"
 #include "keystore/copyundo_private.h"
 #include "keystore/edit.h"
 #include "keystore/edit_private.h"

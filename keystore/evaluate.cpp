@@ -6,6 +6,7 @@
 #include "frame/services/memory.h"
 #include "frame/timehelpers.h"
 #include "keystore/cache_private.h"
+#include "keystore/check_private.h"
 #include "keystore/expstate.h"
 #include "keystore/items_private.h"
 #include "keystore/keylist_private.h"

@@ -48,3 +48,18 @@ public:
 protected:
     KFS_ExpState() = default;
 };
+
+// For a scope, expression errors are looked for rather than reported. Scopes nest; the end of the outermost clears the
+// error count.
+class KFS_API KFS_DetectExpressionErrors {
+public:
+    explicit KFS_DetectExpressionErrors(KFS_ExpState const* state);
+    explicit KFS_DetectExpressionErrors(boost::shared_ptr<KFS_ExpState> const& state);
+    ~KFS_DetectExpressionErrors();
+    KFS_DetectExpressionErrors(KFS_DetectExpressionErrors const&) = delete;
+    KFS_DetectExpressionErrors& operator=(KFS_DetectExpressionErrors const&) = delete;
+
+private:
+    KFS_ExpState const* state_;
+    bool saved_;
+};

@@ -1,3 +1,4 @@
+#include "keystore/check_private.h"
 #include "keystore/items_private.h"
 
 #include "frame/report_private.h"

@@ -2,6 +2,7 @@
 
 #include "frame/report_private.h"
 #include "keystore/cache_private.h"
+#include "keystore/check_private.h"
 #include "keystore/curvehooks_private.h"
 #include "keystore/edit_private.h"
 #include "keystore/keylist_private.h"

@@ -1,3 +1,4 @@
+#include "keystore/check_private.h"
 #include "keystore/lookup.h"
 
 #include "frame/boundary_private.h"

@@ -1,3 +1,4 @@
+#include "keystore/check_private.h"
 #include "keystore/keywalk_private.h"
 
 #include "frame/boundary_private.h"

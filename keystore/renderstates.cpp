@@ -12,6 +12,23 @@ KFS_ExpState::~KFS_ExpState() = default;
 
 KFS_ExprContext::~KFS_ExprContext() = default;
 
+KFS_DetectExpressionErrors::KFS_DetectExpressionErrors(KFS_ExpState const* state)
+    : state_(state),
+      saved_(state->detectingErrors)
+{
+    state_->detectingErrors = true;
+}
+
+KFS_DetectExpressionErrors::KFS_DetectExpressionErrors(boost::shared_ptr<KFS_ExpState> const& state)
+    : KFS_DetectExpressionErrors(state.get())
+{}
+
+KFS_DetectExpressionErrors::~KFS_DetectExpressionErrors()
+{
+    state_->detectingErrors = saved_;
+    if (!saved_) state_->errorCount = 0;
+}
+
 KFSp_RenderStates const& KFSp_GetRenderStates(Q_RenderContext const* context)
 {
     thread_local std::uint64_t knownStamp = 0;

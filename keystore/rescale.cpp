@@ -4,6 +4,7 @@
 #include "frame/report_private.h"
 #include "frame/timehelpers.h"
 #include "keystore/cache_private.h"
+#include "keystore/check_private.h"
 #include "keystore/edit.h"
 #include "keystore/keylist_private.h"
 #include "keystore/pins_private.h"

@@ -7,6 +7,7 @@
 #include "keystore/attributes_private.h"
 #include "keystore/cache_private.h"
 #include "keystore/cachestate.h"
+#include "keystore/check_private.h"
 #include "keystore/curvehooks_private.h"
 #include "keystore/edit_private.h"
 #include "keystore/items_private.h"

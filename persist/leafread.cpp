@@ -4,6 +4,7 @@
 #include "frame/services/chunkfile.h"
 #include "frame/services/reports.h"
 #include "keystore/cache_private.h"
+#include "keystore/check_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/stream.h"
 #include "keystore/valuedata_private.h"

@@ -4,7 +4,9 @@
 #include "frame/services/chunkfile.h"
 #include "frame/services/reports.h"
 #include "keystore/cache_private.h"
+#include "keystore/check_private.h"
 #include "keystore/items.h"
+#include "keystore/paramstreams.h"
 #include "keystore/stream.h"
 #include "keystore/valuedata_private.h"
 #include "persist/keyrecords_private.h"
@@ -12,7 +14,6 @@
 #include "persist/longs_private.h"
 #include "persist/streamdisk_private.h"
 #include "persist/versions_private.h"
-#include "tree/paramstreams.h"
 
 namespace {
 

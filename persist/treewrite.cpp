@@ -1,9 +1,9 @@
 #include "frame/boundary_private.h"
 #include "frame/services/chunkfile.h"
+#include "keystore/paramstreams.h"
 #include "keystore/stream.h"
 #include "persist/leafchunks_private.h"
 #include "tree/factory.h"
-#include "tree/paramstreams.h"
 #include "tree/streamgroup.h"
 
 // A group in a file:

@@ -1,5 +1,6 @@
 #include "frame/report_private.h"
 
+#include "keystore/check_private.h"
 #include "tests/support/streams.h"
 
 #include <cstring>

@@ -2,11 +2,11 @@
 
 #include "frame/frame.h"
 #include "frame/services/byteorder.h"
+#include "keystore/paramstreams.h"
 #include "overrides/streamexpression.h"
 #include "persist/oldstreamid.h"
 #include "tests/persist/leaffile.h"
 #include "tests/support/ownedvalues.h"
-#include "tree/paramstreams.h"
 
 #include <limits>
 

@@ -1,8 +1,8 @@
 #include "tree/streamgroup.h"
 
+#include "keystore/paramstreams.h"
 #include "tests/persist/treefile.h"
 #include "tests/support/notifications.h"
-#include "tree/paramstreams.h"
 
 #include <limits>
 #include <utility>

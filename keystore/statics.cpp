@@ -7,7 +7,8 @@
 
 using hearth::utility::ImmutableString;
 
-// The order of these definitions is the order in which they are made at load.
+// All objects that are made when the library loads. The order of these definitions is the order in which they are made,
+// so they stand in one file, which belongs to the highest folder that has such objects.
 
 ImmutableString const KFS_ExpState::S_StateName = ImmutableString::Create("ExpState");
 ImmutableString const KFS_RenderState::S_StateName = ImmutableString::Create("RenderState");

@@ -1,4 +1,4 @@
-#include "tree/paramstreams.h"
+#include "keystore/paramstreams.h"
 
 #include "frame/frame.h"
 #include "frame/frame_private.h"
