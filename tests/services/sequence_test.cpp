@@ -1,67 +1,74 @@
+// Lists against a vector under random scripts, with items that own something and everything that can fail failing; and
+// the few rules that no script comes by.
+#include "tests/services/chunkbytes.h"
+#include "tests/support/dice.h"
+
 #include "frame/services/memory.h"
 #include "frame/services/sequence.h"
 
-#include <gtest/gtest.h>
-
 #include <algorithm>
 #include <climits>
-#include <cstdint>
 #include <cstring>
-#include <random>
-#include <utility>
+#include <functional>
 #include <vector>
 
 namespace {
 
-// A list of ints in items of a given size; the int stands at the front and the rest of an item is its shadow, so that a
-// move that loses bytes shows.
-class IntList {
-public:
-    explicit IntList(short itemSize = 8, std::vector<int> const& values = {})
-    {
-        EXPECT_EQ(0, SEQ_New(0, itemSize, 4, 1, &list_));
-        for (int const value : values) EXPECT_EQ(0, SEQ_Insert(Item(value).data(), -1, list_));
-    }
-    explicit IntList(SEQ_Head** list) : list_(list) {}
-    IntList(IntList const&) = delete;
-    IntList& operator=(IntList const&) = delete;
-    ~IntList()
-    {
-        if (list_) SEQ_Dispose(list_, 0);
-    }
+constexpr int CopyFailed = 501, DisposeFailed = 502;
 
-    SEQ_Head** get() const { return list_; }
-    SEQ_Head** release() { return std::exchange(list_, nullptr); }
-    int Count() const { return (*list_)->count; }
+// What items own: each holds the number of a token, 0 for none. Copies and disposals can be made to fail.
+struct Tokens {
+    std::vector<int> values = {0};  // by token; -1 once disposed
+    int failCopyIn = 0, failDisposeIn = 0;
 
-    std::vector<unsigned char> Item(int value) const
+    int Make(int value)
     {
-        std::vector<unsigned char> item(static_cast<std::size_t>((*list_)->itemSize));
-        for (std::size_t i = 0; i < item.size(); ++i)
-            item[i] = static_cast<unsigned char>(value * 31 + static_cast<int>(i));
-        std::memcpy(item.data(), &value, std::min(item.size(), sizeof value));
-        return item;
+        values.push_back(value);
+        return static_cast<int>(values.size()) - 1;
     }
-
-    // The values, read item by item; -1 for an item whose shadow is wrong.
-    std::vector<int> Values() const
+    int ValueIn(void const* item) const
     {
-        std::vector<int> values;
-        for (int i = 0; i < Count(); ++i) {
-            void const* address = nullptr;
-            EXPECT_EQ(0, SEQ_GetConstAddress(list_, i, &address));
-            int value = 0;
-            std::memcpy(&value, address, std::min<std::size_t>(sizeof value, Item(0).size()));
-            values.push_back(std::memcmp(address, Item(value).data(), Item(value).size()) == 0 ? value : -1);
-        }
-        return values;
+        int token;
+        std::memcpy(&token, item, sizeof token);
+        return values.at(static_cast<std::size_t>(token));
     }
-
-private:
-    SEQ_Head** list_ = nullptr;
+    auto Alive() const
+    {
+        return std::count_if(
+            values.begin() + 1, values.end(), [](int value) { return value >= 0; });
+    }
 };
 
-int CompareInts(void*, SEQ_Head const* const*, void const* a, void const* b)
+bool Falls(int& countdown)
+{
+    return countdown > 0 && --countdown == 0;
+}
+
+int Copy(void* refcon, SEQ_Head const* const* list, void const* source, void* destination)
+{
+    Tokens& tokens = *static_cast<Tokens*>(refcon);
+    EXPECT_EQ(refcon, (*list)->refcon) << "the function finds the owner from the list it is given";
+    if (Falls(tokens.failCopyIn)) return CopyFailed;
+    int const value = tokens.ValueIn(source);
+    EXPECT_GE(value, 0) << "copied after disposal";
+    int const token = value == 0 ? 0 : tokens.Make(value);
+    std::memcpy(destination, source, static_cast<std::size_t>((*list)->itemSize));
+    std::memcpy(destination, &token, sizeof token);
+    return 0;
+}
+
+int Dispose(void* refcon, SEQ_Head**, void* item)
+{
+    Tokens& tokens = *static_cast<Tokens*>(refcon);
+    if (Falls(tokens.failDisposeIn)) return DisposeFailed;
+    int token;
+    std::memcpy(&token, item, sizeof token);
+    EXPECT_GE(tokens.values.at(static_cast<std::size_t>(token)), 0) << "disposed twice";
+    if (token != 0) tokens.values[static_cast<std::size_t>(token)] = -1;
+    return 0;
+}
+
+int Compare(void*, SEQ_Head const* const*, void const* a, void const* b)
 {
     int left, right;
     std::memcpy(&left, a, sizeof left);
@@ -69,349 +76,385 @@ int CompareInts(void*, SEQ_Head const* const*, void const* a, void const* b)
     return (left > right) - (left < right);
 }
 
-void SetSort(SEQ_Head** list, SEQ_SortFunc sort = CompareInts)
+// An item: a number, and behind it bytes that follow from the value, so that a move that loses bytes shows.
+std::string Item(std::size_t size, int number, int value)
 {
-    SEQ_Funcs const funcs{nullptr, nullptr, sort};
-    ASSERT_EQ(0, SEQ_SetFuncs(list, 3, &funcs));
+    std::string item(size, '\0');
+    for (std::size_t i = 0; value != 0 && i < size; ++i) item[i] = static_cast<char>(value * 31 + static_cast<int>(i));
+    std::memcpy(item.data(), &number, std::min(size, sizeof number));
+    return item;
 }
 
-// ---- search
-
-TEST(SequenceSearch, AgreesWithTheStandardLibraryAtEveryCount)
-{
-    std::mt19937 random(11);
-    for (int count = 0; count < 70; ++count) {
-        std::vector<int> items(static_cast<std::size_t>(count));
-        for (int& item : items) item = static_cast<int>(random() % 60) * 2;
-        std::sort(items.begin(), items.end());
-        IntList const list(count % 2 ? 8 : 12, items);
-        SetSort(list.get());
-        for (int probe = -1; probe <= 121; ++probe) {
-            auto const place = std::lower_bound(items.begin(), items.end(), probe);
-            unsigned char found = 0;
-            int index = -1;
-            ASSERT_EQ(0, SEQ_GetSortedConstItem(list.get(), 0, list.Item(probe).data(), &found, 0, &index));
-            ASSERT_EQ(place - items.begin(), index) << count << " items, probe " << probe;
-            ASSERT_EQ(place != items.end() && *place == probe, found == 1) << count << " items, probe " << probe;
-        }
+class List {
+public:
+    explicit List(int itemSize, std::vector<int> const& values = {}) : size_(static_cast<std::size_t>(itemSize))
+    {
+        EXPECT_EQ(0, SEQ_New(0, static_cast<short>(itemSize), 4, 1, &list_));
+        for (int const value : values) EXPECT_EQ(0, SEQ_Insert(Item(size_, value, value).data(), -1, list_));
     }
-}
-
-// ---- indices
-
-TEST(SequenceIndex, OnlyIndicesInTheListAreTaken)
-{
-    int const asked[] = {INT_MIN, INT_MIN + 1, -2, -1, 0, 1, 2, 3, INT_MAX};
-    for (int const count : {0, 1, 3})
-        for (int const index : asked) {
-            SCOPED_TRACE(testing::Message() << count << " items, index " << index);
-            std::vector<int> values(static_cast<std::size_t>(count));
-            for (int i = 0; i < count; ++i) values[static_cast<std::size_t>(i)] = 100 + i;
-            IntList const list(8, values);
-            bool const inList = index >= 0 && index < count;
-            bool const namesLast = index == -1 && count > 0;
-
-            void* item = nullptr;
-            void const* constItem = nullptr;
-            unsigned char copy[8];
-            int const code = inList ? 0 : SEQ_Err_BadIndex;
-            EXPECT_EQ(code, SEQ_GetAddress(list.get(), index, 1, &item));
-            EXPECT_EQ(inList ? 1 : 0, SEQ_GetPinCount(list.get())) << "a failure owes no unlock";
-            EXPECT_EQ(namesLast ? 0 : code, SEQ_GetConstAddress(list.get(), index, &constItem));
-            EXPECT_EQ(inList, item != nullptr && item == constItem);
-            if (constItem) {
-                int const wanted = namesLast ? values.back() : values[static_cast<std::size_t>(index)];
-                EXPECT_EQ(0, std::memcmp(list.Item(wanted).data(), constItem, 8));
-            }
-            EXPECT_EQ(code, SEQ_GetItemCopy(list.get(), 0, index, copy));
-            if (!inList) {
-                auto const unvisited = [](SEQ_Head**, long, int, void*) { return 77; };
-                EXPECT_EQ(code, SEQ_SetItemCopy(list.Item(5).data(), index, list.get(), 0, 0));
-                EXPECT_EQ(code, SEQ_Remove(index, list.get(), 0, nullptr));
-                EXPECT_EQ(code, SEQ_ForRange(list.get(), index, index, 0, unvisited, nullptr));
-            }
-            bool const insertable = index >= -1 && index <= count;
-            EXPECT_EQ(insertable ? 0 : SEQ_Err_BadIndex, SEQ_InsertCopy(list.Item(5).data(), index, list.get(), 0));
-            EXPECT_EQ(insertable ? count + 1 : count, list.Count());
-        }
-}
-
-TEST(SequenceNew, RefusesItemSizesThatAreNone)
-{
-    for (short const size : {SHRT_MIN, -1, 0}) {
-        SEQ_Head** list = nullptr;
-        EXPECT_EQ(SEQ_Err_BadArgument, SEQ_New(0, size, 4, 1, &list));
-        EXPECT_EQ(nullptr, list);
+    List(List const&) = delete;
+    List& operator=(List const&) = delete;
+    ~List() { SEQ_Dispose(list_, 0); }
+    operator SEQ_Head**() const { return list_; }
+    void const* At(int index) const
+    {
+        void const* item = nullptr;
+        EXPECT_EQ(0, SEQ_GetConstAddress(list_, index, &item));
+        return item;
     }
-}
+    // The numbers, read item by item; -1 where the bytes behind are wrong.
+    std::vector<int> Values(Tokens const* tokens = nullptr, SEQ_Head** other = nullptr) const
+    {
+        std::vector<int> values;
+        SEQ_Head** const list = other ? other : list_;
+        for (int i = 0; i < (*list)->count; ++i) {
+            void const* item = nullptr;
+            EXPECT_EQ(0, SEQ_GetConstAddress(list, i, &item));
+            int number = 0;
+            std::memcpy(&number, item, std::min(size_, sizeof number));
+            int const value = tokens ? tokens->ValueIn(item) : number;
+            values.push_back(std::memcmp(item, Item(size_, number, value).data(), size_) == 0 ? value : -1);
+        }
+        return values;
+    }
 
-TEST(SequenceFuncs, NullLeavesAndRemoveTakesAway)
-{
-    IntList const list(8, {1, 2, 3});
-    unsigned char found = 0;
-    int index = 0;
-    auto const search = [&] { return SEQ_GetSortedItem(list.get(), 0, list.Item(9).data(), &found, 0, &index); };
+private:
+    std::size_t size_;
+    SEQ_Head** list_ = nullptr;
+};
 
-    SetSort(list.get());
-    EXPECT_EQ(0, search());
-    EXPECT_EQ(3, index);
-    SEQ_Funcs const removeOthers{SEQ_RemoveFunc, SEQ_RemoveFunc, nullptr};
-    EXPECT_EQ(0, SEQ_SetFuncs(list.get(), 3, &removeOthers));
-    EXPECT_EQ(0, search());
-    EXPECT_EQ(3, index) << "the sort function stays";
-    SetSort(list.get(), [](void*, SEQ_Head const* const*, void const* a, void const* b) {
-        return CompareInts(nullptr, nullptr, b, a);
-    });
-    EXPECT_EQ(0, search());
-    EXPECT_EQ(0, index) << "the other order";
-    SetSort(list.get(), SEQ_RemoveFunc);
-    found = 77;
-    index = 77;
-    EXPECT_EQ(SEQ_Err_NoSortFunc, search());
-    EXPECT_EQ(std::pair(77, 77), std::pair(int{found}, index)) << "nothing is answered";
-}
+// Each edit may be made to fail by a copy, by a disposal or for want of memory. The list must then be what it was, with
+// nothing leaked and nothing disposed twice.
+class Script {
+public:
+    Script(int itemSize, bool owns)
+        : dice_(static_cast<std::uint64_t>(itemSize)),
+          size_(static_cast<std::size_t>(itemSize)),
+          owns_(owns),
+          list_(itemSize)
+    {
+        SEQ_Funcs const funcs{owns ? Copy : nullptr, owns ? Dispose : nullptr, Compare};
+        EXPECT_EQ(0, SEQ_SetFuncs(list_, 3, &funcs));
+        EXPECT_EQ(0, SEQ_SetRefcon(&tokens_, list_));
+    }
+    ~Script()
+    {
+        EXPECT_EQ(0, SEQ_SetNumItems(0, list_, 0));
+        EXPECT_EQ(0, tokens_.Alive());
+    }
+    int Failures() const { return failures_; }
 
-// ---- an item of the list as the source
+    void Step()
+    {
+        int const count = static_cast<int>(model_.size()), index = dice_.Below(count + 4) - 2;
+        bool const inList = index >= 0 && index < count, insertable = index >= -1 && index <= count;
+        int value = 1 + dice_.Below(100000);
+        int const number = owns_ ? tokens_.Make(value) : value;
+        std::string const outside = Item(size_, number, value);
+        void const* source = outside.data();
+        if (count > 0 && dice_.Below(3) == 0) {  // an item of the list itself
+            int const from = dice_.Below(count);
+            source = list_.At(from);
+            value = model_[static_cast<std::size_t>(from)];
+        }
+        wanted_ = model_;
+        bool took = false;
+        switch (dice_.Below(9)) {
+        case 0:
+        case 1:
+            Arm();
+            Expect(insertable, SEQ_InsertCopy(source, index, list_, 0));
+            if (insertable) wanted_.insert(index == -1 ? wanted_.end() : wanted_.begin() + index, value);
+            break;
+        case 2: {
+            bool const plain = !owns_ || source == outside.data();  // what is taken over can't be owned twice
+            Arm();
+            Expect(insertable, SEQ_Insert(plain ? source : outside.data(), index, list_));
+            if (insertable)
+                wanted_.insert(index == -1 ? wanted_.end() : wanted_.begin() + index,
+                               plain ? value : tokens_.ValueIn(outside.data()));
+            took = code_ == 0;
+            break;
+        }
+        case 3:
+            Arm();
+            Expect(inList, SEQ_SetItemCopy(source, index, list_, 0, 0));
+            if (inList) wanted_[static_cast<std::size_t>(index)] = value;
+            break;
+        case 4:
+            Arm();
+            Expect(inList, SEQ_Remove(index, list_, 0, nullptr));
+            if (inList) wanted_.erase(wanted_.begin() + index);
+            break;
+        case 5: {
+            std::string moved(size_, '\0');
+            auto const alive = tokens_.Alive();
+            Expect(inList, SEQ_Remove(index, list_, 0, moved.data()));
+            if (!inList) break;
+            EXPECT_EQ(alive, tokens_.Alive()) << "what moves out isn't disposed";
+            EXPECT_EQ(Item(size_, Number(moved), model_[static_cast<std::size_t>(index)]), moved);
+            if (owns_) Dispose(&tokens_, list_, moved.data());
+            wanted_.erase(wanted_.begin() + index);
+            break;
+        }
+        case 6: {
+            int const size = dice_.Below(2) ? count / 2 : count + dice_.Below(6);
+            Arm();
+            Expect(true, SEQ_SetNumItems(size, list_, 0));
+            wanted_.resize(static_cast<std::size_t>(size));
+            if (code_ == DisposeFailed) model_.resize(static_cast<std::size_t>((*list_)->count));  // how far it came
+            break;
+        }
+        case 7:
+            Arm();
+            Expect(true, dice_.Below(2) ? SEQ_Compact(list_) : SEQ_ReserveSpace(count + dice_.Below(20), list_));
+            break;
+        case 8: Duplicate(); break;
+        }
+        Q_FailAllocation(0);
+        tokens_.failCopyIn = tokens_.failDisposeIn = 0;
+        if (owns_ && !took) Dispose(&tokens_, list_, const_cast<char*>(outside.data()));
+        if (code_ == 0) model_ = wanted_;
+        failures_ += code_ != 0;
+        ASSERT_EQ(model_, list_.Values(owns_ ? &tokens_ : nullptr)) << "code " << code_;
+        ASSERT_EQ(owns_ ? std::count_if(model_.begin(), model_.end(), [](int v) { return v != 0; }) : 0,
+                  tokens_.Alive());
+        Look(index);
+    }
 
-TEST(SequenceEdits, AnItemOfTheListCanBeTheSource)
-{
-    std::vector<int> const start = {11, 22, 33, 44};  // a full first block: the insertion moves it
-    for (bool const full : {false, true})
-        for (int from = 0; from < 4; ++from)
-            for (int to = 0; to <= 4; ++to) {
-                IntList const list(24, start);
-                if (!full) SEQ_ReserveSpace(40, list.get());
-                void const* source = nullptr;
-                ASSERT_EQ(0, SEQ_GetConstAddress(list.get(), from, &source));
-                ASSERT_EQ(0, SEQ_InsertCopy(source, to, list.get(), 0));
-                std::vector<int> wanted = start;
-                wanted.insert(wanted.begin() + to, start[static_cast<std::size_t>(from)]);
-                EXPECT_EQ(wanted, list.Values()) << "from " << from << " to " << to;
-
-                ASSERT_EQ(0, SEQ_GetConstAddress(list.get(), from, &source));
-                ASSERT_EQ(0, SEQ_SetItemCopy(source, to, list.get(), 0, 0));
-                wanted[static_cast<std::size_t>(to)] = wanted[static_cast<std::size_t>(from)];
-                EXPECT_EQ(wanted, list.Values()) << "set from " << from << " to " << to;
-            }
-}
-
-// ---- walking
-
-TEST(SequenceWalk, ARangeGoesEitherWayAndStopsOnOrder)
-{
-    const struct {
-        int first, last, stopAt;
-        std::vector<int> visited;
-        int code, lastVisited;
-    } walks[] = {
-        {3, 1, -1, {3, 2, 1}, 0, 1},           {1, 3, -1, {1, 2, 3}, 0, 3}, {2, 2, -1, {2}, 0, 2},
-        {0, 4, 2, {0, 1, 2}, 99, 2},           {4, 0, 4, {4}, 99, 4},       {0, 5, -1, {}, SEQ_Err_BadIndex, 77},
-        {-1, 2, -1, {}, SEQ_Err_BadIndex, 77},
-    };
-    static std::vector<int> visited;
-    IntList const list(8, {100, 101, 102, 103, 104});
-    for (auto const& walk : walks) {
-        SCOPED_TRACE(testing::Message() << walk.first << " to " << walk.last << ", stop at " << walk.stopAt);
+private:
+    static int Number(std::string const& item)
+    {
+        int number;
+        std::memcpy(&number, item.data(), sizeof number);
+        return number;
+    }
+    void Arm()
+    {
+        tokens_.failCopyIn = dice_.Below(8) == 0 ? 1 + dice_.Below(2) : 0;
+        tokens_.failDisposeIn = dice_.Below(8) == 0 ? 1 + dice_.Below(2) : 0;
+        Q_FailAllocation(dice_.Below(8) == 0 ? 1 + dice_.Below(2) : 0);
+        armed_ = true;
+    }
+    void Expect(bool allowed, int code)
+    {
+        code_ = code;
+        int const reason = Q_FailAllocationFired() ? 4 : code == CopyFailed || code == DisposeFailed ? code : 0;
+        EXPECT_EQ(!allowed ? SEQ_Err_BadIndex : armed_ ? reason : 0, code);
+        armed_ = false;
+    }
+    void Duplicate()
+    {
+        SEQ_Head** made = nullptr;
+        Arm();
+        tokens_.failDisposeIn = 0;
+        SEQ_Lock(1, list_);
+        Expect(true, SEQ_Duplicate(list_, 0, &made));
+        SEQ_Unlock(list_);
+        Q_FailAllocation(0);
+        EXPECT_EQ(code_ == 0, made != nullptr);
+        if (!made) return;
+        EXPECT_EQ(model_, list_.Values(owns_ ? &tokens_ : nullptr, made));
+        EXPECT_EQ(0, SEQ_GetPinCount(made));
+        EXPECT_TRUE((*made)->refcon == &tokens_ && (*made)->sort == Compare && (*made)->dispose == (*list_)->dispose);
+        if (dice_.Below(2)) EXPECT_EQ(0, SEQ_SetNumItems((*made)->count + 30, made, 0)) << "it grows like any list";
+        EXPECT_EQ(0, SEQ_Compact(made));
+        EXPECT_EQ(0, SEQ_Dispose(made, 0));
+    }
+    // Everything that only looks.
+    void Look(int index)
+    {
+        int const count = static_cast<int>(model_.size()), code = index >= 0 && index < count ? 0 : SEQ_Err_BadIndex;
+        void* item = nullptr;
+        void const* constItem = nullptr;
+        EXPECT_EQ(code, SEQ_GetAddress(list_, index, 1, &item));
+        EXPECT_EQ(code == 0 ? 1 : 0, SEQ_GetPinCount(list_)) << "a failure owes no unlock";
+        EXPECT_EQ(code == 0 ? 0 : SEQ_Err_NotPinned, SEQ_Unlock(list_));
+        EXPECT_EQ(index == -1 && count > 0 ? 0 : code, SEQ_GetConstAddress(list_, index, &constItem));
+        if (code == 0)
+            EXPECT_EQ(item, constItem);
+        else
+            EXPECT_EQ(constItem, constItem ? list_.At(count - 1) : nullptr);
+        EXPECT_EQ(0u, reinterpret_cast<std::uintptr_t>(constItem) % 8);
+        if (count > 1 && size_ % 8 == 0)
+            EXPECT_EQ(size_, static_cast<std::size_t>(static_cast<char const*>(list_.At(1)) -
+                                                      static_cast<char const*>(list_.At(0))));
+        if (!owns_) {
+            std::string copy(size_, '#');
+            EXPECT_EQ(code, SEQ_GetItemCopy(list_, 0, index, copy.data()));
+            if (code == 0) EXPECT_EQ(model_[static_cast<std::size_t>(index)], Number(copy));
+        }
+        int const other = dice_.Below(count + 2), stop = dice_.Below(count + 3);
+        static std::vector<int> visited;
         visited.clear();
-        int lastVisited = 77;
-        auto const visit = [](SEQ_Head** handle, long stopAt, int index, void* item) {
-            void const* address = nullptr;
-            EXPECT_EQ(0, SEQ_GetConstAddress(handle, index, &address));
-            EXPECT_EQ(address, item);
-            visited.push_back(index);
-            return index == stopAt ? 99 : 0;
+        int last = 77;
+        auto const visit = [](SEQ_Head**, long refcon, int at, void*) {
+            visited.push_back(at);
+            return at == refcon ? 99 : 0;
         };
-        EXPECT_EQ(walk.code, SEQ_ForRange(list.get(), walk.first, walk.last, walk.stopAt, visit, &lastVisited));
-        EXPECT_EQ(walk.visited, visited);
-        EXPECT_EQ(walk.lastVisited, lastVisited);
-        EXPECT_EQ(0, SEQ_GetPinCount(list.get()));
+        int const walked = SEQ_ForRange(list_, index, other, stop, visit, &last);
+        std::vector<int> path;
+        if (code == 0 && other < count)
+            for (int at = index; path.empty() || path.back() != other; at += other < index ? -1 : 1) {
+                path.push_back(at);
+                if (at == stop) break;
+            }
+        EXPECT_EQ(path, visited);
+        EXPECT_EQ(path.empty() ? 77 : path.back(), last);
+        EXPECT_EQ(path.empty() ? SEQ_Err_BadIndex : path.back() == stop ? 99 : 0, walked);
     }
-}
 
-TEST(SequenceWalk, ForEachFollowsAListThatShrinksUnderIt)
-{
-    IntList const list(8, {1, 2, 3, 4, 5, 6});
-    auto const removeEven = [](SEQ_Head** handle, long, int index, void* item) {
-        int value;
-        std::memcpy(&value, item, sizeof value);
-        return value % 2 == 0 ? SEQ_Remove(index, handle, 0, nullptr) : 0;
-    };
-    EXPECT_EQ(0, SEQ_ForEach(list.get(), 0, removeEven, 0));
-    EXPECT_EQ((std::vector<int>{1, 3, 5}), list.Values());
+    Tokens tokens_;
+    Dice dice_;
+    std::size_t size_;
+    bool owns_, armed_ = false;
+    List list_;
+    std::vector<int> model_, wanted_;
+    int code_ = 0, failures_ = 0;
+};
 
-    long visits = 0;
-    auto const countTo2 = [](SEQ_Head const* const*, long refcon, int index, void const*) {
-        ++*reinterpret_cast<long*>(refcon);
-        return index == 1 ? 42 : 0;
-    };
-    EXPECT_EQ(42, SEQ_ForEachConst(list.get(), reinterpret_cast<long>(&visits), countTo2, 0));
-    EXPECT_EQ(2, visits);
-}
-
-// ---- pins and room
-
-TEST(SequencePins, NestAndNeverFallBelowZero)
-{
-    IntList const list(8, {1});
-    SEQ_Head** const handle = list.get();
-    void* item = nullptr;
-    std::vector<int> const pinned = {SEQ_Lock(1, handle), SEQ_LockConst(1, handle), SEQ_GetAddress(handle, 0, 1, &item),
-                                     SEQ_GetAddress(handle, 0, 0, &item), SEQ_GetPinCount(handle)};
-    EXPECT_EQ((std::vector<int>{0, 0, 0, 0, 3}), pinned);
-    std::vector<int> const unpinned = {SEQ_Unlock(handle), SEQ_UnlockConst(handle), SEQ_Unlock(handle),
-                                       SEQ_Unlock(handle), SEQ_UnlockConst(handle), SEQ_GetPinCount(handle)};
-    EXPECT_EQ((std::vector<int>{0, 0, 0, SEQ_Err_NotPinned, SEQ_Err_NotPinned, 0}), unpinned);
-    EXPECT_EQ(0, SEQ_Lock(1, handle));
-    EXPECT_EQ(1, SEQ_GetPinCount(handle)) << "a surplus unlock isn't paid for later";
-}
-
-TEST(SequencePins, HoldAddressesThroughEverythingButGrowth)
-{
-    IntList const list(8, {1, 2, 3});
-    ASSERT_EQ(0, SEQ_ReserveSpace(10, list.get()));
-    void* pinned = nullptr;
-    ASSERT_EQ(0, SEQ_GetAddress(list.get(), 0, 1, &pinned));
-    EXPECT_EQ(0, SEQ_Compact(list.get()));
-    for (int i = 0; i < 7; ++i) EXPECT_EQ(0, SEQ_InsertCopy(list.Item(9).data(), -1, list.get(), 0));
-    EXPECT_EQ(0, SEQ_SetItemCopy(list.Item(4).data(), 2, list.get(), 0, 0));
-    EXPECT_EQ(0, SEQ_SetNumItems(2, list.get(), 0));
-    void* again = nullptr;
-    ASSERT_EQ(0, SEQ_GetAddress(list.get(), 0, 0, &again));
-    EXPECT_EQ(pinned, again);
-    EXPECT_EQ((std::vector<int>{1, 2}), list.Values());
-}
-
-TEST(SequenceRoom, ReservedRoomNeedsNoMemoryAndCompactReturnsIt)
-{
-    IntList const list(104);
-    Q_MemoryCount const empty = Q_MemoryLive(nullptr);
-    ASSERT_EQ(0, SEQ_ReserveSpace(50, list.get()));
-    EXPECT_EQ(empty.bytes + 50 * 104, Q_MemoryLive(nullptr).bytes);
-    Q_FailAllocation(1);
-    for (int i = 0; i < 50; ++i) ASSERT_EQ(0, SEQ_Insert(list.Item(i).data(), 0, list.get()));
-    EXPECT_FALSE(Q_FailAllocationFired());
-    EXPECT_EQ(4, SEQ_Insert(list.Item(50).data(), -1, list.get()));
-    EXPECT_EQ(50, list.Count());
-    ASSERT_EQ(0, SEQ_SetNumItems(7, list.get(), 0));
-    ASSERT_EQ(0, SEQ_Compact(list.get()));
-    EXPECT_EQ(empty.bytes + 7 * 104, Q_MemoryLive(nullptr).bytes);
-    ASSERT_EQ(0, SEQ_SetNumItems(0, list.get(), 0));
-    ASSERT_EQ(0, SEQ_Compact(list.get()));
-    EXPECT_EQ(empty, Q_MemoryLive(nullptr));
-}
-
-TEST(SequenceRoom, ADuplicateOfPlainBytesIsOneBlockAndGrowsLikeAnyList)
+TEST(Sequence, FollowsAVectorThroughSuccessAndFailure)
 {
     Q_MemoryCount const before = Q_MemoryLive(nullptr);
-    for (short const itemSize : {4, 8, 12, 33}) {
-        IntList const source(itemSize, {5, 6, 7});
-        for (int removed = 0; removed <= 3; ++removed) {
-            Q_MemoryCount const between = Q_MemoryLive(nullptr);
-            SEQ_Head** made = nullptr;
-            ASSERT_EQ(0, SEQ_Duplicate(source.get(), 0, &made));
-            IntList const copy(made);
-            EXPECT_EQ(between.blocks + 1, Q_MemoryLive(nullptr).blocks);
-            EXPECT_EQ((std::vector<int>{5, 6, 7}), copy.Values());
-            for (int i = 0; i < removed; ++i) ASSERT_EQ(0, SEQ_Remove(0, made, 0, nullptr));
-            ASSERT_EQ(0, SEQ_Compact(made));
-            Q_FailAllocation(1);
-            for (int i = 0; i < removed; ++i) EXPECT_EQ(0, SEQ_Insert(copy.Item(i).data(), -1, made));
-            EXPECT_FALSE(Q_FailAllocationFired()) << "room is reused";
-            EXPECT_EQ(4, SEQ_Insert(copy.Item(9).data(), -1, made));
-            std::vector<int> expected{5, 6, 7};
-            expected.erase(expected.begin(), expected.begin() + removed);
-            for (int i = 0; i < removed; ++i) expected.push_back(i);
-            EXPECT_EQ(expected, copy.Values()) << "a failure changes nothing";
-            for (int i = 0; i < 20; ++i) ASSERT_EQ(0, SEQ_Insert(copy.Item(i).data(), 0, made));
-            for (int i = 0; i < 20; ++i) expected.insert(expected.begin(), i);
-            EXPECT_EQ(expected, copy.Values());
-            ASSERT_EQ(0, SEQ_Compact(made));
-            EXPECT_EQ(expected, copy.Values());
+    for (int const itemSize : {4, 8, 9, 104, 600})  // below, beside and above the alignment and the scratch item
+        for (bool const owns : {false, true}) {
+            Script script(itemSize, owns);
+            for (int step = 0; step < Rounds(1500) && !testing::Test::HasFailure(); ++step) {
+                SCOPED_TRACE(testing::Message() << "items of " << itemSize << ", owning " << owns << ", step " << step);
+                script.Step();
+            }
+            EXPECT_GT(script.Failures(), Rounds(200)) << "the failures that this test is about";
         }
-    }
     EXPECT_EQ(before, Q_MemoryLive(nullptr));
 }
 
-TEST(SequenceRoom, ALargeDuplicateThatGrowsKeepsNoRoomThatItLeft)
+TEST(Sequence, SearchAgreesWithTheStandardLibraryAtEveryCount)
 {
-    IntList const source(1000);
-    for (int i = 0; i < 100; ++i) ASSERT_EQ(0, SEQ_Insert(source.Item(i).data(), -1, source.get()));
-    Q_MemoryCount const before = Q_MemoryLive(nullptr);
-    SEQ_Head** made = nullptr;
-    ASSERT_EQ(0, SEQ_Duplicate(source.get(), 0, &made));
-    IntList const copy(made);
-    auto const head = Q_MemoryLive(nullptr).bytes - before.bytes - 100 * 1000;
-    ASSERT_EQ(0, SEQ_Insert(copy.Item(100).data(), -1, made));
-    ASSERT_EQ(0, SEQ_Compact(made));
-    EXPECT_EQ(before.bytes + head + 101 * 1000, Q_MemoryLive(nullptr).bytes);
-    for (int i = 100; i > 0; --i) ASSERT_EQ(0, SEQ_Remove(i, made, 0, nullptr));
-    ASSERT_EQ(0, SEQ_Compact(made));
-    EXPECT_EQ(before.bytes + head + 1000, Q_MemoryLive(nullptr).bytes);
-
-    for (int n = 1; n <= 2; ++n) {
-        SEQ_Head** none = nullptr;
-        Q_MemoryCount const between = Q_MemoryLive(nullptr);
-        Q_FailAllocation(n);
-        EXPECT_EQ(4, SEQ_Duplicate(source.get(), 0, &none));
-        EXPECT_TRUE(Q_FailAllocationFired());
-        EXPECT_EQ(nullptr, none);
-        EXPECT_EQ(between, Q_MemoryLive(nullptr));
-    }
-}
-
-TEST(SequenceRoom, NumbersInItemsAreAlignedAndWholeSizesLeaveNoGaps)
-{
-    for (short const itemSize : {1, 4, 8, 9, 16, 24, 61, 104, 600}) {
-        IntList const list(itemSize, {1, 2, 3, 4, 5, 6, 7});
-        std::vector<std::uintptr_t> addresses;
-        for (int i = 0; i < list.Count(); ++i) {
-            void const* item = nullptr;
-            ASSERT_EQ(0, SEQ_GetConstAddress(list.get(), i, &item));
-            addresses.push_back(reinterpret_cast<std::uintptr_t>(item));
-            EXPECT_EQ(0u, addresses.back() % 8) << "size " << itemSize << ", item " << i;
-            if (itemSize % 8 == 0) {
-                EXPECT_EQ(addresses[0] + static_cast<std::uintptr_t>(i) * static_cast<std::uintptr_t>(itemSize),
-                          addresses.back());
-            }
+    Dice dice(11);
+    for (int count = 0; count < 40; ++count) {
+        std::vector<int> items(static_cast<std::size_t>(count));
+        for (int& item : items) item = dice.Below(40) * 2;
+        std::sort(items.begin(), items.end());
+        List const list(count % 2 ? 8 : 12, items);
+        unsigned char found = 77;
+        int index = 77;
+        int const nine = 9;
+        EXPECT_EQ(SEQ_Err_NoSortFunc, SEQ_GetSortedItem(list, 0, &nine, &found, 0, &index));
+        EXPECT_TRUE(found == 77 && index == 77) << "nothing is answered";
+        SEQ_Funcs const sorted{nullptr, nullptr, Compare}, keeps{SEQ_RemoveFunc, SEQ_RemoveFunc, nullptr};
+        EXPECT_EQ(0, SEQ_SetFuncs(list, 3, &sorted));
+        EXPECT_EQ(0, SEQ_SetFuncs(list, 3, &keeps)) << "null leaves the sort function";
+        for (int probe = -1; probe <= 81; ++probe) {
+            auto const place = std::lower_bound(items.begin(), items.end(), probe);
+            ASSERT_EQ(0, SEQ_GetSortedConstItem(list, 0, &probe, &found, 0, &index));
+            ASSERT_EQ(place - items.begin(), index) << count << " items, probe " << probe;
+            ASSERT_EQ(place != items.end() && *place == probe, found == 1) << count << " items, probe " << probe;
         }
-        EXPECT_EQ(0u, addresses[0] % 16);
+        SEQ_Funcs const none{nullptr, nullptr, SEQ_RemoveFunc};
+        EXPECT_EQ(0, SEQ_SetFuncs(list, 3, &none));
+        EXPECT_EQ(SEQ_Err_NoSortFunc, SEQ_GetSortedItem(list, 0, &nine, &found, 0, &index));
     }
 }
 
-TEST(SequenceRoom, NewItemsAreZeroAlsoWhereOldOnesLay)
+TEST(Sequence, DisposeDisposesAllAndAnswersTheFirstFailure)
 {
-    IntList const list(8, {1, 2, 3, 4, 5});
-    ASSERT_EQ(0, SEQ_SetNumItems(1, list.get(), 0));
-    ASSERT_EQ(0, SEQ_SetNumItems(20, list.get(), 0));
-    std::vector<unsigned char> const zero(8);
-    for (int i = 1; i < 20; ++i) {
-        void const* item = nullptr;
-        ASSERT_EQ(0, SEQ_GetConstAddress(list.get(), i, &item));
-        EXPECT_EQ(0, std::memcmp(zero.data(), item, 8)) << i;
-    }
-    EXPECT_EQ(SEQ_Err_BadArgument, SEQ_SetNumItems(-1, list.get(), 0));
-    EXPECT_EQ(20, list.Count());
+    Tokens tokens;
+    SEQ_Head** list = nullptr;
+    ASSERT_EQ(0, SEQ_New(0, 4, 4, 1, &list));
+    for (int i = 1; i <= 5; ++i) SEQ_Insert(Item(4, tokens.Make(i), i).data(), -1, list);
+    SEQ_Funcs const funcs{nullptr, Dispose, nullptr};
+    SEQ_SetFuncs(list, 3, &funcs);
+    SEQ_SetRefcon(&tokens, list);
+    tokens.failDisposeIn = 2;
+    EXPECT_EQ(DisposeFailed, SEQ_Dispose(list, 0));
+    EXPECT_EQ(1, tokens.Alive()) << "only the item that refused is left";
 }
 
-TEST(SequenceRoom, AppendingMovesTheItemsARareNumberOfTimes)
+TEST(Sequence, WalksFollowAListThatShrinksUnderThem)
 {
-    IntList const list(16);
+    List const list(8, {1, 2, 3, 4, 5, 6});
+    auto const removeEven = [](SEQ_Head** handle, long, int index, void* item) {
+        return *static_cast<int*>(item) % 2 == 0 ? SEQ_Remove(index, handle, 0, nullptr) : 0;
+    };
+    EXPECT_EQ(0, SEQ_ForEach(list, 0, removeEven, 0));
+    EXPECT_EQ((std::vector<int>{1, 3, 5}), list.Values());
+    int visits = 0;
+    auto const stopAt1 = [](SEQ_Head const* const*, long refcon, int index, void const*) {
+        ++*reinterpret_cast<int*>(refcon);
+        return index == 1 ? 42 : 0;
+    };
+    EXPECT_EQ(42, SEQ_ForEachConst(list, reinterpret_cast<long>(&visits), stopAt1, 0));
+    EXPECT_EQ(2, visits);
+}
+
+TEST(Sequence, PinsNestAndHoldAddressesThroughEverythingButGrowth)
+{
+    List const list(8, {1, 2, 3});
+    ASSERT_EQ(0, SEQ_ReserveSpace(10, list));
+    void const* const pinned = list.At(0);
+    EXPECT_EQ(0, SEQ_Lock(1, list));
+    EXPECT_EQ(0, SEQ_LockConst(1, list));
+    EXPECT_EQ(0, SEQ_Compact(list));
+    for (int i = 0; i < 7; ++i) EXPECT_EQ(0, SEQ_InsertCopy(Item(8, 9, 9).data(), -1, list, 0));
+    EXPECT_EQ(0, SEQ_SetItemCopy(Item(8, 4, 4).data(), 1, list, 0, 0));
+    EXPECT_EQ(0, SEQ_SetNumItems(2, list, 0));
+    EXPECT_EQ(pinned, list.At(0));
+    EXPECT_EQ((std::vector<int>{1, 4}), list.Values());
+    EXPECT_EQ(2, SEQ_GetPinCount(list));
+    EXPECT_EQ(0, SEQ_Unlock(list));
+    EXPECT_EQ(0, SEQ_UnlockConst(list));
+    EXPECT_EQ(SEQ_Err_NotPinned, SEQ_UnlockConst(list));
+    EXPECT_EQ(0, SEQ_GetPinCount(list)) << "a surplus unlock isn't paid for later";
+}
+
+TEST(Sequence, RoomIsWhatWasAskedForAndGoesBack)
+{
+    List const list(104);
+    Q_MemoryCount const empty = Q_MemoryLive(nullptr);
+    ASSERT_EQ(0, SEQ_ReserveSpace(50, list));
+    EXPECT_EQ(empty.bytes + 50 * 104, Q_MemoryLive(nullptr).bytes);
+    Q_FailAllocation(1);
+    for (int i = 0; i < 50; ++i) ASSERT_EQ(0, SEQ_Insert(Item(104, i, i).data(), 0, list));
+    EXPECT_FALSE(Q_FailAllocationFired()) << "reserved room needs no memory";
+    EXPECT_EQ(4, SEQ_Insert(Item(104, 1, 1).data(), -1, list));
+    ASSERT_EQ(0, SEQ_SetNumItems(7, list, 0));
+    ASSERT_EQ(0, SEQ_Compact(list));
+    EXPECT_EQ(empty.bytes + 7 * 104, Q_MemoryLive(nullptr).bytes);
+
+    for (int const count : {3, 400}) {  // a small duplicate is one block, a large one gives its room back
+        ASSERT_EQ(0, SEQ_SetNumItems(count, list, 0));
+        Q_MemoryCount const before = Q_MemoryLive(nullptr);
+        SEQ_Head** made = nullptr;
+        ASSERT_EQ(0, SEQ_Duplicate(list, 0, &made));
+        EXPECT_EQ(before.blocks + (count == 3 ? 1 : 2), Q_MemoryLive(nullptr).blocks);
+        ASSERT_EQ(0, SEQ_SetNumItems(count - 1, made, 0));
+        Q_FailAllocation(1);
+        EXPECT_EQ(0, SEQ_InsertCopy(Item(104, 1, 1).data(), 0, made, 0)) << "room is reused";
+        EXPECT_EQ(4, SEQ_InsertCopy(Item(104, 1, 1).data(), 0, made, 0));
+        EXPECT_EQ(0, SEQ_SetNumItems(count + 1, made, 0));
+        EXPECT_EQ(0, SEQ_SetNumItems(1, made, 0));
+        EXPECT_EQ(0, SEQ_Compact(made));
+        EXPECT_EQ(before.blocks + 2, Q_MemoryLive(nullptr).blocks);
+        EXPECT_LT(Q_MemoryLive(nullptr).bytes, before.bytes + (count == 3 ? 4 : 2) * 104 + 200);
+        EXPECT_EQ(0, SEQ_Dispose(made, 0));
+    }
+    ASSERT_EQ(0, SEQ_SetNumItems(0, list, 0));
+    ASSERT_EQ(0, SEQ_Compact(list));
+    EXPECT_EQ(empty, Q_MemoryLive(nullptr));
     int moves = 0;
-    void const* last = nullptr;
-    for (int i = 0; i < 100000; ++i) {
-        ASSERT_EQ(0, SEQ_Insert(list.Item(i).data(), -1, list.get()));
-        void const* first = nullptr;
-        SEQ_GetConstAddress(list.get(), 0, &first);
-        moves += first != last;
-        last = first;
+    for (int i = 0; i < 20000; ++i) {
+        void const* const first = i ? list.At(0) : nullptr;
+        ASSERT_EQ(0, SEQ_Insert(Item(104, i, i).data(), -1, list));
+        moves += first != list.At(0);
     }
-    EXPECT_LE(moves, 30);
+    EXPECT_LE(moves, 25) << "appending moves the items a rare number of times";
 }
 
-TEST(SequenceHandle, NullIsRefusedEverywhere)
+TEST(Sequence, NonsenseIsRefused)
 {
     SEQ_Head **const none = nullptr, **made = nullptr;
-    SEQ_Funcs funcs{};
+    List const list(8, {1});
+    SEQ_Funcs const funcs{};
     void* item = nullptr;
     void const* constItem = nullptr;
     int number = 0;
@@ -435,6 +478,73 @@ TEST(SequenceHandle, NullIsRefusedEverywhere)
                                     SEQ_Compact(none),
                                     SEQ_SetNumItems(1, none, 0)};
     EXPECT_EQ(std::vector<int>(17, SEQ_Err_BadList), codes);
+    std::vector<int> const arguments = {SEQ_Duplicate(list, 0, nullptr),
+                                        SEQ_SetFuncs(list, 2, &funcs),
+                                        SEQ_SetFuncs(list, 3, nullptr),
+                                        SEQ_GetAddress(list, 0, 1, nullptr),
+                                        SEQ_GetConstAddress(list, 0, nullptr),
+                                        SEQ_GetItemCopy(list, 0, 0, nullptr),
+                                        SEQ_SetItemCopy(nullptr, 0, list, 0, 0),
+                                        SEQ_InsertCopy(nullptr, 0, list, 0),
+                                        SEQ_SetNumItems(-1, list, 0),
+                                        SEQ_ReserveSpace(-1, list),
+                                        SEQ_New(0, 0, 4, 1, &made),
+                                        SEQ_New(0, -1, 4, 1, &made),
+                                        SEQ_New(0, SHRT_MIN, 4, 1, &made),
+                                        SEQ_New(0, 8, 4, 1, nullptr)};
+    EXPECT_EQ(std::vector<int>(14, SEQ_Err_BadArgument), arguments);
+    EXPECT_EQ(nullptr, made);
+    EXPECT_EQ((std::vector<int>{1}), list.Values());
+}
+
+// ---- files
+
+TEST(SequenceFile, OnlyTheItemsGoIntoTheChunkAndComeBackOrNothingDoes)
+{
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
+    for (int const itemSize : {1, 3, 7, 8, 12, 104, 32767})
+        for (int const count : {0, 1, 2, 27}) {
+            SCOPED_TRACE(testing::Message() << count << " items of " << itemSize);
+            List const list(itemSize);
+            std::string items;
+            for (int i = 0; i < count; ++i) {
+                items += Item(static_cast<std::size_t>(itemSize), i, i + 1);
+                ASSERT_EQ(0, SEQ_Insert(&items[items.size() - static_cast<std::size_t>(itemSize)], -1, list));
+            }
+            CKF_File file;
+            ASSERT_EQ(0, file.CreateInMemory());
+            ASSERT_EQ(0, SEQ_Write(list, &file));
+            ASSERT_EQ(0, file.Commit());
+            std::string const atom = Atom("seql", Long(static_cast<std::uint32_t>(itemSize)) +
+                                                      Long(static_cast<std::uint32_t>(count)) + items);
+            EXPECT_EQ(Form(atom), Bytes(file));
+            std::string const bytes = Form(Atom("what", "x") + ::List("kfbs", Atom("odd_", "x") + atom) + atom);
+            for (int n = 0;; ++n) {
+                CKF_File read;
+                ASSERT_EQ(0, read.Open(Span(bytes)));
+                CKF_ScDescendList const leaf(&read, CKF_Id("kfbs"), nullptr, nullptr);
+                SEQ_Head** back = nullptr;
+                Q_FailAllocation(n + 1);
+                int const code = SEQ_Read(&read, &back);
+                bool const fired = Q_FailAllocationFired();
+                Q_FailAllocation(0);
+                EXPECT_EQ(fired ? Q_Err_OutOfMemory : 0, code);
+                EXPECT_EQ(fired, back == nullptr);
+                if (fired) continue;
+                EXPECT_TRUE((*back)->itemSize == itemSize && (*back)->count == count && !(*back)->refcon);
+                for (std::size_t i = 0; i < static_cast<std::size_t>(count); ++i) {
+                    std::string item(static_cast<std::size_t>(itemSize), '#');
+                    EXPECT_EQ(0, SEQ_GetItemCopy(back, 0, static_cast<int>(i), item.data()));
+                    EXPECT_EQ(items.substr(i * item.size(), item.size()), item);
+                }
+                SEQ_Dispose(back, 0);
+                SEQ_Head** none = nullptr;
+                EXPECT_EQ(CKF_Err_NoSuchChunk, SEQ_Read(&read, &none)) << "it stays in its list";
+                EXPECT_EQ(nullptr, none);
+                break;
+            }
+        }
+    EXPECT_EQ(before, Q_MemoryLive(nullptr));
 }
 
 }  // namespace
