@@ -5,13 +5,15 @@
 find_package(GTest REQUIRED)
 include(GoogleTest)
 
-set(testDefinitions
-    "KFS_TEST_DATA=\"${KFS_TEST_DATA}\""
-    "KFS_TEST_SAMPLES=\"${PROJECT_SOURCE_DIR}/examples/samples\"")
-
-add_library(kfs_test_base INTERFACE)
-target_compile_definitions(kfs_test_base INTERFACE ${testDefinitions})
-target_link_libraries(kfs_test_base INTERFACE GTest::gtest_main GTest::gtest)
+add_library(kfs_test_base STATIC tests/support/places.cpp)
+target_compile_definitions(kfs_test_base PRIVATE
+    "KFS_TEST_DATA=\"${KFS_TEST_DATA}\"" "KFS_TEST_SOURCE=\"${PROJECT_SOURCE_DIR}\"")
+if(TARGET kfs_cli)
+    target_compile_definitions(kfs_test_base PRIVATE "KFS_TEST_COMMAND=\"$<TARGET_FILE:kfs_cli>\"")
+endif()
+target_compile_features(kfs_test_base PUBLIC cxx_std_20)
+target_include_directories(kfs_test_base PUBLIC "${PROJECT_SOURCE_DIR}")
+target_link_libraries(kfs_test_base PUBLIC GTest::gtest_main GTest::gtest)
 
 # The targets with label `threads`, for builds that need nothing else.
 add_custom_target(thread_tests)
@@ -30,7 +32,6 @@ function(kfs_add_test_folder name)
         target_link_libraries(${target} PRIVATE kfs_objects kfs_services Boost::thread Threads::Threads)
     endif()
     if(name STREQUAL "cli" AND TARGET kfs_cli)
-        target_compile_definitions(${target} PRIVATE "KFS_TEST_COMMAND=\"$<TARGET_FILE:kfs_cli>\"")
         add_dependencies(${target} kfs_cli)
     endif()
     if(name STREQUAL "threads")

@@ -1,4 +1,5 @@
 #include "tests/cli/command.h"
+#include "tests/support/places.h"
 
 #include <stdexcept>
 
@@ -12,7 +13,7 @@ namespace {
 int Spawn(std::vector<std::string> const& arguments, std::string const& output, std::string const& errors)
 {
     std::vector<char*> pointers;
-    std::string command = KFS_TEST_COMMAND;
+    std::string command = kfstest::Command();
     pointers.push_back(command.data());
     for (std::string const& argument : arguments) pointers.push_back(const_cast<char*>(argument.c_str()));
     pointers.push_back(nullptr);

@@ -1,4 +1,5 @@
 #include "tests/cli/command.h"
+#include "tests/support/places.h"
 
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
@@ -15,7 +16,7 @@ namespace {
 
 std::string Sample()
 {
-    return KFS_TEST_SAMPLES "/bouncing_ball.gltf";
+    return kfstest::SamplesFolder() / "bouncing_ball.gltf";
 }
 
 std::vector<std::string> Lines(std::string const& text)

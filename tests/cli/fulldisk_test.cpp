@@ -1,4 +1,5 @@
 #include "tests/cli/command.h"
+#include "tests/support/places.h"
 
 #include <gtest/gtest.h>
 
@@ -80,7 +81,7 @@ TEST_F(KfsFullDisk, ALimitOfTheProcess)
                 setrlimit(RLIMIT_FSIZE, &most);
                 dup2(end, STDERR_FILENO);
                 dup2(open("/dev/null", O_WRONLY), STDOUT_FILENO);
-                execl(KFS_TEST_COMMAND, KFS_TEST_COMMAND, "save-as", new_.c_str(), "-o", target.c_str(), nullptr);
+                execl(kfstest::Command(), kfstest::Command(), "save-as", new_.c_str(), "-o", target.c_str(), nullptr);
                 return 127;
             },
             &code);

@@ -1,4 +1,5 @@
 #include "tests/cli/command.h"
+#include "tests/support/places.h"
 
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
@@ -14,7 +15,7 @@ namespace {
 
 std::string Sample()
 {
-    return KFS_TEST_SAMPLES "/bouncing_ball.gltf";
+    return kfstest::SamplesFolder() / "bouncing_ball.gltf";
 }
 
 std::size_t Count(std::string const& text, std::string const& part)

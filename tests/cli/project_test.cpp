@@ -1,4 +1,5 @@
 #include "tests/cli/command.h"
+#include "tests/support/places.h"
 
 #include <gtest/gtest.h>
 
@@ -17,7 +18,7 @@
 
 namespace {
 
-std::string const Sample = KFS_TEST_SAMPLES "/bouncing_ball.gltf";
+std::string const Sample = kfstest::SamplesFolder() / "bouncing_ball.gltf";
 
 // A folder with the sample as a project.
 class KfsProject : public testing::Test {
@@ -60,7 +61,7 @@ void KillWhileSaving(std::string const& from, std::string const& to, std::chrono
     if (child == 0) {
         int const nowhere = open("/dev/null", O_WRONLY);
         dup2(nowhere, STDOUT_FILENO);
-        execl(KFS_TEST_COMMAND, KFS_TEST_COMMAND, "save-as", from.c_str(), "-o", to.c_str(), nullptr);
+        execl(kfstest::Command(), kfstest::Command(), "save-as", from.c_str(), "-o", to.c_str(), nullptr);
         _exit(127);
     }
     std::this_thread::sleep_for(after);
@@ -93,7 +94,7 @@ TEST_F(KfsProject, AKilledSaveLeavesTheOldFileOrTheNewOne)
 // The format, byte for byte: a change of it is a decision, and shows in the dump that stands beside the file.
 TEST_F(KfsProject, TheSamplesBytesAndTheirDumpAreTheGoldenOnes)
 {
-    std::string const golden = KFS_TEST_SAMPLES "/../../tests/cli/golden/bouncing_ball";
+    std::string const golden = kfstest::SourceFolder() / "tests/cli/golden/bouncing_ball";
     EXPECT_TRUE(FileContent(golden + ".project") == FileContent(project_));
     EXPECT_EQ(FileContent(golden + ".txt"), RunKfs({"dump", golden + ".project"}).output);
 }

@@ -4,6 +4,7 @@
 #include "host/scene.h"
 #include "host/session.h"
 #include "host/streambuilder.h"
+#include "tests/support/places.h"
 #include "tests/support/reports.h"
 #include "tests/support/scratchfolder.h"
 
@@ -26,12 +27,12 @@ protected:
 // The real files and the values computed elsewhere. A test that needs them skips where they are absent.
 inline std::filesystem::path SharedData(std::string const& name)
 {
-    return std::filesystem::path(KFS_TEST_DATA) / name;
+    return kfstest::DataFolder() / name;
 }
 
 #define SKIP_WITHOUT_SHARED_DATA()                                                                                     \
     if (!std::filesystem::exists(SharedData("README.md")))                                                             \
-        GTEST_SKIP() << "the real animation files aren't there: " << KFS_TEST_DATA;
+        GTEST_SKIP() << "the real animation files aren't there: " << kfstest::DataFolder();
 
 inline nlohmann::json LoadSharedJson(std::string const& name)
 {

@@ -6,6 +6,7 @@
 #include "host/storeerror.h"
 #include "keystore/lookup.h"
 #include "tests/host/hosttest.h"
+#include "tests/support/places.h"
 
 #include <bit>
 #include <cerrno>
@@ -19,7 +20,7 @@ using kfshost::StreamItem;
 
 namespace {
 
-std::string const Sample = KFS_TEST_SAMPLES "/bouncing_ball.gltf";
+std::string const Sample = kfstest::SamplesFolder() / "bouncing_ball.gltf";
 
 std::map<std::string, StreamItem const*> ByPath(Scene const& scene)
 {

@@ -1,6 +1,7 @@
 #include "fuzz/treekinds.h"
 #include "host/session.h"
 #include "tests/hostile/samples.h"
+#include "tests/support/places.h"
 #include "tests/support/reports.h"
 
 #include <gtest/gtest.h>
@@ -14,7 +15,7 @@
 
 namespace {
 
-std::filesystem::path const Corpus = KFS_TEST_SAMPLES "/../../fuzz/corpus";
+std::filesystem::path const Corpus = kfstest::SourceFolder() / "fuzz/corpus";
 
 class Seeds : public testing::Test {
 protected:
