@@ -1,8 +1,5 @@
 #include "frame/project.h"
 
-#include "overrides/parambag.h"
-#include "tree/streambase.h"
-
 #include <boost/make_shared.hpp>
 
 KFS_Project::~KFS_Project() = default;
@@ -46,22 +43,6 @@ KFS_Project const* KFS_GetCurrentConstProject()
     return KFS_GetCurrentProject();
 }
 
-KFS_Project const* KFS_GetConstProject(KFS_StreamBase const* stream, bool)
-{
-    if (stream && !stream->IsCanonical()) {
-        if (KFS_Project const* const project = stream->GetProject()) return project;
-    }
-    return KFS_GetCurrentConstProject();
-}
-
-KFS_Project* KFS_GetProject(KFS_StreamBase* stream, bool)
-{
-    if (stream && !stream->IsCanonical()) {
-        if (KFS_Project* const project = stream->GetProject()) return project;
-    }
-    return KFS_GetCurrentProject();
-}
-
 KFS_Project const* KFS_GetConstProject(KFS_Project const* project, bool)
 {
     return project ? project : KFS_GetCurrentConstProject();
@@ -82,26 +63,4 @@ KFS_RenderState::~KFS_RenderState() = default;
 KFS_RenderState::Suspension KFS_RenderState::SuspendAutoDecanonicalize()
 {
     return boost::make_shared<hearth::utility::ScSetReset<bool>>(&autoDecanonicalizeSuspended_, true);
-}
-
-KFS_CapsuleOverrides::KFS_CapsuleOverrides(Q_RenderContext*) : bag_(new KFS_ParamBag) {}
-
-hearth::utility::ImmutableString const& KFS_CapsuleOverrides::GetStateName() const
-{
-    return S_StateName;
-}
-
-KFS_CapsuleOverrides::~KFS_CapsuleOverrides() = default;
-
-void KFS_CapsuleOverrides::SetScopedCapsuleParamBag(Q_ScSetReset<KFS_ParamBag>& scope, KFS_ParamBag const& bag)
-{
-    scope.Arm(bag_.get());
-    *bag_ = bag;
-}
-
-void KFS_CapsuleOverrides::MergeInScopedCapsuleParamBag(Q_ScSetReset<KFS_ParamBag>& scope, KFS_ParamBag const& bag)
-{
-    KFS_ParamBag const merged(*bag_, bag);
-    scope.Arm(bag_.get());
-    *bag_ = merged;
 }

@@ -13,12 +13,6 @@
 class KFS_ParamBag;
 class KFS_StreamCacheState;
 
-// What a clone of a stream takes along.
-struct KFS_CloneStreamParams {
-    bool cloneKeys;
-    bool cloneExpression;
-};
-
 // A read request as one value.
 struct KFS_EvalData {
     T_Time time;

@@ -5,8 +5,8 @@
 #include "frame/messages_private.h"
 #include "frame/report_private.h"
 #include "frame/services/scoped.h"
-#include "keystore/stream.h"
 #include "tree/decanonicalize.h"
+#include "tree/leafhooks_private.h"
 #include "tree/namedgroup.h"
 #include "tree/verify_private.h"
 
@@ -17,8 +17,6 @@
 using hearth::threads::ScRecursiveLock;
 
 namespace {
-
-constexpr T_Time DefaultKeyTime{0, 1};
 
 // Null, unless the unknown kind is to be reported; the report's code is thrown.
 KFS_StreamBase* RefuseUnknownKind(KFS_MatchName const& name, bool report)
@@ -91,8 +89,8 @@ KFS_StreamBase* KFS_StreamFactory::CreateStream(KFS_MatchName const& name, bool 
     Q_ScAutoPtr<KFS_StreamBase> stream(func ? func(name, this, true, timeScale, canonical) : nullptr);
     if (!stream) return RefuseUnknownKind(name, reportIfUnknown);
     if (KFS_Stream* const leaf = stream->GetAsLeaf()) {
-        leaf->InsertDefaultKey(DefaultKeyTime);
-        if (!constant) KFSp_ThrowIf(leaf->SetConstant(false, true));  // the default value becomes the first key
+        KFSp_InsertDefaultKey(leaf);
+        if (!constant) KFSp_GiveKey(leaf);
     }
     if (!canonical && KFS_ShouldAlwaysDecanonicalize()) KFS_DecanonicalizeAllChildStreamsDeep(stream->GetAsGroup());
     return stream.release();
@@ -148,10 +146,7 @@ KFS_StreamBase* KFS_StreamFactory::MakeInstanceFromCanonical(KFS_MatchName const
     Q_ScAutoPtr<KFS_StreamBase> copy(canonical->CloneStream(KFS_CloneStreamParams{true, true}));
     copy->SetCanonical(false);
     copy->SetSMDataPath(canonical->GetSMDataPath());
-    if (KFS_Stream* const leaf = copy->GetAsLeaf()) {
-        leaf->SetTimeScale(timeScale);
-        KFSp_ThrowIf(leaf->SetConstant(constant, false));
-    }
+    if (KFS_Stream* const leaf = copy->GetAsLeaf()) KFSp_SetUpClone(leaf, timeScale, constant);
     return copy.release();
 }
 

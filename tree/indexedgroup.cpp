@@ -1,6 +1,5 @@
 #include "tree/indexedgroup.h"
 
-#include "keystore/stream.h"
 #include "tree/groupsupport_private.h"
 
 #include <algorithm>
@@ -137,7 +136,7 @@ bool KFS_IndexedStreamGroup::RemoveChild(KFS_StreamBase* child)
 
 KFS_Stream const* KFS_IndexedStreamGroup::GetLeafStream(unsigned int index) const
 {
-    return dynamic_cast<KFS_Stream const*>(GetStream(index));
+    return GetStream(index)->GetAsLeaf();
 }
 
 KFS_Stream* KFS_IndexedStreamGroup::GetEditableLeafStream(unsigned int index)

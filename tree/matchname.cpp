@@ -1,10 +1,8 @@
 #include "tree/matchname.h"
 
 #include "frame/boundary_private.h"
-#include "frame/services/chunkfile.h"
 #include "frame/services/strings.h"
 #include "tree/matchnamepool_private.h"
-#include "tree/verify_private.h"
 
 #include <boost/thread/locks.hpp>
 
@@ -12,12 +10,6 @@
 #include <cstring>
 
 namespace {
-
-// Ends the children of a group in a file.
-constexpr char const* EndOfGroupText = "ZQVM Group End";
-
-constexpr int AtomId = CKF_Id("kfmn");
-constexpr int AtomSize = 40;
 
 unsigned char const* AsBytes(char const* text)
 {
@@ -134,31 +126,4 @@ void KFS_MatchName::SetName(std::basic_string<unsigned char> const& text)
 unsigned char const* KFS_MatchName::GetName() const
 {
     return KFSp_GetMatchNamePool().NameFromGuid(guid_);
-}
-
-void KFS_MatchName::Read(CKF_File* file, CKF_ChunkInfo const* parent)
-{
-    unsigned char text[AtomSize + 1] = {};  // an atom without a NUL ends somewhere too
-    KFSp_ThrowIf(CKF_ReadAtom(file, AtomId, parent, AtomSize, text));
-    SetName(text);
-}
-
-void KFS_MatchName::Write(CKF_File* file) const
-{
-    unsigned char atom[AtomSize] = {};
-    if (unsigned char const* const text = GetName())
-        std::memcpy(atom, text, std::strlen(reinterpret_cast<char const*>(text)));
-    else if (IsValid())
-        KFSp_FailVerification("asked to write a match name without a text");
-    KFSp_ThrowIf(CKF_WriteAtom(file, AtomId, AtomSize, atom));
-}
-
-void KFS_MatchName::WriteEndOfGroupMarker(CKF_File* file)
-{
-    KFS_MatchName(EndOfGroupText, true).Write(file);
-}
-
-bool KFS_MatchName::IsEndOfGroupMarker() const
-{
-    return guid_ == KFSp_GetMatchNamePool().GuidFromName(AsBytes(EndOfGroupText));
 }

@@ -2,11 +2,11 @@
 
 #include "frame/errors.h"
 #include "frame/statics_private.h"
-#include "keystore/stream.h"
 #include "tree/decanonicalize.h"
 #include "tree/factory.h"
 #include "tree/groupsupport_private.h"
 #include "tree/layoutorder_private.h"
+#include "tree/leafhooks_private.h"
 
 #include <algorithm>
 #include <utility>
@@ -151,8 +151,7 @@ KFS_StreamBase* KFS_NamedStreamGroup::GetEditableStream(KFS_MatchName const& nam
     KFS_StreamBase* const stream = created.get();
     if (!stream) throw int{KFS_Err_UnknownStream};
     SwapStream(&created);
-    if (KFS_Stream* const leaf = stream->GetAsLeaf(); leaf && leaf->NeedsResetAfterStored())
-        leaf->InsertDefaultKey(T_Time{0, 1});
+    if (KFS_Stream* const leaf = stream->GetAsLeaf()) KFSp_ResetAfterStored(leaf);
     return stream;
 }
 

@@ -1,9 +1,8 @@
 #include "tree/streambase.h"
 
 #include "frame/boundary_private.h"
-#include "keystore/attributes.h"
-#include "keystore/stream.h"
 #include "tree/factory.h"
+#include "tree/leafhooks_private.h"
 #include "tree/listener_private.h"
 #include "tree/streambase_private.h"
 #include "tree/streamgroup.h"
@@ -30,7 +29,7 @@ constexpr char const* EndOfPathText = "ZQVM End of path sentinel";
 // Takes a leaf that has just found its place to the scale there.
 struct KFSp_RescaleNewlyInstalledStream {
     unsigned int scale;
-    void operator()(KFS_Stream* leaf) const { KFSp_ThrowIf(KFS_RescaleStream(leaf, scale)); }
+    void operator()(KFS_Stream* leaf) const { KFSp_Rescale(leaf, scale); }
 };
 
 }  // namespace

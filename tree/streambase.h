@@ -25,7 +25,12 @@ class KFS_StreamFactory;
 class KFS_StreamGroup;
 struct CKF_ChunkInfo;
 struct CKF_File;
-struct KFS_CloneStreamParams;
+
+// What a clone of a stream takes along.
+struct KFS_CloneStreamParams {
+    bool cloneKeys;
+    bool cloneExpression;
+};
 
 // Bits of a node's flag word. All but Canonical change through the virtual SetStreamBaseFlags, which notifies.
 enum KFS_BaseFlag : unsigned int {
