@@ -50,7 +50,7 @@ void KFS_NamedStreamGroup::ReadAndStore(KFS_MatchName const& name, CKF_File* fil
     // In its place before it reads, because what it takes from the file depends on its parent. What was there goes once
     // it has read.
     std::unique_ptr<KFS_StreamBase> const old(SwapStream(&stream));
-    ReadChild(child, file, chunk);
+    if (GetStream(name, false) == child) ReadChild(child, file, chunk);  // else a listener has taken it
 }
 
 void KFS_IndexedStreamGroup::ReadAndStore(KFS_MatchName const& name, CKF_File* file, CKF_ChunkInfo const* chunk)
@@ -58,6 +58,6 @@ void KFS_IndexedStreamGroup::ReadAndStore(KFS_MatchName const& name, CKF_File* f
     Q_ScAutoPtr<KFS_StreamBase> stream(CreateStream(name, true, NewStreamScale, true, false));
     KFS_StreamBase* const child = stream.get();
     if (!child) return;
-    InsertStream(GetNumStreams(), &stream);
-    ReadChild(child, file, chunk);
+    unsigned int const place = AppendStream(&stream);
+    if (place < GetNumStreams()) ReadChild(child, file, chunk);  // else a listener has taken it
 }

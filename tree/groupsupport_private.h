@@ -5,6 +5,8 @@
 #include "tree/streamgroup.h"
 #include "tree/verify_private.h"
 
+#include <algorithm>
+
 // What the named and the indexed group have in common.
 
 // The real children cloned, without a parent; the canonical ones as they are.
@@ -42,7 +44,22 @@ inline void KFSp_NotifyOfChild(KFSp_ChildNotification what, KFS_StreamGroup* gro
         group, [=](KFS_StreamListener* listener) { (listener->*what)(group, child, index); });
 }
 
+// Every notification may edit the group that sends it, so a place is looked for again behind each of them.
+inline KFS_GroupChildren::iterator KFSp_FindChild(KFS_GroupChildren& children, KFS_StreamBase const* child)
+{
+    return std::find(children.begin(), children.end(), child);
+}
+
+inline unsigned int KFSp_PlaceOf(KFS_GroupChildren& children, KFS_StreamBase const* child)
+{
+    return static_cast<unsigned int>(KFSp_FindChild(children, child) - children.begin());
+}
+
 // Tells that `incoming` is in its place now; `child` is the one that listeners are told of. An independent newcomer is
 // tied in while they look. What they make of another one stays.
-void KFSp_NotifyOfSwap(KFS_StreamGroup* group, KFS_StreamBase* incoming, KFS_StreamBase const* child,
-                       unsigned int index);
+void KFSp_NotifyOfSwap(KFS_StreamGroup* group, KFS_GroupChildren& children, KFS_StreamBase* incoming,
+                       KFS_StreamBase const* child, unsigned int index);
+
+// Takes a child from the list, where listeners see it until both notifications are told. False if it isn't there, or if
+// a listener has taken it meanwhile.
+bool KFSp_RemoveChild(KFS_StreamGroup* group, KFS_GroupChildren* children, KFS_StreamBase* child);

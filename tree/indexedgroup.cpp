@@ -52,12 +52,14 @@ KFS_IndexedStreamGroup::KFS_IndexedStreamGroup(KFS_IndexedStreamGroup const& sou
 KFS_IndexedStreamGroup::~KFS_IndexedStreamGroup()
 {
     for (unsigned int i = static_cast<unsigned int>(streams_.size()); i-- > 0;) {
+        if (i >= streams_.size()) continue;  // a listener has taken some more
         KFS_StreamBase* const child = streams_[i];
         if (!child->IsCanonical())
             delete KFS_IndexedStreamGroup::RemoveStream(i);
         else if (child->GetParent() == this)
             child->SetParent(nullptr);
     }
+    KFSp_DeleteChildren(&streams_);  // what a listener has put in meanwhile
 }
 
 bool KFS_IndexedStreamGroup::IsModified() const
@@ -124,14 +126,7 @@ KFS_StreamID KFS_IndexedStreamGroup::SlowGetIDOfChild(KFS_StreamBase const* chil
 
 bool KFS_IndexedStreamGroup::RemoveChild(KFS_StreamBase* child)
 {
-    auto const found = std::find(streams_.begin(), streams_.end(), child);
-    if (found == streams_.end()) return false;
-    auto const index = static_cast<unsigned int>(found - streams_.begin());
-    KFSp_NotifyOfChild(&KFS_StreamListener::StreamAboutToBeRemoved, this, child, index);
-    child->SetParent(nullptr);
-    KFSp_NotifyOfChild(&KFS_StreamListener::StreamRemoved, this, child, index);
-    streams_.erase(streams_.begin() + index);
-    return true;
+    return KFSp_RemoveChild(this, &streams_, child);
 }
 
 KFS_Stream const* KFS_IndexedStreamGroup::GetLeafStream(unsigned int index) const
@@ -149,11 +144,21 @@ void KFS_IndexedStreamGroup::InsertStream(unsigned int index, Q_ScAutoPtr<KFS_St
     KFS_StreamBase* const incoming = stream->get();
     if (!CanStore(incoming->GetMatchName())) RefuseCorruptChild(*this);
     if (index > GetNumStreams()) KFSp_FailVerification("invalid index for insert in indexed group");
+    KFS_StreamBase const* const next = index < GetNumStreams() ? streams_[index] : nullptr;
     KFSp_NotifyOfChild(&KFS_StreamListener::StreamAboutToBeInserted, this, incoming, index);
-    streams_.insert(streams_.begin() + index, incoming);
+    streams_.insert(streams_.begin() + PlaceBefore(next, index), incoming);
     static_cast<void>(stream->release());
     incoming->SetParent(this);
-    KFSp_NotifyOfChild(&KFS_StreamListener::StreamInserted, this, incoming, index);
+    unsigned int const place = KFSp_PlaceOf(streams_, incoming);
+    KFSp_NotifyOfChild(&KFS_StreamListener::StreamInserted, this, incoming, place);
+}
+
+// Where a stream that was to stand in front of `next`, or at the end, belongs now.
+unsigned int KFS_IndexedStreamGroup::PlaceBefore(KFS_StreamBase const* next, unsigned int index)
+{
+    auto const size = static_cast<unsigned int>(streams_.size());
+    unsigned int const place = next ? KFSp_PlaceOf(streams_, next) : size;
+    return next && place == size ? std::min(index, size) : place;
 }
 
 KFS_StreamBase* KFS_IndexedStreamGroup::DuplicateStream(unsigned int index)
@@ -162,7 +167,7 @@ KFS_StreamBase* KFS_IndexedStreamGroup::DuplicateStream(unsigned int index)
     KFS_StreamBase* const stream = copy.get();
     stream->SetCanonical(false);  // the factory knows nothing of this one, so it must be the group's
     InsertStream(index + 1, &copy);
-    return stream;
+    return KFSp_PlaceOf(streams_, stream) < streams_.size() ? stream : nullptr;
 }
 
 KFS_StreamBase* KFS_IndexedStreamGroup::SwapStream(unsigned int index, Q_ScAutoPtr<KFS_StreamBase>* stream)
@@ -170,13 +175,19 @@ KFS_StreamBase* KFS_IndexedStreamGroup::SwapStream(unsigned int index, Q_ScAutoP
     if (index >= GetNumStreams()) KFSp_FailVerification("invalid index for swap in indexed group");
     KFS_StreamBase* const incoming = stream->get();
     if (!CanStore(incoming->GetMatchName())) KFSp_FailVerification("invalid name for storing in this named group");
+    KFS_StreamBase* const outgoing = streams_[index];
     KFSp_NotifyOfChild(&KFS_StreamListener::StreamAboutToBeSwapped, this, incoming, index);
     if (!incoming->IsCanonical()) incoming->SetParent(this);
-    KFS_StreamBase* const outgoing = std::exchange(streams_[index], stream->release());
+    unsigned int const place = KFSp_PlaceOf(streams_, outgoing);
+    if (place == streams_.size()) {
+        incoming->SetParent(nullptr);
+        KFSp_FailVerification("invalid index for swap in indexed group");
+    }
+    streams_[place] = stream->release();
     // A failure further on must not lose the stream that left.
     Q_ScAutoPtr<KFS_StreamBase> leaving(outgoing->IsCanonical() ? nullptr : outgoing);
     outgoing->SetParent(nullptr);
-    KFSp_NotifyOfSwap(this, incoming, streams_[index], index);
+    KFSp_NotifyOfSwap(this, streams_, incoming, incoming, place);
     static_cast<void>(leaving.release());
     return outgoing;
 }
@@ -186,10 +197,12 @@ KFS_StreamBase* KFS_IndexedStreamGroup::RemoveStream(unsigned int index)
     if (index >= GetNumStreams()) KFSp_FailVerification("invalid index for remove in indexed group");
     KFS_StreamBase* const child = At(index);
     KFSp_NotifyOfChild(&KFS_StreamListener::StreamAboutToBeRemoved, this, child, index);
-    streams_.erase(streams_.begin() + index);
+    unsigned int const place = KFSp_PlaceOf(streams_, child);
+    if (place == streams_.size()) return nullptr;
+    streams_.erase(streams_.begin() + place);
     Q_ScAutoPtr<KFS_StreamBase> leaving(child->IsCanonical() ? nullptr : child);
     child->SetParent(nullptr);
-    KFSp_NotifyOfChild(&KFS_StreamListener::StreamRemoved, this, child, index);
+    KFSp_NotifyOfChild(&KFS_StreamListener::StreamRemoved, this, child, place);
     static_cast<void>(leaving.release());
     return child;
 }
@@ -209,10 +222,12 @@ void KFS_IndexedStreamGroup::ReorderStreamsEnd(KFS_StreamBase* stream, unsigned 
 void KFS_IndexedStreamGroup::ReorderStreams(unsigned int from, unsigned int to)
 {
     KFS_StreamBase* const stream = GetEditableStream(from);
+    bool const isPlace = to < GetNumStreams();
     ReorderStreamsStart(stream, from, to);
     {
         PausedListeners const paused;
-        KFSp_ScIncoming moving(RemoveStream(from));
+        KFSp_ScIncoming moving(RemoveStream(KFSp_PlaceOf(streams_, stream)));
+        if (isPlace) to = std::min(to, GetNumStreams());  // a listener may have made the list shorter
         InsertStream(to, &moving.stream);
     }
     ReorderStreamsEnd(stream, from, to);
@@ -220,9 +235,9 @@ void KFS_IndexedStreamGroup::ReorderStreams(unsigned int from, unsigned int to)
 
 unsigned int KFS_IndexedStreamGroup::AppendStream(Q_ScAutoPtr<KFS_StreamBase>* stream)
 {
-    unsigned int const index = GetNumStreams();
-    InsertStream(index, stream);
-    return index;
+    KFS_StreamBase const* const incoming = stream->get();
+    InsertStream(GetNumStreams(), stream);
+    return KFSp_PlaceOf(streams_, incoming);
 }
 
 KFS_StreamBase* KFS_IndexedStreamGroup::At(unsigned int index) const

@@ -4,7 +4,9 @@
 #include "tree/streamgroup.h"
 
 // A group whose children form a list, free in number. They are found by position, and CanStore decides which match
-// names may stand in it. Every edit is told to the listeners before and after.
+// names may stand in it. Every edit is told to the listeners before and after, and they may edit the list meanwhile
+// (KFS_StreamListener): its own place is then looked for again. A stream comes to stand in front of the child that it
+// was to precede, or, where that is gone, at its index or at the end of a list that is shorter.
 //
 //   InsertStream(1, x)      a b c  ->  a x b c
 //   DuplicateStream(1)      a b c  ->  a b b' c
@@ -45,24 +47,26 @@ public:
     // Takes `*stream` over; `index` may be the number of children. A kind of stream that can't stand here means a
     // corrupt project: the user is told. Where it throws before the list has changed, `*stream` keeps its object.
     virtual void InsertStream(unsigned int index, Q_ScAutoPtr<KFS_StreamBase>* stream);
-    // Puts a clone right behind its source and returns it.
+    // Puts a clone right behind its source and returns it, or null if a listener has taken it out again.
     virtual KFS_StreamBase* DuplicateStream(unsigned int index);
     // Returns the stream that left, which is the caller's now. Listeners are told twice of the one that comes, and
-    // never which one left.
+    // never which one left. A listener that takes the old one first leaves no place: an invalid index.
     virtual KFS_StreamBase* SwapStream(unsigned int index, Q_ScAutoPtr<KFS_StreamBase>* stream);
-    // Returns the stream that left, which is the caller's now.
+    // Returns the stream that left, which is the caller's now; null if a listener has taken it first.
     virtual KFS_StreamBase* RemoveStream(unsigned int index);
     virtual void ReorderStreamsStart(KFS_StreamBase* stream, unsigned int from, unsigned int to);
     virtual void ReorderStreamsEnd(KFS_StreamBase* stream, unsigned int from, unsigned int to);
-    // Moves one child. Listeners hear the start and the end only. If `to` is past the end, the stream is lost.
+    // Moves one child. Listeners hear the start and the end only. If `to` is past the end, the stream is lost; a `to`
+    // that a listener has put there means the end.
     virtual void ReorderStreams(unsigned int from, unsigned int to);
 
-    // InsertStream at the end; returns the new child's index.
+    // InsertStream at the end; returns the new child's index, or their number if a listener has taken it out again.
     unsigned int AppendStream(Q_ScAutoPtr<KFS_StreamBase>* stream);
 
 private:
     KFS_StreamBase* At(unsigned int index) const;
     KFS_StreamBase* At(KFS_StreamID const& id) const;
+    unsigned int PlaceBefore(KFS_StreamBase const* next, unsigned int index);
 
     KFS_GroupChildren streams_;
 };

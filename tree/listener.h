@@ -15,6 +15,10 @@ class KFS_StreamGroup;
 // order of the virtual operations is part of the binary interface. A listener must not unregister itself from inside a
 // notification.
 //
+// It may edit the tree from inside one, the group of which it is told too: the edit that is told of then goes on from
+// what the group holds. It must not delete what it is given, the group or the stream, before the notification has
+// reached all listeners, and a stream that it has taken out of the group is its own.
+//
 // Only streams below a root that wants to be heard are heard (KFS_StreamBase::ProbeListenerState), and never a
 // canonical instance.
 class KFS_API KFS_StreamListener {

@@ -120,9 +120,9 @@ KFS_StreamBase const* KFS_NamedStreamGroup::GetStream(KFS_StreamID const& id) co
 KFS_StreamBase* KFS_NamedStreamGroup::GetEditableStream(KFS_StreamID const& id)
 {
     if (id.GetIndex() == KFS_StreamID::NoIndex) return GetEditableStream(id.GetMatchName());
-    KFS_StreamBase* const child = GetEditableStream(id.GetIndex());
-    KFSp_ValidateMatchNames(id, child);
-    return child;
+    KFS_MatchName const& name = NameAt(id.GetIndex(), GetNumStreams());
+    KFSp_ValidateMatchNames(id, *LookupStream(name, true));  // before anything is made real
+    return GetEditableStream(name);
 }
 
 KFS_StreamID KFS_NamedStreamGroup::SlowGetIDOfChild(KFS_StreamBase const* child) const
@@ -132,27 +132,25 @@ KFS_StreamID KFS_NamedStreamGroup::SlowGetIDOfChild(KFS_StreamBase const* child)
 
 bool KFS_NamedStreamGroup::RemoveChild(KFS_StreamBase* child)
 {
-    auto const found = std::find(streams_.begin(), streams_.end(), child);
-    if (found == streams_.end()) return false;
-    auto const index = static_cast<unsigned int>(found - streams_.begin());
-    KFSp_NotifyOfChild(&KFS_StreamListener::StreamAboutToBeRemoved, this, child, index);
-    child->SetParent(nullptr);
-    KFSp_NotifyOfChild(&KFS_StreamListener::StreamRemoved, this, child, index);
-    filledFrom_ = nullptr;
-    streams_.erase(streams_.begin() + index);
-    return true;
+    bool const removed = KFSp_RemoveChild(this, &streams_, child);
+    if (removed) filledFrom_ = nullptr;
+    return removed;
 }
 
 KFS_StreamBase* KFS_NamedStreamGroup::GetEditableStream(KFS_MatchName const& name)
 {
     KFS_StreamBase* const child = *LookupStream(name, true);
     if (!child->IsCanonical()) return child;
-    Q_ScAutoPtr<KFS_StreamBase> created(CreateStream(name, true, 600, true, false));
-    KFS_StreamBase* const stream = created.get();
+    KFS_MatchName const kind = name;  // which may be that of a stream that goes meanwhile
+    Q_ScAutoPtr<KFS_StreamBase> created(CreateStream(kind, true, 600, true, false));
+    KFS_StreamBase const* const stream = created.get();
     if (!stream) throw int{KFS_Err_UnknownStream};
-    SwapStream(&created);
-    if (KFS_Stream* const leaf = stream->GetAsLeaf()) KFSp_ResetAfterStored(leaf);
-    return stream;
+    // A listener may have made the slot real by itself, and also take what has come.
+    Q_ScAutoPtr<KFS_StreamBase> const replaced(SwapStream(&created));
+    KFS_StreamBase* const stored = *LookupStream(kind, true);
+    if (stored->IsCanonical()) KFSp_FailVerification("unexpected match name searched for in group");
+    if (KFS_Stream* const leaf = stored->GetAsLeaf(); leaf && stored == stream) KFSp_ResetAfterStored(leaf);
+    return stored;
 }
 
 KFS_StreamBase* KFS_NamedStreamGroup::GetEditableStreamNullOK(KFS_MatchName const& name)
@@ -194,25 +192,27 @@ KFS_StreamBase* KFS_NamedStreamGroup::SwapStream(Q_ScAutoPtr<KFS_StreamBase>* st
     KFS_StreamBase* const incoming = stream->get();
     KFS_MatchName const& name = incoming->GetMatchName();
     if (!CanStore(name)) KFSp_FailVerification("invalid name for storing in this named group");
-    auto const slot = LookupStream(name, true);
+    static_cast<void>(LookupStream(name, true));
     unsigned int const index = GetIndexInUILayout(name);
     KFSp_NotifyOfChild(&KFS_StreamListener::StreamAboutToBeSwapped, this, incoming, index);
+    auto const slot = LookupStream(name, true);
     KFS_StreamBase* const outgoing = std::exchange(*slot, stream->release());
     // Whatever throws from here on, the group has the stream that came, and the one that left must not be lost.
     Q_ScAutoPtr<KFS_StreamBase> leaving(outgoing->IsCanonical() ? nullptr : outgoing);
     if (!incoming->IsCanonical()) incoming->SetParent(this);
     if (outgoing->GetParent()) outgoing->SetParent(nullptr);
-    KFSp_NotifyOfSwap(this, incoming, outgoing, index);
+    KFSp_NotifyOfSwap(this, streams_, incoming, outgoing, index);
     return leaving.release();
 }
 
 KFS_StreamBase* KFS_NamedStreamGroup::SwapCanonicalForStream(KFS_MatchName const& name)
 {
     if ((*LookupStream(name, true))->IsCanonical()) return nullptr;
-    KFSp_ScIncoming incoming(GetCanonicalStream(name));
+    KFS_MatchName const kind = name;  // which may be that of the stream that leaves
+    KFSp_ScIncoming incoming(GetCanonicalStream(kind));
     if (!incoming.stream) KFSp_FailVerification("unexpected match name searched for in group");
     Q_ScAutoPtr<KFS_StreamBase> leaving(SwapStream(&incoming.stream));
-    if (KFS_ShouldAlwaysDecanonicalize()) GetEditableStream(name);
+    if (KFS_ShouldAlwaysDecanonicalize()) GetEditableStream(kind);
     return leaving.release();
 }
 
@@ -289,10 +289,14 @@ void KFS_NamedStreamGroup::DestroyContents()
         KFS_StreamBase* const child = streams_[i];
         if (child->IsCanonical()) continue;
         KFSp_NotifyOfChild(&KFS_StreamListener::StreamAboutToBeRemoved, this, child, i);
+        unsigned int const place = KFSp_PlaceOf(streams_, child);
+        if (place == streams_.size()) continue;
         child->SetParent(nullptr);
-        KFSp_NotifyOfChild(&KFS_StreamListener::StreamRemoved, this, child, i);
+        KFSp_NotifyOfChild(&KFS_StreamListener::StreamRemoved, this, child, place);
+        auto const slot = KFSp_FindChild(streams_, child);
+        if (slot == streams_.end()) continue;  // a listener has it
         // A listener of what is still to come may look at this group.
-        streams_[i] = DefaultFor(child->GetMatchName());
+        *slot = DefaultFor(child->GetMatchName());
         delete child;
     }
     DeleteRealStreams();  // what a listener has made real meanwhile

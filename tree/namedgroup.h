@@ -12,6 +12,10 @@
 // Positions are positions in the layout, the display order, except where a sorted index is spoken of: the children are
 // kept sorted by match name, an order that means nothing to users.
 //
+// Listeners may edit the group from inside its notifications (KFS_StreamListener); the slot is then looked for again.
+// Where one throws, or the stream that comes can't take the group's time scale, the slot has that stream if the edit
+// had got so far: an upgrade isn't undone.
+//
 // A canonical group's children are filled in when somebody first looks, once, under a process-wide lock; any thread may
 // look.
 class KFS_API KFS_NamedStreamGroup : public KFS_StreamGroup {
@@ -39,10 +43,11 @@ public:
     void ReadAndStore(KFS_MatchName const& name, CKF_File* file, CKF_ChunkInfo const* chunk) override;
     // The child's match name, without an index.
     KFS_StreamID SlowGetIDOfChild(KFS_StreamBase const* child) const override;
-    // Leaves the slot without an entry. Listeners are told the sorted index.
+    // Leaves the slot without an entry. Listeners are told the sorted index. False too if one of them took the child.
     bool RemoveChild(KFS_StreamBase* child) override;
 
-    // The name must be one of the layout's, except where said otherwise.
+    // The name must be one of the layout's, except where said otherwise. What a listener put into the slot before the new
+    // stream came is deleted; a slot that one of them has made canonical again is a broken invariant.
     virtual KFS_StreamBase* GetEditableStream(KFS_MatchName const& name);
     virtual KFS_StreamBase* GetEditableStreamNullOK(KFS_MatchName const& name);
     virtual KFS_StreamBase const* GetEditableStreamNullOK(KFS_MatchName const& name) const;
@@ -52,8 +57,8 @@ public:
     virtual KFS_Stream* GetEditableLeafStream(KFS_MatchName const& name);
     virtual KFS_Stream* GetEditableLeafStreamNullOK(KFS_MatchName const& name);
     virtual KFS_Stream const* GetLeafStream(KFS_MatchName const& name) const;
-    // Puts `*stream` into the slot of its match name, and returns the real stream that was there, which is the caller's
-    // now, or null. A group without a layout takes nothing and returns null. Listeners hear of the stream that came,
+    // Puts `*stream` into the slot of its match name, and returns the real stream that was there behind the first
+    // notification, which is the caller's now, or null. A group without a layout takes nothing and returns null. Listeners hear of the stream that came,
     // then of the one that left.
     virtual KFS_StreamBase* SwapStream(Q_ScAutoPtr<KFS_StreamBase>* stream);
     // Makes the slot canonical again. Returns the real stream that was there, the caller's now, or null if there was

@@ -13,6 +13,17 @@
 
 namespace {
 
+// Whether `is` holds for a child. A canonical group isn't entered: nobody has edited it, and it may contain itself.
+template <class Question>
+bool AnyChild(KFS_StreamGroup const* group, Question const& is)
+{
+    for (unsigned int i = 0; i < group->GetNumStreams(); ++i) {
+        KFS_StreamBase const* const child = group->GetStream(i);
+        if (!(child->IsCanonical() && child->IsGroup()) && is(child)) return true;
+    }
+    return false;
+}
+
 // Walks down `path` with `step`, which gives a group's child for an identifier.
 template <class Base, class Group, class Step>
 Base* Walk(Group* group, KFS_StreamIDPath const& path, Step const& step)
@@ -42,16 +53,14 @@ KFS_StreamGroup::KFS_StreamGroup(KFS_StreamGroup const& source) = default;
 
 bool KFS_StreamGroup::IsModified() const
 {
-    for (unsigned int i = 0; i < GetNumStreams(); ++i)
-        if (GetStream(i)->IsModified()) return true;
-    return false;
+    return AnyChild(
+        this, [](KFS_StreamBase const* child) { return child->IsModified(); });
 }
 
 bool KFS_StreamGroup::IsAnimated(bool evenIfDisabled) const
 {
-    for (unsigned int i = 0; i < GetNumStreams(); ++i)
-        if (GetStream(i)->IsAnimated(evenIfDisabled)) return true;
-    return false;
+    return AnyChild(
+        this, [=](KFS_StreamBase const* child) { return child->IsAnimated(evenIfDisabled); });
 }
 
 bool KFS_StreamGroup::IsGroup() const

@@ -31,7 +31,8 @@ using KFS_GroupChildren = std::vector<KFS_StreamBase*, Q_Allocator<KFS_StreamBas
 // was. Threads: one thread edits a tree. Look-ups that don't upgrade may run beside each other.
 class KFS_API KFS_StreamGroup : public KFS_StreamBase {
 public:
-    // Any child modified; any child animated. Both look at canonical children too.
+    // Any child modified; any child animated. Both ask canonical leaves too, and enter no canonical group, which is as
+    // its type made it and may contain itself.
     bool IsModified() const override;
     bool IsAnimated(bool evenIfDisabled) const override;
     bool IsGroup() const override;
@@ -89,7 +90,8 @@ public:
     boost::shared_ptr<KFS_CanonicalLayout> GetCanonicalLayout(KFS_MatchName const& name) const;
 
     // The stream at the end of a path from here; this group itself for the empty path. The editable form upgrades every
-    // canonical stream on its way. A path through a leaf is a broken invariant, "expected group".
+    // canonical stream on its way, and what it has upgraded stays so where the path then fails. A path through a leaf is
+    // a broken invariant, "expected group".
     KFS_StreamBase const* FindStream(KFS_StreamIDPath const& path) const;
     KFS_StreamBase* FindEditableStream(KFS_StreamIDPath const& path);
     // A real leaf at the end of a path, else null. Never upgrades.
