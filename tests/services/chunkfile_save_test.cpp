@@ -72,93 +72,53 @@ struct FailNth : CKF_IoHook {
     int Before(CKF_IoCall call, std::size_t) noexcept override
     {
         last = call;
-        return left > 0 && --left == 0 ? ENOSPC : 0;
+        return left != 0 && --left == 0 ? ENOSPC : 0;
     }
-    bool Fired() const { return left == 0; }
-
     int left;
     CKF_IoCall last = CKF_IoCall::Create;
 };
 
-TEST(ChunkFileSave, ReplacesTheTargetWhole)
-{
-    ScratchFolder const folder;
-    for (bool const exists : {false, true}) {
-        if (exists) folder.Write(Project, "the old file");
-        CKF_File file;
-        ASSERT_EQ(0, file.Create(folder.Path(Project).c_str()));
-        EXPECT_EQ(exists ? 2u : 1u, folder.Names().size()) << "what is written is beside the target";
-        ASSERT_EQ(0, WriteEverything(&file)) << file.LastErrorText();
-        EXPECT_EQ(Names{Project}, folder.Names());
-        EXPECT_EQ(Expected(), FileContent(folder.Path(Project)));
-        EXPECT_TRUE(file.GetBytes().empty());
-        EXPECT_EQ(CKF_Err_NotOpen, CKF_WriteAtom(&file, CKF_Id("late"), 0, nullptr));
-    }
-}
-
-TEST(ChunkFileSave, EveryCallThatFailsLeavesTheOldFile)
-{
-    std::set<CKF_IoCall> failed;
-    for (bool const disk : {true, false})
-        for (int n = 1;; ++n) {
-            SCOPED_TRACE(testing::Message() << (disk ? "disk " : "memory ") << n);
-            ASSERT_LT(n, 1000);
-            ScratchFolder const folder;
-            folder.Write(Project, "the old file");
-            FailNth hook(n);
-            CKF_File file;
-            int code = disk ? file.Create(folder.Path(Project).c_str(), &hook) : file.CreateInMemory(&hook);
-            if (code == 0) code = WriteEverything(&file);
-            if (!hook.Fired()) {
-                EXPECT_EQ(0, code);
-                EXPECT_EQ(Expected(), disk ? FileContent(folder.Path(Project)) : Bytes(file));
-                break;
-            }
-            failed.insert(hook.last);
-            EXPECT_EQ(CKF_Err_Io, code) << "the failure came out";
-            EXPECT_EQ(CKF_Err_Io, file.LastError());
-            EXPECT_TRUE(file.GetBytes().empty());
-            EXPECT_NE(nullptr, std::strstr(file.LastErrorText(), "No space left")) << file.LastErrorText();
-            EXPECT_EQ(Names{Project}, folder.Names()) << "nothing stays beside it";
-            // Behind the renaming the new file is in place, whatever the folder says.
-            EXPECT_EQ(hook.last == CKF_IoCall::SyncFolder ? Expected() : "the old file",
-                      FileContent(folder.Path(Project)));
-        }
-    EXPECT_EQ(7u, failed.size()) << "each kind of call was made to fail";
-}
-
-TEST(ChunkFileSave, EveryAllocationThatFailsIsTold)
+// Every call of the operating system and every allocation fails once: the failure comes out, and there is the old file
+// and nothing beside it. The last round of each kind is undisturbed.
+TEST(ChunkFileSave, WhateverFailsLeavesTheOldFileAndNothingElse)
 {
     Q_MemoryCount const before = Q_MemoryLive(nullptr);
-    for (bool const disk : {false, true})
-        for (int n = 1;; ++n) {
-            SCOPED_TRACE(testing::Message() << (disk ? "disk " : "memory ") << n);
-            ASSERT_LT(n, 1000);
-            ScratchFolder const folder;
-            folder.Write(Project, "the old file");
-            bool fired = false;
-            {
-                CKF_File file;
-                int code = 0;
-                Q_FailAllocation(n);
-                try {
-                    code = disk ? file.Create(folder.Path(Project).c_str()) : file.CreateInMemory();
-                    if (code == 0) code = WriteEverything(&file);
-                } catch (std::bad_alloc const&) {  // the texts that are made here, not the file
-                    code = Q_Err_OutOfMemory;
+    std::set<CKF_IoCall> failed;
+    for (bool const disk : {true, false})
+        for (bool const memory : {true, false})
+            for (int n = 1, fired = 1; fired; ++n) {
+                SCOPED_TRACE(testing::Message()
+                             << (disk ? "disk " : "memory ") << (memory ? "allocation " : "call ") << n);
+                ScratchFolder const folder;
+                folder.Write(Project, "the old file");
+                {
+                    FailNth hook(memory ? -1 : n);
+                    CKF_File file;
+                    int code = 0;
+                    Q_FailAllocation(memory ? n : 0);
+                    try {
+                        code = disk ? file.Create(folder.Path(Project).c_str(), &hook) : file.CreateInMemory(&hook);
+                        if (code == 0) code = WriteEverything(&file);
+                    } catch (std::bad_alloc const&) {  // the texts that are made here, not the file
+                        code = Q_Err_OutOfMemory;
+                    }
+                    fired = memory ? Q_FailAllocationFired() : hook.left == 0;
+                    Q_FailAllocation(0);
+                    EXPECT_EQ(!fired ? 0 : memory ? Q_Err_OutOfMemory : CKF_Err_Io, code);
+                    if (fired && !memory) {
+                        failed.insert(hook.last);
+                        EXPECT_EQ(CKF_Err_Io, file.LastError());
+                        EXPECT_NE(nullptr, std::strstr(file.LastErrorText(), "No space left")) << file.LastErrorText();
+                    }
+                    EXPECT_EQ(fired || disk ? "" : Expected(), Bytes(file));
+                    // Behind the renaming the new file is in place, whatever the folder says.
+                    bool const replaced = disk && (!fired || (!memory && hook.last == CKF_IoCall::SyncFolder));
+                    EXPECT_EQ(replaced ? Expected() : "the old file", FileContent(folder.Path(Project)));
                 }
-                fired = Q_FailAllocationFired();
-                Q_FailAllocation(0);
-                if (fired) {
-                    EXPECT_EQ(Q_Err_OutOfMemory, code);
-                } else {
-                    EXPECT_EQ(0, code);
-                    EXPECT_EQ(Expected(), disk ? FileContent(folder.Path(Project)) : Bytes(file));
-                }
+                EXPECT_EQ(Names{Project}, folder.Names());
+                ASSERT_LT(n, 1000);
             }
-            EXPECT_EQ(Names{Project}, folder.Names());
-            if (!fired) break;
-        }
+    EXPECT_EQ(7u, failed.size()) << "each kind of call was made to fail";
     EXPECT_EQ(before, Q_MemoryLive(nullptr));
 }
 
@@ -176,6 +136,14 @@ TEST(ChunkFileSave, WhatIsNotCommittedLeavesNothing)
         begin(file);
     }
     EXPECT_EQ(Names{Project}, folder.Names()) << "destroyed";
+    {
+        CKF_File made;
+        ASSERT_EQ(0, made.Create(folder.Path("new.kfs").c_str()));
+        EXPECT_EQ(0, made.Commit());
+        EXPECT_EQ(Form(""), FileContent(folder.Path("new.kfs"))) << "there was none";
+        EXPECT_EQ(CKF_Err_NotOpen, CKF_WriteAtom(&made, CKF_Id("late"), 0, nullptr));
+        fs::remove(folder.Path("new.kfs"));
+    }
     CKF_File file;
     begin(file);
     file.Close();

@@ -334,51 +334,44 @@ TEST(ChunkFileVersions, EffectivePairs)
 
 // ---- misuse while writing
 
+using Call = int (*)(CKF_File*);
+
+CKF_ChunkInfo chunk, inner;
+
+int BeginList(CKF_File* file, CKF_ChunkInfo* list = &chunk)
+{
+    return CKF_BeginChunkWrite(file, CKF_ListId, 0, CKF_Id("kfgp"), list);
+}
+
 TEST(ChunkFileWriting, AMisuseFailsTheWholeSave)
 {
-    static CKF_ChunkInfo chunk, inner;
-    constexpr int bad = CKF_Err_BadArgument;
+    Call const none = [](CKF_File* f) { return CKF_EndChunkWrite(f, &(chunk = {})); };
+    Call const outer = [](CKF_File* f) { return BeginList(f) + BeginList(f, &inner) + CKF_EndChunkWrite(f, &chunk); };
+    Call const open = [](CKF_File* f) { return BeginList(f) + f->Commit(); };
+    Call const deep = [](CKF_File* f) {
+        for (int i = 0; i < CKF_MaxDepth; ++i) EXPECT_EQ(0, BeginList(f)) << i;
+        return BeginList(f);
+    };
+    constexpr int bad = CKF_Err_BadArgument, unbalanced = CKF_Err_Unbalanced;
     const struct {
         char const* why;
-        std::function<int(CKF_File*)> call;
+        Call call;
         int code;
     } rows[] = {
-        {"a list as an atom", [](CKF_File* f) { return CKF_WriteAtom(f, CKF_ListId, 0, nullptr); }, bad},
+        {"a list as atom", [](CKF_File* f) { return CKF_WriteAtom(f, CKF_ListId, 0, nullptr); }, bad},
         {"no id", [](CKF_File* f) { return CKF_WriteAtom(f, 0, 0, nullptr); }, bad},
-        {"the id of the whole file", [](CKF_File* f) { return CKF_WriteString(f, CKF_Id("KFSF"), {}, 0); }, bad},
+        {"the id of the file", [](CKF_File* f) { return CKF_WriteString(f, CKF_Id("KFSF"), {}, 0); }, bad},
         {"a negative size", [](CKF_File* f) { return CKF_WriteAtom(f, CKF_Id("cdat"), -1, "x"); }, bad},
         {"no data", [](CKF_File* f) { return CKF_WriteAtom(f, CKF_Id("cdat"), 1, nullptr); }, bad},
         {"no handle", [](CKF_File* f) { return CKF_WriteHandle(f, CKF_Id("expr"), nullptr); }, bad},
-        {"chunks in an atom", [](CKF_File* f) { return CKF_BeginChunkWrite(f, CKF_Id("cdat"), 0, 0, &chunk); }, bad},
+        {"no list", [](CKF_File* f) { return CKF_BeginChunkWrite(f, CKF_Id("cdat"), 0, 0, &chunk); }, bad},
         {"no list type", [](CKF_File* f) { return CKF_BeginChunkWrite(f, CKF_ListId, 0, 0, &chunk); }, bad},
-        {"no list", [](CKF_File* f) { return SEQ_Write(nullptr, f); }, SEQ_Err_BadList},
-        {"reading", [](CKF_File* f) { return CKF_ReadAtom(f, CKF_Id("cdat"), nullptr, 0, nullptr); }, CKF_Err_NotOpen},
-        {"an end without a beginning",
-         [](CKF_File* f) {
-             chunk = {};
-             return CKF_EndChunkWrite(f, &chunk);
-         },
-         CKF_Err_Unbalanced},
-        {"the outer list is closed first",
-         [](CKF_File* f) {
-             CKF_BeginChunkWrite(f, CKF_ListId, 0, CKF_Id("kfgp"), &chunk);
-             CKF_BeginChunkWrite(f, CKF_ListId, 0, CKF_Id("kfbs"), &inner);
-             return CKF_EndChunkWrite(f, &chunk);
-         },
-         CKF_Err_Unbalanced},
-        {"a list that is still open",
-         [](CKF_File* f) {
-             CKF_BeginChunkWrite(f, CKF_ListId, 0, CKF_Id("kfgp"), &chunk);
-             return f->Commit();
-         },
-         CKF_Err_Unbalanced},
-        {"lists beyond the depth that a reader takes",
-         [](CKF_File* f) {
-             for (int i = 0; i < CKF_MaxDepth; ++i)
-                 EXPECT_EQ(0, CKF_BeginChunkWrite(f, CKF_ListId, 0, CKF_Id("kfgp"), &chunk)) << i;
-             return CKF_BeginChunkWrite(f, CKF_ListId, 0, CKF_Id("kfgp"), &chunk);
-         },
-         CKF_Err_TooDeep},
+        {"no items", [](CKF_File* f) { return SEQ_Write(nullptr, f); }, SEQ_Err_BadList},
+        {"reading", [](CKF_File* f) { return CKF_ReadAtom(f, 1, nullptr, 0, nullptr); }, CKF_Err_NotOpen},
+        {"an end without a beginning", none, unbalanced},
+        {"the outer list is closed first", outer, unbalanced},
+        {"a list that is still open", open, unbalanced},
+        {"lists beyond the depth that a reader takes", deep, CKF_Err_TooDeep},
     };
     for (auto const& row : rows) {
         SCOPED_TRACE(row.why);
@@ -421,17 +414,12 @@ TEST(ChunkFileWriting, TheSizeLimitIsExact)
 
 // ---- failures while reading
 
-// Failures: each is told, and stays.
-struct Failure {
-    char const* why;
-    std::string content;
-    std::function<int(CKF_File*)> call;
-    int code;
-    std::uint64_t offset;
-};
-
 TEST(ChunkFileReading, AFailureStays)
 {
+    Call const find = [](CKF_File* f) { return CKF_ReadAtom(f, CKF_Id("aaaa"), nullptr, 0, nullptr); };
+    Call const noPlace = [](CKF_File* f) { return CKF_ReadAtom(f, CKF_Id("aaaa"), nullptr, 1, nullptr); };
+    Call const negative = [](CKF_File* f) { return CKF_ReadAtom(f, CKF_Id("aaaa"), nullptr, -1, f); };
+    Call const write = [](CKF_File* f) { return CKF_WriteAtom(f, CKF_Id("aaaa"), 0, nullptr); };
     auto const readPast = [](CKF_File* f) {
         CKF_ScDescend const atom(f, 0, 0, nullptr, nullptr);
         int size = 3;
@@ -462,30 +450,29 @@ TEST(ChunkFileReading, AFailureStays)
         CKF_ScDescend list(f, 0, 0, nullptr, nullptr);
         return Thrown([&] { list.Descend(f, 0, 0, nullptr, nullptr); });
     };
-    auto const find = [](CKF_File* f) { return CKF_ReadAtom(f, CKF_Id("aaaa"), nullptr, 0, nullptr); };
     std::string const list = List("kfgp", List("kfbs", ""));
-    Failure const rows[] = {
+    const struct {
+        char const* why;
+        std::string content;
+        Call call;
+        int code;
+        std::uint64_t offset;
+    } rows[] = {
         {"more data than there is", Atom("aaaa", "12"), readPast, CKF_Err_PastEnd, 40},
         {"a list that isn't open", list, searchOutside, CKF_Err_Unbalanced, 44},
         {"a list that isn't the innermost", list, searchOuter, CKF_Err_Unbalanced, 56},
         {"chunks in an atom", Atom("bbbb", "12"), searchInAtom, CKF_Err_BadArgument, 40},
         {"data of a list", list, readInList, CKF_Err_BadArgument, 44},
         {"a descent that is in use", list, useTwice, CKF_Err_Unbalanced, 44},
-        {"an atom without a place", Atom("aaaa", "12"),
-         [](CKF_File* f) { return CKF_ReadAtom(f, CKF_Id("aaaa"), nullptr, 1, nullptr); }, CKF_Err_BadArgument, 0},
-        {"a negative size", Atom("aaaa", "12"),
-         [](CKF_File* f) {
-             char c;
-             return CKF_ReadAtom(f, CKF_Id("aaaa"), nullptr, -1, &c);
-         },
-         CKF_Err_BadArgument, 0},
-        {"writing", "", [](CKF_File* f) { return CKF_WriteAtom(f, CKF_Id("aaaa"), 0, nullptr); }, CKF_Err_NotOpen, 0},
+        {"an atom without a place", Atom("aaaa", "12"), noPlace, CKF_Err_BadArgument, 0},
+        {"a negative size", Atom("aaaa", "12"), negative, CKF_Err_BadArgument, 0},
+        {"writing", "", write, CKF_Err_NotOpen, 0},
         {"a length beyond the file", "bbbb" + Long(3) + "ab", find, CKF_Err_Corrupt, 32},
         {"a huge length", "bbbb" + Long(0xFFFFFFFFu) + "ab", find, CKF_Err_Corrupt, 32},
         {"half a header", "bbbb" + Long(2) + "abhalf", find, CKF_Err_Corrupt, 42},
         {"a list without room for its type", "LIST" + Long(2) + "ab", find, CKF_Err_Corrupt, 32},
     };
-    for (Failure const& row : rows) {
+    for (auto const& row : rows) {
         SCOPED_TRACE(row.why);
         std::string const bytes = Form(row.content);
         CKF_File file;

@@ -1,6 +1,7 @@
 // Lists against a vector under random scripts, with items that own something and everything that can fail failing; and
 // the few rules that no script comes by.
 #include "tests/services/chunkbytes.h"
+#include "tests/support/codes.h"
 #include "tests/support/dice.h"
 
 #include "frame/services/memory.h"
@@ -460,39 +461,21 @@ TEST(Sequence, NonsenseIsRefused)
     int number = 0;
     unsigned char found = 0;
     auto const visit = [](SEQ_Head**, long, int, void*) { return 0; };
-    std::vector<int> const codes = {SEQ_Dispose(none, 0),
-                                    SEQ_Duplicate(none, 0, &made),
-                                    SEQ_SetFuncs(none, 3, &funcs),
-                                    SEQ_SetRefcon(nullptr, none),
-                                    SEQ_Lock(1, none),
-                                    SEQ_Unlock(none),
-                                    SEQ_GetAddress(none, 0, 1, &item),
-                                    SEQ_GetConstAddress(none, 0, &constItem),
-                                    SEQ_GetItemCopy(none, 0, 0, &number),
-                                    SEQ_SetItemCopy(&number, 0, none, 0, 0),
-                                    SEQ_InsertCopy(&number, 0, none, 0),
-                                    SEQ_Remove(0, none, 0, nullptr),
-                                    SEQ_GetSortedItem(none, 0, &number, &found, 0, &number),
-                                    SEQ_ForEach(none, 0, visit, 0),
-                                    SEQ_ReserveSpace(1, none),
-                                    SEQ_Compact(none),
-                                    SEQ_SetNumItems(1, none, 0)};
-    EXPECT_EQ(std::vector<int>(17, SEQ_Err_BadList), codes);
-    std::vector<int> const arguments = {SEQ_Duplicate(list, 0, nullptr),
-                                        SEQ_SetFuncs(list, 2, &funcs),
-                                        SEQ_SetFuncs(list, 3, nullptr),
-                                        SEQ_GetAddress(list, 0, 1, nullptr),
-                                        SEQ_GetConstAddress(list, 0, nullptr),
-                                        SEQ_GetItemCopy(list, 0, 0, nullptr),
-                                        SEQ_SetItemCopy(nullptr, 0, list, 0, 0),
-                                        SEQ_InsertCopy(nullptr, 0, list, 0),
-                                        SEQ_SetNumItems(-1, list, 0),
-                                        SEQ_ReserveSpace(-1, list),
-                                        SEQ_New(0, 0, 4, 1, &made),
-                                        SEQ_New(0, -1, 4, 1, &made),
-                                        SEQ_New(0, SHRT_MIN, 4, 1, &made),
-                                        SEQ_New(0, 8, 4, 1, nullptr)};
-    EXPECT_EQ(std::vector<int>(14, SEQ_Err_BadArgument), arguments);
+    EXPECT_EQ(std::vector<int>(17, SEQ_Err_BadList),
+              Codes(SEQ_Dispose(none, 0), SEQ_Duplicate(none, 0, &made), SEQ_SetFuncs(none, 3, &funcs),
+                    SEQ_SetRefcon(nullptr, none), SEQ_Lock(1, none), SEQ_Unlock(none),
+                    SEQ_GetAddress(none, 0, 1, &item), SEQ_GetConstAddress(none, 0, &constItem),
+                    SEQ_GetItemCopy(none, 0, 0, &number), SEQ_SetItemCopy(&number, 0, none, 0, 0),
+                    SEQ_InsertCopy(&number, 0, none, 0), SEQ_Remove(0, none, 0, nullptr),
+                    SEQ_GetSortedItem(none, 0, &number, &found, 0, &number), SEQ_ForEach(none, 0, visit, 0),
+                    SEQ_ReserveSpace(1, none), SEQ_Compact(none), SEQ_SetNumItems(1, none, 0)));
+    EXPECT_EQ(std::vector<int>(14, SEQ_Err_BadArgument),
+              Codes(SEQ_Duplicate(list, 0, nullptr), SEQ_SetFuncs(list, 2, &funcs), SEQ_SetFuncs(list, 3, nullptr),
+                    SEQ_GetAddress(list, 0, 1, nullptr), SEQ_GetConstAddress(list, 0, nullptr),
+                    SEQ_GetItemCopy(list, 0, 0, nullptr), SEQ_SetItemCopy(nullptr, 0, list, 0, 0),
+                    SEQ_InsertCopy(nullptr, 0, list, 0), SEQ_SetNumItems(-1, list, 0), SEQ_ReserveSpace(-1, list),
+                    SEQ_New(0, 0, 4, 1, &made), SEQ_New(0, -1, 4, 1, &made), SEQ_New(0, SHRT_MIN, 4, 1, &made),
+                    SEQ_New(0, 8, 4, 1, nullptr)));
     EXPECT_EQ(nullptr, made);
     EXPECT_EQ((std::vector<int>{1}), list.Values());
 }

@@ -1,4 +1,5 @@
 // Times against exact arithmetic of 128 bits.
+#include "tests/support/codes.h"
 #include "tests/support/dice.h"
 
 #include "frame/services/math.h"
@@ -158,31 +159,24 @@ TEST(Time, AScaleOfZeroIsRefusedAndOrderedBeforeAllOthers)
     T_Time result{77, 77};
     M_Ratio const one{1, 1}, nonsense{1, 0};
     int value = 77;
-    std::vector<int> const codes = {T_ShortConvTime(7, 0, 600, &value),
-                                    T_ShortConvTime(7, 600, 0, &value),
-                                    T_ShortConvTime(0, 0, 0, &value),
-                                    T_ConvTime(&none, 600, &result, 0),
-                                    T_AddTime(&none, &good, &result),
-                                    T_AddTime(&good, &none, &result),
-                                    T_AddTime(&none, &none, &result),
-                                    T_MulTime(&none, &one, &result),
-                                    T_MulTime(&good, &nonsense, &result),
-                                    T_CompareTime(&none, &good, &value),
-                                    T_CompareTime(&good, &none, &value),
-                                    T_ReduceTime(&none, &result, nullptr),
-                                    Try([&] { return good / 0; }, &result),
-                                    Try([&] { return none / 2; }, &result),
-                                    Try(
-                                        [&] {
-                                            return T_NormalizeSpan({none, good}).start;
-                                        },
-                                        &result),
-                                    Try(
-                                        [&] {
-                                            return T_NormalizeSpan({good, none}).start;
-                                        },
-                                        &result)};
-    EXPECT_EQ(std::vector<int>(16, T_Err_Scale), codes);
+    EXPECT_EQ(std::vector<int>(16, T_Err_Scale),
+              Codes(T_ShortConvTime(7, 0, 600, &value), T_ShortConvTime(7, 600, 0, &value),
+                    T_ShortConvTime(0, 0, 0, &value), T_ConvTime(&none, 600, &result, 0),
+                    T_AddTime(&none, &good, &result), T_AddTime(&good, &none, &result),
+                    T_AddTime(&none, &none, &result), T_MulTime(&none, &one, &result),
+                    T_MulTime(&good, &nonsense, &result), T_CompareTime(&none, &good, &value),
+                    T_CompareTime(&good, &none, &value), T_ReduceTime(&none, &result, nullptr),
+                    Try([&] { return good / 0; }, &result), Try([&] { return none / 2; }, &result),
+                    Try(
+                        [&] {
+                            return T_NormalizeSpan({none, good}).start;
+                        },
+                        &result),
+                    Try(
+                        [&] {
+                            return T_NormalizeSpan({good, none}).start;
+                        },
+                        &result)));
     EXPECT_TRUE(IsSame(result, {77, 77}) && value == 77);
     EXPECT_EQ(0, T_CompareTime(&none, &none, &value));
     EXPECT_EQ(0, value);
