@@ -59,36 +59,23 @@ TEST_F(Projects, StatesAreFoundByTheirNames)
         EXPECT_NE(nullptr, context->PeekState(hearth::utility::ImmutableString::Create(name))) << name;
 }
 
-TEST_F(Projects, DetectingErrorsNestsAndTheOutermostClearsTheCount)
+TEST_F(Projects, DetectingErrorsAndSuspensionsNest)
 {
     kfshost::ExpState state;
+    KFS_RenderState render;
     state.errorCount = 3;
     {
         KFS_DetectExpressionErrors const outer(&state);
+        KFS_RenderState::Suspension const suspended = render.SuspendAutoDecanonicalize();
         {
             KFS_DetectExpressionErrors const inner(&state);
+            KFS_RenderState::Suspension const again = render.SuspendAutoDecanonicalize(), copy = again;
             state.errorCount = 5;
         }
-        EXPECT_TRUE(state.detectingErrors);
-        EXPECT_EQ(5, state.errorCount);
+        EXPECT_TRUE(state.detectingErrors && state.errorCount == 5 && render.GetAutoDecanonicalizeIsSuspended());
     }
-    EXPECT_FALSE(state.detectingErrors);
-    EXPECT_EQ(0, state.errorCount);
-}
-
-TEST_F(Projects, SuspensionsNestWhateverTheOrderOfTheirLastReferences)
-{
-    KFS_RenderState state;
-    {
-        KFS_RenderState::Suspension const outer = state.SuspendAutoDecanonicalize();
-        {
-            KFS_RenderState::Suspension const inner = state.SuspendAutoDecanonicalize();
-            KFS_RenderState::Suspension const second = inner;
-            EXPECT_TRUE(state.GetAutoDecanonicalizeIsSuspended());
-        }
-        EXPECT_TRUE(state.GetAutoDecanonicalizeIsSuspended());
-    }
-    EXPECT_FALSE(state.GetAutoDecanonicalizeIsSuspended());
+    EXPECT_TRUE(!state.detectingErrors && state.errorCount == 0) << "the outermost clears the count";
+    EXPECT_FALSE(render.GetAutoDecanonicalizeIsSuspended());
 }
 
 // A bag that holds entries without streams, to see contents come and go.

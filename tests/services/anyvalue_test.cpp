@@ -169,7 +169,7 @@ Q_AnyTree RandomTree(std::mt19937& random, int depth)
 TEST(AnyTree, EveryTreeComesBackFromItsText)
 {
     std::mt19937 random(42);
-    for (int i = 0; i < 500; ++i) {
+    for (int i = 0; i < 150; ++i) {
         Q_AnyTree tree = RandomTree(random, 4), back;
         u16str const text = Q_AnyTreeWrapper(tree).GetAs_JSON();
         Q_AnyTreeWrapper(back).SetFrom_JSON_HackRecoverMagicMixed(text);

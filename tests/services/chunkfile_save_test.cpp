@@ -224,6 +224,7 @@ void DieWriting(std::string const& path, int signal, bool takesCare)
 {
     pid_t const child = ::fork();
     if (child == 0) {
+        ::signal(signal, SIG_DFL);  // whoever runs the tests may ignore it
         if (takesCare) CKF_RemoveTemporariesOnSignals();
         CKF_FileWriter file;
         if (file.Create(path.c_str()) == 0) ::raise(signal);
