@@ -33,8 +33,3 @@ inline int KFSp_CheckPathDimension(KFS_Stream const* stream)
     if (KFSp_HasPathDimension(stream) || !stream->IsSpatial() || !stream->IsSParametrized()) return 0;
     return KFSp_RefusePathDimension();
 }
-
-inline bool KFSp_Floats(KFS_KeyScalar const* key)
-{
-    return (key->flags & KFS_KeyFlag_Float) != 0;
-}

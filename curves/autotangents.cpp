@@ -1,3 +1,5 @@
+// Automatic handles and tangents of one key, derived from the keys around it: for the update pass and for a key that is
+// about to enter the list.
 #include "curves/autotangents_private.h"
 
 #include "curves/neighbours_private.h"
@@ -15,25 +17,15 @@ namespace {
 // Components closer than this coincide.
 constexpr double Coincidence = 1e-12;
 
-// The keys around a time: `prev` and `next` strictly before and after it. Missing ones are null.
-struct Surroundings {
-    KFS_KeyScalar* at = nullptr;
-    KFS_KeyScalar* prev = nullptr;
-    KFS_KeyScalar* next = nullptr;
-    int atIndex = -1;
-    int prevIndex = -1;
-    int nextIndex = -1;
-};
-
 int SpanOf(KFS_KeyScalar const* from, KFS_KeyScalar const* to)
 {
     return from && to ? KFSp_TimeDifference(to->time, from->time) : 0;
 }
 
 // Between the keys whose difference gives the slope.
-int OuterSpan(Surroundings const& around)
+int OuterSpan(KFSp_Neighbours const& around)
 {
-    if (around.prev && around.next) return SpanOf(around.prev, around.next);
+    if (around.Both()) return SpanOf(around.prev, around.next);
     if (around.prev && around.at) return SpanOf(around.prev, around.at);
     return SpanOf(around.at, around.next);
 }
@@ -49,7 +41,7 @@ StraightSide GetStraightSide(KFS_KeyScalar const* key)
 }
 
 // The number of units over which the slope is taken, once a straight side has its say.
-int SlopeSpan(Surroundings const& around, StraightSide straight)
+int SlopeSpan(KFSp_Neighbours const& around, StraightSide straight)
 {
     switch (straight) {
     case StraightSide::In: return SpanOf(around.prev, around.at);
@@ -70,7 +62,7 @@ double Slope(Level prev, Level at, Level next, double seconds)
     return 0.0;
 }
 
-void SetPlainHandles(KFS_Stream const* stream, Surroundings const& around, KFS_KeyScalar* key)
+void SetPlainHandles(KFS_Stream const* stream, KFSp_Neighbours const& around, KFS_KeyScalar* key)
 {
     StraightSide const straight = GetStraightSide(key);
     KFS_KeyScalar const* const prev = straight == StraightSide::Out ? nullptr : around.prev;
@@ -112,7 +104,7 @@ struct Distances {
     Level next;
 };
 
-int MeasureDistances(KFS_StreamKeyData const* data, Surroundings const& around, Distances* distances)
+int MeasureDistances(KFS_StreamKeyData const* data, KFSp_Neighbours const& around, Distances* distances)
 {
     int first = around.prevIndex;
     int last = around.nextIndex;
@@ -137,7 +129,7 @@ int MeasureDistances(KFS_StreamKeyData const* data, Surroundings const& around, 
     return 0;
 }
 
-int SetSpatialHandles(KFS_Stream const* stream, KFS_StreamKeyData const* data, Surroundings const& around,
+int SetSpatialHandles(KFS_Stream const* stream, KFS_StreamKeyData const* data, KFSp_Neighbours const& around,
                       KFS_KeyScalar* key)
 {
     Distances distances;
@@ -164,10 +156,8 @@ bool IsStraight(KFS_KeyScalar const* neighbour, double const* farTangent, int di
 
 int SetPathTangents(KFS_Stream const* stream, int time, KFS_KeyScalar* key)
 {
-    Surroundings around;
-    if (int const code = KFSp_GetNeighborsFromTime(stream, time, 1, &around.at, &around.prev, &around.next, nullptr,
-                                                   nullptr, nullptr))
-        return code;
+    KFSp_Neighbours around;
+    if (int const code = KFSp_FindAround(stream, time, 1, &around)) return code;
     short const dimension = stream->GetDimension();
     auto const valueOf = [](KFS_KeyScalar const* source) { return source ? KFSp_Numbers(source) : nullptr; };
     double const* const farIn = around.prev ? KFSp_GetSpatialRuns(around.prev, dimension).inTangent : nullptr;
@@ -189,10 +179,8 @@ int SetPathTangents(KFS_Stream const* stream, int time, KFS_KeyScalar* key)
 int SetTangents(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, char mode, bool custom,
                 KFS_KeyScalar* key)
 {
-    Surroundings around;
-    if (int const code = KFSp_GetNeighborsFromTime(stream, time, 0, &around.at, &around.prev, &around.next,
-                                                   &around.prevIndex, &around.nextIndex, &around.atIndex))
-        return code;
+    KFSp_Neighbours around;
+    if (int const code = KFSp_FindAround(stream, time, 0, &around)) return code;
     bool const temporal = (mode & KFSp_Tangents_Temporal) != 0;
     if (!stream->IsSpatial()) {
         if (temporal) SetPlainHandles(stream, around, key);

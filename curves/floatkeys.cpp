@@ -1,3 +1,4 @@
+// Times of float keys, from the speed graph between their anchors: the last stage of the update pass, their only writer.
 #include "curves/floatkeys.h"
 
 #include "curves/arcs_private.h"
@@ -48,14 +49,6 @@ private:
     int settledTime_ = 0;
 };
 
-int GetKey(KFS_StreamKeyData const* data, int index, KFS_KeyScalar** key)
-{
-    KFS_KeyScalar const* item = nullptr;
-    int const code = KFSp_GetConstKey(data, index, &item);
-    *key = const_cast<KFS_KeyScalar*>(item);
-    return code;
-}
-
 bool FloatRun::Begin(int index, int* code)
 {
     *code = KFSp_GetNeighborsFromIndex(stream_, index, 0, &prev_, &next_, &prevIndex_, &nextIndex_);
@@ -103,12 +96,12 @@ int FloatRun::ProposeTime(double s, long long* time)
 // The difference of a key's time and index never falls along the list, so a block is where it stays the same.
 int FloatRun::GetEndOfBlock(int found, int index, KFS_KeyScalar** key) const
 {
-    int code = GetKey(data_, found, key);
+    int code = KFSp_GetKey(data_, found, key);
     long long const difference = code == 0 ? static_cast<long long>((*key)->time) - found : 0;
     for (int inside = found, outside = index; code == 0 && std::abs(outside - inside) > 1;) {
         int const middle = std::midpoint(inside, outside);
         KFS_KeyScalar* probe = nullptr;
-        code = GetKey(data_, middle, &probe);
+        code = KFSp_GetKey(data_, middle, &probe);
         if (code == 0 && static_cast<long long>(probe->time) - middle == difference) {
             inside = middle;
             *key = probe;
@@ -166,7 +159,7 @@ int FloatRun::Place(int first, int last, int* placed)
     int const end = std::min(last, nextIndex_ - 1);
     for (int i = prevIndex_ + 1; i <= end; ++i) {
         KFS_KeyScalar* key = nullptr;
-        if (int const code = GetKey(data_, i, &key); code != 0) return code;
+        if (int const code = KFSp_GetKey(data_, i, &key); code != 0) return code;
         if (i >= first && KFSp_Floats(key)) {
             if (int const code = PlaceKey(i, key, s); code != 0) return code;
         }
@@ -181,7 +174,7 @@ int PlaceFloatKeys(KFS_Stream const* stream, int first, int last)
     KFS_StreamKeyData* const data = stream->GetKeyDataForModify();
     for (int i = first; i <= last; ++i) {
         KFS_KeyScalar* key = nullptr;
-        if (int const code = GetKey(data, i, &key); code != 0) return code;
+        if (int const code = KFSp_GetKey(data, i, &key); code != 0) return code;
         if (!KFSp_Floats(key)) continue;
         int code = KFSp_CheckPathDimension(stream);
         FloatRun run(stream, data);

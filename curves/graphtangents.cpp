@@ -1,3 +1,4 @@
+// Temporal handles as graph tangents, what curve editors draw. Apart from speeds and influences: the limits differ.
 #include "curves/keyhandles_private.h"
 #include "curves/neighbours_private.h"
 #include "curves/tangents.h"
@@ -5,6 +6,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <limits>
 
 namespace {
 
@@ -59,6 +61,24 @@ void ForbidFalling(KFSp_Handles<double> const& handles)
         if (handles.speed[i] < 0.0) handles.speed[i] = 0.0;
 }
 
+// How many times as long one handle is as another of the same duration, both with speeds too large to be squared: in a
+// graph that is drawn smaller, where they aren't.
+double LengthRatio(double speed, double newSpeed, double yScale)
+{
+    constexpr double largest = std::numeric_limits<double>::max();
+    double const tallness = std::fabs(yScale);
+    double const width = tallness > 1.0 ? 1.0 / tallness : 1.0;
+    auto const scaled = [&](double v) { return std::min(std::fabs(v), largest) * (tallness > 1.0 ? 1.0 : tallness); };
+    auto const length = [width](double height, double unit) {
+        return std::sqrt((height / unit) * (height / unit) + (width / unit) * (width / unit));
+    };
+    double const height = scaled(speed);
+    double const newHeight = scaled(newSpeed);
+    double const unit = std::max(height, width);
+    double const newUnit = std::max(newHeight, width);
+    return std::min(unit / newUnit, largest) * length(height, unit) / length(newHeight, newUnit);
+}
+
 // The influence that keeps a handle's length in the graph when its speed changes.
 double KeepLength(double influence, double speed, double newSpeed, double duration, double yScale)
 {
@@ -66,7 +86,10 @@ double KeepLength(double influence, double speed, double newSpeed, double durati
     double const y = speed * yScale;
     double const newY = newSpeed * yScale;
     if (std::fabs(duration) < NoDuration) return x;
-    return std::clamp(std::sqrt((y * y + 1.0) * (x * x) / (newY * newY + 1.0)) / duration, MinInfluence, MaxInfluence);
+    bool const squares = std::isfinite(y * y) && std::isfinite(newY * newY);
+    double const newX = squares ? std::sqrt((y * y + 1.0) * (x * x) / (newY * newY + 1.0))
+                                : std::fabs(x) * LengthRatio(speed, newSpeed, yScale);
+    return std::clamp(newX / duration, MinInfluence, MaxInfluence);
 }
 
 // Turns a continuous key's other side along.
@@ -125,24 +148,17 @@ void ReadTangent(KFS_Stream const* stream, KFS_KeyScalar const* key, KFSp_Side s
     }
 }
 
-}  // namespace
-
-int KFS_SetKeyTangentsF(KFS_Stream* stream, int index, double const* inX, double const* inY, double const* outX,
-                        double const* outY, double yScale)
+int SetKeyTangents(KFS_Stream* stream, int index, Given const& in, Given const& out, double yScale)
 {
     if (int const code = KFSp_CheckHandleAccess(stream, {KFSp_Op_SetKeyTangents, KFSp_Row_GetValue},
                                                 {KFSp_Op_GetKeyTangents, KFSp_Row_GetValue}))
         return code;
     KFSp_FirstError error;
-    if (stream->HasKeys()) {
-        // Durations and the other side's handle may be derived.
-        error.Keep(stream->UpdateStreamIfStaleTangents(index));
-        if (error.None()) error.Keep(SetTangents(stream, index, {inX, inY}, {outX, outY}, yScale));
-    }
+    if (stream->HasKeys()) error.Keep(SetTangents(stream, index, in, out, yScale));
     return KFSp_FinishHandleEdit(stream, error);
 }
 
-int KFS_GetKeyTangentsF(KFS_Stream const* stream, int index, double* inX, double* inY, double* outX, double* outY)
+int GetKeyTangents(KFS_Stream const* stream, int index, double* inX, double* inY, double* outX, double* outY)
 {
     KFSp_Refusal const refusal{KFSp_Op_GetKeyTangents, KFSp_Row_GetValue};
     if (int const code = KFSp_CheckHandleAccess(stream, refusal, refusal)) return code;
@@ -154,4 +170,17 @@ int KFS_GetKeyTangentsF(KFS_Stream const* stream, int index, double* inX, double
     ReadTangent(stream, key, KFSp_Side::In, durations.prev, inX, inY);
     ReadTangent(stream, key, KFSp_Side::Out, durations.next, outX, outY);
     return 0;
+}
+
+}  // namespace
+
+int KFS_SetKeyTangentsF(KFS_Stream* stream, int index, double const* inX, double const* inY, double const* outX,
+                        double const* outY, double yScale)
+{
+    return KFSp_Boundary([&] { return SetKeyTangents(stream, index, {inX, inY}, {outX, outY}, yScale); });
+}
+
+int KFS_GetKeyTangentsF(KFS_Stream const* stream, int index, double* inX, double* inY, double* outX, double* outY)
+{
+    return KFSp_Boundary([&] { return GetKeyTangents(stream, index, inX, inY, outX, outY); });
 }

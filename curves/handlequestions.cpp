@@ -1,3 +1,4 @@
+// Questions about temporal handles that store nothing.
 #include "curves/keyhandles_private.h"
 #include "curves/neighbours_private.h"
 #include "curves/tangents.h"
@@ -15,6 +16,14 @@ struct Proposal {
     double neighbourTime;
     double speed;
     double influence;
+};
+
+// A side's proposed numbers as a caller hands them in, for the answers too; either may be null.
+struct ProposedSide {
+    double* speeds;
+    double* influences;
+
+    bool IsAskedFor() const { return speeds || influences; }
 };
 
 // A handle that ends between both values. False where the proposal does so already.
@@ -46,7 +55,7 @@ bool ClampHandle(KFSp_Side side, Proposal const& proposal, double* speed, double
 }
 
 void ClampSide(KFS_Stream const* stream, KFS_KeyScalar const* key, KFS_KeyScalar const* neighbour, KFSp_Side side,
-               double* speeds, double* influences, unsigned char* clamped)
+               ProposedSide const& asked, unsigned char* clamped)
 {
     KFSp_Handles<double const> const stored = KFSp_GetHandles(stream, key, side);
     double const scale = static_cast<double>(stream->GetTimeScale());
@@ -55,21 +64,19 @@ void ClampSide(KFS_Stream const* stream, KFS_KeyScalar const* key, KFS_KeyScalar
                                 KFSp_Numbers(neighbour)[i],
                                 static_cast<double>(key->time) / scale,
                                 static_cast<double>(neighbour->time) / scale,
-                                speeds ? speeds[i] : stored.speed[i],
-                                influences ? influences[i] : stored.influence[i]};
+                                asked.speeds ? asked.speeds[i] : stored.speed[i],
+                                asked.influences ? asked.influences[i] : stored.influence[i]};
         double speed = 0.0;
         double influence = 0.0;
         if (!ClampHandle(side, proposal, &speed, &influence)) continue;
-        if (speeds) speeds[i] = speed;
-        if (influences) influences[i] = influence;
+        if (asked.speeds) asked.speeds[i] = speed;
+        if (asked.influences) asked.influences[i] = influence;
         if (clamped) *clamped = 1;
     }
 }
 
-}  // namespace
-
-int KFS_GetClampedVelInflF(KFS_Stream const* stream, int index, short, double* inVelocity, double* inInfluence,
-                           double* outVelocity, double* outInfluence, unsigned char* clamped)
+int GetClamped(KFS_Stream const* stream, int index, ProposedSide const& in, ProposedSide const& out,
+               unsigned char* clamped)
 {
     KFSp_Refusal const refusal{KFSp_Op_GetClampedVelInfl, KFSp_Row_GetValue};
     if (int const code = KFSp_CheckHandleAccess(stream, refusal, refusal)) return code;
@@ -80,15 +87,13 @@ int KFS_GetClampedVelInflF(KFS_Stream const* stream, int index, short, double* i
     KFS_KeyScalar* prev = nullptr;
     KFS_KeyScalar* next = nullptr;
     if (int const code = KFSp_GetNeighborsFromIndex(stream, index, 0, &prev, &next, nullptr, nullptr)) return code;
-    if (prev && (inVelocity || inInfluence))
-        ClampSide(stream, key, prev, KFSp_Side::In, inVelocity, inInfluence, clamped);
-    if (next && (outVelocity || outInfluence))
-        ClampSide(stream, key, next, KFSp_Side::Out, outVelocity, outInfluence, clamped);
+    if (prev && in.IsAskedFor()) ClampSide(stream, key, prev, KFSp_Side::In, in, clamped);
+    if (next && out.IsAskedFor()) ClampSide(stream, key, next, KFSp_Side::Out, out, clamped);
     return 0;
 }
 
-int KFS_GetZeroVelocityPoints(KFS_Stream const* stream, int index, int dimensionIndex, int* count, T_Time* times,
-                              double* secondDerivatives)
+int GetZeroVelocityPoints(KFS_Stream const* stream, int index, int dimensionIndex, int* count, T_Time* times,
+                          double* secondDerivatives)
 {
     KFSp_Refusal const refusal{KFSp_Op_GetZeroVelocityPoints, KFSp_Row_AlterKey};
     if (int const code = KFSp_CheckHandleAccess(stream, refusal, refusal)) return code;
@@ -112,4 +117,21 @@ int KFS_GetZeroVelocityPoints(KFS_Stream const* stream, int index, int dimension
         if (int const code = CRV_Evaluate1dDeriv2FromX(&segment.curve, &secondDerivatives[i], seconds[i])) return code;
     }
     return 0;
+}
+
+}  // namespace
+
+int KFS_GetClampedVelInflF(KFS_Stream const* stream, int index, short, double* inVelocity, double* inInfluence,
+                           double* outVelocity, double* outInfluence, unsigned char* clamped)
+{
+    return KFSp_Boundary([&] {
+        return GetClamped(stream, index, {inVelocity, inInfluence}, {outVelocity, outInfluence}, clamped);
+    });
+}
+
+int KFS_GetZeroVelocityPoints(KFS_Stream const* stream, int index, int dimensionIndex, int* count, T_Time* times,
+                              double* secondDerivatives)
+{
+    return KFSp_Boundary(
+        [&] { return GetZeroVelocityPoints(stream, index, dimensionIndex, count, times, secondDerivatives); });
 }

@@ -1,3 +1,4 @@
+// Temporal handles as influences. Apart from graph tangents: the limits differ.
 #include "curves/keyhandles_private.h"
 #include "curves/segment_private.h"
 #include "curves/tangents.h"
@@ -66,22 +67,17 @@ int RefuseCustom()
     return KFS_Err_CustomNotAllowed;
 }
 
-}  // namespace
-
-int KFS_SetKeyInfluence(KFS_Stream* stream, int index, double const* inInfluence, double const* outInfluence)
+int SetKeyInfluence(KFS_Stream* stream, int index, double const* in, double const* out)
 {
     if (int const code = KFSp_CheckHandleAccess(stream, {KFSp_Op_SetKeyInfluence, KFSp_Row_AlterKey},
                                                 {KFSp_Op_SetKeyInfluence, KFSp_Row_InquireKey}))
         return code;
     KFSp_FirstError error;
-    if (stream->HasKeys()) {
-        KFSp_SettleAutomaticKey(stream, index);
-        error.Keep(SetInfluences(stream, index, inInfluence, outInfluence));
-    }
+    if (stream->HasKeys()) error.Keep(SetInfluences(stream, index, in, out));
     return KFSp_FinishHandleEdit(stream, error);
 }
 
-int KFS_GetKeyInfluence(KFS_Stream const* stream, int index, double* inInfluence, double* outInfluence)
+int GetKeyInfluence(KFS_Stream const* stream, int index, double* in, double* out)
 {
     KFSp_Refusal const refusal{KFSp_Op_GetKeyInfluence, KFSp_Row_GetValue};
     if (int const code = KFSp_CheckHandleAccess(stream, refusal, refusal)) return code;
@@ -91,8 +87,20 @@ int KFS_GetKeyInfluence(KFS_Stream const* stream, int index, double* inInfluence
     if (int const code = KFSp_GetHandleKey(stream, data, index, &key)) return code;
     if (stream->IsCustom() && !stream->IsSpatial() && stream->GetValueDesc()->itemSize != sizeof(double))
         return RefuseCustom();
-    if (inInfluence) {
-        if (int const code = GetInfluence(stream, data, key, KFSp_Side::In, inInfluence)) return code;
+    if (in) {
+        if (int const code = GetInfluence(stream, data, key, KFSp_Side::In, in)) return code;
     }
-    return outInfluence ? GetInfluence(stream, data, key, KFSp_Side::Out, outInfluence) : 0;
+    return out ? GetInfluence(stream, data, key, KFSp_Side::Out, out) : 0;
+}
+
+}  // namespace
+
+int KFS_SetKeyInfluence(KFS_Stream* stream, int index, double const* inInfluence, double const* outInfluence)
+{
+    return KFSp_Boundary([&] { return SetKeyInfluence(stream, index, inInfluence, outInfluence); });
+}
+
+int KFS_GetKeyInfluence(KFS_Stream const* stream, int index, double* inInfluence, double* outInfluence)
+{
+    return KFSp_Boundary([&] { return GetKeyInfluence(stream, index, inInfluence, outInfluence); });
 }

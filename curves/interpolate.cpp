@@ -1,8 +1,11 @@
+// Values between two keys of a plain stream: what a read spends its time in.
 #include "curves/interpolate_private.h"
 
 #include "curves/neighbours_private.h"
 #include "curves/solvesegment_private.h"
 #include "keystore/keylist_private.h"
+
+#include <algorithm>
 
 namespace {
 
@@ -125,6 +128,7 @@ int KFSp_InterpolateBetween(KFS_Stream const* stream, KFS_KeyScalar const* a, KF
     case KFSp_SegmentKind::Hold:
     case KFSp_SegmentKind::Other: break;
     }
+    std::copy_n(KFSp_Numbers(a), std::max<int>(stream->GetDimension(), 0), result);
     return 0;
 }
 
@@ -133,6 +137,8 @@ int KFSp_Interpolate(KFS_Stream const* stream, long, int time, int keyIndex)
     KFS_StreamKeyData const* const data = stream->GetKeyData();
     Segment segment;
     if (int const code = FindSegment(stream, data, time, keyIndex, &segment)) return code;
+    KFSp_SegmentKind const kind = KFSp_GetSegmentKind(segment.a->outInterp, segment.b->inInterp);
+    if (kind == KFSp_SegmentKind::Hold || kind == KFSp_SegmentKind::Other) return 0;
     return KFSp_InterpolateBetween(stream, segment.a, segment.b, time, KFSp_Numbers(data->cache));
 }
 

@@ -71,19 +71,7 @@ inline int KFSp_GetHandleKey(KFS_Stream const* stream, KFS_StreamKeyData const* 
         return 0;
     }
     if (index < 0) return SEQ_Err_BadIndex;
-    KFS_KeyScalar const* item = nullptr;
-    int const code = KFSp_GetConstKey(data, index, &item);
-    *key = const_cast<KFS_KeyScalar*>(item);
-    return code;
-}
-
-// To be called before a key turns the user's: what it leaves unset stays for good, so an automatic key is brought up to
-// date first.
-inline void KFSp_SettleAutomaticKey(KFS_Stream const* stream, int index)
-{
-    KFS_KeyScalar* key = nullptr;
-    bool const found = KFSp_GetHandleKey(stream, stream->GetKeyData(), index, &key) == 0;
-    if (found && (key->flags & KFS_KeyFlag_Modifiable)) (void)stream->UpdateStreamIfStaleTangents(index);
+    return KFSp_GetKey(data, index, key);
 }
 
 // The cache record as room for numbers of the key's own layout. What it held is gone, unless it is the key itself.

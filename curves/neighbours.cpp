@@ -1,3 +1,4 @@
+// Which keys bound a time or a key, and the curve between them: the question that everything else here begins with.
 #include "curves/neighbours_private.h"
 
 #include "frame/report_private.h"
@@ -20,11 +21,12 @@ struct Answer {
     }
 };
 
+// A key that can't be read is none.
 int ReadKey(KFS_StreamKeyData const* data, int index, KFS_KeyScalar** out)
 {
-    KFS_KeyScalar const* key = nullptr;
-    int const code = KFSp_GetConstKey(data, index, &key);
-    if (code == 0) *out = const_cast<KFS_KeyScalar*>(key);
+    KFS_KeyScalar* key = nullptr;
+    int const code = KFSp_GetKey(data, index, &key);
+    if (code == 0) *out = key;
     return code;
 }
 
@@ -35,11 +37,6 @@ int ReadNeighbour(KFS_StreamKeyData const* data, int index, Answer const& answer
     return code;
 }
 
-bool IsFloat(KFS_KeyScalar const* key)
-{
-    return (key->flags & KFS_KeyFlag_Float) != 0;
-}
-
 // The first anchor from `index` on; with none left, the last key.
 int WalkForward(KFS_StreamKeyData const* data, int index, Answer const& next)
 {
@@ -47,7 +44,7 @@ int WalkForward(KFS_StreamKeyData const* data, int index, Answer const& next)
     if (index >= count) return 0;
     for (; index < count; ++index) {
         if (int const code = ReadKey(data, index, next.key)) return code;
-        if (!IsFloat(*next.key)) break;
+        if (!KFSp_Floats(*next.key)) break;
     }
     next.SetIndex(index < count ? index : count - 1);
     return 0;
@@ -59,7 +56,7 @@ int WalkBackward(KFS_StreamKeyData const* data, int index, Answer const& prev)
     if (index < 0) return 0;
     for (;; --index) {
         if (int const code = ReadKey(data, index, prev.key)) return code;
-        if (index == 0 || !IsFloat(*prev.key)) break;
+        if (index == 0 || !KFSp_Floats(*prev.key)) break;
     }
     prev.SetIndex(index);
     return 0;
@@ -182,7 +179,7 @@ int FindSegment(KFS_Stream const* stream, int keyIndex, int time, unsigned char 
     if (int const code = ReadKey(stream->GetKeyData(), keyIndex, &key)) return code;
     // Between anchors the speed graph runs through a float key, so the segment that contains it begins at the anchor
     // before.
-    bool const insideSegment = !spatial && stream->IsSpatial() && IsFloat(key);
+    bool const insideSegment = !spatial && stream->IsSpatial() && KFSp_Roves(stream->GetKeyData(), key, keyIndex);
     if (!insideSegment) *first = key;
     return 0;
 }

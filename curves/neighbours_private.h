@@ -12,7 +12,7 @@
 //                 ^ time                 allKeys 1 answers the two f
 //
 // The path runs through the float keys: whoever works on it asks for all keys. On any other stream all keys are
-// neighbours.
+// neighbours. The first and the last key of the list are anchors, whatever their flags say.
 //
 // The pointers go into the key list's storage and are good until the list changes; nothing is pinned here.
 
@@ -31,11 +31,35 @@ int KFSp_GetNeighborsFromTime(KFS_Stream const* stream, int time, unsigned char 
 int KFSp_GetNeighborsFromIndex(KFS_Stream const* stream, int index, unsigned char allKeys, KFS_KeyScalar** prev,
                                KFS_KeyScalar** next, int* prevIndex, int* nextIndex);
 
+// The answers of the two as one value: missing keys are null, and their indices mean nothing.
+struct KFSp_Neighbours {
+    KFS_KeyScalar* at = nullptr;
+    KFS_KeyScalar* prev = nullptr;
+    KFS_KeyScalar* next = nullptr;
+    int atIndex = KFS_INVALID_INDEX;
+    int prevIndex = KFS_INVALID_INDEX;
+    int nextIndex = KFS_INVALID_INDEX;
+
+    bool Both() const { return prev && next; }
+};
+
+inline int KFSp_FindAround(KFS_Stream const* stream, int time, unsigned char allKeys, KFSp_Neighbours* around)
+{
+    return KFSp_GetNeighborsFromTime(stream, time, allKeys, &around->at, &around->prev, &around->next,
+                                     &around->prevIndex, &around->nextIndex, &around->atIndex);
+}
+
+inline int KFSp_FindAroundKey(KFS_Stream const* stream, int index, unsigned char allKeys, KFSp_Neighbours* around)
+{
+    return KFSp_GetNeighborsFromIndex(stream, index, allKeys, &around->prev, &around->next, &around->prevIndex,
+                                      &around->nextIndex);
+}
+
 // Builds the curve of a segment.
 //
 //   keyIndex        the key at which the segment begins, or KFS_INVALID_INDEX: the segment around `time`, in the
 //                   stream's scale. A temporal segment of a spatial stream that is asked for by a float key begins at
-//                   the key before that.
+//                   the key before that, unless it is an end of the list.
 //   dimensionIndex  component of the value; not looked at with `spatial`. -1 reads the word before each run: only x is
 //                   meant then. A word that lies outside the record counts as 0.
 //   relativeTime    non-zero: x begins at 0; zero: x in seconds of the stream. Temporal segments only.

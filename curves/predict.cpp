@@ -1,3 +1,4 @@
+// How far in time an edit would reach, told before it happens.
 #include "curves/neighbours_private.h"
 #include "curves/update.h"
 #include "frame/report_private.h"
@@ -24,16 +25,6 @@ bool IsSpatialAction(unsigned short action)
     return action == 5 || action == 6;
 }
 
-// Where an edit happens: the keys around it, null where there is none.
-struct Place {
-    KFS_Stream const* stream;
-    KFS_KeyScalar* at = nullptr;
-    KFS_KeyScalar* prev = nullptr;
-    KFS_KeyScalar* next = nullptr;
-    int prevIndex = 0;
-    int nextIndex = 0;
-};
-
 struct Span {
     int from;
     int to;
@@ -59,48 +50,45 @@ int NeighboursOf(KFS_Stream const* stream, int index, KFS_KeyScalar** prev, KFS_
     return KFSp_GetNeighborsFromIndex(stream, index, stream->IsSpatial() ? 1 : 0, prev, next, nullptr, nullptr);
 }
 
-int ReachOfKey(Place const& place, Span* span)
+int ReachOfKey(KFS_Stream const* stream, KFSp_Neighbours const& around, Span* span)
 {
     KFSp_FirstError error;
     KFS_KeyScalar* before = nullptr;
     KFS_KeyScalar* behind = nullptr;
-    if (place.prev) {
-        span->from = place.prev->time;
-        if (IsAutomatic(place.stream, place.prev, place.prev->inInterp)) {
-            error.Keep(NeighboursOf(place.stream, place.prevIndex, &before, &behind));
+    if (around.prev) {
+        span->from = around.prev->time;
+        if (IsAutomatic(stream, around.prev, around.prev->inInterp)) {
+            error.Keep(NeighboursOf(stream, around.prevIndex, &before, &behind));
             if (before) span->from = before->time;
         }
     }
-    if (place.next) {
-        span->to = place.next->time;
-        if (IsAutomatic(place.stream, place.next, place.next->outInterp)) {
-            error.Keep(NeighboursOf(place.stream, place.nextIndex, &before, &behind));
+    if (around.next) {
+        span->to = around.next->time;
+        if (IsAutomatic(stream, around.next, around.next->outInterp)) {
+            error.Keep(NeighboursOf(stream, around.nextIndex, &before, &behind));
             if (behind) span->to = behind->time;
         }
     }
     return error.Code();
 }
 
-int ReachOfSide(Place const& place, Reach reach, Span* span)
+int ReachOfSide(KFS_Stream const* stream, KFSp_Neighbours const& around, Reach reach, Span* span)
 {
-    if (!place.at) return KFSp_ReportRow(KFSp_Op_PredictInvalid, KFS_Err_NoControlPoint, KFSp_Row_NoControlPoint);
-    bool const bothSides = IsContinuous(place.stream, place.at);
-    if (place.prev && (reach == Reach::InSide || bothSides)) span->from = place.prev->time;
-    if (place.next && (reach == Reach::OutSide || bothSides)) span->to = place.next->time;
+    if (!around.at) return KFSp_ReportRow(KFSp_Op_PredictInvalid, KFS_Err_NoControlPoint, KFSp_Row_NoControlPoint);
+    bool const bothSides = IsContinuous(stream, around.at);
+    if (around.prev && (reach == Reach::InSide || bothSides)) span->from = around.prev->time;
+    if (around.next && (reach == Reach::OutSide || bothSides)) span->to = around.next->time;
     return 0;
 }
 
 int FindReach(KFS_Stream const* stream, Reach reach, int time, Span* span)
 {
-    Place place{stream};
-    if (int const code = KFSp_GetNeighborsFromTime(stream, time, 0, &place.at, &place.prev, &place.next,
-                                                   &place.prevIndex, &place.nextIndex, nullptr);
-        code != 0)
-        return code;
+    KFSp_Neighbours around;
+    if (int const code = KFSp_FindAround(stream, time, 0, &around); code != 0) return code;
     switch (reach) {
-    case Reach::Key: return ReachOfKey(place, span);
+    case Reach::Key: return ReachOfKey(stream, around, span);
     case Reach::InSide:
-    case Reach::OutSide: return ReachOfSide(place, reach, span);
+    case Reach::OutSide: return ReachOfSide(stream, around, reach, span);
     case Reach::Nowhere: break;
     }
     return 0;

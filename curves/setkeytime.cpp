@@ -1,3 +1,4 @@
+// Moving a key in time: float keys make way, the key leaves the list and comes back. Their true times are floatkeys.cpp's.
 #include "curves/arcs_private.h"
 #include "curves/floatkeys.h"
 #include "curves/neighbours_private.h"
@@ -15,17 +16,7 @@
 #include <utility>
 #include <vector>
 
-// Moving a key in time.
-
 namespace {
-
-// The keys around an index or a time; a missing one is null, and its index means nothing.
-struct Neighbours {
-    KFS_KeyScalar* prev = nullptr;
-    KFS_KeyScalar* next = nullptr;
-    int prevIndex = 0;
-    int nextIndex = 0;
-};
 
 struct Move {
     KFS_Stream* stream;
@@ -50,67 +41,66 @@ int ResetEndInfluence(KFS_Stream* stream, int index)
     return 0;
 }
 
-int GetKey(Move const& move, int index, KFS_KeyScalar** key)
-{
-    void* item = nullptr;
-    int const code = SEQ_GetAddress(move.data->keys, index, 0, &item);
-    *key = static_cast<KFS_KeyScalar*>(item);
-    return code;
-}
-
 // Gives the float keys `first` to `last` the times that `placeHolder` says, which keep the order of the list.
 template <class PlaceHolder>
 int Pack(Move const& move, int first, int last, PlaceHolder&& placeHolder)
 {
+    if (!move.stream->IsSpatial()) return 0;  // the flag means nothing there
     for (int i = first; i <= last; ++i) {
         KFS_KeyScalar* key = nullptr;
-        if (int const code = GetKey(move, i, &key); code != 0) return code;
+        if (int const code = KFSp_GetKey(move.data, i, &key); code != 0) return code;
         if (KFSp_Floats(key)) KFSp_RetimeKey(move.data, i, key, placeHolder(i));
     }
     return 0;
 }
 
-int PackBehind(Move const& move, Neighbours const& around, int last)
+// Packs the float keys from `first` to `last`, which lie on the same side of the anchor at `anchorIndex`, so that they
+// stand one unit of time apart right behind it or right ahead of it.
+int PackAt(Move const& move, KFS_KeyScalar const* anchor, int anchorIndex, int first, int last)
 {
     return Pack(
-        move, around.prevIndex + 1, last, [&](int i) { return around.prev->time + (i - around.prevIndex); });
-}
-
-int PackAheadOf(Move const& move, Neighbours const& around, int first)
-{
-    return Pack(
-        move, first, around.nextIndex - 1, [&](int i) { return around.next->time - (around.nextIndex - i); });
+        move, first, last, [&](int i) { return KFSp_TimeDifference(anchor->time, anchorIndex - i); });
 }
 
 // A key between two others counts as inside whatever its target is.
-bool IsInside(Move const& move, Neighbours const& around)
+bool IsInside(Move const& move, KFSp_Neighbours const& around)
 {
     return (around.prev && move.target > around.prev->time) || (around.next && move.target < around.next->time);
 }
 
 // Packs the float keys between the anchors around the key, so that it can go to any unit of time in between.
-int MakeRoomInside(Move const& move, Neighbours const& around)
+int MakeRoomInside(Move const& move, KFSp_Neighbours const& around)
 {
     if (around.prev) {
-        if (int const code = PackBehind(move, around, move.index - 1); code != 0) return code;
+        if (int const code = PackAt(move, around.prev, around.prevIndex, around.prevIndex + 1, move.index - 1);
+            code != 0)
+            return code;
     }
-    return around.next ? PackAheadOf(move, around, move.index + 1) : 0;
+    return around.next ? PackAt(move, around.next, around.nextIndex, move.index + 1, around.nextIndex - 1) : 0;
 }
 
-// The same between the anchors around the target, for an end key that passes its only neighbour. They stay on the side
-// to which the key doesn't come.
+// The same between the anchors around the target, for an end key that passes its only neighbour. The float keys stay on
+// the side to which the key doesn't come. An anchor that stands at the target is about to be replaced, and until then
+// float keys on both sides of it stay there.
+int PackAroundTarget(Move const& move, KFSp_Neighbours const& around, int present)
+{
+    bool const behind = move.target <= present;
+    auto const packBetween = [&](KFS_KeyScalar const* prev, int prevIndex, KFS_KeyScalar const* next, int nextIndex) {
+        return behind ? PackAt(move, prev, prevIndex, prevIndex + 1, nextIndex - 1)
+                      : PackAt(move, next, nextIndex, prevIndex + 1, nextIndex - 1);
+    };
+    if (!around.at || KFSp_Floats(around.at))
+        return packBetween(around.prev, around.prevIndex, around.next, around.nextIndex);
+    int const code = packBetween(around.prev, around.prevIndex, around.at, around.atIndex);
+    return code != 0 ? code : packBetween(around.at, around.atIndex, around.next, around.nextIndex);
+}
+
 int MakeRoomOutside(Move* move, int present)
 {
-    Neighbours around;
-    KFS_KeyScalar* at = nullptr;
-    if (int const code = KFSp_GetNeighborsFromTime(move->stream, move->target, 0, &at, &around.prev, &around.next,
-                                                   &around.prevIndex, &around.nextIndex, nullptr);
-        code != 0)
-        return code;
-    if (around.prev && around.next) {
-        int const code = move->target <= present ? PackBehind(*move, around, around.nextIndex - 1)
-                                                 : PackAheadOf(*move, around, around.prevIndex + 1);
-        if (code != 0) return code;
+    KFSp_Neighbours around;
+    if (int const code = KFSp_FindAround(move->stream, move->target, 0, &around); code != 0) return code;
+    if (around.Both()) {
+        if (int const code = PackAroundTarget(*move, around, present); code != 0) return code;
     }
     if (around.prev) move->low = std::min(move->low, around.prevIndex);
     if (around.next) move->high = std::max(move->high, around.nextIndex);
@@ -119,15 +109,13 @@ int MakeRoomOutside(Move* move, int present)
 
 int MakeRoom(Move* move)
 {
-    Neighbours around;
-    if (int const code = KFSp_GetNeighborsFromIndex(move->stream, move->index, 0, &around.prev, &around.next,
-                                                    &around.prevIndex, &around.nextIndex);
-        code != 0)
-        return code;
+    KFSp_Neighbours around;
+    if (int const code = KFSp_FindAroundKey(move->stream, move->index, 0, &around); code != 0) return code;
     move->low = around.prev ? around.prevIndex : move->index;
     move->high = around.next ? around.nextIndex : move->index;
     KFS_KeyScalar* key = nullptr;
-    if (int const code = GetKey(*move, move->index, &key); code != 0) return code;
+    if (move->index < 0) return SEQ_Err_BadIndex;  // -1 would name the last key
+    if (int const code = KFSp_GetKey(move->data, move->index, &key); code != 0) return code;
     int const code = IsInside(*move, around) ? MakeRoomInside(*move, around) : MakeRoomOutside(move, key->time);
     move->old = key->time;
     return code;

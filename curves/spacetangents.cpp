@@ -1,3 +1,4 @@
+// The doors to a spatial key's tangents and spatial flags.
 #include "curves/spacetangents.h"
 
 #include "curves/spacetangents_private.h"
@@ -30,6 +31,28 @@ int CheckSpatial(KFS_Stream const* stream, short operation)
     return KFSp_ReportErr(operation, KFS_Err_NotSpatial, KFSp_Row_SpatialTangents);
 }
 
+// Mirror() for vectors too long to be squared. What can't be represented in the end becomes the largest number.
+void MirrorScaled(double const* given, double* other, int dimension)
+{
+    static constexpr double largest = std::numeric_limits<double>::max();
+    auto const reach = [dimension](double const* vector) {
+        double result = 0.0;
+        for (int i = 0; i < dimension; ++i) result = std::max(result, std::min(std::fabs(vector[i]), largest));
+        return result;
+    };
+    auto const length = [dimension](double const* vector, double unit) {
+        double sum = 0.0;
+        for (int i = 0; i < dimension; ++i) sum += vector[i] / unit * (vector[i] / unit);
+        return std::sqrt(sum);
+    };
+    double const givenReach = reach(given);
+    double const otherReach = reach(other);
+    double const otherLength = otherReach > 0.0 ? length(other, otherReach) : 0.0;
+    double const ratio = otherLength / length(given, givenReach);
+    for (int i = 0; i < dimension; ++i)
+        other[i] = std::clamp(-(given[i] / givenReach * ratio) * otherReach, -largest, largest);
+}
+
 // Turns `other` against `given` and keeps its length. A zero `given` has no direction to turn to.
 void Mirror(double const* given, double* other, int dimension)
 {
@@ -37,6 +60,7 @@ void Mirror(double const* given, double* other, int dimension)
     if (KFSp_IsZero({given, size})) return;
     double const givenSquare = KFSp_SquaredLength({given, size});
     double const otherSquare = KFSp_SquaredLength({other, size});
+    if (!std::isfinite(givenSquare) || !std::isfinite(otherSquare)) return MirrorScaled(given, other, dimension);
     for (int i = 0; i < dimension; ++i) {
         other[i] = -given[i];
         // Too small to be squared: the other tangent takes the given one's length.
@@ -64,15 +88,7 @@ int StoreTangents(KFS_Stream* stream, KFS_KeyScalar* key, short kind, void const
     return error.Code();
 }
 
-// What is automatic of a key is derived, its being continuous included. An edit that leaves some of it as it is, and
-// stops it from being automatic, means what a read would find now.
-int RepairTangents(KFS_Stream const* stream, KFS_StreamKeyData const* data, int index)
-{
-    int const* const stale = data->arcInvalidKeyIndex;
-    return index >= stale[0] && index <= stale[1] ? stream->UpdateStream() : 0;
-}
-
-// Any number may come here: a constant's index isn't looked at, and a mark behind the list is none.
+// Any number may come here: a constant's index isn't looked at.
 int IndexBehind(int index)
 {
     return index < std::numeric_limits<int>::max() ? index + 1 : index;
@@ -97,7 +113,6 @@ int SetTangents(KFS_Stream* stream, int index, void const* inTangent, void const
     }
     if (KFSp_ItemCount(data) == 0)
         return KFSp_ReportErr(KFSp_Op_SetKeySpaceTangents, KFS_Err_NoKeys, KFSp_Row_AlterKey);
-    if (int const code = RepairTangents(stream, data, index); code != 0) return code;
     error.Keep(KFSp_ClearCache(stream));
     {
         KFSp_ScKey const key(data->keys, index, error);
@@ -195,21 +210,10 @@ int GetSpFlags(KFS_Stream const* stream, int index, unsigned int* flags)
     return 0;
 }
 
-int StopAutomaticTangents(KFS_Stream* stream, int index)
-{
-    if (int const code = CheckKeys(stream, KFSp_Op_UnsetKeySpaceFlags, KFSp_Row_AlterKey, KFSp_Op_KeyFlags); code != 0)
-        return code;
-    if (int const code = RepairTangents(stream, stream->GetKeyData(), index); code != 0) return code;
-    return KFSp_UnsetKeySpaceFlags(stream, KFS_KeySpFlag_Modifiable, index);
-}
-
 int SetSpFlags(KFS_Stream* stream, int index, unsigned int mask, unsigned int values)
 {
     if (int const code = CheckKeys(stream, KFSp_Op_SetKeySpFlags, KFSp_Row_AlterKey, KFSp_Op_SetKeySpFlags); code != 0)
         return code;
-    if ((mask & ~values & KFS_KeySpFlag_Modifiable) != 0) {
-        if (int const code = RepairTangents(stream, stream->GetKeyData(), index); code != 0) return code;
-    }
     int result = ChangeSpFlags(stream, index, mask, values);
     if (stream->HasNoKeys()) return result;
     if ((mask & KFS_KeySpFlag_Modifiable) != 0 || ((mask & KFS_KeySpFlag_Continuous) != 0 && result == 0))
@@ -265,7 +269,7 @@ int KFS_GetKeySpaceTangentsF(KFS_Stream const* stream, int index, int, double* i
 int KFS_SetKeySpModifiable(KFS_Stream* stream, unsigned char on, int index)
 {
     return KFSp_Boundary([&] {
-        if (on == 0) return StopAutomaticTangents(stream, index);
+        if (on == 0) return KFSp_UnsetKeySpaceFlags(stream, KFS_KeySpFlag_Modifiable, index);
         if (int const code = KFSp_SetKeySpaceFlags(stream, KFS_KeySpFlag_Modifiable, index); code != 0) return code;
         return stream->SetArcInvalid(IndexBehind(index), 2);
     });

@@ -15,7 +15,8 @@
 //   7434 KFS_Err_NotSpatial  the tangent functions on a stream that isn't spatial
 //   7441 KFS_Err_CustomValue the tangent functions on a custom stream, whose values have no tangents
 //   the list service's for an index outside the list; a copy function's; a listener's
-// Setters belong to the main thread. They leave the cache record of a stream with keys empty.
+// Setters belong to the main thread. They leave the cache record of a stream with keys empty. They bring nothing up to
+// date and read nothing derived: what isn't given stays as it is stored.
 
 // Gives a key its tangents, in the stream's external data type, `dimension` elements each; a null one stays as it is.
 // From now on the update pass leaves the key's tangents alone.
@@ -37,8 +38,10 @@ KFS_API int KFS_SetKeySpaceTangentsF(KFS_Stream* stream, int index, int unused, 
 KFS_API int KFS_GetKeySpaceTangentsF(KFS_Stream const* stream, int index, int unused, double* inTangent,
                                      double* outTangent);
 
-// Lets the update pass recompute the key's tangents, beginning with the next update, or stops it from doing so.
-// Operation 74 or 75.
+// Lets the update pass recompute the key's tangents, beginning with the next update, or stops it from doing so. Turned
+// on, it makes the arcs around the key stale, with the spatial tangents of the keys there; temporal handles and float
+// times around aren't marked, though a changed arc may change them: they follow with the next edit or forced update.
+// Turned off, it leaves everything derived as it is. Operation 74 or 75.
 KFS_API int KFS_SetKeySpModifiable(KFS_Stream* stream, unsigned char on, int index);
 // Operation 74 or 75. Nothing becomes stale.
 KFS_API int KFS_SetKeySpContinuous(KFS_Stream* stream, unsigned char on, int index);
@@ -48,5 +51,5 @@ KFS_API int KFS_SetKeySpContinuous(KFS_Stream* stream, unsigned char on, int ind
 // Operation 75, without keys 72.
 KFS_API int KFS_GetKeySpFlags(KFS_Stream const* stream, int index, unsigned int* flags);
 // Replaces the bits of `mask` by those of `values`. A mask with one of the two flags makes the arcs around the key
-// stale; the code of that mark is then the result. Operation 76.
+// stale, and only these, as KFS_SetKeySpModifiable does; the code of that mark is then the result. Operation 76.
 KFS_API int KFS_SetKeySpFlags(KFS_Stream* stream, int index, unsigned int mask, unsigned int values);

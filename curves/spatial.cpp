@@ -1,3 +1,4 @@
+// Values on a path: speed graph, arc table and path in sequence, where a plain stream has one curve a component.
 #include "curves/spatial.h"
 
 #include "curves/arcs_private.h"
@@ -29,7 +30,7 @@ struct Run {
 };
 
 // A piece of the path between two keys of the list, and a distance from its first one.
-struct Place {
+struct PathPlace {
     KFS_KeyScalar const* first;
     KFS_KeyScalar const* second;
     double s;
@@ -47,20 +48,26 @@ struct Place {
     return run->a->time < time && time < run->b->time;
 }
 
+// Which key of a pair is no anchor, if any. An end of the list is one, whatever its flags say.
+[[gnu::always_inline]] inline int FindRoving(KFS_StreamKeyData const* data, Run const& run)
+{
+    if (KFSp_Roves(data, run.a, run.aIndex)) return run.aIndex;
+    return KFSp_Roves(data, run.b, run.bIndex) ? run.bIndex : KFS_INVALID_INDEX;
+}
+
 [[gnu::always_inline]] inline int FindAnchors(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time,
                                               int keyIndex, Run* run)
 {
     bool const hinted = TakeHint(data, time, keyIndex, run);
-    bool const floats = hinted && stream->IsSParametrized() && (KFSp_Floats(run->a) || KFSp_Floats(run->b));
-    if (hinted && !floats) return 0;
+    int const roving = hinted && stream->IsSParametrized() ? FindRoving(data, *run) : KFS_INVALID_INDEX;
+    if (hinted && roving == KFS_INVALID_INDEX) return 0;
 
-    // From a float key of the pair the anchors on both sides are those of the time.
+    // From a roving key of the pair the anchors on both sides are those of the time.
     KFS_KeyScalar* at = nullptr;
     KFS_KeyScalar* a = nullptr;
     KFS_KeyScalar* b = nullptr;
-    int const code = floats
-                         ? KFSp_GetNeighborsFromIndex(stream, KFSp_Floats(run->a) ? run->aIndex : run->bIndex, 0, &a,
-                                                      &b, &run->aIndex, &run->bIndex)
+    int const code = roving != KFS_INVALID_INDEX
+                         ? KFSp_GetNeighborsFromIndex(stream, roving, 0, &a, &b, &run->aIndex, &run->bIndex)
                          : KFSp_GetNeighborsFromTime(stream, time, 0, &at, &a, &b, &run->aIndex, &run->bIndex, nullptr);
     run->a = a;
     run->b = b;
@@ -111,7 +118,7 @@ double LinearFraction(KFS_KeyScalar const* a, KFS_KeyScalar const* b, int time)
 
 // Walks from anchor to anchor to the piece on which the distance lies; a distance at a key belongs to the piece before
 // it. The last piece takes what rounding has left over.
-int FindPiece(KFS_StreamKeyData const* data, Run const& run, double s, Place* place)
+int FindPiece(KFS_StreamKeyData const* data, Run const& run, double s, PathPlace* place)
 {
     *place = {run.a, run.b, s};
     if (run.Adjacent()) return 0;
@@ -126,7 +133,7 @@ int FindPiece(KFS_StreamKeyData const* data, Run const& run, double s, Place* pl
 }
 
 // The piece that begins at the first anchor, however far the distance goes.
-int TakeFirstPiece(KFS_StreamKeyData const* data, Run const& run, Place* place)
+int TakeFirstPiece(KFS_StreamKeyData const* data, Run const& run, PathPlace* place)
 {
     return run.Adjacent() ? 0 : KFSp_GetConstKey(data, run.aIndex + 1, &place->second);
 }
@@ -150,8 +157,8 @@ void PrefetchTable(KFS_KeyScalar const* key)
 
 // The path's parameter at a place. `path` is filled here, with the piece's points in the value's coordinates, where
 // `fill` asks for it or the table is missing.
-[[gnu::always_inline]] inline int GetParameter(KFS_Stream const* stream, Run const& run, Place const& place, bool fill,
-                                               KFSp_SegmentCurve& path, double* t)
+[[gnu::always_inline]] inline int GetParameter(KFS_Stream const* stream, Run const& run, PathPlace const& place,
+                                               bool fill, KFSp_SegmentCurve& path, double* t)
 {
     if (!TableOf(place.first)) {
         if (int const code = KFS_ForceUpdateStream(stream); code != 0) return code;
@@ -221,7 +228,7 @@ int KFSp_InterpolateSpatial(KFS_Stream const* stream, long, int time, int keyInd
 
     bool const onPath = stream->GetSpInterp() == KFS_SpInterp_Auto;
     if (onPath && !KFSp_HasPathDimension(stream)) return KFSp_RefusePathDimension();
-    Place place{run.a, run.b, s};
+    PathPlace place{run.a, run.b, s};
     if (int const code = onPath ? FindPiece(data, run, s, &place) : TakeFirstPiece(data, run, &place); code != 0)
         return code;
     double t = 0.0;
@@ -235,6 +242,23 @@ int KFSp_InterpolateSpatial(KFS_Stream const* stream, long, int time, int keyInd
     if (int const code = EvaluatePoint(curve.curve, t, result); code != 0) return code;
     result[stream->GetDimension()] = t;
     return 0;
+}
+
+int KFSp_FindOnPath(KFS_Stream const* stream, int time, KFSp_PathPoint* point)
+{
+    KFS_StreamKeyData const* const data = stream->GetKeyData();
+    Run run;
+    if (int const code = FindRun(stream, data, time, KFS_INVALID_INDEX, &run); code != 0) return code;
+
+    KFSp_SegmentCurve curve(2);
+    double s = 0.0;
+    if (int const code = GetDistance(stream, run, time, curve, &s); code != 0) return code;
+    if (!KFSp_HasPathDimension(stream)) return KFSp_RefusePathDimension();
+    PathPlace place{};
+    if (int const code = FindPiece(data, run, s, &place); code != 0) return code;
+    point->first = place.first;
+    point->second = place.second;
+    return GetParameter(stream, run, place, false, curve, &point->t);
 }
 
 int KFSp_InterpTangentSpatial(KFS_Stream const* stream, long, int time, int keyIndex)
@@ -251,7 +275,7 @@ int KFSp_InterpTangentSpatial(KFS_Stream const* stream, long, int time, int keyI
 
     int const dimension = stream->GetDimension();
     bool const onPath = stream->IsSParametrized() || (stream->GetSpInterp() == KFS_SpInterp_Auto && dimension == 2);
-    Place place{};
+    PathPlace place{};
     if (int const code = FindPiece(data, run, s, &place); code != 0) return code;
     double t = 0.0;
     if (int const code = GetParameter(stream, run, place, onPath, curve, &t); code != 0) return code;

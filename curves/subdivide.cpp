@@ -1,3 +1,4 @@
+// Splits the curve at a key that joins it, or that stops floating, so that it keeps its shape.
 #include "curves/subdivide_private.h"
 
 #include "curves/arcs_private.h"
@@ -14,11 +15,12 @@
 
 #include <algorithm>
 #include <array>
+#include <climits>
 
 namespace {
 
 // A split: the new key between its anchors, either of which may be missing.
-struct Place {
+struct Split {
     KFS_Stream* stream;
     KFS_StreamKeyData* data;
     int time;
@@ -54,11 +56,11 @@ void FlattenTangents(KFS_KeyScalar* key, int dimension)
 
 // What a new key has where nothing else gives it handles: the record is scratch, and holds numbers of whatever was read
 // last.
-void RestHandles(Place const& place)
+void RestHandles(Split const& split)
 {
-    int const dimension = place.Dimension();
-    KFS_KeyScalar* const key = place.key;
-    if (place.stream->IsSpatial()) {
+    int const dimension = split.Dimension();
+    KFS_KeyScalar* const key = split.key;
+    if (split.stream->IsSpatial()) {
         key->arcLength = 0.0;
         key->inSpeed = key->outSpeed = 0.0;
         key->inInfluence = key->outInfluence = KFSp_OneSixth;
@@ -73,40 +75,52 @@ void RestHandles(Place const& place)
 }
 
 // The value that the stream has at the time, for a new key: interpolation writes the cache record, which is the key.
-int TakeValue(Place const& place)
+int TakeValue(Split const& split)
 {
-    KFS_KeyScalar const* held = place.prev ? place.prev : place.next;
-    if (!place.stream->IsSpatial() && place.IsHeld() && place.prev->outInterp != KFS_Interp_Hold) held = place.next;
-    double* const value = KFSp_Numbers(place.key);
+    KFS_KeyScalar const* held = split.prev ? split.prev : split.next;
+    if (!split.stream->IsSpatial() && split.IsHeld() && split.prev->outInterp != KFS_Interp_Hold) held = split.next;
+    double* const value = KFSp_Numbers(split.key);
     if (held)
-        std::copy_n(KFSp_Numbers(held), place.Dimension(), value);
+        std::copy_n(KFSp_Numbers(held), split.Dimension(), value);
     else
-        std::fill_n(value, place.Dimension(), 0.0);
-    if (!place.Between()) return 0;
-    if (!place.stream->IsSpatial()) return KFSp_Interpolate(place.stream, 0, place.time, place.prevIndex);
-    int const code = KFSp_InterpolateSpatial(place.stream, 0, place.time, -1);
-    FlattenTangents(place.key, place.Dimension());  // one of them took the path's parameter
+        std::fill_n(value, split.Dimension(), 0.0);
+    if (!split.Between()) return 0;
+    if (!split.stream->IsSpatial()) return KFSp_Interpolate(split.stream, 0, split.time, split.prevIndex);
+    int const code = KFSp_InterpolateSpatial(split.stream, 0, split.time, -1);
+    FlattenTangents(split.key, split.Dimension());  // one of them took the path's parameter
     return code;
 }
 
-// The path's half. The neighbours' facing tangents become absolute handles in place, so that the curve lies on the
-// keys' own numbers.
-int SplitPath(Place const& place)
+// The arcs from anchor to anchor, of which the split has changed some.
+int MarkArcs(Split const& split)
 {
-    if (int const code = KFSp_InterpolateSpatial(place.stream, 0, place.time, -1); code != 0) return code;
-    int const dimension = place.Dimension();
-    double const t = KFSp_Numbers(place.data->cache)[dimension];
+    int const count = split.nextIndex - split.prevIndex;
+    return split.stream->SetArcInvalid(split.nextIndex, static_cast<short>(std::min(count, SHRT_MAX)));
+}
 
-    KFSp_SpatialRuns<double> const prev = KFSp_GetSpatialRuns(place.prev, dimension);
-    KFSp_SpatialRuns<double> const next = KFSp_GetSpatialRuns(place.next, dimension);
-    KFSp_SpatialRuns<double> const key = KFSp_GetSpatialRuns(place.key, dimension);
+// The path's half works on the keys right beside the new one, float keys or not, since the path runs through all of
+// them. Their facing tangents become absolute handles in place, so that the curve lies on the keys' own numbers.
+int SplitPath(Split const& split)
+{
+    KFSp_PathPoint point;
+    if (int const code = KFSp_FindOnPath(split.stream, split.time, &point); code != 0) return code;
+    KFSp_Neighbours beside;
+    if (int const code = KFSp_FindAround(split.stream, split.time, 1, &beside); code != 0) return code;
+    // Float keys that crowd, or that a hold passes over, have other times than the point that comes by. The piece between
+    // the keys beside isn't where the stream is then: the new key takes the place, and the path bends.
+    if (point.first != beside.prev || point.second != beside.next) return split.IsNewKey() ? TakeValue(split) : 0;
+
+    int const dimension = split.Dimension();
+    KFSp_SpatialRuns<double> const prev = KFSp_GetSpatialRuns(beside.prev, dimension);
+    KFSp_SpatialRuns<double> const next = KFSp_GetSpatialRuns(beside.next, dimension);
+    KFSp_SpatialRuns<double> const key = KFSp_GetSpatialRuns(split.key, dimension);
     for (int i = 0; i < dimension; ++i) {
         prev.outTangent[i] += prev.value[i];
         next.inTangent[i] += next.value[i];
     }
     CRV_Curve const curve{static_cast<short>(dimension), prev.value, prev.outTangent, next.inTangent, next.value};
     std::array<double, 5 * KFSp_SegmentCurve::MaxDimension> rows{};
-    if (int const code = CRV_SubdivideCurve(&curve, rows.data(), t); code != 0) return code;
+    if (int const code = CRV_SubdivideCurve(&curve, rows.data(), point.t); code != 0) return code;
     auto const row = [&](int index, int i) { return rows[static_cast<std::size_t>(index * dimension + i)]; };
     for (int i = 0; i < dimension; ++i) {
         prev.outTangent[i] = row(0, i) - prev.value[i];
@@ -116,14 +130,14 @@ int SplitPath(Place const& place)
         key.outTangent[i] = row(3, i) - key.value[i];
     }
 
-    place.key->flags |= KFS_KeyFlag_TangentsSet;
-    for (KFS_KeyScalar* const changed : {place.key, place.prev, place.next})
+    split.key->flags |= KFS_KeyFlag_TangentsSet;
+    for (KFS_KeyScalar* const changed : {split.key, beside.prev, beside.next})
         changed->spFlags &= ~KFS_KeySpFlag_Modifiable;
     // On a straight run the path stays made of keys without tangents.
     auto const size = static_cast<std::size_t>(dimension);
     if (KFSp_IsZero({prev.inTangent, size}) && KFSp_IsZero({next.outTangent, size}))
-        FlattenTangents(place.key, dimension);
-    return 0;
+        FlattenTangents(split.key, dimension);
+    return MarkArcs(split);
 }
 
 // A spatial key's speed graph as the five runs of a plain key of dimension 1, distance standing in for the value.
@@ -143,87 +157,89 @@ void SetSpeedNumbers(KFS_KeyScalar* key, SpeedNumbers const& numbers)
     key->outInfluence = numbers[4];
 }
 
-void ClearModifiable(Place const& place)
+void ClearModifiable(Split const& split)
 {
-    for (KFS_KeyScalar* const changed : {place.key, place.prev, place.next})
+    for (KFS_KeyScalar* const changed : {split.key, split.prev, split.next})
         if (changed) changed->flags &= static_cast<unsigned short>(~KFS_KeyFlag_Modifiable);
 }
 
-int SplitSpeedGraph(Place const& place)
+int SplitSpeedGraph(Split const& split)
 {
     double total = 0.0;
-    if (int const code = KFSp_SumArcs(place.data, place.prevIndex, place.nextIndex, &total); code != 0) return code;
-    double const prevArc = place.prev->arcLength;
-    double const nextArc = place.next->arcLength;
-    place.prev->arcLength = 0.0;
-    place.next->arcLength = total;
+    if (int const code = KFSp_SumArcs(split.data, split.prevIndex, split.nextIndex, &total); code != 0) return code;
+    double const prevArc = split.prev->arcLength;
+    double const nextArc = split.next->arcLength;
+    split.prev->arcLength = 0.0;
+    split.next->arcLength = total;
 
-    SpeedNumbers prev = GetSpeedNumbers(place.prev);
-    SpeedNumbers next = GetSpeedNumbers(place.next);
-    SpeedNumbers key = GetSpeedNumbers(place.key);
+    SpeedNumbers prev = GetSpeedNumbers(split.prev);
+    SpeedNumbers next = GetSpeedNumbers(split.next);
+    SpeedNumbers key = GetSpeedNumbers(split.key);
     int const code =
-        KFSp_ComputeTempSubdivision(1, place.X(), place.Duration(), place.NonDecreasing() ? 1 : 0, place.PrevIsLinear(),
-                                    place.NextIsLinear(), prev.data(), next.data(), key.data());
-    SetSpeedNumbers(place.prev, prev);
-    SetSpeedNumbers(place.next, next);
-    SetSpeedNumbers(place.key, key);
+        KFSp_ComputeTempSubdivision(1, split.X(), split.Duration(), split.NonDecreasing() ? 1 : 0, split.PrevIsLinear(),
+                                    split.NextIsLinear(), prev.data(), next.data(), key.data());
+    SetSpeedNumbers(split.prev, prev);
+    SetSpeedNumbers(split.next, next);
+    SetSpeedNumbers(split.key, key);
     if (code != 0) return code;
-    place.prev->arcLength = prevArc;
-    place.next->arcLength = nextArc;
-    ClearModifiable(place);
+    split.prev->arcLength = prevArc;
+    split.next->arcLength = nextArc;
+    ClearModifiable(split);
     return 0;
 }
 
-int SplitSpatial(Place const& place)
+int SplitSpatial(Split const& split)
 {
+    bool const splitsPath = split.Wants(KFSp_Tangents_Spatial) && split.Between();
     int code = 0;
-    if (place.Wants(KFSp_Tangents_Spatial) && place.Between())
-        code = SplitPath(place);
-    else if (place.IsNewKey())
-        code = TakeValue(place);
-    if (code != 0 || !place.Wants(KFSp_Tangents_Temporal) || !place.Between()) return code;
-    return SplitSpeedGraph(place);
+    if (splitsPath)
+        code = SplitPath(split);
+    else if (split.IsNewKey())
+        code = TakeValue(split);
+    if (code != 0 || !split.Wants(KFSp_Tangents_Temporal) || !split.Between()) return code;
+    return SplitSpeedGraph(split);
 }
 
-int SplitHandles(Place const& place)
+int SplitHandles(Split const& split)
 {
-    bool const prevLinear = place.PrevIsLinear();
-    bool const nextLinear = place.NextIsLinear();
+    bool const prevLinear = split.PrevIsLinear();
+    bool const nextLinear = split.NextIsLinear();
     int const code = KFSp_ComputeTempSubdivision(
-        place.stream->GetDimension(), place.X(), place.Duration(), place.NonDecreasing() ? 1 : 0, prevLinear,
-        nextLinear, place.prev ? KFSp_Numbers(place.prev) : nullptr, place.next ? KFSp_Numbers(place.next) : nullptr,
-        KFSp_Numbers(place.key));
-    ClearModifiable(place);
+        split.stream->GetDimension(), split.X(), split.Duration(), split.NonDecreasing() ? 1 : 0, prevLinear,
+        nextLinear, split.prev ? KFSp_Numbers(split.prev) : nullptr, split.next ? KFSp_Numbers(split.next) : nullptr,
+        KFSp_Numbers(split.key));
+    ClearModifiable(split);
     // The handles carry the line now.
-    if (prevLinear) place.prev->outInterp = KFS_Interp_Spline;
-    if (nextLinear) place.next->inInterp = KFS_Interp_Spline;
+    if (prevLinear) split.prev->outInterp = KFS_Interp_Spline;
+    if (nextLinear) split.next->inInterp = KFS_Interp_Spline;
     return code;
 }
 
-int SplitPlain(Place const& place)
+int SplitPlain(Split const& split)
 {
     int code = 0;
-    if (place.Wants(KFSp_Tangents_Temporal)) code = SplitHandles(place);
+    if (split.Wants(KFSp_Tangents_Temporal)) code = SplitHandles(split);
     // The split of a held segment is that of a curve which nobody sees.
-    bool const takesValue = !place.Wants(KFSp_Tangents_Temporal) || place.IsHeld();
-    return code == 0 && place.IsNewKey() && takesValue ? TakeValue(place) : code;
+    bool const takesValue = !split.Wants(KFSp_Tangents_Temporal) || split.IsHeld();
+    return code == 0 && split.IsNewKey() && takesValue ? TakeValue(split) : code;
 }
 
-int Split(Place* place)
+int Run(Split* split)
 {
-    KFS_KeyScalar* at = nullptr;
-    if (int const code = KFSp_GetNeighborsFromTime(place->stream, place->time, 0, &at, &place->prev, &place->next,
-                                                   &place->prevIndex, &place->nextIndex, nullptr);
-        code != 0)
-        return code;
-    if (place->IsNewKey()) RestHandles(*place);
-    return place->stream->IsSpatial() ? SplitSpatial(*place) : SplitPlain(*place);
+    KFSp_Neighbours anchors;
+    if (int const code = KFSp_FindAround(split->stream, split->time, 0, &anchors); code != 0) return code;
+    split->prev = anchors.prev;
+    split->next = anchors.next;
+    split->prevIndex = anchors.prevIndex;
+    split->nextIndex = anchors.nextIndex;
+    if (split->IsNewKey()) RestHandles(*split);
+    return split->stream->IsSpatial() ? SplitSpatial(*split) : SplitPlain(*split);
 }
 
 // Only the speed graph of a custom stream has numbers that could be split.
-bool NeedsPlainValue(Place const& place)
+bool NeedsPlainValue(Split const& split)
 {
-    return place.IsNewKey() || !place.stream->IsSpatial() || place.Wants(KFSp_Tangents_Spatial);
+    return split.IsNewKey() || !split.stream->IsSpatial() || split.Wants(KFSp_Tangents_Spatial);
 }
 
 }  // namespace
@@ -234,15 +250,15 @@ int KFSp_SubdivideSpline(KFS_Stream* stream, int time, char mode, KFS_KeyScalar*
     KFS_StreamKeyData* const data = stream->GetKeyDataForModify();
     if (stream->HasNoKeys() || KFSp_ItemCount(data) == 0)
         return KFSp_ReportErr(KFSp_Op_Subdivide, KFS_Err_NoKeys, KFSp_Row_Subdivide);
-    Place place{stream, data, time, mode, key};
-    if ((stream->IsCustom() || stream->IsTemporarilyNonCustom()) && NeedsPlainValue(place))
+    Split split{stream, data, time, mode, key};
+    if ((stream->IsCustom() || stream->IsTemporarilyNonCustom()) && NeedsPlainValue(split))
         return KFSp_RefuseCustomValue(KFSp_Op_Subdivide, KFSp_Row_ConvertTo);
     if (int const code = stream->UpdateStream(); code != 0) return code;
-    if (!place.IsNewKey()) place.time = key->time;
+    if (!split.IsNewKey()) split.time = key->time;
     KFSp_FirstError error;
     {
         KFSp_ScPin const pin(data->keys, error);
-        if (error.None()) error.Keep(Split(&place));
+        if (error.None()) error.Keep(Run(&split));
     }
     return error.Code();
 }

@@ -25,7 +25,8 @@
 // Cost: constant, apart from that repair, and from sums of arcs over the float keys between two anchors.
 //
 // Setters that succeed call NotifyValueChanged; what a listener throws is their result. They leave the cache record of
-// a stream with keys empty.
+// a stream with keys empty. They bring nothing up to date: what was given is stored and stands, and a side that wasn't
+// given stays as it is stored, also when the key turns the user's before an automatic handle was ever read.
 #pragma once
 
 #include "frame/services/time.h"

@@ -1,3 +1,4 @@
+// The arithmetic of a temporal split. It knows no stream, and serves components and speed graphs alike.
 #include "curves/segment_private.h"
 #include "curves/subdivide_private.h"
 

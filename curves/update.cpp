@@ -1,3 +1,8 @@
+// The repair of stale keys. It touches the marked ranges only, so its cost doesn't depend on how many keys the list
+// has.
+//
+// The order is part of the result: path lengths first, because the automatic speeds of spatial keys are distances over
+// time; float times last, because they depend on lengths and speeds.
 #include "curves/update.h"
 
 #include "curves/arcs_private.h"
@@ -12,12 +17,6 @@
 
 #include <algorithm>
 #include <cmath>
-
-// The repair of stale keys. It touches the marked ranges only, so its cost doesn't depend on how many keys the list
-// has.
-//
-// The order is part of the result: path lengths first, because the automatic speeds of spatial keys are distances over
-// time; float times last, because they depend on lengths and speeds.
 
 namespace {
 
@@ -44,20 +43,12 @@ StaleRange ClipToList(int const bounds[2], int count)
     return {std::max(bounds[0], 0), std::min(bounds[1], count - 1)};
 }
 
-int GetKey(Pass const& pass, int index, KFS_KeyScalar** key)
-{
-    void* item = nullptr;
-    int const code = SEQ_GetAddress(pass.data->keys, index, 0, &item);
-    *key = static_cast<KFS_KeyScalar*>(item);
-    return code;
-}
-
 template <class Visit>
 int ForKeys(Pass const& pass, StaleRange range, Visit&& visit)
 {
     for (int i = range.first; i <= range.last; ++i) {
         KFS_KeyScalar* key = nullptr;
-        if (int const code = GetKey(pass, i, &key); code != 0) return code;
+        if (int const code = KFSp_GetKey(pass.data, i, &key); code != 0) return code;
         if (int const code = visit(key); code != 0) return code;
     }
     return 0;
@@ -69,10 +60,10 @@ int ForArcs(Pass const& pass, Visit&& visit)
 {
     KFS_KeyScalar* a = nullptr;
     if (pass.arcs.first >= pass.arcs.last) return 0;
-    if (int const code = GetKey(pass, pass.arcs.first, &a); code != 0) return code;
+    if (int const code = KFSp_GetKey(pass.data, pass.arcs.first, &a); code != 0) return code;
     for (int next = pass.arcs.first + 1; next <= pass.arcs.last; ++next) {
         KFS_KeyScalar* b = nullptr;
-        if (int const code = GetKey(pass, next, &b); code != 0) return code;
+        if (int const code = KFSp_GetKey(pass.data, next, &b); code != 0) return code;
         // A record without the block has no place for an arc.
         if (KFSp_HasSpatialBlock(a)) {
             if (int const code = visit(a, b, next); code != 0) return code;

@@ -1,3 +1,4 @@
+// Temporal handles as speeds, in the stream's own type and as doubles.
 #include "curves/arcs_private.h"
 #include "curves/keyhandles_private.h"
 #include "curves/neighbours_private.h"
@@ -55,7 +56,7 @@ int FindKey(AskedKey* asked)
 // The speed of a straight run between anchors: up to the key, from it on, or, for a float key, through it.
 int GetRunSpeed(AskedKey const& asked, KFSp_Side side, double* speed)
 {
-    bool const through = (asked.key->flags & KFS_KeyFlag_Float) != 0 && asked.prev && asked.next;
+    bool const through = KFSp_Floats(asked.key) && asked.prev && asked.next;
     bool const fromPrev = through || side == KFSp_Side::In;
     bool const toNext = through || side == KFSp_Side::Out;
     KFS_KeyScalar const* const from = fromPrev ? asked.prev : asked.key;
@@ -201,40 +202,10 @@ int CheckVelocityAccess(KFS_Stream const* stream)
 
 int SetVelocity(KFS_Stream* stream, int index, void const* in, void const* out)
 {
-    if (stream->HasNoKeys()) return 0;
-    KFSp_SettleAutomaticKey(stream, index);
-    return SetSpeeds(stream, index, in, out);
+    return stream->HasNoKeys() ? 0 : SetSpeeds(stream, index, in, out);
 }
 
-}  // namespace
-
-int KFS_SetKeyVelocity(KFS_Stream* stream, int index, void const* inVelocity, void const* outVelocity)
-{
-    if (int const code = CheckVelocityAccess(stream)) return code;
-    KFSp_FirstError error;
-    error.Keep(SetVelocity(stream, index, inVelocity, outVelocity));
-    return KFSp_FinishHandleEdit(stream, error);
-}
-
-int KFS_SetKeyVelocityF(KFS_Stream* stream, int index, double const* inVelocity, double const* outVelocity)
-{
-    if (int const code = KFSp_CheckStream(KFSp_Op_SetKeyVelocityF, stream, KFSp_Row_AlterKey)) return code;
-    KFSp_FirstError error;
-    if (int const code = CheckVelocityAccess(stream)) return code;
-    // A cached custom value must be disposed while the stream still says what it is.
-    if (stream->HasKeys()) error.Keep(KFSp_ClearCache(stream));
-    {
-        KFSp_ScDoubleValues doubles(stream, KFSp_FakeCopyItemFuncNoLimits);
-        error.Keep(doubles.Code());
-        if (error.None()) error.Keep(SetVelocity(stream, index, inVelocity, outVelocity));
-        error.Keep(doubles.Restore());
-    }
-    // Listeners hear of it when the stream is itself again.
-    return KFSp_FinishHandleEdit(stream, error);
-}
-
-int KFS_GetKeyVelocityF(KFS_Stream const* stream, int index, unsigned char zeroAtEnds, double* inVelocity,
-                        double* outVelocity)
+int GetVelocity(KFS_Stream const* stream, int index, bool zeroAtEnds, double* inVelocity, double* outVelocity)
 {
     KFSp_Refusal const refusal{KFSp_Op_GetKeyVelocity, KFSp_Row_GetValue};
     if (int const code = KFSp_CheckHandleAccess(stream, refusal, refusal)) return code;
@@ -247,6 +218,43 @@ int KFS_GetKeyVelocityF(KFS_Stream const* stream, int index, unsigned char zeroA
         if (int const code = GetSpeed(asked, KFSp_Side::In, zeroAtEnds, inVelocity)) return code;
     }
     return outVelocity ? GetSpeed(asked, KFSp_Side::Out, zeroAtEnds, outVelocity) : 0;
+}
+
+}  // namespace
+
+int KFS_SetKeyVelocity(KFS_Stream* stream, int index, void const* inVelocity, void const* outVelocity)
+{
+    return KFSp_Boundary([&] {
+        if (int const code = CheckVelocityAccess(stream)) return code;
+        KFSp_FirstError error;
+        error.Keep(SetVelocity(stream, index, inVelocity, outVelocity));
+        return KFSp_FinishHandleEdit(stream, error);
+    });
+}
+
+int KFS_SetKeyVelocityF(KFS_Stream* stream, int index, double const* inVelocity, double const* outVelocity)
+{
+    return KFSp_Boundary([&] {
+        if (int const code = KFSp_CheckStream(KFSp_Op_SetKeyVelocityF, stream, KFSp_Row_AlterKey)) return code;
+        if (int const code = CheckVelocityAccess(stream)) return code;
+        KFSp_FirstError error;
+        // A cached custom value must be disposed while the stream still says what it is.
+        if (stream->HasKeys()) error.Keep(KFSp_ClearCache(stream));
+        {
+            KFSp_ScDoubleValues doubles(stream, KFSp_FakeCopyItemFuncNoLimits);
+            error.Keep(doubles.Code());
+            if (error.None()) error.Keep(SetVelocity(stream, index, inVelocity, outVelocity));
+            error.Keep(doubles.Restore());
+        }
+        // Listeners hear of it when the stream is itself again.
+        return KFSp_FinishHandleEdit(stream, error);
+    });
+}
+
+int KFS_GetKeyVelocityF(KFS_Stream const* stream, int index, unsigned char zeroAtEnds, double* inVelocity,
+                        double* outVelocity)
+{
+    return KFSp_Boundary([&] { return GetVelocity(stream, index, zeroAtEnds != 0, inVelocity, outVelocity); });
 }
 
 int KFSp_EqualizeSides(KFS_Stream* stream, int index)

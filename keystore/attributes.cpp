@@ -70,10 +70,13 @@ int KFS_SetStreamSpIMask(KFS_Stream* stream, unsigned short mask)
 
 int KFS_SetStreamSpInterp(KFS_Stream* stream, unsigned short spInterp)
 {
-    int code = KFSp_CheckStream(KFSp_Op_SetSpInterp, stream, KFSp_Row_SetSpInterp);
-    if (code == 0) code = KFSp_CanDoSpInterp(stream, spInterp);
-    if (code == 0) stream->SetSpInterp(spInterp);
-    return code;
+    return KFSp_Boundary([&] {
+        if (int const code = KFSp_CheckStream(KFSp_Op_SetSpInterp, stream, KFSp_Row_SetSpInterp)) return code;
+        if (int const code = KFSp_CanDoSpInterp(stream, spInterp)) return code;
+        bool const changes = stream->GetSpInterp() != spInterp;
+        stream->SetSpInterp(spInterp);
+        return changes ? ForgetComputedValue(stream) : 0;
+    });
 }
 
 int KFS_SetStreamSParametrize(KFS_Stream* stream, unsigned char on)

@@ -72,7 +72,7 @@ inline int FillBetweenKeys(KFS_Stream const* stream, KFS_StreamKeyData const* da
         if (a->outInterp == KFS_Interp_Hold) return CopyKeyToCache(data, next - 1);
         // A hold on the far side takes the later key's value, and is meant to.
         if (b->inInterp == KFS_Interp_Hold) return CopyKeyToCache(data, next);
-        if (!interpFunc && stream->GetInterpFunc() == KFSp_Interpolate) [[likely]] {
+        if ((interpFunc ? *interpFunc : stream->GetInterpFunc()) == KFSp_Interpolate) [[likely]] {
             int const code = KFSp_InterpolateBetween(stream, a, b, time, KFSp_Numbers(data->cache));
             data->cache->time = code == 0 ? time : KFS_INVALID_INDEX;
             return code;
@@ -196,7 +196,7 @@ inline void UpdateCache(KFS_Stream const* stream, KFS_StreamKeyData const* data,
         if (mayBeStale && found) {
             KFS_KeyScalar const* key = nullptr;
             KFSp_ThrowIf(KFSp_GetConstKey(data, index, &key));
-            mayBeStale = stream->IsSpatial() && (key->flags & KFS_KeyFlag_Float) != 0;
+            mayBeStale = stream->IsSpatial() && KFSp_Floats(key);
         }
         if (mayBeStale) {
             KFSp_ThrowIf(stream->UpdateStream());

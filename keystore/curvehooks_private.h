@@ -18,7 +18,8 @@
 // Cost: two item look-ups with a right hint, and one solve a component; nothing is allocated.
 int KFSp_Interpolate(KFS_Stream const* stream, long refcon, int time, int keyIndex);
 
-// KFSp_Interpolate between two keys at hand, into `result`: what a read calls that has found the keys already.
+// The same between two keys at hand, into `result`: what a read calls that has found the keys already. On a segment
+// that holds, or whose codes have no shape, `a`'s value: a read never answers what the record held before.
 int KFSp_InterpolateBetween(KFS_Stream const* stream, KFS_KeyScalar const* a, KFS_KeyScalar const* b, int time,
                             double* result);
 
@@ -55,10 +56,14 @@ int KFSp_SetDefaultKeyframeTangents(KFS_Stream const* stream, int time, char mod
 //         stands at `time` and is about to become an anchor: its own time then counts, and its value stays when `mode`
 //         lacks bit 2
 //
-// The cache record always gets the value that the stream has at the time, also where no handle is computed; such
-// handles are then at rest: speed 0, the default influence, tangents of zero.
+// A new key always gets the value that the stream has at the time, also where no handle is computed; such handles are
+// then at rest: speed 0, the default influence, tangents of zero.
 //
-// Neighbours are anchors. Changed keys are no longer automatic. Brings the stream up to date first, which may move
+// The neighbours of the temporal half are anchors; those of the path are the keys right beside, float or not, since the
+// path runs through all of them. Where so many float keys crowd, or a hold passes over them, that the stream isn't
+// between the keys beside at that time, the path isn't split, and bends to the new key. A path segment of which one side
+// is linear in time changes its motion by the split: a spatial key's linear side stays linear, but it is one of a shorter
+// segment then. Changed keys are no longer automatic. Brings the stream up to date first, which may move
 // float keys: whoever has searched the list before does so again.
 //
 // Operation 87. Result: 0; 2; 7427 KFS_Err_NoKeys; the codes of the update, the list, the interpolation and the curve

@@ -36,7 +36,7 @@ bool ChangesFloat(KFS_Stream const* stream, unsigned short flags, FlagChange con
 int ChangeFloat(KFS_Stream* stream, KFS_StreamKeyData const* data, KFS_KeyScalar* key, int index, FlagChange* change)
 {
     KFSp_FirstError error;
-    if ((key->flags & KFS_KeyFlag_Float) != 0)
+    if (KFSp_Floats(key))
         error.Keep(KFSp_SubdivideSpline(stream, key->time, KFSp_Tangents_Temporal, key));
     else if (index == 0 || index == KFSp_ItemCount(data) - 1)
         change->value &= static_cast<unsigned short>(~KFS_KeyFlag_Float);
@@ -68,13 +68,10 @@ int ChangeKey(KFS_Stream* stream, KFS_StreamKeyData const* data, int index, Flag
 {
     void* present = nullptr;
     if (int const code = SEQ_GetAddress(data->keys, index, 0, &present)) return code;
-    if (ChangesFloat(stream, static_cast<KFS_KeyScalar*>(present)->flags, change)) {
+    auto const* const floating = static_cast<KFS_KeyScalar const*>(present);
+    if (KFSp_Floats(floating) && ChangesFloat(stream, floating->flags, change)) {
         // Its time is about to become its own, so it has to be the right one.
         if (int const code = stream->UpdateStream()) return code;
-    }
-    if ((change.mask & ~change.value & KFS_KeyFlag_Modifiable) != 0) {
-        // Handles that stop being automatic stay as a read would find them now.
-        if (int const code = stream->UpdateStreamIfStaleTangents(index)) return code;
     }
     KFSp_FirstError error;
     {

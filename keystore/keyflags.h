@@ -16,5 +16,6 @@
 KFS_API int KFS_SetKeyFlags(KFS_Stream* stream, int index, unsigned short mask, unsigned short value);
 // KFS_SetKeyFlags for KFS_KeyFlag_Continuous.
 KFS_API int KFS_SetKeyContinuous(KFS_Stream* stream, unsigned char on, int index);
-// KFS_SetKeyFlags for KFS_KeyFlag_Modifiable.
+// KFS_SetKeyFlags for KFS_KeyFlag_Modifiable. Turned off, it leaves the handles as they are stored, which KFS_GetKeyTangentsF
+// would have brought up to date: what has been given stands.
 KFS_API int KFS_SetKeyModifiable(KFS_Stream* stream, unsigned char on, int index);

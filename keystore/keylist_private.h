@@ -91,6 +91,34 @@ inline int KFSp_GetConstKey(KFS_StreamKeyData const* data, int index, KFS_KeySca
     return code;
 }
 
+// The same for writing what is derived, or under an edit's pin.
+inline int KFSp_GetKey(KFS_StreamKeyData const* data, int index, KFS_KeyScalar** key)
+{
+    KFS_KeyScalar const* item = nullptr;
+    int const code = KFSp_GetConstKey(data, index, &item);
+    *key = const_cast<KFS_KeyScalar*>(item);
+    return code;
+}
+
+// Whether a key is flagged as one whose time follows from its neighbours.
+inline bool KFSp_Floats(KFS_KeyScalar const* key)
+{
+    return (key->flags & KFS_KeyFlag_Float) != 0;
+}
+
+// The same of the key at an index; false where there is none.
+inline bool KFSp_FloatsAt(KFS_StreamKeyData const* data, int index)
+{
+    KFS_KeyScalar const* key = nullptr;
+    return KFSp_GetConstKey(data, index, &key) == 0 && KFSp_Floats(key);
+}
+
+// Whether its time does follow from them: the first and the last key are anchors, whatever their flags say.
+inline bool KFSp_Roves(KFS_StreamKeyData const* data, KFS_KeyScalar const* key, int index)
+{
+    return KFSp_Floats(key) && index > 0 && index < KFSp_ItemCount(data) - 1;
+}
+
 // Two neighbours, read-only, without a call: there is a key at `index` and one after it.
 struct KFSp_KeyPair {
     KFS_KeyScalar const* a;

@@ -93,7 +93,7 @@ int FindNearestKeyTime(KFS_Stream const* stream, T_Time const* time, int* index,
             return KFSp_ReportErr(KFSp_Op_FindNearestKeyTime, KFS_Err_NoKeys, KFSp_Row_GetValue);
         MoveConstant(data, at);
         *index = 0;
-        *keyTime = asked;
+        *keyTime = time ? *time : asked;
         return 0;
     }
     if (KFSp_ItemCount(data) == 0) {
@@ -145,12 +145,6 @@ private:
     int saved_;
 };
 
-bool IsFloatKey(KFS_StreamKeyData const* data, int index)
-{
-    KFS_KeyScalar const* key = nullptr;
-    return KFSp_GetConstKey(data, index, &key) == 0 && (key->flags & KFS_KeyFlag_Float) != 0;
-}
-
 int UpdateForLookup(KFS_Stream const* stream)
 {
     ScUpdating const updating;
@@ -169,7 +163,7 @@ int TimeToIndex(KFS_Stream const* stream, T_Time const* time, int* index)
     int position = 0;
     if (int const code = KFSp_SearchKeys(data, at, &found, &position)) return code;
     // An update asks for float keys that are in the way, and those are to be found where they stand.
-    if (!found || !IsFloatKey(data, position)) {
+    if (!found || !KFSp_FloatsAt(data, position)) {
         if (int const code = UpdateForLookup(stream)) {
             // The key that stands there is no less an answer.
             if (found) *index = position;

@@ -32,7 +32,8 @@ KFS_API int KFS_FindKeyTime(KFS_Stream const* stream, T_Time const* time, short 
 
 // The key nearest to a time. A tie goes to the earlier key.
 //
-// A constant stream with a value answers index 0 and the time asked for, and its value moves there. An empty list
+// A constant stream with a value answers index 0 and the time asked for, in the caller's own scale, and its value moves
+// there. An empty list
 // answers no index, which isn't an error, and a key time without a value but in the stream's scale.
 //
 // Operation 23. KFS_Err_NoKeys: a constant stream without a value; reported, unanswered.

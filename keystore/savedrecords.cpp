@@ -12,12 +12,6 @@ namespace {
 
 constexpr char const* ScratchLabel = "key edit scratch";
 
-bool IsFloat(KFS_StreamKeyData const* data, int index)
-{
-    KFS_KeyScalar const* key = nullptr;
-    return KFSp_GetConstKey(data, index, &key) == 0 && (key->flags & KFS_KeyFlag_Float) != 0;
-}
-
 std::size_t CountOf(int first, int last)
 {
     return last >= first ? static_cast<std::size_t>(last - first + 1) : 0;
@@ -88,6 +82,6 @@ KFSp_AnchorRange::KFSp_AnchorRange(KFS_StreamKeyData const* data, int before, in
     : first(std::max(before, 0)),
       last(std::min(after, KFSp_ItemCount(data) - 1))
 {
-    while (first > 0 && IsFloat(data, first)) --first;
-    while (last < KFSp_ItemCount(data) - 1 && IsFloat(data, last)) ++last;
+    while (first > 0 && KFSp_FloatsAt(data, first)) --first;
+    while (last < KFSp_ItemCount(data) - 1 && KFSp_FloatsAt(data, last)) ++last;
 }

@@ -20,21 +20,14 @@ struct Range {
 };
 
 // The keys from `index` - `count` to `index`, cut to the list; `index` -1 counts from the last key. A mark that lies
-// behind the list is none.
+// behind the list falls on the last key: when the key behind it goes, its own handles are no longer right.
 Range MarkedRange(int keyCount, int index, int count)
 {
-    int reach = count;
-    int last = index;
-    if (index == -1) {
-        last = keyCount - 1;
-    } else if (index >= keyCount) {
-        last = keyCount - 1;
-        long const shrunk = static_cast<long>(count) - (static_cast<long>(index) - last);
-        reach = static_cast<int>(std::max(shrunk, 0L));
-    }
-    if (reach < 1) return {};
-    long const first = static_cast<long>(last) - reach;
-    return {static_cast<int>(std::max(first, 0L)), std::max(last, 0)};
+    if (count < 1) return {};
+    int const lastKey = keyCount - 1;
+    int const last = index == -1 ? lastKey : std::min(index, lastKey);
+    long const first = (index == -1 ? long{lastKey} : long{index}) - count;
+    return {static_cast<int>(std::clamp(first, 0L, long{lastKey})), std::max(last, 0)};
 }
 
 void Merge(Range mark, int* stored)
@@ -56,7 +49,7 @@ bool IsFloatKey(SEQ_Head** keys, int index, KFSp_FirstError& error)
     void* item = nullptr;
     int const code = SEQ_GetAddress(keys, index, 0, &item);
     error.Keep(code);
-    return code == 0 && (static_cast<KFS_KeyScalar*>(item)->flags & KFS_KeyFlag_Float) != 0;
+    return code == 0 && KFSp_Floats(static_cast<KFS_KeyScalar*>(item));
 }
 
 // The time of a float key follows from the anchors around it, so a range never ends on one, except at the ends of the

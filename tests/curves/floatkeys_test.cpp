@@ -44,7 +44,7 @@ FloatCase const FloatCases[] = {
     {"on the earlier anchor", {{0, 0}, {50, 0}, {100, 8}}, 1, 1, {0, 1, 100}},
     {"on the later anchor", {{0, 0}, {50, 8}, {100, 8}}, 1, 1, {0, 99, 100}},
     {"room for those that follow", {{0, 0}, {40, 8}, {50, 8}, {60, 8}, {100, 8}}, 1, 1, {0, 97, 98, 99, 100}},
-    {"at one place", {{0, 0}, {10, 4}, {50, 4}, {60, 4}, {100, 8}}, 1, 1, {0, 50, 51, 52, 100}},
+    {"at one place", {{0, 0}, {10, 4}, {50, 4}, {60, 4}, {100, 8}}, 1, 1, {0, 49, 50, 51, 100}},
     {"no way at all", {{0, 5}, {40, 5}, {50, 5}, {100, 5}}, 1, 1, {0, 1, 2, 100}},
     {"a hold out of the earlier anchor", {{0, 0}, {40, 4}, {50, 6}, {100, 8}}, 3, 1, {0, 1, 2, 100}},
     {"a hold into the later one", {{0, 0}, {40, 4}, {50, 6}, {100, 8}}, 1, 3, {0, 1, 2, 100}},
@@ -174,6 +174,8 @@ TEST_F(FloatKeys, StayAtTheEndsOfTheListAndRefuseOtherDimensions)
     }
     ASSERT_EQ(0, KFS_ForceUpdateStream(line));
     EXPECT_EQ((std::vector<int>{0, 10, 100}), line.Times());
+    EXPECT_NEAR(2.5, line.At(5)[0], 1e-6);
+    EXPECT_NEAR(7.5, line.At(55)[0], 1e-6);
 
     PathStream stream({{0, {0, 0, 0, 0}}, {50, {1, 1, 1, 1}}, {100, {2, 2, 2, 2}}}, KFS_Interp_Linear,
                       PathOptions(4, false));
@@ -222,6 +224,15 @@ MoveCase const MoveCases[] = {
     {"between float keys", {0, 10, 20, 30, 40, 50}, {1, 3, 4}, 2, 25, {0, 1, 25, 48, 49, 50}, 2, {0, 5}},
     {"in place between float keys", {0, 10, 20, 30, 40, 50}, {1, 3, 4}, 2, 20, {0, 1, 20, 48, 49, 50}, 2, {0, 5}},
     {"the first into a run of float keys", {0, 10, 20, 30, 50}, {2, 3}, 0, 25, {10, 25, 48, 49, 50}, 1, {0, 4}},
+    {"the first onto an anchor past a float key", {-1, 0, 2, 4}, {1}, 0, 2, {1, 2, 4}, 1, {0, 3}},
+    {"the last onto an anchor between float keys",
+     {0, 10, 20, 30, 40, 50},
+     {1, 3},
+     5,
+     20,
+     {0, 1, 20, 21, 40},
+     2,
+     {0, 5}},
     {"the last into a run of float keys", {0, 10, 20, 40, 50}, {1, 2}, 4, 25, {0, 1, 2, 25, 40}, 3, {0, 4}},
 };
 

@@ -169,6 +169,10 @@ TEST_F(InterpolateTest, OtherPairsOfCodesWriteNothing)
             bool const straight = out == KFS_Interp_Linear && in == KFS_Interp_Linear;
             stream.Codes(0, KFS_Interp_Linear, out).Codes(1, in, KFS_Interp_Linear);
             EXPECT_EQ(shaped, Evaluate(KFSp_Interpolate, stream, 300, 0)[0] != Untouched) << out << " to " << in;
+            stream.At(600);
+            // A read has the earlier key's value there.
+            bool const holds = out == KFS_Interp_Hold || in == KFS_Interp_Hold;
+            EXPECT_TRUE(shaped || holds || stream.At1(300) == 1.0) << out << " to " << in;
             EXPECT_EQ(shaped && !straight, Evaluate(KFSp_InterpDeriv, stream, 300, 0)[0] != Untouched)
                 << out << " to " << in;
         }

@@ -42,8 +42,8 @@ Script const Scripts[] = {
 
 class Editor {
 public:
-    // `steady`: all sides stay splines. A side that stops being one while it is stale keeps the handle that it had,
-    // which nobody sees until it becomes one again.
+    // `steady`: all sides stay splines, and the stream is up to date when handles, tangents and flags are set. A side
+    // that stops being a spline or automatic while it is stale keeps what it had.
     Editor(Script const& script, unsigned int seed, bool steady = false)
         : script_(script),
           random_(seed),
@@ -130,8 +130,14 @@ private:
         Check(KFS_SetKeyTime(stream_, index, nullptr, Inside(), nullptr, nullptr));
     }
 
+    void Settle()
+    {
+        if (steady_) Check(stream_->UpdateStream());
+    }
+
     void SetHandles()
     {
+        Settle();
         int const index = Index();
         auto const size = static_cast<std::size_t>(stream_->GetDimension());
         Vector const speeds(size, Number(0, 200));
@@ -143,6 +149,7 @@ private:
 
     void SetFlags()
     {
+        Settle();
         int const index = Index();
         Check(KFS_SetKeyContinuous(stream_, static_cast<unsigned char>(Pick(0, 1)), index));
         if (script_.handles) Check(KFS_SetKeyModifiable(stream_, static_cast<unsigned char>(Pick(0, 1)), index));
@@ -150,6 +157,7 @@ private:
 
     void SetTangents()
     {
+        Settle();
         int const index = Index();
         Vector const in = Place();
         Vector const out = Place();
@@ -159,6 +167,7 @@ private:
 
     void SetSpFlags()
     {
+        Settle();
         int const index = Index();
         Check(KFS_SetKeySpFlags(stream_, index, 3, static_cast<unsigned int>(Pick(0, 3))));
     }

@@ -2,6 +2,8 @@
 
 #include "curves/spacetangents.h"
 #include "curves/update.h"
+#include "frame/services/memory.h"
+#include "keystore/keyflags.h"
 #include "tests/curves/threekeys.h"
 #include "tests/support/listening.h"
 
@@ -59,19 +61,28 @@ TEST_F(TangentsTest, OnlySplineSidesHaveAnInfluence)
     }
 }
 
-// A key that turns the user's keeps the numbers that nobody set: they must be those of the keys as they are now.
-TEST_F(TangentsTest, WhatAnAutomaticKeyKeepsIsUpToDate)
+// Setters and flags bring nothing up to date: what was just given is what stays.
+TEST_F(TangentsTest, WhatWasGivenStandsWhenAKeyStopsBeingAutomatic)
 {
-    KeyedStream stream = MakeThree();
-    stream.Flag(1, KFS_KeyFlag_Modifiable);
-    ASSERT_EQ(0, KFS_ForceUpdateStream(stream));
-    EXPECT_DOUBLE_EQ(40.0 / 3.0, stream.GetHandle(1).outSpeed);
-    double const value = 100.0;
-    ASSERT_EQ(0, KFS_SetKeyF(stream, 2, &value, S, S));
-    double const influence = 0.4;
-    ASSERT_EQ(0, KFS_SetKeyInfluence(stream, 1, &influence, nullptr));
-    EXPECT_DOUBLE_EQ(100.0 / 3.0, stream.GetHandle(1).outSpeed);
-    EXPECT_EQ(0.4, stream.GetHandle(1).inInfluence);
+    static double const number = 0.4;
+    int (*const stops[])(KFS_Stream*) = {
+        [](KFS_Stream* s) { return KFS_SetKeyModifiable(s, 0, 1); },
+        [](KFS_Stream* s) { return KFS_SetKeyInfluence(s, 1, &number, nullptr); },
+        [](KFS_Stream* s) { return KFS_SetKeyVelocityF(s, 1, &number, nullptr); },
+    };
+    for (bool const spatial : {false, true}) {
+        for (auto const stop : stops) {
+            KeyedStream stream = MakeThree(spatial);
+            stream.Flag(1, KFS_KeyFlag_Modifiable);
+            double const x = 0.5;
+            double const y = 3.0;
+            ASSERT_EQ(0, KFS_SetKeyTangentsF(stream, 1, nullptr, nullptr, &x, &y, 1.0));
+            ASSERT_EQ(0, stop(stream));
+            ASSERT_EQ(0, stream->UpdateStream());
+            EXPECT_EQ(6.0, stream.GetHandle(1).outSpeed);
+            EXPECT_EQ(0.25, stream.GetHandle(1).outInfluence);
+        }
+    }
 }
 
 // ---- the cache record
@@ -159,6 +170,24 @@ TEST_F(TangentsTest, EveryDoorRefusesInItsOwnWords)
             EXPECT_EQ(SEQ_Err_BadIndex, door.call(stream, index)) << index;
         EXPECT_EQ(before, stream.Bytes());
         EXPECT_EQ(0, stream.Pins());
+    }
+}
+
+// A render's copy of the keys is made by whatever reads first.
+TEST_F(TangentsTest, NoDoorLetsThroughWhatACopyThrows)
+{
+    for (Door const& door : Doors()) {
+        SCOPED_TRACE(door.name);
+        KeyedStream const stream = MakeThree();
+        Q_ScSetCurrentRenderContext const current(kfshost::MakeRenderContext(true));
+        Q_FailAllocation(1);
+        int code = 0;
+        EXPECT_NO_THROW(code = door.call(stream, 1));
+        EXPECT_TRUE(Q_FailAllocationFired());
+        Q_FailAllocation(0);
+        EXPECT_EQ(4, code);
+        reports.Take();  // std::bad_alloc is reported where it is translated
+        EXPECT_EQ(0, door.call(stream, 1));
     }
 }
 

@@ -313,9 +313,9 @@ TEST_F(Edit, AnEditMarksTheNeighbourhood)
         {"insert", [](TestStream const& s) { return Insert(s, 450, 4.0, Linear, Linear); }, {4, 6}, {3, 7}},
         {"set", [](TestStream const& s) { return KFS_SetKey(s, 4, nullptr, Hold, None); }, {2, 5}, {2, 6}},
         {"remove", [](TestStream const& s) { return KFS_RemoveKey(s, 4, nullptr); }, {3, 4}, {2, 6}},
-        {"remove the last, whose mark lies past the end",
+        {"remove the last, whose mark falls on the one before",
          [](TestStream const& s) { return KFS_RemoveKey(s, 7, nullptr); },
-         TestStream::NotStale,
+         {6, 6},
          {5, 6}},
     };
     TestStream stream({.dimension = 2, .spatial = true});

@@ -42,8 +42,8 @@ TEST_F(StaleRanges, AMarkReachesBackFromItsIndex)
         {"no reach, no mark", 3, 0, {None, None}},
         {"nor with less than none", 3, -2, {None, None}},
         {"past the end, as far as it reaches in", 7, 4, {3, 5}},
-        {"past the end by its whole reach", 7, 2, {None, None}},
-        {"far past the end", 2000000000, 32767, {None, None}},
+        {"past the end by its whole reach, on the last key", 7, 2, {5, 5}},
+        {"far past the end", 2000000000, 32767, {5, 5}},
         {"from the end", -1, 2, {3, 5}},
         {"more than all", -1, 32767, {0, 5}},
         {"nothing from the end", -1, 0, {None, None}},
@@ -80,9 +80,9 @@ TEST_F(StaleRanges, MarksAddUp)
             int const count = below(6) - 1;
             EXPECT_EQ(0, (*stream)->SetInvalid(index, static_cast<short>(count)));
             EXPECT_EQ(0, (*stream)->SetArcInvalid(index, static_cast<short>(count)));
-            bool const isBehind = index >= keys && index - count >= keys - 1;
-            for (int key = 0; key < keys && count > 0 && !isBehind; ++key)
-                if (key >= index - count && key <= index) marked[static_cast<std::size_t>(key)] = true;
+            int const from = std::min(index - count, keys - 1);  // behind the list it falls on the last key
+            for (int key = 0; key < keys && count > 0; ++key)
+                if (key >= from && key <= index) marked[static_cast<std::size_t>(key)] = true;
             auto const first = std::find(marked.begin(), marked.end(), true);
             auto const last = std::find(marked.rbegin(), marked.rend(), true);
             Range const hull = first == marked.end() ? Range{None, None}
