@@ -336,17 +336,19 @@ TEST(ChunkFileVersions, EffectivePairs)
 
 using Call = int (*)(CKF_File*);
 
-CKF_ChunkInfo chunk, inner;
+CKF_ChunkInfo firstList, secondList;
 
-int BeginList(CKF_File* file, CKF_ChunkInfo* list = &chunk)
+int BeginList(CKF_File* file, CKF_ChunkInfo* list = &firstList)
 {
     return CKF_BeginChunkWrite(file, CKF_ListId, 0, CKF_Id("kfgp"), list);
 }
 
 TEST(ChunkFileWriting, AMisuseFailsTheWholeSave)
 {
-    Call const none = [](CKF_File* f) { return CKF_EndChunkWrite(f, &(chunk = {})); };
-    Call const outer = [](CKF_File* f) { return BeginList(f) + BeginList(f, &inner) + CKF_EndChunkWrite(f, &chunk); };
+    Call const none = [](CKF_File* f) { return CKF_EndChunkWrite(f, &(firstList = {})); };
+    Call const outer = [](CKF_File* f) {
+        return BeginList(f) + BeginList(f, &secondList) + CKF_EndChunkWrite(f, &firstList);
+    };
     Call const open = [](CKF_File* f) { return BeginList(f) + f->Commit(); };
     Call const deep = [](CKF_File* f) {
         for (int i = 0; i < CKF_MaxDepth; ++i) EXPECT_EQ(0, BeginList(f)) << i;
@@ -364,8 +366,8 @@ TEST(ChunkFileWriting, AMisuseFailsTheWholeSave)
         {"a negative size", [](CKF_File* f) { return CKF_WriteAtom(f, CKF_Id("cdat"), -1, "x"); }, bad},
         {"no data", [](CKF_File* f) { return CKF_WriteAtom(f, CKF_Id("cdat"), 1, nullptr); }, bad},
         {"no handle", [](CKF_File* f) { return CKF_WriteHandle(f, CKF_Id("expr"), nullptr); }, bad},
-        {"no list", [](CKF_File* f) { return CKF_BeginChunkWrite(f, CKF_Id("cdat"), 0, 0, &chunk); }, bad},
-        {"no list type", [](CKF_File* f) { return CKF_BeginChunkWrite(f, CKF_ListId, 0, 0, &chunk); }, bad},
+        {"no list", [](CKF_File* f) { return CKF_BeginChunkWrite(f, CKF_Id("cdat"), 0, 0, &firstList); }, bad},
+        {"no list type", [](CKF_File* f) { return CKF_BeginChunkWrite(f, CKF_ListId, 0, 0, &firstList); }, bad},
         {"no items", [](CKF_File* f) { return SEQ_Write(nullptr, f); }, SEQ_Err_BadList},
         {"reading", [](CKF_File* f) { return CKF_ReadAtom(f, 1, nullptr, 0, nullptr); }, CKF_Err_NotOpen},
         {"an end without a beginning", none, unbalanced},
