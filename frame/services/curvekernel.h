@@ -122,7 +122,8 @@ KFS_SERVICE_API int CRV_CurveSetNonDecreasing(CRV_Curve* curve, unsigned char* c
 //                for SEQ_Dispose; its items are private. On failure the older table is gone and null is left.
 //   arcLength    out, not null. In the units of the curve's coordinates. On failure 0.
 //   accuracy     absolute, in the same units. `arcLength` is that close to the true length, and the point that the
-//                table finds for a distance that close to the true one. Anything smaller than 1e-9 of the control
+//                table finds for a distance that close to the true one; up to twice as far from it on one curve in some
+//                hundred thousand, which all but stands still at an end. Anything smaller than 1e-9 of the control
 //                polygon's length, negative or NaN counts as that.
 //
 // Whatever the accuracy, the table keeps the speed along the path even, so that equal distances stay equal steps: of a
