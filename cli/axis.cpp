@@ -20,26 +20,45 @@ Axis::Axis(double low, double high, int ticks, double leastStep)
     : low_(low),
       high_(high),
       step_(std::max(RoundStep((high - low) / ticks), leastStep))
-{}
+{
+    double const largest = std::max(std::abs(low_), std::abs(high_));
+    if (largest >= 1e6 || (largest > 0.0 && largest < 1e-3))
+        exponent_ = 3 * static_cast<int>(std::floor(std::log10(largest) / 3));
+}
+
+Axis Axis::Around(double number)
+{
+    double const half = number == 0.0 ? 1.0 : std::abs(number) / 2;
+    Axis axis(number - half, number + half, 1);
+    axis.number_ = number;
+    axis.exponent_ = 0;
+    return axis;
+}
 
 std::vector<double> Axis::Ticks() const
 {
+    if (number_) return {*number_};
     std::vector<double> ticks;
     for (double index = std::ceil(low_ / step_); index * step_ <= high_; index += 1.0) ticks.push_back(index * step_);
     return ticks;
 }
 
+bool Axis::IsZero(double tick) const
+{
+    return std::abs(tick) < (number_ ? high_ - low_ : step_) / 2;
+}
+
 std::string Axis::Label(double tick) const
 {
-    double const largest = std::max(std::abs(low_), std::abs(high_));
-    if (largest >= 1e6 || step_ < 1e-5) {
-        return std::abs(tick) < step_ / 2
-                   ? "0"
-                   : fmt::format("{:.{}e}", tick,
-                                 std::clamp(static_cast<int>(std::ceil(std::log10(largest / step_))), 0, 15));
-    }
-    int const places = std::max(0, static_cast<int>(std::ceil(-std::log10(step_) - 1e-9)));
-    return fmt::format("{:.{}f}", std::abs(tick) < step_ / 2 ? 0.0 : tick, places);
+    if (number_) return fmt::format("{:.6g}", tick == 0.0 ? 0.0 : tick);
+    double const power = std::pow(10.0, exponent_);
+    int const places = std::clamp(static_cast<int>(std::ceil(-std::log10(step_ / power) - 1e-9)), 0, 15);
+    return fmt::format("{:.{}f}", IsZero(tick) ? 0.0 : tick / power, places);
+}
+
+std::string Axis::Factor() const
+{
+    return exponent_ == 0 ? "" : fmt::format("1e{}", exponent_);
 }
 
 Range WithAir(Range range, double share, double leastExtent)

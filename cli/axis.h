@@ -1,5 +1,6 @@
 #pragma once
 
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -8,19 +9,29 @@ class Axis {
 public:
     // `low` <= `high`, finite. About `ticks` ticks; a step is never below `leastStep`.
     Axis(double low, double high, int ticks, double leastStep = 0.0);
+    // For what never changes: one tick at the number, in the middle.
+    static Axis Around(double number);
 
     double Low() const { return low_; }
     double High() const { return high_; }
     double Step() const { return step_; }
+    // Whether it is one of a number that never changes.
+    bool IsConstant() const { return number_.has_value(); }
     // The ticks inside the range.
     std::vector<double> Ticks() const;
-    // As many places as the step needs, and no "-0".
+    bool IsZero(double tick) const;
+    // All labels of an axis have the same number of places, as many as the step needs, and no "-0". Where numbers are
+    // huge or tiny they stand for multiples of Factor().
     std::string Label(double tick) const;
+    // A power of ten as text, like "1e6", or "" for 1.
+    std::string Factor() const;
 
 private:
     double low_;
     double high_;
     double step_;
+    int exponent_ = 0;
+    std::optional<double> number_;
 };
 
 struct Range {

@@ -1,5 +1,6 @@
 #include "cli/curvesamples.h"
 
+#include "cli/rates.h"
 #include "curves/tangents.h"
 #include "host/storeerror.h"
 #include "keystore/evaluate.h"
@@ -16,23 +17,27 @@ namespace {
 // One sampler walks a stream from key to key. Times are whole units of the stream's scale, as its keys are.
 class Sampler {
 public:
-    Sampler(KFS_Stream const& stream, double pointsPerSecond)
+    Sampler(KFS_Stream const& stream, std::vector<std::size_t> const& components, TimeSpan const& part,
+            double pointsPerSecond)
         : stream_(stream),
-          dimension_(static_cast<std::size_t>(stream.GetDimension())),
+          components_(components),
           scale_(stream.GetTimeScale()),
+          first_(part.first.ToUnits(scale_)),
+          last_(part.last.ToUnits(scale_)),
           pointsPerSecond_(pointsPerSecond),
-          row_(dimension_),
-          nextRow_(dimension_)
+          row_(static_cast<std::size_t>(stream.GetDimension())),
+          rates_(stream)
     {
-        curves_.components.resize(dimension_);
+        curves_.components.resize(components.size());
     }
 
     StreamCurves Run()
     {
         int const keys = kfshost::KeyCount(stream_);
         for (int i = 0; i < keys; ++i) {
-            AddKey(i);
-            if (i + 1 < keys) AddSegment(i);
+            int const time = KeyUnits(i);
+            if (time >= first_ && time <= last_) AddKey(i, time);
+            if (i + 1 < keys && time < last_ && KeyUnits(i + 1) > first_) AddSegment(i, time, KeyUnits(i + 1));
         }
         return std::move(curves_);
     }
@@ -53,99 +58,100 @@ private:
         ThrowIfFailed(KFS_GetValueFPlus(&stream_, &time, 0, row.data(), nullptr, nullptr));
     }
 
-    void AddKey(int index)
+    void AddKey(int index, int time)
     {
         char inInterp = 0;
         char outInterp = 0;
         ThrowIfFailed(KFS_GetKeyF(&stream_, index, row_.data(), &inInterp, &outInterp));
-        double const seconds = Seconds(KeyUnits(index));
-        for (std::size_t d = 0; d < dimension_; ++d) {
-            Point const key{seconds, row_[d]};
-            curves_.components[d].keys.push_back(key);
-            curves_.components[d].value.push_back(key);
+        double const seconds = Seconds(time);
+        for (std::size_t c = 0; c < components_.size(); ++c) {
+            Point const key{seconds, row_[components_[c]]};
+            curves_.components[c].keys.push_back(key);
+            curves_.components[c].value.push_back(key);
         }
         if (!stream_.IsSpatial())  // a path's handles belong to the graph of its distance, not to these
             AddHandles(index, seconds, inInterp, outInterp);
     }
 
+    // Those whose ends lie in the part that is drawn.
     void AddHandles(int index, double seconds, char inInterp, char outInterp)
     {
-        std::vector<double> inX(dimension_), inY(dimension_), outX(dimension_), outY(dimension_);
+        std::size_t const dimension = row_.size();
+        std::vector<double> inX(dimension), inY(dimension), outX(dimension), outY(dimension);
         ThrowIfFailed(KFS_GetKeyTangentsF(&stream_, index, inX.data(), inY.data(), outX.data(), outY.data()));
-        for (std::size_t d = 0; d < dimension_; ++d) {
+        for (std::size_t c = 0; c < components_.size(); ++c) {
+            std::size_t const d = components_[c];
             Point const key{seconds, row_[d]};
-            if (inInterp == KFS_Interp_Spline && inX[d] < 0.0)
-                curves_.handles.push_back({d, key, {key.x + inX[d], key.y + inY[d]}});
-            if (outInterp == KFS_Interp_Spline && outX[d] > 0.0)
-                curves_.handles.push_back({d, key, {key.x + outX[d], key.y + outY[d]}});
+            if (inInterp == KFS_Interp_Spline && inX[d] < 0.0 && key.x + inX[d] >= Seconds(first_))
+                curves_.handles.push_back({c, key, {key.x + inX[d], key.y + inY[d]}});
+            if (outInterp == KFS_Interp_Spline && outX[d] > 0.0 && key.x + outX[d] <= Seconds(last_))
+                curves_.handles.push_back({c, key, {key.x + outX[d], key.y + outY[d]}});
         }
     }
 
-    void AddSegment(int index)
+    void AddSegment(int index, int start, int end)
     {
-        int const start = KeyUnits(index);
-        int const end = KeyUnits(index + 1);
         char outInterp = 0;
         char inInterp = 0;
         ThrowIfFailed(KFS_GetKeyF(&stream_, index, nullptr, nullptr, &outInterp));
         ThrowIfFailed(KFS_GetKeyF(&stream_, index + 1, nullptr, &inInterp, nullptr));
+        int const from = std::max(start, first_);
+        int const to = std::min(end, last_);
         if (outInterp == KFS_Interp_Hold || inInterp == KFS_Interp_Hold) {
-            AddHold(start, end);
+            AddHold(from, to);
         } else if (outInterp == KFS_Interp_Linear && inInterp == KFS_Interp_Linear) {
-            AddPieces(start, end, 1);
+            AddPieces(from, to, 1, start, end);
         } else {
-            double const wanted = (static_cast<double>(end) - start) / scale_ * pointsPerSecond_;
-            AddPieces(start, end, std::clamp(static_cast<std::int64_t>(wanted), std::int64_t{24}, std::int64_t{4000}));
+            double const wanted = (static_cast<double>(to) - from) / scale_ * pointsPerSecond_;
+            AddPieces(from, to, std::clamp(static_cast<std::int64_t>(wanted), std::int64_t{24}, std::int64_t{4000}),
+                      start, end);
         }
     }
 
-    void AddHold(int start, int end)
+    void AddHold(int from, int to)
     {
-        Read(start, row_);
-        for (std::size_t d = 0; d < dimension_; ++d) {
-            ComponentCurve& curve = curves_.components[d];
-            curve.value.push_back({Seconds(end), row_[d]});
-            curve.speed.push_back({Seconds(start), 0.0});
-            curve.speed.push_back({Seconds(end), 0.0});
-        }
-    }
-
-    // The speed in the middle of a piece is the slope across it; at the segment's ends that of the outermost pieces
-    // stands for the limit.
-    void AddPieces(int start, int end, std::int64_t pieces)
-    {
-        std::int64_t const length = std::int64_t{end} - start;
-        pieces = std::min(pieces, length);
-        Read(start, row_);
-        std::int64_t before = start;
-        for (std::int64_t i = 1; i <= pieces; ++i) {
-            std::int64_t const after = start + length * i / pieces;
-            Read(static_cast<int>(after), nextRow_);
-            for (std::size_t d = 0; d < dimension_; ++d) {
-                ComponentCurve& curve = curves_.components[d];
-                double const slope = (nextRow_[d] - row_[d]) / Seconds(after - before);
-                if (i == 1) curve.speed.push_back({Seconds(start), slope});
-                curve.speed.push_back({(Seconds(before) + Seconds(after)) / 2, slope});
-                if (i == pieces) curve.speed.push_back({Seconds(end), slope});
-                curve.value.push_back({Seconds(after), nextRow_[d]});
+        Read(from, row_);
+        for (std::size_t c = 0; c < components_.size(); ++c) {
+            ComponentCurve& curve = curves_.components[c];
+            for (int const time : {from, to}) {
+                curve.value.push_back({Seconds(time), row_[components_[c]]});
+                curve.speed.push_back({Seconds(time), 0.0});
             }
-            before = after;
-            std::swap(row_, nextRow_);
+        }
+    }
+
+    // A part of the segment between `start` and `end`.
+    void AddPieces(int from, int to, std::int64_t pieces, int start, int end)
+    {
+        std::int64_t const length = std::int64_t{to} - from;
+        pieces = std::min(pieces, length);
+        for (std::int64_t i = 0; i <= pieces; ++i) {
+            int const time = static_cast<int>(from + (pieces == 0 ? 0 : length * i / pieces));
+            std::vector<double> const& rates = rates_.At(time, start, end);
+            Read(time, row_);
+            for (std::size_t c = 0; c < components_.size(); ++c) {
+                ComponentCurve& curve = curves_.components[c];
+                curve.value.push_back({Seconds(time), row_[components_[c]]});
+                curve.speed.push_back({Seconds(time), rates[components_[c]]});
+            }
         }
     }
 
     KFS_Stream const& stream_;
-    std::size_t dimension_;
+    std::vector<std::size_t> const& components_;
     unsigned int scale_;
+    int first_;
+    int last_;
     double pointsPerSecond_;
     std::vector<double> row_;
-    std::vector<double> nextRow_;
+    Rates rates_;
     StreamCurves curves_;
 };
 
 }  // namespace
 
-StreamCurves SampleCurves(kfshost::StreamItem const& item, double pointsPerSecond)
+StreamCurves SampleCurves(kfshost::StreamItem const& item, std::vector<std::size_t> const& components,
+                          TimeSpan const& part, double pointsPerSecond)
 {
-    return Sampler(*item.stream, pointsPerSecond).Run();
+    return Sampler(*item.stream, components, part, pointsPerSecond).Run();
 }

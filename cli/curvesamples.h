@@ -1,5 +1,6 @@
 #pragma once
 
+#include "cli/selection.h"
 #include "cli/svg.h"
 #include "host/scene.h"
 
@@ -14,7 +15,7 @@ struct ComponentCurve {
 
 // A handle of a key on a curved side.
 struct Handle {
-    std::size_t component;
+    std::size_t component;  // its place among those that are sampled
     Point key;
     Point end;
 };
@@ -24,5 +25,8 @@ struct StreamCurves {
     std::vector<Handle> handles;
 };
 
-// Samples a stream with some `pointsPerSecond` points. Throws StoreError.
-StreamCurves SampleCurves(kfshost::StreamItem const& item, double pointsPerSecond);
+// Samples these components of a stream with some `pointsPerSecond` points
+// from the first to the last time of `part`.
+// Throws StoreError.
+StreamCurves SampleCurves(kfshost::StreamItem const& item, std::vector<std::size_t> const& components,
+                          TimeSpan const& part, double pointsPerSecond);

@@ -7,6 +7,7 @@
 #include <fmt/format.h>
 #include <fmt/ranges.h>
 
+#include <cstring>
 #include <unordered_map>
 
 using kfshost::Rational;
@@ -20,11 +21,6 @@ std::string Against(std::string const& before, std::string const& after)
     return before == after ? "" : before + " | " + after;
 }
 
-std::string With(std::string const& place, std::string const& difference)
-{
-    return difference.empty() ? "" : place + ": " + difference;
-}
-
 std::string Shape(StreamItem const& item)
 {
     KFS_Stream const& stream = *item.stream;
@@ -32,51 +28,106 @@ std::string Shape(StreamItem const& item)
     return fmt::format("{} of {}", form, fmt::join(item.components, " ")) + (stream.HasNoKeys() ? ", constant" : "");
 }
 
-std::string KeyText(KFS_Stream const& stream, int index)
+// A key without its time.
+struct Key {
+    std::vector<double> value;
+    char in = 0;
+    char out = 0;
+};
+
+// As bits, so that -0 isn't 0: what the texts show must differ where this does.
+bool Same(std::vector<double> const& a, std::vector<double> const& b)
 {
-    std::vector<double> value(static_cast<std::size_t>(stream.GetDimension()));
-    char inInterp = 0;
-    char outInterp = 0;
-    kfshost::ThrowIfFailed(KFS_GetKeyF(&stream, index, value.data(), &inInterp, &outInterp));
-    return fmt::format("{} ({}/{})", fmt::join(value, " "), static_cast<int>(inInterp), static_cast<int>(outInterp));
+    return a.size() == b.size() && std::memcmp(a.data(), b.data(), a.size() * sizeof(double)) == 0;
 }
 
-std::string ValueText(KFS_Stream const& stream, Rational const& time)
+std::string_view NameOfInterp(char code)
 {
-    std::vector<double> value(static_cast<std::size_t>(stream.GetDimension()));
-    kfshost::ReadAt(stream, time, value.data());
-    return fmt::format("{}", fmt::join(value, " "));
+    switch (code) {
+    case KFS_Interp_Linear: return "linear";
+    case KFS_Interp_Spline: return "spline";
+    case KFS_Interp_Hold: return "hold";
+    default: return "undecided";
+    }
 }
+
+// One of the two streams, with room for what is read of it: keys are many, and texts are made of those alone that
+// differ.
+class Side {
+public:
+    explicit Side(KFS_Stream const& stream) : stream_(stream)
+    {
+        key_.value.resize(static_cast<std::size_t>(stream.GetDimension()));
+        value_ = key_.value;
+    }
+
+    Rational Time(int index) const { return kfshost::KeyTime(stream_, index); }
+    Key const& KeyAt(int index)
+    {
+        kfshost::ThrowIfFailed(KFS_GetKeyF(&stream_, index, key_.value.data(), &key_.in, &key_.out));
+        return key_;
+    }
+    std::vector<double> const& ValueAt(Rational const& time)
+    {
+        kfshost::ReadAt(stream_, time, value_.data());
+        return value_;
+    }
+    std::string KeyText() const
+    {
+        return fmt::format("{} ({}/{})", fmt::join(key_.value, " "), NameOfInterp(key_.in), NameOfInterp(key_.out));
+    }
+    std::string ValueText() const { return fmt::format("{}", fmt::join(value_, " ")); }
+
+private:
+    KFS_Stream const& stream_;
+    Key key_;
+    std::vector<double> value_;
+};
 
 // Keys with their times, and halfway between keys the values, which depend on the handles.
 std::string FirstDifferenceOfKeys(KFS_Stream const& before, KFS_Stream const& after)
 {
+    Side left(before);
+    Side right(after);
     int const count = kfshost::KeyCount(before);
+    Rational timeBefore;
     for (int i = 0; i < count; ++i) {
-        Rational const time = kfshost::KeyTime(before, i);
-        std::string const key = fmt::format("key {}", i);
-        std::string text = With(key, Against(TimeText(time) + " s", TimeText(kfshost::KeyTime(after, i)) + " s"));
-        if (text.empty())
-            text = With(key + " at " + TimeText(time) + " s", Against(KeyText(before, i), KeyText(after, i)));
-        if (text.empty() && i > 0) {
-            Rational const middle = (kfshost::KeyTime(before, i - 1) + time) * Rational(1, 2);
-            text = With("between keys at " + TimeText(middle) + " s",
-                        Against(ValueText(before, middle), ValueText(after, middle)));
+        Rational const time = left.Time(i);
+        Rational const otherTime = right.Time(i);
+        if (time != otherTime) return fmt::format("key {}: {} s | {} s", i, TimeText(time), TimeText(otherTime));
+        Key const& key = left.KeyAt(i);
+        Key const& other = right.KeyAt(i);
+        if (key.in != other.in || key.out != other.out || !Same(key.value, other.value))
+            return fmt::format("key {} at {} s: {} | {}", i, TimeText(time), left.KeyText(), right.KeyText());
+        if (i > 0) {
+            Rational const middle = (timeBefore + time) * Rational(1, 2);
+            if (!Same(left.ValueAt(middle), right.ValueAt(middle)))
+                return fmt::format("between keys at {} s: {} | {}", TimeText(middle), left.ValueText(),
+                                   right.ValueText());
         }
-        if (!text.empty()) return text;
+        timeBefore = time;
     }
     return "";
+}
+
+std::string ConstantText(KFS_Stream const& stream)
+{
+    Side side(stream);
+    side.ValueAt(Rational());
+    return side.ValueText();
+}
+
+std::string Keys(KFS_Stream const& stream)
+{
+    return Plural(static_cast<std::size_t>(kfshost::KeyCount(stream)), "key", "keys");
 }
 
 std::string FirstDifference(StreamItem const& before, StreamItem const& after)
 {
     std::string text = Against(Shape(before), Shape(after));
-    if (text.empty()) {
-        text = Against(fmt::format("{} keys", kfshost::KeyCount(*before.stream)),
-                       fmt::format("{} keys", kfshost::KeyCount(*after.stream)));
-    }
+    if (text.empty()) text = Against(Keys(*before.stream), Keys(*after.stream));
     if (text.empty() && before.stream->HasNoKeys())
-        text = Against(ValueText(*before.stream, Rational(0, 1)), ValueText(*after.stream, Rational(0, 1)));
+        text = Against(ConstantText(*before.stream), ConstantText(*after.stream));
     return text.empty() ? FirstDifferenceOfKeys(*before.stream, *after.stream) : text;
 }
 
@@ -90,12 +141,12 @@ std::string DifferencesOf(kfshost::Scene const& before, kfshost::Scene const& af
         auto const other = others.extract(item.path);
         std::string const difference = other ? FirstDifference(item, *other.mapped()) : "";
         if (!other)
-            text += "- " + item.path + '\n';
+            text += "- " + Shown(item.path) + '\n';
         else if (!difference.empty())
-            text += "~ " + item.path + ": " + difference + '\n';
+            text += "~ " + Shown(item.path) + ": " + difference + '\n';
     }
     for (StreamItem const& item : after.streams)
-        if (others.contains(item.path)) text += "+ " + item.path + '\n';
+        if (others.contains(item.path)) text += "+ " + Shown(item.path) + '\n';
     return text;
 }
 
@@ -118,7 +169,7 @@ Work Prepare(CLI::App& command)
     command.add_option("AFTER", options->after.file, "another one")->required();
     command.footer(
         "A line for each stream that differs: - only in BEFORE, + only in AFTER, ~ in both, with what differs first.\n"
-        "Keys show their values and, like (2/1), how the curve comes in and goes out: 1 linear, 2 spline, 3 hold.\n"
+        "Keys show their values and, like (spline/linear), how the curve comes in and goes out.\n"
         "The exit code is 0 if nothing differs and 1 if something does.");
     return [options] { return Run(*options); };
 }

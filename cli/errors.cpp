@@ -2,6 +2,7 @@
 #include "cli/errors.h"
 
 #include "cli/command.h"
+#include "cli/output.h"
 #include "frame/services/reports.h"
 #include "host/storeerror.h"
 
@@ -20,7 +21,7 @@ void RememberFirstReport(Q_Report const& report)
 
 int Fail(std::string const& message)
 {
-    std::fprintf(stderr, "kfs: %s\n", message.c_str());
+    std::fprintf(stderr, "kfs: %s\n", Shown(message).c_str());
     return ExitFailed;
 }
 

@@ -28,15 +28,6 @@ struct Options {
     Format format = Format::Table;
 };
 
-// Seconds, or frames with an "f" behind.
-Rational ParseTime(std::string const& text, char const* option, Rational const& fps)
-{
-    bool const inFrames = text.ends_with('f');
-    auto const number = Rational::Parse(std::string_view(text).substr(0, text.size() - (inFrames ? 1 : 0)));
-    if (!number) throw UserError(option, '"' + text + "\" isn't a time: seconds like 0.5 or 1/24, or frames like 12f");
-    return inFrames ? *number / fps : *number;
-}
-
 std::vector<Rational> SampleTimes(Options const& options, Rational const& fps, std::optional<TimeSpan> const& span)
 {
     TimeSpan const keys = span.value_or(TimeSpan{});

@@ -4,9 +4,7 @@
 #include "cli/errors.h"
 #include "cli/options.h"
 #include "cli/output.h"
-#include "host/projectfile.h"
-
-#include <fmt/format.h>
+#include "cli/projectoutput.h"
 
 namespace {
 
@@ -18,17 +16,14 @@ struct Options {
 
 int Run(Options const& options)
 {
-    if (options.output == "-") throw UserError("-o", "a project goes into a file, not to the standard output");
     RefuseToOverwrite(options.file, options.output);
     kfshost::Scene scene =
         ReadingFile(options.file, [&] { return kfshost::ImportFile(options.file, {options.timeScale}); });
     std::size_t keys = 0;
     for (kfshost::StreamItem const& item : scene.streams)
         keys += static_cast<std::size_t>(kfshost::KeyCount(*item.stream));
-    std::string const summary = fmt::format(
-        "{}: {}, {}\n", options.output, Plural(scene.streams.size(), "stream", "streams"), Plural(keys, "key", "keys"));
-    kfshost::SaveProject(*kfshost::MakeTree(std::move(scene)), options.output);
-    WriteToStandardOutput(summary);
+    std::string const what = Plural(scene.streams.size(), "stream", "streams") + ", " + Plural(keys, "key", "keys");
+    WriteProject(*kfshost::MakeTree(std::move(scene)), options.output, what);
     return ExitDone;
 }
 

@@ -1,5 +1,7 @@
 #include "cli/command.h"
 #include "cli/errors.h"
+#include "cli/output.h"
+#include "cli/signals.h"
 #include "host/session.h"
 
 #include <string>
@@ -17,7 +19,7 @@ std::string TellUsageError(CLI::App const* app, CLI::Error const& error)
     bool const lacksCommand = error.get_name() == "RequiredError" && app->get_subcommands().empty();
     std::string const what =
         lacksCommand && !rest.empty() ? "there is no command \"" + rest.front() + '"' : error.what();
-    return "kfs: " + what + " (kfs --help tells what there is)\n";
+    return "kfs: " + Shown(what) + " (kfs --help tells what there is)\n";
 }
 
 int Run(int argc, char** argv)
@@ -57,6 +59,7 @@ int Run(int argc, char** argv)
 int main(int argc, char** argv)
 {
     return RunTold([&] {
+        TellOfSignals();
         kfshost::Session const session;
         ListenToReports();
         return Run(argc, argv);

@@ -1,5 +1,6 @@
 #include "cli/motionsamples.h"
 
+#include "cli/rates.h"
 #include "curves/spacetangents.h"
 #include "frame/services/curvekernel.h"
 #include "host/paths.h"
@@ -32,14 +33,19 @@ std::array<std::size_t, 3> AxesOf(StreamItem const& item)
 
 class Sampler {
 public:
-    explicit Sampler(StreamItem const& item) : item_(item), stream_(*item.stream), axes_(AxesOf(item)) {}
+    explicit Sampler(StreamItem const& item) : item_(item), stream_(*item.stream), axes_(AxesOf(item)), rates_(stream_)
+    {}
 
-    MotionSamples Run(double pointsPerSecond)
+    MotionSamples Run(TimeSpan const& part, double pointsPerSecond)
     {
+        part_ = part;
         int const keys = kfshost::KeyCount(stream_);
+        Key before;
         for (int i = 0; i < keys; ++i) {
-            AddKey(i);
-            if (i > 0) AddSegment(static_cast<std::size_t>(i), pointsPerSecond);
+            Key const key = ReadKey(i, i == 0 || i + 1 == keys);
+            if (i > 0 && before.time < part.last && key.time > part.first) AddSegment(before, key, pointsPerSecond);
+            if (key.time >= part.first && key.time <= part.last) samples_.keys.push_back(key.mark);
+            before = key;
         }
         return std::move(samples_);
     }
@@ -59,39 +65,60 @@ private:
         return place;
     }
 
-    void AddKey(int index)
+    struct Key {
+        MotionKey mark;
+        Rational time;
+        char in = 0;
+        char out = 0;
+    };
+
+    Key ReadKey(int index, bool isEnd) const
     {
         double value[3] = {};
         double in[3] = {};
         double out[3] = {};
-        outBefore_ = out_;
-        ThrowIfFailed(KFS_GetKeyF(&stream_, index, value, &in_, &out_));
+        Key key{};
+        ThrowIfFailed(KFS_GetKeyF(&stream_, index, value, &key.in, &key.out));
         ThrowIfFailed(KFS_GetKeySpaceTangentsF(&stream_, index, -1, in, out));
         for (std::size_t d = 0; d < item_.components.size(); ++d) {
             in[d] += value[d];
             out[d] += value[d];
         }
-        timeBefore_ = time_;
-        time_ = kfshost::KeyTime(stream_, index);
-        samples_.keys.push_back(
-            {time_.ToDouble(), ToPlace(value), ToPlace(in), ToPlace(out), kfshost::IsFloatKey(stream_, index)});
+        key.time = kfshost::KeyTime(stream_, index);
+        key.mark = {
+            key.time.ToDouble(), ToPlace(value), ToPlace(in), ToPlace(out), kfshost::IsFloatKey(stream_, index), isEnd};
+        return key;
     }
 
-    // The segment that ends at the key added last.
-    void AddSegment(std::size_t index, double pointsPerSecond)
+    void AddSegment(Key const& before, Key const& key, double pointsPerSecond)
     {
-        MotionKey const& from = samples_.keys[index - 1];
-        MotionKey const& to = samples_.keys[index];
-        if (outBefore_ == KFS_Interp_Hold || in_ == KFS_Interp_Hold) {
-            samples_.segments.push_back({{from.place, to.place}, true});
-            samples_.speed.push_back({from.seconds, 0.0});
-            samples_.speed.push_back({to.seconds, 0.0});
+        MotionKey const& from = before.mark;
+        MotionKey const& to = key.mark;
+        double const first = std::max(from.seconds, part_.first.ToDouble());
+        double const last = std::min(to.seconds, part_.last.ToDouble());
+        if (before.out == KFS_Interp_Hold || key.in == KFS_Interp_Hold) {
+            bool const jumps = key.time <= part_.last;
+            samples_.segments.push_back({{from.place, jumps ? to.place : from.place}, true});
+            samples_.speed.push_back({first, 0.0});
+            samples_.speed.push_back({last, 0.0});
             return;
         }
-        samples_.segments.push_back({Route(from, to), false});
-        bool const isLinear = outBefore_ == KFS_Interp_Linear && in_ == KFS_Interp_Linear;
-        double const wanted = (to.seconds - from.seconds) * pointsPerSecond;
-        AddSpeed(isLinear ? 1 : std::clamp(static_cast<std::int64_t>(wanted), std::int64_t{24}, std::int64_t{4000}));
+        bool const isWhole = before.time >= part_.first && key.time <= part_.last;
+        samples_.segments.push_back({isWhole ? Route(from, to) : PartOfRoute(before.time, key.time), false});
+        bool const isLinear = before.out == KFS_Interp_Linear && key.in == KFS_Interp_Linear;
+        std::int64_t const wanted = static_cast<std::int64_t>((last - first) * pointsPerSecond);
+        AddSpeed(before.time, key.time, isLinear ? 1 : std::clamp(wanted, std::int64_t{24}, std::int64_t{4000}));
+    }
+
+    // What of a segment is to be seen, point after point in time.
+    std::vector<Place> PartOfRoute(Rational const& start, Rational const& end) const
+    {
+        constexpr std::int64_t pieces = 96;
+        Rational const first = std::max(start, part_.first);
+        Rational const step = (std::min(end, part_.last) - first) * Rational(1, pieces);
+        std::vector<Place> route;
+        for (std::int64_t i = 0; i <= pieces; ++i) route.push_back(Read(first + step * Rational(i, 1)));
+        return route;
     }
 
     static std::vector<Place> Route(MotionKey const& from, MotionKey const& to)
@@ -106,46 +133,35 @@ private:
         return route;
     }
 
-    // The speed in the middle of a piece is the way across it by its time; the outermost pieces stand for the limits at
-    // the segment's ends.
-    void AddSpeed(std::int64_t pieces)
+    void AddSpeed(Rational const& startTime, Rational const& endTime, std::int64_t pieces)
     {
         unsigned int const scale = stream_.GetTimeScale();
-        std::int64_t const start = timeBefore_.ToUnits(scale);
-        std::int64_t const length = time_.ToUnits(scale) - start;
+        int const start = startTime.ToUnits(scale);
+        int const end = endTime.ToUnits(scale);
+        std::int64_t const from = std::max(start, part_.first.ToUnits(scale));
+        std::int64_t const length = std::min(end, part_.last.ToUnits(scale)) - from;
         pieces = std::min(pieces, length);
-        Place before = samples_.keys[samples_.keys.size() - 2].place;
-        std::int64_t unitsBefore = start;
-        for (std::int64_t i = 1; i <= pieces; ++i) {
-            std::int64_t const units = start + length * i / pieces;
-            Place const place = Read(Rational(units, scale));
-            double const from = static_cast<double>(unitsBefore) / scale;
-            double const to = static_cast<double>(units) / scale;
-            double const speed = DistanceBetween(before, place) / (to - from);
-            if (i == 1) samples_.speed.push_back({from, speed});
-            samples_.speed.push_back({(from + to) / 2, speed});
-            if (i == pieces) samples_.speed.push_back({to, speed});
-            before = place;
-            unitsBefore = units;
+        for (std::int64_t i = 0; i <= pieces; ++i) {
+            std::int64_t const time = from + (pieces == 0 ? 0 : length * i / pieces);
+            double squares = 0.0;
+            for (double const rate : rates_.At(static_cast<int>(time), start, end)) squares += rate * rate;
+            samples_.speed.push_back({static_cast<double>(time) / scale, std::sqrt(squares)});
         }
     }
 
     StreamItem const& item_;
     KFS_Stream const& stream_;
     std::array<std::size_t, 3> axes_;
+    Rates rates_;
+    TimeSpan part_;
     MotionSamples samples_;
-    char in_ = 0;
-    char out_ = 0;
-    char outBefore_ = 0;
-    Rational time_;
-    Rational timeBefore_;
 };
 
 }  // namespace
 
-MotionSamples SampleMotion(StreamItem const& item, double pointsPerSecond)
+MotionSamples SampleMotion(StreamItem const& item, TimeSpan const& part, double pointsPerSecond)
 {
-    return Sampler(item).Run(pointsPerSecond);
+    return Sampler(item).Run(part, pointsPerSecond);
 }
 
 std::vector<Place> PlacesAt(StreamItem const& item, std::vector<Rational> const& times)

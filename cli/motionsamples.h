@@ -1,5 +1,6 @@
 #pragma once
 
+#include "cli/selection.h"
 #include "cli/svg.h"
 #include "host/scene.h"
 
@@ -15,6 +16,7 @@ struct MotionKey {
     Place inEnd;  // where the tangents end; on the key itself where it has none
     Place outEnd;
     bool floats;
+    bool isEnd;  // the first or the last key of all
 };
 
 // The route between two keys as points, or a jump from the one to the other.
@@ -29,8 +31,8 @@ struct MotionSamples {
     std::vector<Point> speed;  // distance a second over seconds; a change at a key is two points at one time
 };
 
-// A spatial stream with keys, seen as a motion. Throws StoreError.
-MotionSamples SampleMotion(kfshost::StreamItem const& item, double pointsPerSecond);
+// A spatial stream with keys, seen as a motion, from the first to the last time of `part`. Throws StoreError.
+MotionSamples SampleMotion(kfshost::StreamItem const& item, TimeSpan const& part, double pointsPerSecond);
 
 // Where it is at these times.
 std::vector<Place> PlacesAt(kfshost::StreamItem const& item, std::vector<kfshost::Rational> const& times);

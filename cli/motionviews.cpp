@@ -23,14 +23,15 @@ constexpr double LabelHeight = 50.0;
 constexpr double Gap = 80.0;
 constexpr double MostWidth = PanelRight - PanelLeft;
 constexpr double MostHeightOfOne = 620.0;
-constexpr double LeastHeightOfOne = 240.0;
+constexpr double LeastHeightOfOne = 150.0;  // room for the notes of keys on a straight way
+constexpr double LeastWidthOfOne = 320.0;
 constexpr double MostHeightOfThree = 900.0;
 constexpr double TickDistance = 48.0;
 
 // The places of the panels come from the extents; each then shows as much as it has pixels for.
 class Layout {
 public:
-    Layout(Extents const& extents, double top) : extents_(extents), top_(top + CaptionHeight)
+    Layout(Extents const& extents, double top, std::string const& name) : extents_(extents), top_(top + CaptionHeight)
     {
         double size = 0.0;
         for (std::size_t i = 0; i < 3; ++i) {
@@ -38,7 +39,7 @@ public:
             extent_[i] = extents.high[i] - extents.low[i];
         }
         least_ = size == 0.0 ? 1.0 : size * LeastShare;
-        if (!std::isfinite(size * 4)) throw UserError("plot", "the numbers are too large to draw");
+        if (!std::isfinite(size * 4)) throw UserError(name, "the numbers are too large to draw");
     }
 
     MotionLayout Run()
@@ -62,7 +63,8 @@ private:
         double const unitsPerPixel = std::max({across / MostWidth, up / MostHeightOfOne, least_ / MostHeightOfOne});
         layout_.unitsPerPixel = unitsPerPixel;
         double const height = std::clamp(up / unitsPerPixel, LeastHeightOfOne, MostHeightOfOne);
-        Add(view, {PanelLeft, top_, MostWidth, height});
+        double const width = std::clamp(across / unitsPerPixel, LeastWidthOfOne, MostWidth);
+        Add(view, {PanelLeft, top_, width, height});
         layout_.height = CaptionHeight + height + LabelHeight;
     }
 
@@ -70,7 +72,8 @@ private:
     {
         double const width = (extent_[0] + extent_[2]) * Air;
         double const height = (extent_[1] + extent_[2]) * Air;
-        double const unitsPerPixel = std::max({width / (MostWidth - Gap), height / (MostHeightOfThree - Gap), least_});
+        double const unitsPerPixel =
+            std::max({width / (MostWidth - Gap), height / (MostHeightOfThree - Gap), least_ / MostHeightOfThree});
         layout_.unitsPerPixel = unitsPerPixel;
         auto const pixels = [&](std::size_t axis) { return extent_[axis] * Air / unitsPerPixel; };
         Add(Front, {PanelLeft, top_, pixels(0), pixels(1)});
@@ -109,7 +112,7 @@ private:
 
 }  // namespace
 
-MotionLayout LayOutViews(Extents const& extents, double top)
+MotionLayout LayOutViews(Extents const& extents, double top, std::string const& name)
 {
-    return Layout(extents, top).Run();
+    return Layout(extents, top, name).Run();
 }

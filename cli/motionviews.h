@@ -44,6 +44,6 @@ struct Extents {
 };
 
 // The view that shows most, or three where the motion makes notable use of all of space: from the front, beside it from
-// the side and below it from above, each the way it is folded over. `top` is where captions begin. Throws UserError for
-// numbers that are too large.
-MotionLayout LayOutViews(Extents const& extents, double top);
+// the side and below it from above, each the way it is folded over. `top` is where captions begin. Throws UserError, with
+// the motion's name, for numbers that are too large.
+MotionLayout LayOutViews(Extents const& extents, double top, std::string const& name);

@@ -6,6 +6,10 @@
 
 #include <charconv>
 #include <climits>
+#include <cmath>
+#include <cstdio>
+
+using kfshost::Rational;
 
 namespace {
 
@@ -55,10 +59,24 @@ CLI::Option* AddOutput(CLI::App& command, std::string& output, std::string const
     return command.add_option("-o,--output", output, what)->required()->type_name(typeName);
 }
 
-kfshost::Rational ParseFps(std::string const& text)
+Rational ParseFps(std::string const& text)
 {
-    auto const fps = kfshost::Rational::Parse(text);
-    if (!fps || *fps <= kfshost::Rational())
+    auto const fps = Rational::Parse(text);
+    if (!fps || *fps <= Rational())
         throw UserError("--fps", '"' + text + "\" isn't a number of frames a second like 24 or 30000/1001");
+    for (int const whole : {24, 30, 48, 60, 120}) {
+        Rational const exact(whole * 1000, 1001);
+        if (*fps != exact && std::abs(fps->ToDouble() - exact.ToDouble()) < 0.005)
+            std::fprintf(stderr, "kfs: --fps %s is taken as it stands; the exact rate near it is %s\n", text.c_str(),
+                         exact.ToString().c_str());
+    }
     return *fps;
+}
+
+Rational ParseTime(std::string const& text, char const* option, Rational const& fps)
+{
+    bool const inFrames = text.ends_with('f');
+    auto const number = Rational::Parse(std::string_view(text).substr(0, text.size() - (inFrames ? 1 : 0)));
+    if (!number) throw UserError(option, '"' + text + "\" isn't a time: seconds like 0.5 or 1/24, or frames like 12f");
+    return inFrames ? *number / fps : *number;
 }

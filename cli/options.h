@@ -16,3 +16,6 @@ CLI::Option* AddOutput(CLI::App& command, std::string& output, std::string const
 
 // "24" or "30000/1001", above 0. Throws UserError.
 kfshost::Rational ParseFps(std::string const& text);
+
+// Seconds like 0.5 or 1/24, or frames with an "f" behind. Throws UserError, with the option's name.
+kfshost::Rational ParseTime(std::string const& text, char const* option, kfshost::Rational const& fps);

@@ -1,6 +1,7 @@
 #include "cli/output.h"
 
 #include "cli/usererror.h"
+#include "frame/services/filewriter.h"
 
 #include <fmt/format.h>
 
@@ -9,26 +10,26 @@
 #include <cstring>
 #include <filesystem>
 
-#include <unistd.h>
-
-namespace {
-
-bool WriteAndClose(std::FILE* file, std::string_view text)
-{
-    bool const written = std::fwrite(text.data(), 1, text.size(), file) == text.size();
-    return std::fclose(file) == 0 && written;
-}
-
-[[noreturn]] void Fail(std::string const& fileName)
-{
-    throw UserError(fileName, std::string("can't be written: ") + std::strerror(errno));
-}
-
-}  // namespace
-
 std::string Plural(std::size_t count, std::string_view one, std::string_view many)
 {
     return fmt::format("{} {}", count, count == 1 ? one : many);
+}
+
+std::string Shown(std::string_view text)
+{
+    std::string shown;
+    for (char const c : text) {
+        auto const code = static_cast<unsigned char>(c);
+        if (c == '\n')
+            shown += "\\n";
+        else if (c == '\t')
+            shown += "\\t";
+        else if (code < 0x20 || code == 0x7F)
+            shown += fmt::format("\\x{:02x}", code);
+        else
+            shown += c;
+    }
+    return shown;
 }
 
 void RefuseToOverwrite(std::string const& input, std::string const& output)
@@ -38,29 +39,22 @@ void RefuseToOverwrite(std::string const& input, std::string const& output)
         throw UserError("-o", '"' + output + "\" is the file that is read");
 }
 
-void WriteToStandardOutput(std::string_view text)
+void WriteToStandardOutput(std::string_view text, std::string const& done)
 {
-    if (std::fwrite(text.data(), 1, text.size(), stdout) != text.size() || std::fflush(stdout) != 0)
-        Fail("standard output");
+    if (std::fwrite(text.data(), 1, text.size(), stdout) == text.size() && std::fflush(stdout) == 0) return;
+    std::string const reason = std::strerror(errno);
+    throw UserError("standard output", "can't be written: " + reason + (done.empty() ? "" : " (" + done + ')'));
 }
 
-void WriteWholeFile(std::string const& fileName, std::string_view text)
+void WriteWholeFile(std::string const& fileName, std::string_view bytes)
 {
     if (fileName == "-") {
-        WriteToStandardOutput(text);
+        WriteToStandardOutput(bytes);
         return;
     }
-    std::error_code ignored;
-    auto const status = std::filesystem::status(fileName, ignored);
-    bool const isDevice = std::filesystem::exists(status) && !std::filesystem::is_regular_file(status);
-    std::string const target = isDevice ? fileName : fileName + ".part" + std::to_string(getpid());
-    std::FILE* const file = std::fopen(target.c_str(), "wb");
-    if (!file) Fail(fileName);
-    bool const written = WriteAndClose(file, text);
-    if (isDevice ? !written : !written || std::rename(target.c_str(), fileName.c_str()) != 0) {
-        int const reason = errno;
-        if (!isDevice) std::remove(target.c_str());
-        errno = reason;
-        Fail(fileName);
-    }
+    CKF_FileWriter file;
+    file.Create(fileName.c_str(), CKF_Target::FileOrStream);
+    file.Append(bytes.data(), bytes.size());
+    if (int const reason = file.Commit())
+        throw UserError(fileName, std::string("can't be written: ") + std::strerror(reason));
 }

@@ -18,8 +18,10 @@ struct TimeUnit {
     double leastStep;
 };
 TimeUnit MakeTimeUnit(DrawingOptions const& options);
-// The time axis for the keys of some streams.
-Axis MakeTimeAxis(TimeUnit const& unit, std::vector<kfshost::StreamItem const*> const& items);
+// Each animation has a time axis of its own, for those of its streams that are drawn, or for the part of it that is
+// asked for.
+Axis MakeTimeAxis(DrawingOptions const& options, std::vector<kfshost::StreamItem const*> const& drawn,
+                  std::string const& animation);
 
 // The end of a path that is too long for a title.
 std::string ShortenedPath(std::string const& path);

@@ -1,10 +1,7 @@
 #include "cli/command.h"
 #include "cli/errors.h"
 #include "cli/options.h"
-#include "cli/output.h"
-#include "host/projectfile.h"
-
-#include <fmt/format.h>
+#include "cli/projectoutput.h"
 
 namespace {
 
@@ -16,9 +13,8 @@ struct Options {
 // Through the tree and nothing else, so that what a file has comes out as this version writes it.
 int Run(Options const& options)
 {
-    kfshost::SaveProject(*ReadingFile(options.file, [&] { return kfshost::LoadProject(options.file); }),
-                         options.output);
-    WriteToStandardOutput(fmt::format("{}: saved\n", options.output));
+    WriteProject(*ReadingFile(options.file, [&] { return kfshost::LoadProject(options.file); }), options.output,
+                 "saved");
     return ExitDone;
 }
 

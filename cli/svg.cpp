@@ -15,7 +15,7 @@ std::string Escape(std::string_view text)
         case '<': escaped += "&lt;"; break;
         case '>': escaped += "&gt;"; break;
         case '"': escaped += "&quot;"; break;
-        default: escaped += c;
+        default: escaped += static_cast<unsigned char>(c) < 0x20 ? '?' : c;  // no others may stand in XML
         }
     }
     return escaped;
@@ -75,6 +75,17 @@ void Svg::Circle(Point center, double radius, std::string_view fill, Pen const& 
 {
     fmt::format_to(std::back_inserter(text_), "<circle cx=\"{:.2f}\" cy=\"{:.2f}\" r=\"{}\" fill=\"{}\" {}/>\n",
                    center.x, center.y, radius, fill, Stroke(border));
+}
+
+// Lines without length, whose round ends are the discs.
+void Svg::Dots(std::span<Point const> centers, double radius, std::string_view fill)
+{
+    if (centers.empty()) return;
+    text_ += "<path d=\"";
+    for (Point const& center : centers)
+        fmt::format_to(std::back_inserter(text_), "M{:.2f} {:.2f}h0", center.x, center.y);
+    fmt::format_to(std::back_inserter(text_), "\" fill=\"none\" stroke-linecap=\"round\" {}/>\n",
+                   Stroke({fill, 2 * radius}));
 }
 
 void Svg::Diamond(Point center, double radius, std::string_view fill, Pen const& border)

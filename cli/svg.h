@@ -35,6 +35,8 @@ public:
     // Nothing for fewer than two points.
     void Polyline(std::span<Point const> points, Pen const& pen);
     void Circle(Point center, double radius, std::string_view fill, Pen const& border);
+    // Many discs in one element.
+    void Dots(std::span<Point const> centers, double radius, std::string_view fill);
     // A square on its corner.
     void Diamond(Point center, double radius, std::string_view fill, Pen const& border);
     // The text stands on the line through `at`.

@@ -178,14 +178,41 @@ TEST(Kfs, PlotCopesWithWhatHasNoExtentAndWithTooMuchOfIt)
     }
     ExpectFailure(
         RunKfs({"plot", folder.Write("a.bvh", head + "Frames: 2\nFrame Time: 1\n1e308 1\n-1e308 1"), "-o", drawing}),
-        "plot: the numbers are too large to draw");
+        folder.Path("a.bvh") + ": motion/a/angles: the numbers are too large to draw");
     ExpectFailure(RunKfs({"plot", folder.Write("a.bvh", head + "Frames: 0\nFrame Time: 1"), "-o", drawing}),
                   folder.Path("a.bvh") + ": the chosen streams have no keys to draw");
+}
+
+// A hundred thousand keys that jump up and down: all extremes are there, in a file that can be looked at.
+TEST(Kfs, PlotOfManyKeysStaysSmall)
+{
+    ScratchFolder const folder;
+    std::string text = "HIERARCHY\nROOT a\n{\nCHANNELS 3 Xposition Yposition Zposition\n}\nMOTION\n"
+                       "Frames: 100000\nFrame Time: 0.01\n";
+    for (int i = 0; i < 100000; ++i) text += std::to_string(i * 7919 % 1000) + (i % 2 ? " 1 -3\n" : " 2 4\n");
+    std::string const file = folder.Write("a.bvh", text);
+    for (char const* kind : {"--frames", "--motion"}) {
+        std::string const svg = RunKfs({"plot", file, kind, "-o", "-"}).output;
+        EXPECT_GT(svg.size(), 50'000U) << kind;
+        EXPECT_LT(svg.size(), 2'000'000U) << kind;
+    }
+    std::string const part =
+        RunKfs({"plot", file, "--from", "1", "--to", "1.05", "--components", "Yposition", "-o", "-"}).output;
+    EXPECT_EQ(std::string::npos, part.find(">Xposition<"));
+    EXPECT_NE(std::string::npos, part.find(">Yposition<"));
+    EXPECT_NE(std::string::npos, part.find(">key<"));
 }
 
 TEST(Kfs, PlotWritesNothingWhenItFails)
 {
     ScratchFolder const folder;
+    ExpectFailure(RunKfs({"plot", Sample(), "-o", folder.Path("x.png")}),
+                  "-o: \"" + folder.Path("x.png") +
+                      "\" is no name for an SVG file, and no other kind is written; rsvg-convert makes others of one");
+    ExpectFailure(RunKfs({"plot", Sample(), "--fps", "nope", "-o", folder.Path("x.svg")}),
+                  "--fps: \"nope\" isn't a number of frames a second like 24 or 30000/1001");
+    ExpectFailure(RunKfs({"info", folder.Path("a\nb.gltf")}),
+                  folder.Path("a\\nb.gltf") + ": can't be opened: No such file or directory");
     std::string const drawing = folder.Write("old.svg", "an earlier drawing");
     ExpectFailure(RunKfs({"plot", Sample(), "--stream", "nothing", "-o", drawing}),
                   Sample() + ": --stream nothing: none of the 3 streams has such a path (kfs info lists them)");

@@ -6,6 +6,7 @@
 
 #include <cmath>
 #include <filesystem>
+#include <sstream>
 #include <string>
 #include <vector>
 
@@ -102,19 +103,19 @@ TEST(KfsMotion, InfoSaysWhatIsAPath)
 TEST(KfsMotion, TheDrawingHasItsMarks)
 {
     std::string const svg = DrawMotion(Sample());
-    EXPECT_EQ(5U + 1U, Count(svg, "<polyline"));  // five arcs, and the speed
-    EXPECT_EQ(12U + 1U, Count(svg, "<path"));
-    EXPECT_EQ(61U + 1U, Count(svg, "r=\"2.3\""));
+    EXPECT_EQ(1U + 1U, Count(svg, "<polyline"));  // five arcs in one, and the speed
+    EXPECT_EQ(12U + 1U, Count(svg, "Z\" "));
+    EXPECT_EQ(61U + 1U, Count(svg, "h0"));
     EXPECT_EQ(10U + 1U, Count(svg, "r=\"3.5\""));
     EXPECT_EQ(0U, Count(svg, "float key"));
-    for (char const* text : {"from the front", ">route<", ">every 1/24 s<", ">tangent<", ">1.25 s<", ">seconds<"})
+    for (char const* text : {"from the front", ">route<", ">each frame, 1/24 s<", ">tangent<", ">1.25 s<", ">seconds<"})
         EXPECT_EQ(1U, Count(svg, text)) << text;
 }
 
 TEST(KfsMotion, FloatKeysHaveAMarkOfTheirOwn)
 {
     std::string const svg = DrawMotion(Sample(), {"--rove"});
-    EXPECT_EQ(4U + 1U, Count(svg, "<path"));
+    EXPECT_EQ(4U + 1U, Count(svg, "Z\" "));
     EXPECT_EQ(8U + 1U, Count(svg, "r=\"5\""));
     EXPECT_EQ(1U, Count(svg, ">float key<"));
 }
@@ -138,6 +139,18 @@ TEST(KfsMotion, ItIsSeenFromTheSideThatShowsMost)
     }
 }
 
+// The corners of the route are no dips of the speed, which is one smooth hill.
+TEST(KfsMotion, TheSpeedOfRovingKeysIsSmooth)
+{
+    std::string const svg = DrawMotion(Sample(), {"--rove"});
+    std::istringstream points(svg.substr(svg.rfind("points=\"") + 8));
+    std::vector<double> heights;
+    for (double x = 0.0, y = 0.0; points >> x && points.ignore(1, ',') && points >> y;) heights.push_back(y);
+    ASSERT_GT(heights.size(), 100U);
+    for (std::size_t i = 2; i < heights.size(); ++i)
+        EXPECT_LT(std::abs(heights[i] - 2 * heights[i - 1] + heights[i - 2]), 0.5) << i;
+}
+
 // A frame a second for a thousand seconds: dots stand apart, and only the ends of so many keys are marked.
 TEST(KfsMotion, ManyKeysDontHideTheRoute)
 {
@@ -145,10 +158,10 @@ TEST(KfsMotion, ManyKeysDontHideTheRoute)
     std::vector<std::string> rows;
     for (int i = 0; i < 1000; ++i) rows.push_back(std::to_string(i) + " 0 0");
     std::string const svg = DrawMotion(folder.Write("a.bvh", Motion(rows)));
-    EXPECT_EQ(2U + 1U, Count(svg, "<path"));
+    EXPECT_EQ(4U + 1U, Count(svg, "Z\" "));
     EXPECT_EQ(1U, Count(svg, ">first, last key<"));
-    EXPECT_GT(Count(svg, "r=\"2.3\""), 50U);
-    EXPECT_LT(Count(svg, "r=\"2.3\""), 200U);
+    EXPECT_GT(Count(svg, "h0"), 50U);
+    EXPECT_LT(Count(svg, "h0"), 200U);
 }
 
 TEST(KfsMotion, CombinationsThatMeanNothingAreRefused)

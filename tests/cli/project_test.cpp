@@ -131,7 +131,11 @@ TEST_F(KfsProject, ImportingTwiceGivesTheSameBytes)
 
 TEST_F(KfsProject, WhatCannotBeDoneIsOneLine)
 {
-    ExpectFailure(RunKfs({"import", Sample, "-o", "-"}), "-o: a project goes into a file, not to the standard output");
+    EXPECT_TRUE(FileContent(project_) == RunKfs({"import", Sample, "-o", "-"}).output);
+    std::string const saved = folder_.Path("saved");
+    ExpectFailure(RunKfs({"import", Sample, "-o", saved}, "/dev/full"),
+                  "standard output: can't be written: No space left on device (" + saved + " was saved)");
+    EXPECT_TRUE(FileContent(project_) == FileContent(saved));
     std::string const copy = folder_.Write("copy.gltf", FileContent(Sample));
     ExpectFailure(RunKfs({"import", project_, "-o", folder_.Path("new")}), project_ + ": this is a project already");
     ExpectFailure(RunKfs({"import", copy, "-o", copy}), "-o: \"" + copy + "\" is the file that is read");
