@@ -3,6 +3,7 @@
 # nothing of the library. What a host sees of libkfs itself is tested by tests/consumer.
 
 find_package(GTest REQUIRED)
+find_package(rapidcheck REQUIRED)
 include(GoogleTest)
 
 add_library(kfs_test_base STATIC tests/support/places.cpp)
@@ -13,7 +14,7 @@ if(TARGET kfs_cli)
 endif()
 target_compile_features(kfs_test_base PUBLIC cxx_std_20)
 target_include_directories(kfs_test_base PUBLIC "${PROJECT_SOURCE_DIR}")
-target_link_libraries(kfs_test_base PUBLIC GTest::gtest_main GTest::gtest)
+target_link_libraries(kfs_test_base PUBLIC GTest::gtest_main GTest::gtest rapidcheck)
 
 # The targets with label `threads`, for builds that need nothing else.
 add_custom_target(thread_tests)

@@ -54,21 +54,6 @@ int FromDisk(KFS_Stream* stream, int itemSize, std::vector<std::string> const& i
     return code;
 }
 
-TEST_F(KeyRecords, PlainRecordsByteByByte)
-{
-    TestStream stream({.dimension = 2});
-    stream.Key(-2, {1.5, -2.0}, KFS_Interp_Linear, KFS_Interp_Hold).Key(600, {3.0, 4.0});
-    stream.Record(0)->flags = 0x0016;
-    KFSp_TemporalRuns<double> runs = KFSp_GetTemporalRuns(stream.Record(0), 2);
-    std::vector<double> const numbers{1.5, -2.0, 10, 11, 0.25, 0.5, 20, 21, 0.75, 1};
-    std::copy(numbers.begin(), numbers.end(), runs.value);
-    std::vector<std::string> const items = ToDisk(stream);
-    ASSERT_EQ(2u, items.size());
-    EXPECT_EQ(KeyHead(-2, 1, 3, 0x16) + Doubles(numbers), items[0]);
-    EXPECT_EQ(88u, items[1].size());
-    EXPECT_EQ(Long(600), items[1].substr(0, 4));
-}
-
 TEST_F(KeyRecords, SpatialRecordsHaveNoArcTable)
 {
     TestStream stream({.dimension = 2, .spatial = true});
@@ -236,21 +221,6 @@ TEST_F(KeyRecords, AStreamOfPointersTakesRecordsOfAnySize)
             EXPECT_EQ(size < 4 ? 0x01000000 : 0x01010101, static_cast<KFS_KeyScalar const*>(key)->time);
             EXPECT_EQ(size > (spatial ? 76 : 16) ? 1u : 0u, reports.Take().size());
         }
-    }
-}
-
-TEST_F(KeyRecords, TheSwapsUndoThemselves)
-{
-    for (bool const spatial : {false, true}) {
-        TestStream stream({.dimension = 2, .spatial = spatial});
-        stream.Key(0, {1, 2}).Key(10, {3, 4});
-        std::vector<unsigned char> const before = stream.Bytes();
-        for (int i = 0; i < 2; ++i) EXPECT_EQ(0, KFSp_KeyScalarDataSwap(stream, stream.Record(i)));
-        EXPECT_NE(before, stream.Bytes());
-        EXPECT_EQ(MemoryFile::Hex(Span(Double(3))),
-                  MemoryFile::Hex({static_cast<unsigned char const*>(KFSp_ValueData(stream.Record(1))), 8}));
-        for (int i = 0; i < 2; ++i) EXPECT_EQ(0, KFSp_KeyScalarDataSwap(stream, stream.Record(i)));
-        EXPECT_EQ(before, stream.Bytes());
     }
 }
 

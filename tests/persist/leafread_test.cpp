@@ -83,38 +83,6 @@ TEST_F(LeafRead, AConstantByHand)
     EXPECT_EQ(2.5, stream.At1(0));
 }
 
-TEST_F(LeafRead, ASpatialConstantByHand)
-{
-    LeafRecord record;
-    record.Dimension(2).Flags(KFS_StreamFlag_NoKeys | KFS_StreamFlag_Spatial).Put(72, Long(5)).Put(78, Short(0x18));
-    record.Put(80, Long(0x0A0B0C0D)).Put(84, Doubles({1.5, 0.25, 2.5, 0.75}));
-    TestStream stream;
-    ASSERT_EQ(0, ReadLeaf(stream, Form(Leaf(record, Value({3, 4, 5, 6, 7, 8})))));
-    KFS_KeyScalar const* const cache = stream->GetCache();
-    EXPECT_EQ(0x18 | KFS_KeyFlag_SpatialBlock, cache->flags);
-    EXPECT_EQ(0x0A0B0C0Du, cache->spFlags);
-    EXPECT_EQ(1.5, cache->inSpeed);
-    EXPECT_EQ(0.25, cache->inInfluence);
-    EXPECT_EQ(2.5, cache->outSpeed);
-    EXPECT_EQ(0.75, cache->outInfluence);
-    EXPECT_EQ(nullptr, cache->remapTable);
-    EXPECT_EQ((std::vector<double>{3, 4, 5, 6, 7, 8}),
-              (std::vector<double>{KFSp_Numbers(cache), KFSp_Numbers(cache) + 6}));
-}
-
-TEST_F(LeafRead, KeysByHand)
-{
-    TestStream stream;
-    ASSERT_EQ(0, ReadLeaf(stream, Form(Leaf(LeafRecord().Flags(0).HasList(), TwoKeys))));
-    EXPECT_EQ((std::vector<int>{0, 100}), stream.Times());
-    EXPECT_EQ((std::array<int, 2>{0, 1}), stream.Stale());
-    EXPECT_EQ((std::array<int, 2>{0, 1}), stream.ArcStale());
-    EXPECT_TRUE(stream.CacheIsEmpty());
-    EXPECT_EQ(1.5, stream.At1(25));
-    stream.Key(50, {10.0});  // the list's functions and owner are in place
-    EXPECT_EQ(5.5, stream.At1(25));
-}
-
 // A short record ends in zeros; of a long one the front counts.
 TEST_F(LeafRead, RecordsOfOtherLengths)
 {
@@ -224,19 +192,6 @@ TEST_F(LeafRead, ADerivedClassKeepsItsSpatialFlag)
         EXPECT_EQ(42.0, stream.Value());
         EXPECT_EQ(Text("time"), KFS_GetStreamExpression(&stream));
     }
-}
-
-TEST_F(LeafRead, AConstantMayOwnAList)
-{
-    TestStream stream;
-    ASSERT_EQ(0, ReadLeaf(stream, Form(Leaf(LeafRecord().HasList(), OneValue + TwoKeys))));
-    EXPECT_EQ(2, stream.Count());
-    EXPECT_EQ(2.5, stream.At1(50));
-    EXPECT_EQ(TestStream::NotStale, stream.Stale());
-    TestStream again;
-    ASSERT_EQ(0, ReadLeaf(again, Written(stream)));
-    EXPECT_EQ(stream.Bytes(), again.Bytes());
-    EXPECT_EQ(2.5, again.At1(50));
 }
 
 TEST_F(LeafRead, APropertyThatDoesNotAnimateBecomesConstant)
@@ -460,41 +415,6 @@ TEST_F(LeafRead, WrittenAndReadBack)
         for (int time = -5; count > 0 && time < 210; time += 7) EXPECT_EQ(stream.At(time), other.At(time)) << time;
         EXPECT_EQ(KFS_GetStreamExpression(stream), KFS_GetStreamExpression(other));
     }
-}
-
-TEST_F(LeafRead, EveryAllocationMayFail)
-{
-    LeafRecord record;
-    record.Dimension(2).Flags(KFS_StreamFlag_Spatial).HasList().HasExpression();
-    std::string const key = KeyHead(0, 1, 1, 1) + std::string(48, '\0') + Doubles({1, 2, 3, 4, 5, 6});
-    std::string const file =
-        Form(Leaf(record, Keys(104, {key}) + Atom("Utf8", "an expression that is longer than a short string")));
-    int const failures = FailEveryAllocation(
-        [] {
-            auto stream = std::make_unique<TestStream>(StreamOptions{.dimension = 3});
-            stream->Key(0, {1, 2, 3});
-            return stream;
-        },
-        [&](TestStream& stream) {
-            CKF_File open;
-            KFSp_ThrowIf(open.Open(Span(file)));
-            try {
-                return Thrown([&] { stream->Read(&open, nullptr); });
-            } catch (std::exception const& exception) {
-                ADD_FAILURE() << "not a code: " << exception.what();
-                return 4;
-            }
-        },
-        [&](TestStream& stream, int, Q_MemoryCount const&) {
-            static_cast<void>(reports.Take());
-            EXPECT_EQ(0, stream.Pins());
-            std::vector<double> value(static_cast<std::size_t>(stream->GetDimension()));
-            T_Time const at{0, 600};
-            static_cast<void>(KFS_GetValueFPlus(stream, &at, 0, value.data(), nullptr, nullptr));
-            static_cast<void>(reports.Take());
-            EXPECT_EQ(0, ReadLeaf(stream, file)) << "it can be tried again";
-        });
-    EXPECT_LT(2, failures);
 }
 
 TEST_F(LeafRead, Expressions)

@@ -11,16 +11,6 @@ namespace {
 
 using Lines = std::vector<std::string>;
 
-TEST_F(Tree, AnUntouchedGroupCostsItsSubgroups)
-{
-    auto const node = MakeNode();
-    EXPECT_EQ((Lines{"transform"}), NamesIn(WrittenGroup(node.get())));
-    MemoryFile const layers = WrittenGroup(MakeLayers().get());
-    EXPECT_EQ((Lines{"LIST kfgp", "  kfsb 00000001", "  kfsn " + MemoryFile::Hex(Span("layers")),
-                     "  kfmn " + MemoryFile::Hex(Span(MatchName("ZQVM Group End").substr(8)))}),
-              layers.Lines());
-}
-
 struct Edit {
     char const* what;
     std::function<void(KFS_StreamBase*)> make;
@@ -51,22 +41,6 @@ TEST_F(Tree, LeavesThatDifferAreWritten)
         {"parameter's name",
          [&](KFS_StreamBase* leaf) {
              setParam(leaf, [](FX_ParamDef& def) { def.paramType = FX_Param_COLOR, def.name[0] = 'p'; });
-         },
-         true},
-        {"range",
-         [&](KFS_StreamBase* leaf) {
-             setParam(leaf, [](FX_ParamDef& def) {
-                 def.paramType = FX_Param_FLOAT_SLIDER;
-                 def.value.floatSlider.sliderMin = -5;
-             });
-         },
-         true},
-        {"a range of NaN",
-         [&](KFS_StreamBase* leaf) {
-             setParam(leaf, [](FX_ParamDef& def) {
-                 def.paramType = FX_Param_FLOAT_SLIDER;
-                 def.value.floatSlider.sliderMax = std::numeric_limits<float>::quiet_NaN();
-             });
          },
          true},
     };
@@ -103,15 +77,6 @@ TEST_F(Tree, RangesThatDifferAreWritten)
         Lines const expected = c.isWritten ? Lines{"opacity", "transform"} : Lines{"transform"};
         EXPECT_EQ(expected, NamesIn(WrittenGroup(node.get())));
     }
-}
-
-TEST_F(Tree, ChildrenOfIndexedGroupsAreAllWritten)
-{
-    auto const layers = MakeLayers();
-    Append(layers.get(), "opacity");
-    Append(layers.get(), "node");
-    Append(layers.get(), "opacity");
-    EXPECT_EQ((Lines{"opacity", "node", " transform", "opacity"}), NamesIn(WrittenGroup(layers.get())));
 }
 
 TEST_F(Tree, WhatOldFilesDontKnowIsLeftOut)
@@ -253,38 +218,6 @@ TEST_F(Tree, NamesThatNobodyElseKnows)
         }
     }
     batch.UnregisterAll();
-}
-
-TEST_F(Tree, ASceneThereAndBack)
-{
-    auto const layers = MakeLayers();
-    auto* const node = static_cast<KFS_NamedStreamGroup*>(Append(layers.get(), "node"));
-    SetValue(node->GetEditableStream(Name("position")), 3.0);
-    node->SetDisplayName(Text("Camera"));
-    node->SetHidden(true);
-    auto* const transform = node->GetEditableStream(Name("transform"))->GetAsNamedGroup();
-    SetValue(transform->GetEditableStream(Name("anchor")), 4.0);
-    auto* const inner = Append(layers.get(), "layers")->GetAsIndexedGroup();
-    SetValue(Append(inner, "opacity"), 50.0);
-    SetValue(Append(layers.get(), "opacity"), 60.0);
-
-    MemoryFile const file = WrittenGroup(layers.get());
-    EXPECT_EQ((Lines{"node", " transform", "  anchor", " position", "layers", " opacity", "opacity"}), NamesIn(file));
-    auto const other = MakeLayers();
-    ASSERT_EQ(0, ReadGroup(other.get(), file));
-    EXPECT_EQ(file.Bytes(), WrittenGroup(other.get()).Bytes());
-    ASSERT_EQ(3u, other->GetNumStreams());
-    EXPECT_TRUE(other->GetStream(0)->IsHidden());
-    EXPECT_EQ(Text("Camera"), other->GetStream(0)->GetDisplayName());
-    KFS_NamedStreamGroup const* const otherNode = other->GetStream(0)->GetAsNamedGroup();
-    EXPECT_EQ(3.0, ValueOf(otherNode->GetStream(Name("position"), true)));
-    EXPECT_EQ(nullptr, otherNode->GetEditableStreamNullOK(Name("rotation"))) << "still shared";
-    EXPECT_EQ(
-        4.0,
-        ValueOf(otherNode->GetStream(Name("transform"), true)->GetAsNamedGroup()->GetStream(Name("anchor"), true)));
-    EXPECT_EQ(50.0, ValueOf(other->GetStream(1)->GetAsGroup()->GetStream(0)));
-    EXPECT_EQ(60.0, ValueOf(other->GetStream(2)));
-    EXPECT_EQ(other.get(), other->GetStream(2)->GetParent());
 }
 
 TEST_F(Tree, UnknownChildren)

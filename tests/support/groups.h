@@ -141,13 +141,19 @@ public:
     template <class G>
     void Group(char const* name, std::vector<KFS_MatchName> const& kinds)
     {
+        Deferred<G>(name, kinds);
+        Get_VX_StreamFactory()->SetupCanonicalStream(Name(name));
+    }
+    // The caller sets the layout up once all its kinds are registered.
+    template <class G>
+    void Deferred(char const* name, std::vector<KFS_MatchName> const& kinds)
+    {
         batch_.Register(
             Name(name),
             [=](KFS_MatchName const& kind, KFS_StreamFactory* factory, bool, unsigned int, bool canonical) {
                 return new G(kind, factory, canonical, kinds);
             },
             true);
-        Get_VX_StreamFactory()->SetupCanonicalStream(Name(name));
     }
 
     // A new real stream of a kind, a leaf being constant.

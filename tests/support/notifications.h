@@ -74,17 +74,22 @@ public:
     // What to add to each record: how the tree looks from inside the notification. The group is null where there is
     // none. May throw.
     std::function<std::string(KFS_StreamGroup* group, KFS_StreamBase const* stream)> look;
+    // Names a stream in place of the labels, if set.
+    std::function<std::string(KFS_StreamBase const*)> called;
 
 private:
     std::string Called(KFS_StreamBase const* stream) const
     {
+        if (called) return called(stream);
         auto const found = labels_.find(stream);
         return found != labels_.end() ? found->second : NameOf(stream);
     }
     void Child(char const* what, KFS_StreamGroup* group, KFS_StreamBase const* stream, unsigned int index,
                std::string const& more = {})
     {
-        Hear(what + (" " + Called(group)) + " " + Called(stream) + " " + std::to_string(index) + more, group, stream);
+        std::string text = std::string(what) + " " + Called(group) + " ";  // the group is named first
+        text += Called(stream) + " " + std::to_string(index) + more;
+        Hear(std::move(text), group, stream);
     }
     void Hear(std::string text, KFS_StreamGroup* group, KFS_StreamBase const* stream)
     {

@@ -64,36 +64,6 @@ TEST_F(Capsule, IdsStayWhatTheyWereWhenFirstAsked)
     EXPECT_EQ(Text("node{}"), clone->GetStreamCapsuleData().id) << "a copy stands elsewhere";
 }
 
-// Two ways to name a place have to agree, for every stream of a tree.
-TEST_F(Capsule, APathLeadsBackToItsStream)
-{
-    for (int i = 0; i < 3; ++i) {
-        Q_ScAutoPtr<KFS_StreamBase> inner = TestKinds::Make("layers");
-        KFS_IndexedStreamGroup* const layers = root_.GetEditableStream(root_.AppendStream(&inner))->GetAsIndexedGroup();
-        for (int j = 0; j <= i; ++j) {
-            KFS_NamedStreamGroup* const node = AddNode(*layers);
-            node->GetEditableStream(Name(j % 2 ? "position" : "opacity"));
-            Transform(node)->GetEditableStream(Name("anchor"));
-        }
-    }
-    int leaves = 0;
-    auto const visit = [&](KFS_Stream* leaf) {
-        ++leaves;
-        for (KFS_StreamBase* stream = leaf; stream->GetParent(); stream = stream->GetParent()) {
-            KFS_StreamIDPath const path = PathOf(stream);
-            EXPECT_EQ(stream, root_.FindStream(path));
-            EXPECT_EQ(stream, root_.FindEditableStream(path));
-            KFS_StreamIDPath read;
-            read.SetFrom_JSON(path.GetAs_JSON());
-            EXPECT_EQ(stream, root_.FindStream(read));
-            EXPECT_TRUE(PathOf(stream->GetParent()).IsPrefixOf(path));
-        }
-    };
-    root_.ForEachNonCanonicalLeafStream(visit, nullptr);
-    EXPECT_EQ(12, leaves);
-    EXPECT_EQ(&root_, root_.FindStream(PathOf(&root_)));
-}
-
 TEST_F(Capsule, ManyThreadsMayAskFirst)
 {
     KFS_StreamBase const* const scale = Transform(AddNode(root_))->GetEditableStream(Name("scale"));

@@ -87,27 +87,6 @@ TEST_F(Factory, AKindWhoseFunctionGivesNothingIsUnknownAndDoesntRegister)
     EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("void")));
 }
 
-TEST_F(Factory, ALeafIsMadeWithItsDefault)
-{
-    kinds.Leaf("blur", 1, 7.0);
-    for (bool const constant : {true, false}) {
-        unsigned int const timeScale = constant ? 600 : 24;
-        Q_ScAutoPtr<KFS_StreamBase> const made(factory.CreateStream(Name("blur"), constant, timeScale, true, false));
-        auto const* const leaf = static_cast<TestLeaf*>(made.get());
-        EXPECT_FALSE(leaf->IsCanonical());
-        EXPECT_EQ(&factory, leaf->GetFactory());
-        EXPECT_EQ(timeScale, leaf->GetTimeScale());
-        EXPECT_EQ(constant, leaf->HasNoKeys());
-        EXPECT_EQ(7.0, leaf->ValueAt(100));
-        EXPECT_EQ(constant, leaf->GetKeys() == nullptr);
-        if (constant) continue;
-        ASSERT_EQ(1, leaf->GetKeyCount());
-        void const* key = nullptr;
-        ASSERT_EQ(0, SEQ_GetConstAddress(leaf->GetKeys(), 0, &key));
-        EXPECT_EQ(0, static_cast<KFS_KeyScalar const*>(key)->time);
-    }
-}
-
 TEST_F(Factory, AKindRegisteredAsAnObjectIsClonedFromIt)
 {
     auto* const object = new TestLeaf(Name("glow"), &factory, true, 600, false, 1, 7.0);
@@ -130,29 +109,6 @@ TEST_F(Factory, AKindRegisteredAsAnObjectIsClonedFromIt)
     EXPECT_TRUE(factory.UnregisterCanonicalInstance(object));
     EXPECT_EQ(nullptr, factory.GetCanonicalInstance(Name("glow")));
     EXPECT_EQ(nullptr, factory.CreateStream(Name("glow"), true, 600, false, false));
-}
-
-// Its children are registered after it, and it holds its own kind.
-TEST_F(Factory, ADeferredLayoutMayNameWhatComesLaterAndItself)
-{
-    auto const make = [](KFS_MatchName const& name, KFS_StreamFactory* f, bool, unsigned int, bool canonical) {
-        return new TestNamedGroup(name, f, canonical, {Name("late"), Name("nest")});
-    };
-    EXPECT_TRUE(factory.RegisterFactoryFunc(Name("nest"), make, true));
-    EXPECT_TRUE(factory.RegisterFactoryFunc(Name("late"), LeafFunc(0.0), false));
-    factory.SetupCanonicalStream(Name("nest"));
-    {
-        auto const made = TestKinds::Make("nest");
-        KFS_StreamGroup const* level = made->GetAsGroup();
-        for (int depth = 0; depth < 5; ++depth) {
-            ASSERT_EQ(2u, level->GetNumStreams());
-            EXPECT_EQ("late", NameOf(level->GetStream(0)));
-            level = level->GetStream(1)->GetAsGroup();
-        }
-        EXPECT_EQ(factory.GetCanonicalStream(Name("nest")), level);
-    }
-    EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("late"))) << "before the group that names it";
-    EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("nest")));
 }
 
 TEST_F(Factory, ABatchUnregistersBackwardsAndOnlyWhatItRegistered)

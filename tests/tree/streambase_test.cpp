@@ -107,30 +107,6 @@ TEST_F(StreamBase, FlagAccessorsHoldTheirBits)
     }
 }
 
-TEST_F(StreamBase, WalksUpToTheRoot)
-{
-    Group root, middle;
-    TestStream const leaf;
-    root.Store(&middle);
-    middle.Store(leaf);
-    EXPECT_EQ(&root, leaf->GetRoot());
-    EXPECT_EQ(nullptr, root.GetRoot()) << "a root isn't its own root";
-    EXPECT_EQ(nullptr, root.GetProject());
-    unsigned int depth = 77;
-    EXPECT_TRUE(leaf->IsChildOf(&root, &depth));
-    EXPECT_EQ(2u, depth);
-    EXPECT_TRUE(leaf->IsChildOf(&middle, nullptr));
-    EXPECT_FALSE(leaf->IsChildOf(nullptr, &depth));
-    EXPECT_FALSE(root.IsChildOf(&middle, nullptr));
-    EXPECT_TRUE(leaf->AreAllParentsActive());
-    middle.SetActive(false);
-    EXPECT_FALSE(leaf->AreAllParentsActive());
-    EXPECT_TRUE(middle.AreAllParentsActive());
-    EXPECT_FALSE(leaf->IsHiddenByAncestor());
-    root.SetHidden(true);
-    EXPECT_TRUE(leaf->IsHiddenByAncestor());
-}
-
 TEST_F(StreamBase, ARealStreamHasItsRootsProjectAndACanonicalOneTheCurrent)
 {
     kfshost::Project other;
@@ -145,21 +121,6 @@ TEST_F(StreamBase, ARealStreamHasItsRootsProjectAndACanonicalOneTheCurrent)
     leaf->SetCanonical(true);
     EXPECT_EQ(&session.GetProject(), KFS_GetProject(leaf, false));
     EXPECT_EQ(&session.GetProject(), KFS_GetConstProject(constLeaf, true));
-}
-
-TEST_F(StreamBase, AnArrivingTreeTakesTheScaleOfItsPlace)
-{
-    Group root(30), arriving;
-    TestStream leaf, canonical;
-    leaf.Key(600, {1.0}).Key(1200, {2.0});
-    canonical->SetCanonical(true);
-    arriving.Store(leaf);
-    arriving.Store(canonical);
-    EXPECT_EQ(600u, leaf->GetTimeScale()) << "the scale of a root without a parent";
-    root.Store(&arriving);
-    EXPECT_EQ(30u, leaf->GetTimeScale());
-    EXPECT_EQ((std::vector{30, 60}), leaf.Times());
-    EXPECT_EQ(600u, canonical->GetTimeScale()) << "canonical leaves stay";
 }
 
 TEST_F(StreamBase, AncestorsHearOfAStoredStreamOnce)

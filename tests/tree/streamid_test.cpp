@@ -109,24 +109,6 @@ TEST(StreamID, ChunksAreTheseBytes)
     });
 }
 
-TEST(StreamID, IsReadAmongChunksOfLaterVersions)
-{
-    MemoryFile const file([](CKF_File* out) {
-        CKF_WriteAtom(out, CKF_Id("new1"), 3, "abc");
-        const CKF_ScWriteList list(out, CKF_Id("kfsi"), 0);
-        CKF_WriteAtom(out, CKF_Id("new2"), 5, "abcde");
-        KFSp_WriteLong(out, CKF_Id("kfix"), 8);
-        Name("opacity").Write(out);
-        CKF_WriteAtom(out, CKF_Id("new3"), 1, "a");
-    });
-    file.Read([](CKF_File* in) {
-        KFS_StreamID id;
-        id.Read(in, nullptr);
-        EXPECT_EQ(8u, id.GetIndex());
-        EXPECT_EQ(Name("opacity"), id.GetMatchName());
-    });
-}
-
 TEST(Longs, AreSignedAndBigEndian)
 {
     constexpr int Id = CKF_Id("long");

@@ -97,17 +97,6 @@ TEST_F(StreamPath, MayBeBuiltFromItself)
     EXPECT_EQ("aaaaaababaaaaa", Letters(path));
 }
 
-TEST_F(StreamPath, MovesSwap)
-{
-    KFS_StreamIDPath a = Names("abc"), b = Names("x");
-    a = std::move(b);
-    EXPECT_EQ("x", Letters(a));
-    EXPECT_EQ("abc", Letters(b));
-    KFS_StreamIDPath const c(std::move(b));
-    EXPECT_EQ("abc", Letters(c));
-    EXPECT_TRUE(b.IsEmpty());
-}
-
 TEST_F(StreamPath, AskedForWhatIsNotThereReportsAndThrows3)
 {
     const KFS_StreamIDPath empty, path = Names("ab");
@@ -221,33 +210,6 @@ TEST_F(StreamPath, JsonIsThisText)
     std::string const text = Q_UTF16ToMBString(ten.GetAs_JSON());
     EXPECT_EQ(0u, text.find(R"({"00":{"index":0,)")) << text;
     EXPECT_NE(std::string::npos, text.find(R"("09":{"index":9,)")) << "keys of equal width";
-}
-
-TEST_F(StreamPath, JsonComesBack)
-{
-    std::mt19937 random(5);
-    char const* const texts[] = {"position", "", "\xC3\xA9t\xC3\xA9", "\"", "0123456789012345678901234567890123456"};
-    for (int round = 0; round < 50; ++round) {
-        KFS_StreamIDPath path;
-        for (unsigned long length = random() % 13; length > 0; --length) {
-            unsigned int const index = random() % 3 == 0 ? KFS_StreamID::NoIndex : random() % 2000;
-            path.AddTail(KFS_StreamID(index, Name(texts[random() % std::size(texts)])));
-        }
-        KFS_StreamIDPath back;
-        back.SetFrom_JSON(path.GetAs_JSON());
-        EXPECT_TRUE(Same(path, back)) << Q_UTF16ToMBString(path.GetAs_JSON());
-        EXPECT_EQ(UidHex(path), UidHex(back));
-    }
-}
-
-TEST_F(StreamPath, JsonIsAppendedInTheOrderOfItsEntries)
-{
-    KFS_StreamIDPath path = Names("a");
-    path.SetFrom_JSON(
-        Text(R"( {"9": {"matchName": "b", "index": "7", "more": {"x": 1}}, "1": {"index": 2, "matchName": "c"}} )"));
-    EXPECT_EQ("abc", Letters(path));
-    EXPECT_EQ(7u, path.GetComponent(1).GetIndex());
-    EXPECT_EQ(2u, path.GetComponent(2).GetIndex());
 }
 
 TEST_F(StreamPath, JsonThatIsNoPathLeavesThePathAlone)
@@ -378,49 +340,6 @@ TEST_F(StreamPath, ALengthIsOnlyAClaim)
         KFS_StreamIDPath path = Names("x");
         FileWithHead(-1, length, "ab").Read([&](CKF_File* in) { path.Read(in, nullptr); });
         EXPECT_TRUE(path.IsEmpty());
-    }
-}
-
-TEST_F(StreamPath, EveryTruncatedOrDamagedFileIsAnswered)
-{
-    const MemoryFile whole([](CKF_File* out) { Names("abc").Write(out); });
-    auto const tryToRead = [](std::vector<unsigned char> const& bytes) {
-        KFS_StreamIDPath path;
-        CKF_File file;
-        return KFSp_Boundary([&] {
-            KFSp_ThrowIf(file.Open(bytes));
-            path.Read(&file, nullptr);
-        });
-    };
-    ASSERT_EQ(0, tryToRead(whole.Bytes()));
-    for (std::size_t size = 0; size < whole.Bytes().size(); ++size) {
-        std::vector<unsigned char> bytes(whole.Bytes().begin(), whole.Bytes().begin() + static_cast<long>(size));
-        EXPECT_NE(0, tryToRead(bytes)) << size;
-    }
-    for (std::size_t at = 0; at < whole.Bytes().size(); ++at) {
-        for (int const bit : {0, 3, 7}) {
-            std::vector<unsigned char> bytes = whole.Bytes();
-            bytes[at] = static_cast<unsigned char>(bytes[at] ^ (1 << bit));
-            tryToRead(bytes);  // an answer, whichever; sanitizers look on
-        }
-    }
-    reports_.Take();
-}
-
-TEST_F(StreamPath, AWriteThatFailsAnywhereThrows)
-{
-    for (int n = 1;; ++n) {
-        ASSERT_LT(n, 200);
-        FailNthAppend hook(n);
-        CKF_File file;
-        int code = file.CreateInMemory(&hook);
-        if (code == 0) code = KFSp_Boundary([&] { Names("abc").Write(&file); });
-        if (code == 0) code = file.Commit();  // the last list's length is put right behind its scope
-        EXPECT_EQ(hook.Fired() ? CKF_Err_Io : 0, code) << n;
-        if (!hook.Fired()) {
-            EXPECT_GT(n, 10);
-            break;
-        }
     }
 }
 
