@@ -125,8 +125,9 @@ int KFSp_InterpolateBetween(KFS_Stream const* stream, KFS_KeyScalar const* a, KF
     switch (KFSp_GetSegmentKind(a->outInterp, b->inInterp)) {
     case KFSp_SegmentKind::Linear: InterpolateLinear(stream->GetDimension(), segment, time, result); return 0;
     case KFSp_SegmentKind::Curved: return EvaluateCurved(stream, segment, time, result);
-    case KFSp_SegmentKind::Hold:
-    case KFSp_SegmentKind::Other: break;
+    // Codes without a shape hold, so that no read answers what the record held before.
+    case KFSp_SegmentKind::Other: std::copy_n(KFSp_Numbers(a), stream->GetDimension(), result); return 0;
+    case KFSp_SegmentKind::Hold: break;
     }
     std::copy_n(KFSp_Numbers(a), std::max<int>(stream->GetDimension(), 0), result);
     return 0;

@@ -137,7 +137,9 @@ int Reinsert(Move* move)
     if (!KFSp_CacheIsEmpty(cache)) cache->time = move->target;
     if (removed != 0) return removed;
     KFSp_FirstError error;
-    error.Keep(KFSp_PutKeyFromCache(1, 1, 1, 1, move->stream, &move->newIndex));
+    error.Keep(KFSp_PutKeyFromCache(move->stream,
+                                    {.overwrite = true, .valueGiven = true, .tangentsGiven = true, .clearCache = true},
+                                    &move->newIndex));
     bool const inserted = error.None();
     error.Keep(Notify(move->stream));
     if (inserted && error.None()) error.Keep(Notify(move->stream));

@@ -1,3 +1,5 @@
+// Operations on a stream as a whole that change no key.
+
 #include "keystore/attributes.h"
 
 #include "frame/boundary_private.h"
@@ -6,21 +8,18 @@
 #include "keystore/cache_private.h"
 #include "keystore/check_private.h"
 #include "keystore/items_private.h"
+#include "keystore/keylist_private.h"
 
-#include <climits>
 #include <cmath>
 
 namespace {
 
-// Marks every key with one of the two marking operations, whose reach is a short.
-int MarkAllKeys(KFS_Stream const* stream, int (KFS_Stream::*mark)(int, short) const)
+void MarkAllKeys(KFS_Stream const* stream)
 {
-    int const count = stream->GetKeyCount();
-    if (count <= SHRT_MAX) return (stream->*mark)(-1, static_cast<short>(count));
-    KFSp_FirstError error;
-    error.Keep((stream->*mark)(-1, SHRT_MAX));
-    error.Keep((stream->*mark)(0, 1));  // a range holds all that lies between its ends
-    return error.Code();
+    KFS_StreamKeyData* const data = stream->GetKeyDataForModify();
+    int const count = stream->HasNoKeys() ? 0 : KFSp_ItemCount(data);
+    KFSp_MarkAllKeys(data->invalidKeyIndex, count);
+    KFSp_MarkAllKeys(data->arcInvalidKeyIndex, count);
 }
 
 // A value that was computed with what has just been changed isn't to be answered again. A constant's value stays.
@@ -87,10 +86,10 @@ int KFS_SetStreamSParametrize(KFS_Stream* stream, unsigned char on)
             return KFSp_ReportRow(KFSp_Op_SetSParametrize, KFS_Err_NotSpatial, KFSp_Row_StreamIsntSpatial);
         KFSp_FirstError error;
         if (stream->IsSParametrized() != (on != 0)) {
-            error.Keep(MarkAllKeys(stream, &KFS_Stream::SetArcInvalid));
-            error.Keep(MarkAllKeys(stream, &KFS_Stream::SetInvalid));
+            MarkAllKeys(stream);
             error.Keep(ForgetComputedValue(stream));
             stream->SetKFSFlags(stream->GetKFSFlags() ^ KFS_StreamFlag_SParametrize);
+            stream->ShowChangeInCopy();
         }
         return error.None() ? Notify(stream) : error.Code();
     });
@@ -102,6 +101,7 @@ int KFS_SetCustomFuncs(KFS_Stream* stream, KFS_CopyItemFunc copyItem, KFS_Dispos
         if (int const code = KFSp_CheckStream(KFSp_Op_SetCustomFuncs, stream, KFSp_Row_SetCustomFuncs)) return code;
         stream->SetCopyItemFunc(copyItem);
         stream->SetDisposeItemFunc(disposeItem);
+        stream->ShowChangeInCopy();
         return KFSp_SetKeyFuncs(stream);
     });
 }
@@ -140,8 +140,8 @@ int KFS_SetStreamMultiplier(KFS_Stream* stream, double const* newValue, double* 
             if (newValue) multiplier[i & 3] = newValue[i];
         }
         if (!newValue) return 0;
-        if (int const code = MarkAllKeys(stream, &KFS_Stream::SetInvalid)) return code;
-        if (int const code = MarkAllKeys(stream, &KFS_Stream::SetArcInvalid)) return code;
+        stream->ShowChangeInCopy();
+        MarkAllKeys(stream);
         if (int const code = ForgetComputedValue(stream)) return code;
         return Notify(stream);
     });

@@ -1,3 +1,5 @@
+// The cache record: made, emptied, filled, and brought to a time, which is the middle of every read.
+
 #include "keystore/cache_private.h"
 
 #include "frame/boundary_private.h"
@@ -28,19 +30,10 @@ int CopyKeyToCache(KFS_StreamKeyData const* data, int index)
     return code;
 }
 
-// What a request asks of the cache, beyond a value at a time.
-struct Request {
-    unsigned char keyOnly;
-    void const* value;
-    unsigned char* atKey;
-    KFS_InterpFunc* interpFunc;
-    long refcon;
-};
-
 // The common one asks for the value and nothing else. The compiler makes a shorter way of it.
 struct PlainRequest {
-    static constexpr unsigned char keyOnly = 0;
-    static constexpr bool value = true;
+    static constexpr bool keyOnly = false;
+    static constexpr bool wantsValue = true;
     static constexpr unsigned char* atKey = nullptr;
     static constexpr KFS_InterpFunc* interpFunc = nullptr;
     static constexpr long refcon = 0;
@@ -55,7 +48,9 @@ int InterpolateToCache(KFS_Stream const* stream, KFS_StreamKeyData const* data, 
         data->cache->time = KFS_INVALID_INDEX;
         return KFS_Err_InterpNotAllowed;
     }
-    int const code = func(stream, interpFunc ? refcon : stream->GetItemRefcon(), time, keyIndex);
+    bool const isOurs = func == KFSp_Interpolate || func == KFSp_InterpolateSpatial;
+    int const code =
+        func(isOurs ? stream : stream->GetOriginal(), interpFunc ? refcon : stream->GetItemRefcon(), time, keyIndex);
     data->cache->time = code == 0 ? time : KFS_INVALID_INDEX;
     return code;
 }
@@ -123,8 +118,8 @@ KFS_KeyScalar* KFS_Stream::CloneCache(KFS_KeyScalar const* source) const
     if (KFSp_HasSpatialBlock(clone)) clone->remapTable = nullptr;
     if (!KFSp_CacheIsEmpty(source) && copyItemFunc_) {
         int const code = KFSp_Boundary([&] {
-            return copyItemFunc_(this, GetItemRefcon(), KFS_Item_CacheWhole, KFSp_ValueData(source),
-                                 KFSp_ValueData(clone));
+            return copyItemFunc_(KFSp_HandedTo(copyItemFunc_, this), GetItemRefcon(), KFS_Item_CacheWhole,
+                                 KFSp_ValueData(source), KFSp_ValueData(clone));
         });
         if (code != 0) {
             Q_FreePtr(clone);
@@ -139,7 +134,7 @@ int KFSp_ClearCacheRecord(KFS_Stream const* stream, KFS_KeyScalar* cache)
     if (KFSp_CacheIsEmpty(cache)) return 0;
     int code = 0;
     if (KFS_DisposeItemFunc const dispose = stream->GetDisposeItemFunc())
-        code = dispose(stream, stream->GetItemRefcon(), KFS_Item_CacheWhole, KFSp_ValueData(cache));
+        code = dispose(stream->GetOriginal(), stream->GetItemRefcon(), KFS_Item_CacheWhole, KFSp_ValueData(cache));
     cache->time = KFS_INVALID_INDEX;
     return code;
 }
@@ -167,12 +162,6 @@ int KFSp_SetupCache(KFS_Stream const* stream, int time, void const* value, char 
     return copy(stream, 0, kind, value, KFSp_ValueData(cache));
 }
 
-void KFSp_UpdateStreamCacheToTime(KFS_Stream const* stream, int time, unsigned char keyOnly, void* value,
-                                  unsigned char* atKey, KFS_InterpFunc* interpFunc, long refcon)
-{
-    KFSp_UpdateCacheToTime(stream, stream->GetKeyData(), time, keyOnly, value, atKey, interpFunc, refcon);
-}
-
 namespace {
 
 template <class Request>
@@ -180,12 +169,11 @@ inline void UpdateCache(KFS_Stream const* stream, KFS_StreamKeyData const* data,
 {
     KFS_KeyScalar* const cache = data->cache;
     if (stream->HasNoKeys()) {
-        if (time != KFS_INVALID_INDEX)  // which would say that the constant has no value
-            cache->time = time;
+        KFSp_MoveConstant(data, time);
         if (request.atKey) *request.atKey = 1;
         return;
     }
-    bool const stands = !request.value || (cache->time == time && !KFSp_CacheIsEmpty(cache));
+    bool const stands = !request.wantsValue || (cache->time == time && !KFSp_CacheIsEmpty(cache));
     if (stands && !request.atKey) return;
     bool found = false;
     int index = 0;
@@ -212,10 +200,10 @@ inline void UpdateCache(KFS_Stream const* stream, KFS_StreamKeyData const* data,
 
 }  // namespace
 
-void KFSp_UpdateCacheToTime(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, unsigned char keyOnly,
-                            void const* value, unsigned char* atKey, KFS_InterpFunc* interpFunc, long refcon)
+void KFSp_UpdateCacheToTime(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time,
+                            KFSp_CacheRequest const& request)
 {
-    UpdateCache(stream, data, time, Request{keyOnly, value, atKey, interpFunc, refcon});
+    UpdateCache(stream, data, time, request);
 }
 
 void KFSp_UpdateCacheToTime(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time)

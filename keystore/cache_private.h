@@ -17,17 +17,18 @@ int KFSp_ClearCacheRecord(KFS_Stream const* stream, KFS_KeyScalar* cache);
 int KFSp_SetupCache(KFS_Stream const* stream, int time, void const* value, char inInterp, char outInterp, short kind,
                     unsigned char convert);
 
-// Brings the cache record to a time in the stream's scale. Throws an int.
-//
-//   keyOnly     only keys are wanted: between keys the cache stays empty.
-//   value       null: only `atKey` is wanted, the cache stands as it is.
-//   atKey       out or null: whether a key stands at the time; always on a stream without a list.
-//   interpFunc  null or the address of a function to interpolate with in place of the stream's; `refcon` goes with it.
-void KFSp_UpdateStreamCacheToTime(KFS_Stream const* stream, int time, unsigned char keyOnly, void* value,
-                                  unsigned char* atKey, KFS_InterpFunc* interpFunc, long refcon);
+// What is asked of the cache record.
+struct KFSp_CacheRequest {
+    bool keyOnly = false;            // only keys are wanted: between keys the cache stays empty
+    bool wantsValue = true;          // else only `atKey` is wanted, and the cache stands as it is
+    unsigned char* atKey = nullptr;  // out or null: whether a key stands at the time; always on a stream without a list
+    KFS_InterpFunc* interpFunc = nullptr;  // the address of a function to interpolate with in place of the stream's
+    long refcon = 0;                       // goes with it
+};
 
-// The same on key data that the caller has at hand.
-void KFSp_UpdateCacheToTime(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, unsigned char keyOnly,
-                            void const* value, unsigned char* atKey, KFS_InterpFunc* interpFunc, long refcon);
+// Brings the cache record of the key data at hand to a time in the stream's scale; `stream` is the stream as that data's
+// reader sees it. Throws an int.
+void KFSp_UpdateCacheToTime(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time,
+                            KFSp_CacheRequest const& request);
 // The same for a read that wants the value and nothing else.
 void KFSp_UpdateCacheToTime(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time);

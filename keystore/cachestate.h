@@ -8,11 +8,12 @@
 
 #include <map>
 
-// The private copies of a render on a temporary clone context: for each stream that it reads, the key data as it stood
-// at the first read. The host puts one into each such context, and makes the first reads (or all of them) while nobody
+// The private copies of a render on a temporary clone context: for each stream that it reads, the stream as it stood at
+// the first read. The host puts one into each such context, and makes the first reads (or all of them) while nobody
 // edits the streams.
-// A temporary clone context without this state can't be read in. Copies are found by the stream's address: streams outlive this state, or
-// FreeCacheData is called first.
+// A temporary clone context without this state can't be read in. Copies are found by the stream's address, and a
+// stream's end drops the copy of the context that is current then. So a stream that other contexts have read outlives
+// their states, or FreeCacheData is called first.
 // Threads: reached by the thread of one context at a time.
 class KFS_API KFS_StreamCacheState : public Q_RenderState {
 public:
@@ -30,6 +31,13 @@ public:
     void FreeCacheData();
 
 private:
+    friend class KFS_Stream;
+
+    // The copy for `stream`, or null.
+    KFS_StreamKeyData* Find(KFS_Stream const* stream) const;
+    void Forget(KFS_Stream const* stream);
+
+    // Each belongs to a stand-in for the stream, of which it is the key data.
     std::map<KFS_Stream const*, boost::shared_ptr<KFS_StreamKeyData>> keyData_;
     // The last answer: one read asks several times.
     KFS_Stream const* lastStream_ = nullptr;

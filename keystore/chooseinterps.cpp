@@ -1,3 +1,5 @@
+// What a key inserted at a time ought to take from its neighbours: asked by insertion, and by hosts that preview one.
+
 #include "frame/report_private.h"
 #include "keystore/check_private.h"
 #include "keystore/edit.h"
@@ -5,8 +7,6 @@
 #include "keystore/keylist_private.h"
 #include "keystore/pins_private.h"
 #include "keystore/valuedata_private.h"
-
-// What a key inserted at a time ought to take from its neighbours.
 
 namespace {
 

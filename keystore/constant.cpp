@@ -1,3 +1,5 @@
+// The move between one value and keys.
+
 #include "frame/boundary_private.h"
 #include "frame/report_private.h"
 #include "frame/services/reports.h"
@@ -24,6 +26,13 @@ void Verify(KFS_Stream const* stream)
         Q_ReportFailedVerification(id, CanonicalLine, 0, "attempt to animate the canonical instance stream");
 }
 
+void SetNoKeys(KFS_Stream* stream, bool on)
+{
+    unsigned short& flags = *stream->GetKFSFlagsForModify();
+    flags = static_cast<unsigned short>(on ? flags | KFS_StreamFlag_NoKeys : flags & ~KFS_StreamFlag_NoKeys);
+    stream->ShowChangeInCopy();
+}
+
 int DisposeList(KFS_Stream* stream)
 {
     int code = KFS_DisposeRemapTables(stream);
@@ -46,12 +55,12 @@ int MakeFirstKey(KFS_Stream* stream)
     if (error.None()) {
         KFS_KeyScalar* const cache = stream->GetCache();
         if (stream->IsSpatial()) cache->flags &= ~KFS_KeyFlag_TangentsSet;
-        error.Keep(KFSp_PutKeyFromCache(0, 1, 0, 0, stream, nullptr));
+        error.Keep(KFSp_PutKeyFromCache(stream, {.valueGiven = true}, nullptr));
         if (!error.None()) value.Restore();
     }
     if (!error.None()) {
         if (!hadList && stream->GetKeys()) static_cast<void>(DisposeList(stream));
-        stream->SetKFSFlags(stream->GetKFSFlags() | KFS_StreamFlag_NoKeys);
+        SetNoKeys(stream, true);
         return error.Code();
     }
     error.Keep(KFSp_ClearCacheRecord(stream, value.get()));
@@ -62,7 +71,7 @@ int MakeFirstKey(KFS_Stream* stream)
 int MakeKeyed(KFS_Stream* stream, bool keepValue)
 {
     Verify(stream);
-    stream->SetKFSFlags(stream->GetKFSFlags() & ~KFS_StreamFlag_NoKeys);
+    SetNoKeys(stream, false);
     if (!keepValue) return KFSp_ClearCache(stream);
     return KFSp_CacheIsEmpty(stream->GetCache()) ? 0 : MakeFirstKey(stream);
 }
@@ -72,7 +81,7 @@ int MakeConstant(KFS_Stream* stream)
     if (stream->GetKeys()) {
         if (int const code = DisposeList(stream)) return code;
     }
-    stream->SetKFSFlags(stream->GetKFSFlags() | KFS_StreamFlag_NoKeys);
+    SetNoKeys(stream, true);
     for (int* const range : {stream->GetInvalidKeyIndexForModify(), stream->GetArcInvalidKeyIndexForModify()}) {
         range[0] = KFS_INVALID_INDEX;
         range[1] = KFS_INVALID_INDEX;

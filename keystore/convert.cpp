@@ -1,3 +1,5 @@
+// Doubles inside, ten element types outside. Callers' buffers may lie anywhere, so elements are moved as bytes.
+
 #include "frame/boundary_private.h"
 #include "frame/report_private.h"
 #include "frame/services/math.h"
@@ -7,8 +9,6 @@
 #include <cstdint>
 #include <cstring>
 #include <limits>
-
-// Doubles inside, ten element types outside. Callers' buffers may lie anywhere, so elements are moved as bytes.
 
 namespace {
 
@@ -160,8 +160,9 @@ int KFS_ConvertItemFromFloat(short count, char dataType, double const* source, v
 int KFSp_FakeCopyItemFunc(KFS_Stream const* stream, long, short kind, void const* source, void* destination)
 {
     MoveBlock(stream, kind, source, destination);
-    if (kind == KFS_Item_Component || !stream->IsFloatBased()) return 0;
-    return KFSp_Boundary([&] { stream->GetAsLeaf()->LegalizeValue(static_cast<double*>(destination)); });
+    KFS_Stream const* const original = stream->GetOriginal();  // which has the class, and so the limits
+    if (kind == KFS_Item_Component || !original->IsFloatBased()) return 0;
+    return KFSp_Boundary([&] { original->GetAsLeaf()->LegalizeValue(static_cast<double*>(destination)); });
 }
 
 int KFSp_FakeCopyItemFuncNoLimits(KFS_Stream const* stream, long, short kind, void const* source, void* destination)

@@ -1,7 +1,8 @@
+// Keys from stream to stream. What takes a failed copying back stands in copyundo.cpp.
+
 #include "keystore/copykeys.h"
 
 #include "frame/report_private.h"
-#include "frame/services/reports.h"
 #include "keystore/cache_private.h"
 #include "keystore/check_private.h"
 #include "keystore/copyundo_private.h"
@@ -31,13 +32,30 @@ int DataSize(KFS_Stream const* stream)
     return KFS_GetKeyScalarDataSize(stream->GetValueDesc(), stream->IsSpatial(), stream->GetDimension());
 }
 
-// A record is read for as many bytes as the destination has; what they mean isn't looked at.
-int CheckRoom(Route const& route, int operation)
-{
-    if (DataSize(route.source) >= DataSize(route.destination)) return 0;
-    return Qp_ReportLegacyErrString(KFSp_ReportId(operation), KFSp_Severity, KFS_Err_LegacyMismatch,
-                                    KFSp_MessageText(KFSp_Row_KeyDataSizeMismatch));
-}
+// A record's value data, as many bytes of it as the destination's records have: a shorter one is followed by zeros. What
+// the bytes mean isn't looked at.
+class FittedData {
+public:
+    FittedData(Route const& route, KFS_KeyScalar const* record)
+        : data_(KFSp_ValueData(record)),
+          zeros_(IsShort(route) ? static_cast<std::size_t>(DataSize(route.destination)) : 0)
+    {
+        if (!IsShort(route)) return;
+        int const held =
+            std::min(DataSize(route.source), KFSp_KeyItemSize(route.source) - KFSp_ValueDataOffset(record));
+        if (zeros_.get() && held > 0) std::memcpy(zeros_.get(), data_, static_cast<std::size_t>(held));
+        data_ = zeros_.get();
+    }
+
+    // Null when out of memory.
+    void const* get() const { return data_; }
+
+private:
+    static bool IsShort(Route const& route) { return DataSize(route.source) < DataSize(route.destination); }
+
+    void const* data_;
+    KFSp_ScBytes zeros_;
+};
 
 int CheckStreams(KFS_Stream const* source, KFS_Stream const* destination, short operation)
 {
@@ -54,8 +72,10 @@ int BringUpToDate(Route const& route)
 // The record's number block into the destination's cache record; a custom destination takes a value alone.
 int SetupCopy(Route const& route, KFS_KeyScalar const* record, int time)
 {
+    FittedData const data(route, record);
+    if (!data.get()) return KFS_Err_OutOfMemory;
     short const kind = route.destination->IsCustom() ? KFS_Item_KeyValue : KFS_Item_KeyWhole;
-    return KFSp_SetupCache(route.destination, time, KFSp_ValueData(record), static_cast<char>(record->inInterp),
+    return KFSp_SetupCache(route.destination, time, data.get(), static_cast<char>(record->inInterp),
                            static_cast<char>(record->outInterp), kind, 0);
 }
 
@@ -88,6 +108,13 @@ int TimeAtDestination(Route const& route, int operation, short row, T_Time const
     return converted.value != KFS_INVALID_INDEX ? 0 : KFSp_ReportErr(operation, KFS_Err_TimeNotRepresentable, row);
 }
 
+void HoldOnly(Route const& route)
+{
+    if (route.destination->GetInterpMask() != KFS_InterpMask_Hold) return;
+    route.to->cache->inInterp = KFS_Interp_Hold;
+    route.to->cache->outInterp = KFS_Interp_Hold;
+}
+
 int AssembleCopy(Route const& route, KFS_KeyScalar const* record, int time)
 {
     KFSp_FirstError error;
@@ -97,10 +124,7 @@ int AssembleCopy(Route const& route, KFS_KeyScalar const* record, int time)
             [&] { route.destination->PrepareForInsertOfForeignValue(const_cast<KFS_Stream*>(route.source)); }));
     }
     KFS_KeyScalar* const cache = route.to->cache;
-    if (route.destination->GetInterpMask() == KFS_InterpMask_Hold) {
-        cache->inInterp = KFS_Interp_Hold;
-        cache->outInterp = KFS_Interp_Hold;
-    }
+    HoldOnly(route);
     if (error.None()) {
         CopyFlags(record, cache);
         CopySpatialBlock(record, cache);
@@ -135,7 +159,8 @@ int PutCopy(Route const& route, KFS_KeyScalar const* record, int time, bool repl
 {
     KFSp_FirstError error;
     error.Keep(AssembleCopy(route, record, time));
-    if (error.None()) error.Keep(KFSp_PutKeyFromCache(replace, 1, 1, 0, route.destination, index));
+    KFSp_PutKey const how{.overwrite = replace, .valueGiven = true, .tangentsGiven = true};
+    if (error.None()) error.Keep(KFSp_PutKeyFromCache(route.destination, how, index));
     return error.Code();
 }
 
@@ -143,7 +168,9 @@ int CopyToConstant(Route const& route, KFS_KeyScalar const* record, int time, bo
 {
     if (!KFSp_CacheIsEmpty(route.to->cache) && !replace)
         return KFSp_ReportErr(KFSp_Op_InsertKey, KFS_Err_KeyValue, KFSp_Row_OverwriteKey);
-    if (record == route.to->cache) {  // onto itself
+    if (record == route.to->cache) {  // onto itself: it moves
+        KFSp_MoveConstant(route.to, time);
+        HoldOnly(route);
         *index = 0;
         return 0;
     }
@@ -177,7 +204,6 @@ int CopyKey(Route const& route, int index, bool replace, T_Time const* time, int
 {
     if (KFSp_HasNoValue(route.source, route.from))
         return KFSp_ReportErr(KFSp_Op_CopyKey, KFS_Err_NoKeys, KFSp_Row_CopyKeyFrom);
-    if (int const code = CheckRoom(route, KFSp_Op_CopyKey)) return code;
     if (int const code = BringUpToDate(route)) return code;
     if (route.source->HasNoKeys()) return CopyRecord(route, route.from->cache, replace, time, newIndex);
     KFSp_FirstError error;
@@ -185,6 +211,23 @@ int CopyKey(Route const& route, int index, bool replace, T_Time const* time, int
         KFSp_ScKey const key(route.from->keys, index, error);
         if (error.None()) error.Keep(CopyRecord(route, key.get(), replace, time, newIndex));
     }
+    return error.Code();
+}
+
+// The spatial block of a copy that stands in the list. Listeners have heard of it before, and what one of them has read,
+// and so repaired, was without the block.
+int FinishCopy(Route const& route, KFS_KeyScalar const* record, KFS_KeyScalar const& head, int newIndex)
+{
+    KFS_KeyScalar* copy = nullptr;
+    if (int const code = KFSp_GetKey(route.to, newIndex, &copy)) return code;
+    if (!KFSp_HasSpatialBlock(&head) || !KFSp_HasSpatialBlock(copy)) return 0;
+    CopySpatialBlock(&head, copy);
+    KFSp_FirstError error;
+    // The arc table of a key that was overwritten belongs to the arc that was there.
+    if (copy != record) error.Keep(KFSp_DisposeRemapTable(copy));
+    error.Keep(KFSp_ClearCache(route.destination));
+    error.Keep(route.destination->SetInvalid(newIndex + 1, 2));
+    error.Keep(route.destination->SetArcInvalid(newIndex + 2, 4));
     return error.Code();
 }
 
@@ -200,22 +243,17 @@ int CopyOneKey(Route const& route, int index, KFSp_CopyUndo& undo)
     // Within one stream the record is about to be written over.
     KFS_KeyScalar head{};
     std::memcpy(static_cast<void*>(&head), record, static_cast<std::size_t>(KFSp_ValueDataOffset(record)));
-    KFSp_FirstError error;
-    error.Keep(SetupCopy(route, record, at));
-    int newIndex = 0;
-    if (error.None()) {
-        CopyFlags(record, route.to->cache);
-        error.Keep(KFSp_InsertKeyFromCache(1, 1, 1, 0, route.destination, &newIndex));
+    // Whoever heard of the key before may have read, and the record owns a value then.
+    if (int const code = KFSp_ClearCache(route.destination)) return code;
+    if (int const code = SetupCopy(route, record, at)) {
+        route.to->cache->time = KFS_INVALID_INDEX;  // what it holds is the source's
+        return code;
     }
-    route.to->cache->time = KFS_INVALID_INDEX;
-    if (!error.None()) return error.Code();
-    void* item = nullptr;
-    if (int const code = SEQ_GetAddress(route.to->keys, newIndex, 0, &item)) return code;
-    auto* const copy = static_cast<KFS_KeyScalar*>(item);
-    if (!KFSp_HasSpatialBlock(&head) || !KFSp_HasSpatialBlock(copy)) return 0;
-    CopySpatialBlock(&head, copy);
-    // The arc table of a key that was overwritten belongs to the arc that was there.
-    return copy == record ? 0 : KFSp_DisposeRemapTable(copy);
+    CopyFlags(record, route.to->cache);
+    int newIndex = KFS_INVALID_INDEX;
+    int const code = KFSp_InsertKeyFromCache(1, 1, 1, 0, route.destination, &newIndex);
+    undo.Put(newIndex);
+    return code != 0 ? code : FinishCopy(route, record, head, newIndex);
 }
 
 // The n-th key to be copied.
@@ -268,6 +306,7 @@ int CopyIntoKeys(Route const& route, SEQ_Head const* const* keys)
         error.Keep(CopyKeysPinned(route, keys, count, undo));
         if (!error.None()) {
             undo.Undo();
+            static_cast<void>(KFSp_ClearCache(route.destination));  // of what was read with keys that are gone
             // Listeners may have heard of keys that are gone again. Nothing that they answer matters any more.
             static_cast<void>(KFSp_Boundary([&] { route.destination->NotifyValueChanged(); }));
         }
@@ -284,13 +323,14 @@ int CopyConstant(Route const& route)
     T_Time const time{0, route.source->GetTimeScale()};
     char const in = static_cast<char>(record->inInterp);
     char const out = static_cast<char>(record->outInterp);
-    if (destination->IsCustom()) return KFS_InsertKey(destination, &time, 1, KFSp_ValueData(record), in, out);
-    if (int const code = KFS_InsertKeyF(destination, &time, 1, KFSp_Numbers(record), in, out)) return code;
+    FittedData const data(route, record);
+    if (!data.get()) return KFS_Err_OutOfMemory;
+    if (destination->IsCustom()) return KFS_InsertKey(destination, &time, 1, data.get(), in, out);
+    if (int const code = KFS_InsertKeyF(destination, &time, 1, static_cast<double const*>(data.get()), in, out))
+        return code;
     if (destination->HasNoKeys() && destination->GetValueDesc()->dataType != KFS_Type_Double &&
-        record != route.to->cache) {
-        std::memcpy(KFSp_ValueData(route.to->cache), KFSp_ValueData(record),
-                    static_cast<std::size_t>(DataSize(destination)));
-    }
+        record != route.to->cache)
+        std::memcpy(KFSp_ValueData(route.to->cache), data.get(), static_cast<std::size_t>(DataSize(destination)));
     return 0;
 }
 
@@ -299,7 +339,6 @@ int CopyKeys(Route const& route, SEQ_Head const* const* keys)
     if (keys && (*keys)->count == 0) return 0;
     if (KFSp_HasNoValue(route.source, route.from))
         return KFSp_ReportErr(KFSp_Op_CopyKeys, KFS_Err_NoKeys, KFSp_Row_CopyKeyFrom);
-    if (int const code = CheckRoom(route, KFSp_Op_CopyKeys)) return code;
     if (route.source->HasNoKeys()) return CopyConstant(route);
     if (route.destination->HasNoKeys()) return KFSp_ReportErr(KFSp_Op_CopyKeys, KFS_Err_Constant, KFSp_Row_CopyKeyTo);
     if (int const code = BringUpToDate(route)) return code;

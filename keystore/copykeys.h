@@ -3,13 +3,12 @@
 #include "frame/export.h"
 #include "keystore/stream.h"
 
-// Copying keys from stream to stream, with tangents and flags. An arc table never goes along. Common to both: see
-// keystore/edit.h for what an edit leaves behind.
+// Copying keys from stream to stream, with tangents and flags. An arc table never goes along. Streams of any two kinds
+// go: a record's value data is taken byte by byte, as much as the destination's records hold, and zeros where it is
+// shorter. Common to both: see keystore/edit.h for what an edit leaves behind.
 //
 // Results: 0, or
 //   2                        a damaged stream; reported, the source's before the destination's
-//   3                        the source's records are too short for the destination; reported as "key data size
-//                            mismatch"
 //   7425 KFS_Err_KeyValue    something stands at that time and `replace` is 0
 //   7426 KFS_Err_Constant    keys for a destination that holds one value
 //   7427 KFS_Err_NoKeys      the source has no value
@@ -22,7 +21,8 @@
 //   time      in or null: null keeps the key's own
 //   newIndex  out or null: where the copy stands; KFS_INVALID_INDEX on failure
 //
-// A destination that can only hold takes hold codes. Data types aren't compared. Operation 19.
+// A destination that can only hold takes hold codes. A constant that is copied onto itself moves to the time asked for.
+// Operation 19.
 KFS_API int KFS_CopyKey(KFS_Stream* source, int index, unsigned char replace, T_Time const* time,
                         KFS_Stream* destination, int* newIndex);
 

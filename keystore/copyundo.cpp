@@ -1,10 +1,10 @@
+// Takes a failed copying of keys back: needs no memory, because it may be memory that ran out.
+
 #include "keystore/copyundo_private.h"
 
 #include "keystore/items_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/valuedata_private.h"
-
-#include <climits>
 
 KFSp_CopyUndo::KFSp_CopyUndo(KFS_Stream* stream, KFS_StreamKeyData* data, int count) noexcept
     : stream_(stream),
@@ -30,8 +30,13 @@ int KFSp_CopyUndo::Note(int time)
     if (found) {
         if (int const code = Keep(index)) return code;
     }
-    static_cast<Step*>(steps_.get())[stepCount_++] = {time, found};
+    static_cast<Step*>(steps_.get())[stepCount_++] = {time, KFS_INVALID_INDEX, found};
     return 0;
+}
+
+void KFSp_CopyUndo::Put(int index) noexcept
+{
+    static_cast<Step*>(steps_.get())[stepCount_ - 1].index = index;
 }
 
 int KFSp_CopyUndo::Keep(int index)
@@ -46,38 +51,32 @@ int KFSp_CopyUndo::Keep(int index)
 
 void KFSp_CopyUndo::Undo()
 {
-    while (stepCount_ > 0) {
-        Step const step = static_cast<Step const*>(steps_.get())[--stepCount_];
-        bool found = false;
-        int index = 0;
-        if (KFSp_SearchKeys(data_, step.time, &found, &index) != 0 || !found) continue;  // the copy never got in
-        if (step.overwrites)
-            PutBack(index);
-        else
-            static_cast<void>(KFSp_RemoveKeyItem(data_, index, nullptr));
-    }
-    MarkAllStale();
+    while (stepCount_ > 0) TakeBack(static_cast<Step const*>(steps_.get())[--stepCount_]);
+    KFSp_MarkAllKeys(data_->invalidKeyIndex, KFSp_ItemCount(data_));
+    KFSp_MarkAllKeys(data_->arcInvalidKeyIndex, KFSp_ItemCount(data_));
+}
+
+void KFSp_CopyUndo::TakeBack(Step const& step)
+{
+    int index = step.index;
+    bool found = index != KFS_INVALID_INDEX;
+    if (!found && KFSp_SearchKeys(data_, step.time, &found, &index) != 0) return;
+    if (!found) return;  // the copy never got in
+    if (step.overwrites)
+        PutBack(index);
+    else
+        static_cast<void>(KFSp_RemoveKeyItem(data_, index, nullptr));
 }
 
 // The kept key moves into the place of the one that stands there now, whose arc table it takes over. Needs no memory.
 void KFSp_CopyUndo::PutBack(int index)
 {
-    void* item = nullptr;
-    if (SEQ_GetAddress(data_->keys, index, 0, &item) != 0) return;
-    auto* const key = static_cast<KFS_KeyScalar*>(item);
+    KFS_KeyScalar* key = nullptr;
+    if (KFSp_GetKey(data_, index, &key) != 0) return;
     bool const hasTable = KFSp_HasSpatialBlock(key);
     SEQ_Head** const table = hasTable ? key->remapTable : nullptr;
-    static_cast<void>(KFSp_DisposeKeyItemFunc(stream_, data_->keys, item));
-    static_cast<void>(SEQ_Remove((*kept_)->count - 1, kept_, 0, item));
+    static_cast<void>(KFSp_DisposeKeyItemFunc(stream_, data_->keys, key));
+    static_cast<void>(SEQ_Remove((*kept_)->count - 1, kept_, 0, key));
     if (hasTable) key->remapTable = table;
-}
-
-void KFSp_CopyUndo::MarkAllStale() const
-{
-    int last = KFSp_ItemCount(data_) - 1;
-    do {
-        static_cast<void>(stream_->SetInvalid(last, SHRT_MAX));
-        static_cast<void>(stream_->SetArcInvalid(last, SHRT_MAX));
-        last -= SHRT_MAX;
-    } while (last >= 0);
+    KFSp_RetimeKey(data_, index, key, key->time);
 }

@@ -7,8 +7,8 @@
 // the class (KFS_Stream::UpdateStream and its like).
 
 // The stream's value at a time strictly between two keys, each component by its own curve, into the numbers of the
-// cache record. This is the interpolation function of plain streams that aren't spatial. A segment with a hold, or with
-// codes that have no shape, writes nothing.
+// cache record. This is the interpolation function of plain streams that aren't spatial. A segment with a hold
+// writes nothing; one with codes that have no shape takes the earlier key's value.
 //
 //   refcon    not looked at.
 //   time      in the stream's scale; a key stands on both sides of it, which isn't checked.

@@ -1,3 +1,5 @@
+// The scope in which a stream takes doubles. Apart, because handles (curves/) are set in it too.
+
 #include "keystore/edit_private.h"
 
 #include "frame/boundary_private.h"
@@ -44,6 +46,7 @@ int KFSp_ScDoubleValues::Restore()
     stream->SetInterpFunc(interp_);
     stream->SetCopyItemFunc(copy_);
     stream->SetDisposeItemFunc(dispose_);
+    stream->ShowChangeInCopy();
     error.Keep(KFSp_SetKeyFuncs(stream));  // also of a list that was made meanwhile
     return error.Code();
 }

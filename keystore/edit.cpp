@@ -1,3 +1,5 @@
+// Inserting, changing and removing a key, in external form and as doubles. How a key enters the list: insertfromcache.cpp.
+
 #include "keystore/edit.h"
 
 #include "frame/report_private.h"
@@ -14,11 +16,6 @@
 
 namespace {
 
-bool IsCustomRecord(KFS_Stream const* stream)
-{
-    return stream->IsCustom() || stream->IsTemporarilyNonCustom();
-}
-
 // Bytes of the value alone in a record.
 std::size_t ValueSize(KFS_Stream const* stream)
 {
@@ -29,9 +26,9 @@ std::size_t ValueSize(KFS_Stream const* stream)
 // Bytes of a record's value data that are known to be there.
 std::size_t DataSize(KFS_Stream const* stream)
 {
-    return IsCustomRecord(stream) ? ValueSize(stream)
-                                  : static_cast<std::size_t>(KFS_GetKeyScalarDataSize(
-                                        stream->GetValueDesc(), stream->IsSpatial(), stream->GetDimension()));
+    return KFSp_HasCustomRecords(stream) ? ValueSize(stream)
+                                         : static_cast<std::size_t>(KFS_GetKeyScalarDataSize(
+                                               stream->GetValueDesc(), stream->IsSpatial(), stream->GetDimension()));
 }
 
 int DisposeValue(KFS_Stream const* stream, short kind, void* value)
@@ -80,8 +77,8 @@ int InsertConstant(KFS_Stream* stream, int time, bool replace, void const* value
     KFSp_FirstError error;
     error.Keep(AssembleKey(stream, time, value, hasValue, inInterp, outInterp));
     if (error.None()) {
-        unsigned char const ownsValue = value ? 0 : 1;
-        error.Keep(KFSp_PutKeyFromCache(replace, value != nullptr, 0, ownsValue, stream, nullptr));
+        KFSp_PutKey const how{.overwrite = replace, .valueGiven = value != nullptr, .clearCache = !value};
+        error.Keep(KFSp_PutKeyFromCache(stream, how, nullptr));
     }
     if (!error.None()) {
         std::memcpy(static_cast<void*>(cache), &head, static_cast<std::size_t>(KFSp_ValueDataOffset(&head)));
@@ -98,10 +95,8 @@ int InsertIntoKeys(KFS_Stream* stream, int time, bool replace, void const* value
     error.Keep(KFSp_ClearCache(stream));
     if (error.None()) {
         error.Keep(AssembleKey(stream, time, value, false, inInterp, outInterp));
-        if (error.None()) {
-            int index = 0;
-            error.Keep(KFSp_PutKeyFromCache(replace, value != nullptr, 0, 0, stream, &index));
-        }
+        KFSp_PutKey const how{.overwrite = replace, .valueGiven = value != nullptr};
+        if (error.None()) error.Keep(KFSp_PutKeyFromCache(stream, how, nullptr));
     }
     // What the record holds is the caller's value, so it isn't disposed.
     stream->GetCache()->time = KFS_INVALID_INDEX;

@@ -26,12 +26,14 @@
 //                                with operation 81
 //   the services' codes, an item function's, a listener's
 //
-// Threads: the main thread. The F forms change the stream's description while they run; listeners hear of the change
-// afterwards.
+// Threads: the main thread. Renders that have their copies may read meanwhile (keystore/cachestate.h). The F forms change
+// the stream's description while they run, for who reads the stream itself; listeners hear of the edit afterwards.
 
 // Puts a key at a time. A null `value` gives it the value that the stream has there; on a plain stream with splines the
 // curve keeps its shape, for which the neighbours' handles are shortened. With a value, spline sides get default
-// handles. A key that stands there already is changed as by KFS_SetKey if `replace` is set.
+// handles. A key that stands there already is changed as by KFS_SetKey if `replace` is set. A side without a code takes
+// what KFS_ChooseInterps says and, where that has nothing to go by, linear: also on a stream that may only hold, whose
+// mask is asked about given codes alone.
 // Operation 17. Cost: one search, and moving the records behind the key.
 KFS_API int KFS_InsertKey(KFS_Stream* stream, T_Time const* time, unsigned char replace, void const* value,
                           char inInterp, char outInterp);

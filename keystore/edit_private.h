@@ -18,8 +18,13 @@ int KFSp_InsertKeyFromCache(unsigned char overwrite, unsigned char valueGiven, u
                             unsigned char clearCache, KFS_Stream* stream, int* index);
 
 // The same without the notification, for whoever isn't done yet.
-int KFSp_PutKeyFromCache(unsigned char overwrite, unsigned char valueGiven, unsigned char tangentsGiven,
-                         unsigned char clearCache, KFS_Stream* stream, int* index);
+struct KFSp_PutKey {
+    bool overwrite = false;
+    bool valueGiven = false;
+    bool tangentsGiven = false;
+    bool clearCache = false;
+};
+int KFSp_PutKeyFromCache(KFS_Stream* stream, KFSp_PutKey const& how, int* index);
 
 // Takes a key out of the list, into the cache record with `keepInCache`. This is KFS_Stream::RemoveKey without the
 // notification.

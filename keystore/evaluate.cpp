@@ -1,3 +1,5 @@
+// A read from the call down to the cache record, and what hosts call at its end.
+
 #include "keystore/evaluate.h"
 
 #include "frame/boundary_private.h"
@@ -11,12 +13,14 @@
 #include "keystore/items_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/renderstates_private.h"
+#include "keystore/savedrecords_private.h"
 #include "keystore/valuedata_private.h"
 #include "overrides/parambag.h"
 
 #include <algorithm>
 #include <cstring>
 #include <new>
+#include <utility>
 
 namespace {
 
@@ -49,9 +53,10 @@ short ValueItemKind(KFS_Stream const* stream)
     return stream->HasNoKeys() ? KFS_Item_CacheValue : KFS_Item_KeyValue;
 }
 
+// `stream` as this thread sees it.
 int ExternalForm::Adapt(KFS_Stream const* stream, KFS_Stream const* target, void* value)
 {
-    if (target == stream || target->GetValueDesc()->dataType == stream->GetValueDesc()->dataType ||
+    if (target->GetValueDesc()->dataType == stream->GetValueDesc()->dataType ||
         target->GetDimension() != stream->GetDimension() || stream->GetDimension() > MaxAdaptedDimension)
         return 0;
     double numbers[MaxAdaptedDimension] = {};
@@ -59,46 +64,56 @@ int ExternalForm::Adapt(KFS_Stream const* stream, KFS_Stream const* target, void
     return KFSp_ConvertItemFromFloat(stream, 0, ValueItemKind(stream), numbers, value);
 }
 
+// A stream, and what this thread sees of it: its place and its virtual operations are the stream's, all else is seen.
+struct Reading {
+    KFS_Stream const* stream;
+    KFS_Stream const* seen;
+    int time;  // in the stream's scale, as the others are as the caller gave them
+    int flags;
+    KFS_ParamBag const* bag;
+};
+
 bool AnswersFromFollowers(KFS_Stream const* stream, void const* value)
 {
     return value && stream->GetParent() && !stream->IsCanonical() && stream->AreDimensionsSeparated();
 }
 
 // The buffer is taken as doubles, whatever the data type. A dimension without a follower keeps what is there.
-int ReadFollowers(KFS_Stream const* stream, int time, int flags, double* value, KFS_ParamBag const* bag)
+int ReadFollowers(Reading const& reading, double* value)
 {
-    T_Time const at{time, stream->GetTimeScale()};
-    for (int d = 0; d < stream->GetDimension(); ++d) {
-        if (KFS_Stream const* const follower = stream->GetSeparationFollower(d)) {
-            if (int const code = KFS_GetValueFPlus(follower, &at, flags, value + d, nullptr, bag)) return code;
+    T_Time const at{reading.time, reading.seen->GetTimeScale()};
+    for (int d = 0; d < reading.seen->GetDimension(); ++d) {
+        if (KFS_Stream const* const follower = reading.stream->GetSeparationFollower(d)) {
+            int const code = KFS_GetValueFPlus(follower, &at, reading.flags, value + d, nullptr, reading.bag);
+            if (code != 0) return code;
         }
     }
     return 0;
 }
 
-bool WantsExpression(KFS_Stream const* stream, int flags, void const* value)
+bool WantsExpression(Reading const& reading, void const* value)
 {
-    return (flags & KFS_EvalFlag_NoExpression) == 0 && value && stream->HasExpression() &&
-           !stream->GetExprInfo().GetFlag(KFS_ExprFlag_Disabled);
+    return (reading.flags & KFS_EvalFlag_NoExpression) == 0 && value && reading.seen->HasExpression() &&
+           !reading.seen->GetExprInfo().GetFlag(KFS_ExprFlag_Disabled);
 }
 
 // Whether the expression answered; `code` is the read's result then.
 template <class Form>
-bool ReadExpression(KFS_ExpState* state, KFS_Stream const* stream, int time, int flags, typename Form::Value* value,
-                    unsigned char* atKey, KFS_ParamBag const* bag, int* code)
+bool ReadExpression(KFS_ExpState* state, Reading const& reading, typename Form::Value* value, unsigned char* atKey,
+                    int* code)
 {
-    KFS_Stream const* target = stream;
-    int targetTime = time;
+    KFS_Stream const* target = reading.stream;
+    int targetTime = reading.time;
     KFS_ParamBag resolved;
-    state->ResolveExprTarget(&target, &targetTime, bag, &resolved);
-    KFS_ParamBag const* const inForce = resolved.GetOverrideCount() == 0 ? bag : &resolved;
+    state->ResolveExprTarget(&target, &targetTime, reading.bag, &resolved);
+    KFS_ParamBag const* const inForce = resolved.GetOverrideCount() == 0 ? reading.bag : &resolved;
     boost::shared_ptr<KFS_ExprContext> const context = state->GetExprContext(target);
     if (!context || !context->CanEvaluate()) return false;
-    *code = KFSp_Boundary([&] { Form::EvalExpr(state, target, targetTime, flags, value, inForce); });
+    *code = KFSp_Boundary([&] { Form::EvalExpr(state, target, targetTime, reading.flags, value, inForce); });
     if (*code != 0 && *code != KFS_Err_ExprNoValue) return true;
     if (atKey) *atKey = 0;
     if (*code == KFS_Err_ExprNoValue) return false;
-    *code = Form::Adapt(stream, target, value);
+    if (target != reading.stream) *code = Form::Adapt(reading.seen, KFSp_Seen(target), value);
     return true;
 }
 
@@ -108,58 +123,65 @@ int ReportMissingState()
     return Qp_ReportLegacyErrString(KFSp_ReportId(KFSp_Op_GetValue), KFSp_Severity, KFS_Err_LegacyMismatch, nullptr);
 }
 
-// The current render context goes before the stream's project, which is asked only without one.
-Q_RenderContext const* FindRenderContext(KFS_Stream const* stream)
+// What the external form goes by where the thread has no render context.
+Q_RenderContext const* ProjectRenderContext(KFS_Stream const* stream)
 {
-    if (Q_RenderContext const* const current = Q_RenderContext::PeekCurrent()) [[likely]]
-        return current;
     KFS_Project const* const project = KFS_GetConstProject(stream, true);
     return project ? project->GetRenderContext(true) : nullptr;
 }
 
 // The double form doesn't know of projects: a thread without a current render context is a mistake, which the service
 // reports.
-Q_RenderContext const* NeedRenderContext()
+[[gnu::cold]] void ReportMissingContext()
 {
-    Q_RenderContext const* const current = Q_RenderContext::PeekCurrent();
-    if (!current) [[unlikely]]
-        static_cast<void>(Q_RenderContext::GetCurrent(false));
-    return current;
+    static_cast<void>(Q_RenderContext::GetCurrent(false));
+}
+
+// The expression and, where it has no value, the keys. An expression may have the host replace the state that runs it,
+// so a reference is held; a read of the keys alone does without.
+template <class Form, class ReadKeys>
+[[gnu::noinline]] int ReadHoldingState(Q_RenderContext const* context, Reading const& reading,
+                                       typename Form::Value* value, unsigned char* atKey, ReadKeys const& readKeys)
+{
+    boost::shared_ptr<Q_RenderState> const held = context->GetState(KFS_ExpState::S_StateName);
+    KFS_ExpState* const state = KFSp_GetRenderStates(context).expState;
+    int code = 0;
+    if (!ReadExpression<Form>(state, reading, value, atKey, &code)) readKeys(state);
+    return code == KFS_Err_ExprNoValue ? 0 : code;
 }
 
 // The stages that both forms share, up to the keys; `readKeys` takes the state that says how to read them.
 template <class Form, class ReadKeys>
-int ReadStaged(KFS_Stream const* stream, Q_RenderContext const* context, int time, int flags,
-               typename Form::Value* value, unsigned char* atKey, KFS_ParamBag const* bag, ReadKeys&& readKeys)
+int ReadStaged(Reading const& reading, Q_RenderContext const* context, typename Form::Value* value,
+               unsigned char* atKey, ReadKeys const& readKeys)
 {
-    if (AnswersFromFollowers(stream, value)) [[unlikely]]
-        return ReadFollowers(stream, time, flags, static_cast<double*>(value), bag);
+    if (AnswersFromFollowers(reading.stream, value)) [[unlikely]]
+        return ReadFollowers(reading, static_cast<double*>(value));
     KFS_ExpState* const state = context ? KFSp_GetRenderStates(context).expState : nullptr;
     if (!state) [[unlikely]]
         return ReportMissingState();
-    if (WantsExpression(stream, flags, value)) [[unlikely]] {
-        int code = 0;
-        if (ReadExpression<Form>(state, stream, time, flags, value, atKey, bag, &code)) return code;
-    }
+    if (WantsExpression(reading, value)) [[unlikely]]
+        return ReadHoldingState<Form>(context, reading, value, atKey, readKeys);
     readKeys(state);
     return 0;
 }
 
 // What both ends of a read do before the value is copied out: refuse, and bring the cache to the time. Whether there is
 // a value to copy.
-bool BringCache(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, unsigned char keyOnly,
-                void const* value, unsigned char* atKey, KFS_InterpFunc* interpFunc, long refcon)
+bool BringCache(KFS_StreamKeyData const* data, int time, KFSp_CacheRequest request)
 {
-    if (KFSp_HasNoValue(stream, data)) [[unlikely]]
+    KFS_Stream const* const seen = data->stream;
+    if (KFSp_HasNoValue(seen, data)) [[unlikely]]
         throw KFSp_ReportErr(KFSp_Op_GetValueNoExpr, KFS_Err_NoKeys, KFSp_Row_GetValue);
-    if (value && !keyOnly && !atKey && !interpFunc) [[likely]] {
-        KFSp_UpdateCacheToTime(stream, data, time);
-        return stream->GetDimension() >= 1;
+    if (request.wantsValue && !request.keyOnly && !request.atKey && !request.interpFunc) [[likely]] {
+        KFSp_UpdateCacheToTime(seen, data, time);
+        return seen->GetDimension() >= 1;
     }
     unsigned char found = 0;
-    KFSp_UpdateCacheToTime(stream, data, time, keyOnly, value, &found, interpFunc, refcon);
+    unsigned char* const atKey = std::exchange(request.atKey, &found);
+    KFSp_UpdateCacheToTime(seen, data, time, request);
     if (atKey) *atKey = found;
-    return value && stream->GetDimension() >= 1 && (!keyOnly || found);
+    return request.wantsValue && seen->GetDimension() >= 1 && (!request.keyOnly || found);
 }
 
 int ReadSamples(KFS_Stream const* stream, T_Time time, T_Time const* step, int count, int flags, double* values)
@@ -167,7 +189,7 @@ int ReadSamples(KFS_Stream const* stream, T_Time time, T_Time const* step, int c
     bool const separated = stream->GetParent() && stream->AreDimensionsSeparated();
     std::vector<KFS_Stream const*> followers;
     if (separated) stream->GetSeparationFollowers(followers);
-    int const dimension = stream->GetDimension();
+    int const dimension = KFSp_Seen(stream)->GetDimension();
     for (int sample = 0; sample < count; ++sample, values += dimension) {
         KFSp_FirstError error;
         if (!separated) error.Keep(KFS_GetValueFPlus(stream, &time, flags, values, nullptr, nullptr));
@@ -196,11 +218,14 @@ int KFS_GetValuePlus(KFS_Stream const* stream, T_Time const* time, int flags, vo
                      KFS_ParamBag const* bag, KFS_InterpFunc* interpFunc, long refcon)
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_GetValue, stream, KFSp_Row_GetValue)) return code;
-    int at = 0;
-    if (int const code = KFSp_TimeInStream(stream, time, &at)) return code;
     return KFSp_Boundary([&] {
+        Q_RenderContext const* const current = Q_RenderContext::PeekCurrent();
+        KFS_Stream const* const seen = KFSp_Seen(stream, current);
+        int at = 0;
+        if (int const code = KFSp_TimeInStream(seen, time, &at)) return code;
         return ReadStaged<ExternalForm>(
-            stream, FindRenderContext(stream), at, flags, value, atKey, bag, [&](KFS_ExpState* state) {
+            {stream, seen, at, flags, bag}, current ? current : ProjectRenderContext(stream), value, atKey,
+            [&](KFS_ExpState* state) {
                 state->EvalNoExprValue(stream, at, flags, value, atKey, bag, interpFunc, refcon);
             });
     });
@@ -216,14 +241,18 @@ int KFS_GetValueFPlus(KFS_Stream const* stream, T_Time const* time, int flags, d
                       KFS_ParamBag const* bag)
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_GetValue, stream, KFSp_Row_GetValue)) return code;
-    int at = 0;
-    if (int const code = KFSp_TimeInStream(stream, time, &at)) return code;
-    if (stream->IsCustom()) [[unlikely]]
-        return KFSp_RefuseCustomValue(KFSp_Op_GetFloat, KFSp_Row_ComputeFloatValues);
     return KFSp_Boundary([&] {
-        return ReadStaged<DoubleForm>(
-            stream, NeedRenderContext(), at, flags, value, atKey, bag,
-            [&](KFS_ExpState* state) { state->EvalNoExprValueF(stream, at, flags, value, atKey, bag); });
+        Q_RenderContext const* const current = Q_RenderContext::PeekCurrent();
+        KFS_Stream const* const seen = KFSp_Seen(stream, current);
+        int at = 0;
+        if (int const code = KFSp_TimeInStream(seen, time, &at)) return code;
+        if (seen->IsCustom()) [[unlikely]]
+            return KFSp_RefuseCustomValue(KFSp_Op_GetFloat, KFSp_Row_ComputeFloatValues);
+        if (!current) [[unlikely]]
+            ReportMissingContext();
+        return ReadStaged<DoubleForm>({stream, seen, at, flags, bag}, current, value, atKey, [&](KFS_ExpState* state) {
+            state->EvalNoExprValueF(stream, at, flags, value, atKey, bag);
+        });
     });
 }
 
@@ -232,11 +261,11 @@ void KFS_GetValueNoExpr(KFS_Stream const* stream, int time, unsigned char keyOnl
 {
     KFSp_ThrowIf(KFSp_CheckStream(KFSp_Op_GetValueNoExpr, stream, KFSp_Row_GetValue));
     KFS_StreamKeyData const* const data = stream->GetKeyData();
-    if (!BringCache(stream, data, time, keyOnly, value, atKey, interpFunc, refcon)) return;
-    KFS_CopyItemFunc copy = stream->GetCopyItemFunc();
-    if (!copy) copy = stream->IsCustom() ? KFSp_FakeCopyItemFunc : KFSp_ConvertItemFromFloat;
+    KFS_Stream const* const seen = data->stream;
+    if (!BringCache(data, time, {keyOnly != 0, value != nullptr, atKey, interpFunc, refcon})) return;
+    KFS_CopyItemFunc const copy = KFSp_OutwardFunc(seen);
     void const* const from = source ? source : KFSp_ValueData(data->cache);
-    KFSp_ThrowIf(copy(stream, stream->GetItemRefcon(), KFS_Item_CacheValue, from, value));
+    KFSp_ThrowIf(copy(KFSp_HandedTo(copy, seen), seen->GetItemRefcon(), KFS_Item_CacheValue, from, value));
 }
 
 namespace {
@@ -259,29 +288,31 @@ void KFS_GetValueFNoExpr(KFS_Stream const* stream, int time, unsigned char keyOn
                          void const* source)
 {
     KFSp_ThrowIf(KFSp_CheckStream(KFSp_Op_GetValueNoExpr, stream, KFSp_Row_GetValue));
-    if (stream->IsCustom()) throw KFSp_RefuseCustomValue(KFSp_Op_GetValuesFRefusal, KFSp_Row_ComputeFloatValues);
     KFS_StreamKeyData const* const data = stream->GetKeyData();
-    if (!BringCache(stream, data, time, keyOnly, value, atKey, nullptr, 0)) return;
+    KFS_Stream const* const seen = data->stream;
+    if (seen->IsCustom()) throw KFSp_RefuseCustomValue(KFSp_Op_GetValuesFRefusal, KFSp_Row_ComputeFloatValues);
+    if (!BringCache(data, time, {keyOnly != 0, value != nullptr, atKey})) return;
     void const* const from = source ? source : KFSp_ValueData(data->cache);
-    if (!stream->IsFloatBased() && CopyFewDoubles(stream->GetDimension(), from, value)) return;
-    KFSp_ThrowIf(KFSp_FakeCopyItemFunc(stream, 0, KFS_Item_CacheValue, from, value));
+    if (!stream->IsFloatBased() && CopyFewDoubles(seen->GetDimension(), from, value)) return;
+    KFSp_ThrowIf(KFSp_FakeCopyItemFunc(seen, 0, KFS_Item_CacheValue, from, value));
 }
 
-int KFS_GetValuesFPlus(KFS_Stream const* stream, T_Time const* start, T_Time const* step, int count, int flags,
-                       char*** values)
+namespace {
+
+int GetValuesF(KFS_Stream const* stream, T_Time const* start, T_Time const* step, int count, int flags, char*** values)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_GetFloat, stream, KFSp_Row_GetValue)) return code;
-    if (stream->IsCustom()) return KFSp_RefuseCustomValue(KFSp_Op_GetValuesFRefusal, KFSp_Row_ComputeFloatValues);
+    KFS_Stream const* const seen = KFSp_Seen(stream);
+    if (seen->IsCustom()) return KFSp_RefuseCustomValue(KFSp_Op_GetValuesFRefusal, KFSp_Row_ComputeFloatValues);
     if (!values) {
         return Qp_ReportLegacyErrString(KFSp_ReportId(KFSp_Op_GetValuesFHandle), KFSp_Severity, KFS_Err_LegacyMismatch,
                                         nullptr);
     }
     std::size_t const number =
-        count > 0 ? static_cast<std::size_t>(count) * static_cast<std::size_t>(stream->GetDimension()) : 0;
+        count > 0 ? static_cast<std::size_t>(count) * static_cast<std::size_t>(seen->GetDimension()) : 0;
     char** const handle = Q_AllocateHandleClear(KFSp_ReportId(KFSp_Op_GetValuesFHandle),
                                                 KFSp_MessageText(KFSp_Row_InterpolationArray), number * sizeof(double));
     if (!handle) return KFS_Err_OutOfMemory;
-    T_Time const first = start ? *start : T_Time{0, stream->GetTimeScale()};
+    T_Time const first = start ? *start : T_Time{0, seen->GetTimeScale()};
     int const code = KFSp_Boundary(
         [&] { return ReadSamples(stream, first, step, count, flags, reinterpret_cast<double*>(*handle)); });
     if (code != 0) {
@@ -292,14 +323,26 @@ int KFS_GetValuesFPlus(KFS_Stream const* stream, T_Time const* start, T_Time con
     return 0;
 }
 
+}  // namespace
+
+int KFS_GetValuesFPlus(KFS_Stream const* stream, T_Time const* start, T_Time const* step, int count, int flags,
+                       char*** values)
+{
+    if (int const code = KFSp_CheckStream(KFSp_Op_GetFloat, stream, KFSp_Row_GetValue)) return code;
+    return KFSp_Boundary([&] { return GetValuesF(stream, start, step, count, flags, values); });
+}
+
 int KFS_DisposeValue(KFS_Stream const* stream, void* value)
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_DisposeValue, stream, KFSp_Row_Dispose)) return code;
-    KFS_DisposeItemFunc const dispose = stream->GetDisposeItemFunc();
-    return dispose ? KFSp_Boundary([&] { return dispose(stream, stream->GetItemRefcon(), KFS_Item_KeyValue, value); })
-                   : 0;
+    return KFSp_Boundary([&] {
+        KFS_Stream const* const seen = KFSp_Seen(stream);
+        KFS_DisposeItemFunc const dispose = seen->GetDisposeItemFunc();
+        return dispose ? dispose(stream, seen->GetItemRefcon(), KFS_Item_KeyValue, value) : 0;
+    });
 }
 
+// The vector's four components, and zero for what a value has beyond them.
 void KFS_PostCacheVector4Value(KFS_Stream const* stream, int, M_Vector4T<double> const& vector, void* pointerValue,
                                void* value)
 {
@@ -307,8 +350,14 @@ void KFS_PostCacheVector4Value(KFS_Stream const* stream, int, M_Vector4T<double>
         std::memcpy(value, &pointerValue, sizeof pointerValue);
         return;
     }
-    KFS_CopyItemFunc const copy = stream->IsCustom() ? KFSp_FakeCopyItemFunc : KFSp_ConvertItemFromFloat;
-    KFSp_ThrowIf(copy(stream, 0, KFS_Item_CacheValue, vector.v, value));
+    KFS_Stream const* const seen = KFSp_Seen(stream);
+    KFS_CopyItemFunc const copy = seen->IsCustom() ? KFSp_FakeCopyItemFunc : KFSp_ConvertItemFromFloat;
+    std::size_t const size = seen->IsCustom() ? seen->GetValueDesc()->itemSize
+                                              : static_cast<std::size_t>(seen->GetDimension()) * sizeof(double);
+    KFSp_ScBytes const widened(std::max(size, sizeof vector.v));
+    if (!widened.get()) throw int{KFS_Err_OutOfMemory};
+    std::memcpy(widened.get(), vector.v, sizeof vector.v);
+    KFSp_ThrowIf(copy(seen, 0, KFS_Item_CacheValue, widened.get(), value));
 }
 
 namespace {
@@ -317,9 +366,10 @@ namespace {
 // doubles that separated dimensions answer. Throws the int 4.
 class ScratchValue {
 public:
-    explicit ScratchValue(KFS_Stream const* stream)
-        : size_(static_cast<std::size_t>(stream->GetDimension()) *
-                std::max<std::size_t>(stream->GetValueDesc()->itemSize, sizeof(double))),
+    // `seen`: the stream as this thread sees it.
+    explicit ScratchValue(KFS_Stream const* seen)
+        : size_(static_cast<std::size_t>(seen->GetDimension()) *
+                std::max<std::size_t>(seen->GetValueDesc()->itemSize, sizeof(double))),
           buffer_(::operator new(size_, Alignment, std::nothrow))
     {
         if (!buffer_) throw int{KFS_Err_OutOfMemory};
@@ -342,7 +392,7 @@ private:
 
 void ReadForSideEffect(KFS_Stream const* stream, T_Time const& time)
 {
-    ScratchValue const scratch(stream);
+    ScratchValue const scratch(KFSp_Seen(stream));
     KFSp_ThrowIf(
         KFS_GetValuePlus(stream, &time, KFS_EvalFlag_NoExpression, scratch.get(), nullptr, nullptr, nullptr, 0));
     KFSp_ThrowIf(KFS_DisposeValue(stream, scratch.get()));
@@ -352,14 +402,14 @@ void ReadForSideEffect(KFS_Stream const* stream, T_Time const& time)
 
 void KFS_Stream::ValidateCacheAtTime(T_Time const& time)
 {
-    if (HasKeys()) {
+    KFS_StreamKeyData const* const data = GetKeyData();
+    if (data->stream->HasKeys()) {
         ReadForSideEffect(this, time);
         return;
     }
     int at = 0;
-    KFSp_ThrowIf(KFSp_TimeInStream(this, &time, &at));
-    if (at != KFS_INVALID_INDEX)  // which would say that the constant has no value
-        GetCache()->time = at;
+    KFSp_ThrowIf(KFSp_TimeInStream(data->stream, &time, &at));
+    KFSp_MoveConstant(data, at);
 }
 
 void KFS_Stream::ForceInterpolateAtTime(T_Time const& time)

@@ -1,3 +1,5 @@
+// How the key that stands in the cache record enters the list: the one way in.
+
 #include "frame/report_private.h"
 #include "keystore/cache_private.h"
 #include "keystore/curvehooks_private.h"
@@ -10,8 +12,6 @@
 
 #include <cstring>
 #include <optional>
-
-// How the key that stands in the cache record enters the list.
 
 namespace {
 
@@ -26,7 +26,7 @@ struct Insertion {
     int position = KFS_INVALID_INDEX;
 
     // Also a custom stream that passes for a plain one for a while: its records have no room for tangents.
-    bool IsCustom() const { return stream->IsCustom() || stream->IsTemporarilyNonCustom(); }
+    bool IsCustom() const { return KFSp_HasCustomRecords(stream); }
     bool HasSplineSide() const { return key->inInterp == KFS_Interp_Spline || key->outInterp == KFS_Interp_Spline; }
     bool HasOpenSide() const { return key->inInterp == KFS_Interp_None || key->outInterp == KFS_Interp_None; }
 };
@@ -111,9 +111,7 @@ int EvaluateCustomValue(Insertion& insertion)
         return saved;
     }();
     insertion.key->time = KFS_INVALID_INDEX;
-    int const code = KFSp_Boundary([&] {
-        KFSp_UpdateCacheToTime(insertion.stream, insertion.data, head.time, 0, insertion.key, nullptr, nullptr, 0);
-    });
+    int const code = KFSp_Boundary([&] { KFSp_UpdateCacheToTime(insertion.stream, insertion.data, head.time); });
     insertion.ownsValue = code == 0;
     std::memcpy(static_cast<void*>(insertion.key), &head, static_cast<std::size_t>(KFSp_ValueDataOffset(&head)));
     return code;
@@ -228,13 +226,12 @@ int TakeConstant(Insertion& insertion, bool ownsValue)
 
 }  // namespace
 
-int KFSp_PutKeyFromCache(unsigned char overwrite, unsigned char valueGiven, unsigned char tangentsGiven,
-                         unsigned char clearCache, KFS_Stream* stream, int* index)
+int KFSp_PutKeyFromCache(KFS_Stream* stream, KFSp_PutKey const& how, int* index)
 {
     KFS_StreamKeyData* const data = stream->GetKeyDataForModify();
-    Insertion insertion{stream, data, data->cache, overwrite != 0, valueGiven != 0, tangentsGiven != 0, false};
-    bool const clears = clearCache != 0;
-    int const code = stream->HasNoKeys() ? TakeConstant(insertion, clears) : InsertIntoKeyedStream(insertion, clears);
+    Insertion insertion{stream, data, data->cache, how.overwrite, how.valueGiven, how.tangentsGiven, false};
+    int const code = stream->HasNoKeys() ? TakeConstant(insertion, how.clearCache)
+                                         : InsertIntoKeyedStream(insertion, how.clearCache);
     if (index) *index = code == 0 ? insertion.position : KFS_INVALID_INDEX;
     return code;
 }
@@ -242,7 +239,7 @@ int KFSp_PutKeyFromCache(unsigned char overwrite, unsigned char valueGiven, unsi
 int KFSp_InsertKeyFromCache(unsigned char overwrite, unsigned char valueGiven, unsigned char tangentsGiven,
                             unsigned char clearCache, KFS_Stream* stream, int* index)
 {
-    if (int const code = KFSp_PutKeyFromCache(overwrite, valueGiven, tangentsGiven, clearCache, stream, index))
-        return code;
+    KFSp_PutKey const how{overwrite != 0, valueGiven != 0, tangentsGiven != 0, clearCache != 0};
+    if (int const code = KFSp_PutKeyFromCache(stream, how, index)) return code;
     return KFSp_Boundary([&] { stream->NotifyValueChanged(); });
 }

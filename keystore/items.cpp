@@ -1,3 +1,5 @@
+// The key list: how it is made, and what it calls for its items.
+
 #include "keystore/check_private.h"
 #include "keystore/items_private.h"
 
@@ -47,7 +49,7 @@ int KFSp_NewKeyList(KFS_Stream* stream, SEQ_Head*** list)
 {
     SEQ_Head** made = nullptr;
     if (int const code = SEQ_New(0, static_cast<short>(KFSp_KeyItemSize(stream)), 4, 1, &made)) return code;
-    (*made)->refcon = stream;
+    (*made)->refcon = const_cast<KFS_Stream*>(stream->GetKeyData()->stream);  // K7
     SEQ_Funcs const funcs{stream->GetCopyItemFunc() ? KFSp_CopyKeyItemFunc : nullptr,
                           stream->GetDisposeItemFunc() ? KFSp_DisposeKeyItemFunc : nullptr, KFSp_SortKeyItemFunc};
     if (int const code = SEQ_SetFuncs(made, 3, &funcs)) {
@@ -71,7 +73,8 @@ int KFSp_SetKeyFuncs(KFS_Stream* stream)
 {
     SEQ_Head** const list = stream->GetKeys();
     if (!list) return 0;
-    (*list)->refcon = stream;
+    stream->ShowChangeInCopy();                                               // of the functions, by which it is called
+    (*list)->refcon = const_cast<KFS_Stream*>(stream->GetKeyData()->stream);  // K7
     SEQ_Funcs funcs{SEQ_RemoveFunc, SEQ_RemoveFunc, nullptr};
     if (stream->GetCopyItemFunc()) funcs.copy = KFSp_CopyKeyItemFunc;
     if (stream->GetDisposeItemFunc()) funcs.dispose = KFSp_DisposeKeyItemFunc;
@@ -95,10 +98,11 @@ int KFSp_CopyKeyItemFunc(void*, SEQ_Head const* const* list, void const* source,
     auto* const to = static_cast<KFS_KeyScalar*>(destination);
     auto const head = static_cast<std::size_t>(KFSp_ValueDataOffset(from));
     std::memcpy(destination, source, head + (KFSp_HasSpatialBlock(from) ? LeadingBytes(stream) : 0));
-    if (KFSp_HasSpatialBlock(from)) to->remapTable = nullptr;
+    if (KFSp_HasSpatialBlock(from)) to->remapTable = nullptr;  // K5
     KFS_CopyItemFunc const own = stream->GetCopyItemFunc();
     KFS_CopyItemFunc const copy = own ? own : KFSp_FakeCopyItemFunc;
-    return copy(stream, stream->GetItemRefcon(), KFS_Item_KeyWhole, KFSp_ValueData(from), KFSp_ValueData(to));
+    return copy(KFSp_HandedTo(copy, stream), stream->GetItemRefcon(), KFS_Item_KeyWhole, KFSp_ValueData(from),
+                KFSp_ValueData(to));
 }
 
 int KFSp_DisposeKeyItemFunc(void*, SEQ_Head** list, void* item)
@@ -106,20 +110,20 @@ int KFSp_DisposeKeyItemFunc(void*, SEQ_Head** list, void* item)
     KFS_Stream const* const stream = OwnerOf(list);
     KFS_DisposeItemFunc const dispose = stream->GetDisposeItemFunc();
     if (!dispose) return 0;
-    return dispose(stream, stream->GetItemRefcon(), KFS_Item_KeyWhole,
+    return dispose(stream->GetOriginal(), stream->GetItemRefcon(), KFS_Item_KeyWhole,
                    KFSp_ValueData(static_cast<KFS_KeyScalar*>(item)));
 }
 
 int KFS_DisposeRemapTables(KFS_Stream* stream)
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_DisposeRemapTables, stream, KFSp_Row_Dispose)) return code;
-    KFS_StreamKeyData const* const data = stream->GetKeyData();
+    KFS_StreamKeyData* const data = stream->GetKeyDataForModify();
     if (!stream->IsSpatial() || stream->HasNoKeys() || KFSp_ItemCount(data) == 0) return 0;
     KFSp_FirstError error;
     {
         KFSp_ScPin const pin(data->keys, error);
         if (error.None()) error.Keep(KFSp_DisposeRemapTables(data->keys));
     }
-    if (error.None()) error.Keep(stream->SetArcInvalid(-1, static_cast<short>(KFSp_ItemCount(data))));
+    if (error.None()) KFSp_MarkAllKeys(data->arcInvalidKeyIndex, KFSp_ItemCount(data));
     return error.Code();
 }

@@ -37,6 +37,15 @@ int KFSp_FakeCopyItemFunc(KFS_Stream const* stream, long refcon, short kind, voi
 int KFSp_FakeCopyItemFuncNoLimits(KFS_Stream const* stream, long refcon, short kind, void const* source,
                                   void* destination);
 
+// What a copy function of a stream's is handed: ours the stream as this thread sees it, a client's the one that the
+// client knows.
+inline KFS_Stream const* KFSp_HandedTo(KFS_CopyItemFunc func, KFS_Stream const* seen)
+{
+    bool const isOurs = func == KFSp_ConvertItemFromFloat || func == KFSp_FakeCopyItemFunc ||
+                        func == KFSp_ConvertItemToFloat || func == KFSp_FakeCopyItemFuncNoLimits;
+    return isOurs ? seen : seen->GetOriginal();
+}
+
 // What brings a value from a record into external form: the stream's own copy function, or what stands in for it.
 inline KFS_CopyItemFunc KFSp_OutwardFunc(KFS_Stream const* stream)
 {

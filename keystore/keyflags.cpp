@@ -1,3 +1,5 @@
+// Changes of the flag word of a key.
+
 #include "keystore/keyflags.h"
 
 #include "frame/report_private.h"
@@ -66,10 +68,9 @@ int ChangeFlags(KFS_Stream* stream, KFS_StreamKeyData const* data, KFS_KeyScalar
 
 int ChangeKey(KFS_Stream* stream, KFS_StreamKeyData const* data, int index, FlagChange const& change)
 {
-    void* present = nullptr;
-    if (int const code = SEQ_GetAddress(data->keys, index, 0, &present)) return code;
-    auto const* const floating = static_cast<KFS_KeyScalar const*>(present);
-    if (KFSp_Floats(floating) && ChangesFloat(stream, floating->flags, change)) {
+    KFS_KeyScalar const* present = nullptr;
+    if (int const code = KFSp_GetConstKey(data, index, &present)) return code;
+    if (KFSp_Floats(present) && ChangesFloat(stream, present->flags, change)) {
         // Its time is about to become its own, so it has to be the right one.
         if (int const code = stream->UpdateStream()) return code;
     }
@@ -100,8 +101,8 @@ int SetKeyFlags(KFS_Stream* stream, int index, FlagChange const& change)
     KFSp_FirstError error;
     error.Keep(KFSp_ClearCache(stream));
     if (error.None()) error.Keep(ChangeKey(stream, data, index, change));
-    // Scratch of the work above owns nothing, so it isn't disposed.
-    data->cache->time = KFS_INVALID_INDEX;
+    // The work above leaves the record empty (C1), but a listener who heard of it may have read.
+    error.Keep(KFSp_ClearCache(stream));
     return error.Code();
 }
 

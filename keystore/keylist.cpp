@@ -1,3 +1,5 @@
+// The list side of keys, in step with their packed times.
+
 #include "keystore/keylist_private.h"
 
 #include "keystore/valuedata_private.h"

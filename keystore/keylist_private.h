@@ -7,7 +7,7 @@
 #include <climits>
 
 // Everything that searches, inserts, removes or retimes keys goes through here, which keeps the packed times of the key
-// data in step with the list.
+// data in step with the list (T1).
 
 // Bytes of one record of the key list, head and value data.
 inline int KFSp_KeyItemSize(KFS_ValueDesc const& desc, bool spatial, short dimension)
@@ -37,6 +37,13 @@ inline int KFSp_TimeInStream(KFS_Stream const* stream, T_Time const* time, int* 
     return T_ShortConvTime(time->value, time->scale, stream->GetTimeScale(), value);
 }
 
+// Whether the stream's records hold a client's block: no handles, and of a size that only the client's description says,
+// which isn't at hand while the stream passes for a plain one.
+inline bool KFSp_HasCustomRecords(KFS_Stream const* stream)
+{
+    return stream->IsCustom() || stream->IsTemporarilyNonCustom();
+}
+
 // The number of items of the data's list; 0 without a list.
 inline int KFSp_ItemCount(KFS_StreamKeyData const* data)
 {
@@ -61,6 +68,20 @@ inline bool KFSp_IsStale(KFS_StreamKeyData const* data)
 inline bool KFSp_HasNoValue(KFS_Stream const* stream, KFS_StreamKeyData const* data)
 {
     return KFSp_KeyCount(stream, data) == 0;
+}
+
+// The time at which a constant's value stands, which has one. The sentinel would say that there is no value (C1), and
+// moving an empty record would say that there is one.
+inline void KFSp_MoveConstant(KFS_StreamKeyData const* data, int time)
+{
+    if (time != KFS_INVALID_INDEX && data->cache->time != KFS_INVALID_INDEX) data->cache->time = time;
+}
+
+// Marks all of `count` keys as stale in one of the two ranges.
+inline void KFSp_MarkAllKeys(int (&range)[2], int count)
+{
+    range[0] = count > 0 ? 0 : KFS_INVALID_INDEX;
+    range[1] = count > 0 ? count - 1 : KFS_INVALID_INDEX;
 }
 
 // The key at exactly `time`: `found` and its index; or not found, and the index of the first key after it (the count

@@ -1,3 +1,5 @@
+// The packed times and the search in them, which knows nothing of records beyond where their time stands.
+
 #include "keystore/keytimes.h"
 
 #include "keystore/keytypes.h"

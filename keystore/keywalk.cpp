@@ -1,3 +1,5 @@
+// Walks over keys with a caller's function.
+
 #include "keystore/check_private.h"
 #include "keystore/keywalk_private.h"
 
@@ -22,8 +24,12 @@ int WalkConstant(KFSp_KeyWalk* walk)
 
 int WalkList(KFSp_KeyWalk* walk, int first, int last, int* lastIndex)
 {
-    return SEQ_ForRange(walk->stream->GetKeys(), first, last, reinterpret_cast<long>(walk), KFSp_InvokeItemFunc,
-                        lastIndex);
+    // Whoever is handed the records for writing may have written their times, so what mirrors them ends here (T1).
+    struct ScDropTimes {
+        KFS_StreamKeyData const* data;
+        ~ScDropTimes() { data->times.Drop(); }
+    } const drop{walk->stream->GetKeyData()};
+    return SEQ_ForRange(drop.data->keys, first, last, reinterpret_cast<long>(walk), KFSp_InvokeItemFunc, lastIndex);
 }
 
 // An end of a range of times as an index, which may lie beside the list. `onTheLeft`: between two keys the earlier one

@@ -1,8 +1,8 @@
+// Limits and precision, as the parameter record of the stream says.
+
 #include "keystore/stream.h"
 
 #include <limits>
-
-// Limits and precision, as the parameter record of the stream says.
 
 namespace {
 
@@ -77,7 +77,8 @@ double KFS_Stream::GetUIMinValue() const
     case FX_Param_INT_SLIDER: return def.value.intSlider.sliderMin;
     case FX_Param_FIXED_SLIDER: return FromFixed(def.value.fixedSlider.sliderMin);
     case FX_Param_FLOAT_SLIDER: return static_cast<double>(def.value.floatSlider.sliderMin);
-    default: return GetMinValue();  // the other kinds have no range of their own for a slider
+    case FX_Param_FIXED_ANGLE: return GetMinValue();  // the only kind whose class has a say
+    default: return KFS_Stream::GetMinValue();
     }
 }
 
@@ -88,7 +89,8 @@ double KFS_Stream::GetUIMaxValue() const
     case FX_Param_INT_SLIDER: return def.value.intSlider.sliderMax;
     case FX_Param_FIXED_SLIDER: return FromFixed(def.value.fixedSlider.sliderMax);
     case FX_Param_FLOAT_SLIDER: return static_cast<double>(def.value.floatSlider.sliderMax);
-    default: return GetMaxValue();
+    case FX_Param_FIXED_ANGLE: return GetMaxValue();
+    default: return KFS_Stream::GetMaxValue();
     }
 }
 

@@ -1,3 +1,5 @@
+// Which key stands at or near a time.
+
 #include "keystore/lookup.h"
 
 #include "frame/boundary_private.h"
@@ -20,12 +22,6 @@ void Answer(Value* out, Value const& value)
     if (out) *out = value;
 }
 
-// The time at which a constant's value stands. The sentinel would say that there is no value.
-void MoveConstant(KFS_StreamKeyData const* data, int time)
-{
-    if (time != KFS_INVALID_INDEX) data->cache->time = time;
-}
-
 int GetKeyTime(KFS_Stream const* stream, KFS_StreamKeyData const* data, int index, T_Time* time)
 {
     KFS_KeyScalar const* key = nullptr;
@@ -46,8 +42,9 @@ int StepFromSearch(bool found, int index, short direction)
 int FindKeyTime(KFS_Stream const* stream, T_Time const* time, short direction, int* index, T_Time* keyTime)
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_FindKeyTime, stream, KFSp_Row_GetKeyValue)) return code;
-    if (stream->HasNoKeys()) return KFSp_ReportErr(KFSp_Op_FindKeyTime, KFS_Err_Constant, KFSp_Row_GetKeyValue);
     KFS_StreamKeyData const* const data = stream->GetKeyData();
+    stream = data->stream;
+    if (stream->HasNoKeys()) return KFSp_ReportErr(KFSp_Op_FindKeyTime, KFS_Err_Constant, KFSp_Row_GetKeyValue);
     int const count = KFSp_ItemCount(data);
     if (count == 0) return 0;
     int at = 0;
@@ -84,14 +81,15 @@ int NearerKey(KFS_StreamKeyData const* data, int at, int next, int* nearest)
 int FindNearestKeyTime(KFS_Stream const* stream, T_Time const* time, int* index, T_Time* keyTime)
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_FindNearestKeyTime, stream, KFSp_Row_InquireKey)) return code;
+    KFS_StreamKeyData const* const data = stream->GetKeyData();
+    stream = data->stream;
     int at = 0;
     if (int const code = KFSp_TimeInStream(stream, time, &at)) return code;
-    KFS_StreamKeyData const* const data = stream->GetKeyData();
     T_Time const asked{at, stream->GetTimeScale()};
     if (stream->HasNoKeys()) {
         if (KFSp_HasNoValue(stream, data))
             return KFSp_ReportErr(KFSp_Op_FindNearestKeyTime, KFS_Err_NoKeys, KFSp_Row_GetValue);
-        MoveConstant(data, at);
+        KFSp_MoveConstant(data, at);
         *index = 0;
         *keyTime = time ? *time : asked;
         return 0;
@@ -154,8 +152,9 @@ int UpdateForLookup(KFS_Stream const* stream)
 int TimeToIndex(KFS_Stream const* stream, T_Time const* time, int* index)
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_TimeToIndex, stream, KFSp_Row_InquireKey)) return code;
-    if (stream->HasNoKeys()) return KFSp_ReportErr(KFSp_Op_TimeToIndex, KFS_Err_Constant, KFSp_Row_InquireKey);
     KFS_StreamKeyData const* const data = stream->GetKeyData();
+    stream = data->stream;
+    if (stream->HasNoKeys()) return KFSp_ReportErr(KFSp_Op_TimeToIndex, KFS_Err_Constant, KFSp_Row_InquireKey);
     if (KFSp_ItemCount(data) == 0) return KFSp_ReportErr(KFSp_Op_TimeToIndex, KFS_Err_NoKeys, KFSp_Row_InquireKey);
     int at = 0;
     if (int const code = KFSp_TimeInStream(stream, time, &at)) return code;
@@ -178,12 +177,13 @@ int TimeToIndex(KFS_Stream const* stream, T_Time const* time, int* index)
 int GetKeyIndex(KFS_Stream const* stream, T_Time const* time, int* index, bool* found)
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_GetKeyIndex, stream, KFSp_Row_InquireKey)) return code;
+    KFS_StreamKeyData const* const data = stream->GetKeyData();
+    stream = data->stream;
     int at = 0;
     if (int const code = KFSp_TimeInStream(stream, time, &at)) return code;
-    KFS_StreamKeyData const* const data = stream->GetKeyData();
     if (KFSp_HasNoValue(stream, data)) return KFSp_ReportErr(KFSp_Op_GetKeyIndex, KFS_Err_NoKeys, KFSp_Row_GetValue);
     if (stream->HasNoKeys()) {
-        MoveConstant(data, at);
+        KFSp_MoveConstant(data, at);
         *index = 0;
         *found = true;
         return 0;
@@ -201,6 +201,7 @@ int IndexToTime(KFS_Stream const* stream, int index, T_Time* time)
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_IndexToTime, stream, KFSp_Row_InquireKey)) return code;
     KFS_StreamKeyData const* const data = stream->GetKeyData();
+    stream = data->stream;
     if (stream->HasNoKeys()) {
         if (KFSp_HasNoValue(stream, data))
             return KFSp_ReportErr(KFSp_Op_IndexToTime, KFS_Err_Constant, KFSp_Row_InquireKey);

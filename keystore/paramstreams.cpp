@@ -1,3 +1,5 @@
+// The layer stream: a leaf whose value is in its parameter record.
+
 #include "keystore/paramstreams.h"
 
 #include "frame/frame.h"

@@ -1,3 +1,5 @@
+// What a leaf answers about itself, and what it does when asked for things that only typed streams can do.
+
 #include "frame/boundary_private.h"
 #include "frame/services/identifiers.h"
 #include "keystore/edit.h"
@@ -7,8 +9,6 @@
 #include "tree/streamgroup.h"
 
 #include <utility>
-
-// What a leaf answers about itself, and what it does when asked for things that only typed streams can do.
 
 namespace {
 

@@ -1,3 +1,5 @@
+// The states of a render context that the library knows, and each thread's memory of where they are.
+
 #include "keystore/renderstates_private.h"
 
 #include "keystore/cachestate.h"
@@ -39,4 +41,9 @@ KFSp_RenderStates const& KFSp_GetRenderStates(Q_RenderContext const* context)
         knownStamp = context->GetStatesStamp();
     }
     return known;
+}
+
+KFS_Stream const* KFSp_SeenInCopy(KFS_Stream const* stream, Q_RenderContext const* context)
+{
+    return KFSp_GetRenderStates(context).cacheState ? KFSp_Seen(stream) : stream;
 }

@@ -1,3 +1,5 @@
+// All key times in a new scale, and what becomes of keys that meet.
+
 #include "keystore/attributes.h"
 
 #include "frame/boundary_private.h"
@@ -40,9 +42,8 @@ int RetimeKeys(KFS_Stream* stream, KFS_StreamKeyData* data, unsigned int newScal
     int previousOld = KFS_INVALID_INDEX;
     int previousNew = KFS_INVALID_INDEX;
     for (int index = 0; index < KFSp_ItemCount(data);) {
-        void* item = nullptr;
-        if (int const code = SEQ_GetAddress(data->keys, index, 0, &item)) return code;
-        auto* const key = static_cast<KFS_KeyScalar*>(item);
+        KFS_KeyScalar* key = nullptr;
+        if (int const code = KFSp_GetKey(data, index, &key)) return code;
         int const oldTime = key->time;
         T_Time tick{0, newScale};
         if (int const code = T_ShortConvTime(oldTime, oldScale, newScale, &tick.value)) return code;
@@ -103,6 +104,7 @@ int KFS_RescaleStream(KFS_Stream* stream, unsigned int newScale)
             if (int const code = RescaleKeys(stream, newScale)) return code;
         }
         stream->SetTimeScale(newScale);
+        stream->ShowChangeInCopy();
         return 0;
     });
 }

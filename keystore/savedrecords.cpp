@@ -1,3 +1,5 @@
+// Copies of records as bytes, for edits that may still fail.
+
 #include "keystore/savedrecords_private.h"
 
 #include "frame/report_private.h"
@@ -66,13 +68,13 @@ KFSp_SavedKeys::KFSp_SavedKeys(KFS_Stream const* stream, KFS_StreamKeyData const
 void KFSp_SavedKeys::Restore() const noexcept
 {
     for (int i = first_; i <= last_; ++i) {
-        void* item = nullptr;
-        if (SEQ_GetAddress(data_->keys, i, 0, &item) != 0) return;
-        auto* const key = static_cast<KFS_KeyScalar*>(item);
+        KFS_KeyScalar* key = nullptr;
+        if (KFSp_GetKey(data_, i, &key) != 0) return;
         int const time = key->time;
         bool const hasTable = KFSp_HasSpatialBlock(key);
         SEQ_Head** const table = hasTable ? key->remapTable : nullptr;
-        std::memcpy(item, static_cast<char const*>(bytes_.get()) + static_cast<std::size_t>(i - first_) * size_, size_);
+        std::memcpy(static_cast<void*>(key),
+                    static_cast<char const*>(bytes_.get()) + static_cast<std::size_t>(i - first_) * size_, size_);
         key->time = time;
         if (hasTable) key->remapTable = table;
     }

@@ -1,9 +1,11 @@
+// Marks of keys whose derived data has to be computed anew.
+
 #include "keystore/keylist_private.h"
 #include "keystore/pins_private.h"
 
 #include <algorithm>
 
-// Marks of keys whose derived data has to be computed anew. An edit at key i reaches its neighbours:
+// An edit at key i reaches its neighbours:
 //
 //   SetInvalid(i + 1, 2)        SetArcInvalid(i + 2, 4)
 //
@@ -44,24 +46,24 @@ void Clear(int* stored)
 }
 
 // A key of a list that the caller has pinned.
-bool IsFloatKey(SEQ_Head** keys, int index, KFSp_FirstError& error)
+bool IsFloatKey(KFS_StreamKeyData const* data, int index, KFSp_FirstError& error)
 {
-    void* item = nullptr;
-    int const code = SEQ_GetAddress(keys, index, 0, &item);
+    KFS_KeyScalar* key = nullptr;
+    int const code = KFSp_GetKey(data, index, &key);
     error.Keep(code);
-    return code == 0 && KFSp_Floats(static_cast<KFS_KeyScalar*>(item));
+    return code == 0 && KFSp_Floats(key);
 }
 
 // The time of a float key follows from the anchors around it, so a range never ends on one, except at the ends of the
 // list.
-int WidenOverFloatKeys(SEQ_Head** keys, Range* range)
+int WidenOverFloatKeys(KFS_StreamKeyData const* data, Range* range)
 {
     KFSp_FirstError error;
     {
-        KFSp_ScPin const pin(keys, error);
-        int const lastKey = (*keys)->count - 1;
-        while (error.None() && range->first > 0 && IsFloatKey(keys, range->first, error)) --range->first;
-        while (error.None() && range->last < lastKey && IsFloatKey(keys, range->last, error)) ++range->last;
+        KFSp_ScPin const pin(data->keys, error);
+        int const lastKey = KFSp_ItemCount(data) - 1;
+        while (error.None() && range->first > 0 && IsFloatKey(data, range->first, error)) --range->first;
+        while (error.None() && range->last < lastKey && IsFloatKey(data, range->last, error)) ++range->last;
     }
     return error.Code();
 }
@@ -78,7 +80,7 @@ int KFS_Stream::SetInvalid(int index, short count) const
     }
     Range mark = MarkedRange(keyCount, index, count);
     int code = 0;
-    if (IsSpatial() && !mark.IsNone()) code = WidenOverFloatKeys(data->keys, &mark);
+    if (IsSpatial() && !mark.IsNone()) code = WidenOverFloatKeys(data, &mark);
     Merge(mark, data->invalidKeyIndex);
     return code;
 }

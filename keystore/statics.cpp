@@ -1,3 +1,6 @@
+// All objects that are made when the library loads. The order of these definitions is the order in which they are made,
+// so they stand in one file, which belongs to the highest folder that has such objects.
+
 #include "frame/statics_private.h"
 
 #include "frame/project.h"
@@ -6,9 +9,6 @@
 #include "tree/matchnamepool_private.h"
 
 using hearth::utility::ImmutableString;
-
-// All objects that are made when the library loads. The order of these definitions is the order in which they are made,
-// so they stand in one file, which belongs to the highest folder that has such objects.
 
 ImmutableString const KFS_ExpState::S_StateName = ImmutableString::Create("ExpState");
 ImmutableString const KFS_RenderState::S_StateName = ImmutableString::Create("RenderState");

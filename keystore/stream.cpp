@@ -1,3 +1,5 @@
+// A leaf's life: made, copied, seen by renders, unmade. Its other operations stand by what they are about.
+
 #include "keystore/stream.h"
 
 #include "frame/boundary_private.h"
@@ -93,24 +95,25 @@ int SetPlainDescription(KFS_Stream* stream, KFS_ValueDesc const& newDesc)
 
 }  // namespace
 
-KFS_StreamKeyData::KFS_StreamKeyData(KFS_StreamKeyData const& source, KFS_Stream const* stream)
-    : invalidKeyIndex{source.invalidKeyIndex[0], source.invalidKeyIndex[1]},
+KFS_StreamKeyData::KFS_StreamKeyData(KFS_StreamKeyData const& source, KFS_Stream const* owner)
+    : stream(owner),
+      invalidKeyIndex{source.invalidKeyIndex[0], source.invalidKeyIndex[1]},
       arcInvalidKeyIndex{source.arcInvalidKeyIndex[0], source.arcInvalidKeyIndex[1]}
 {
     if (source.keys) KFSp_ThrowIf(SEQ_Duplicate(source.keys, 0, &keys));
     KFSp_FirstError error;
     if (keys) {
         error.Keep(SEQ_SetRefcon((*source.keys)->refcon, keys));
-        if (stream->IsSpatial()) error.Keep(DuplicateRemapTables(source.keys, keys));
+        if (owner->IsSpatial()) error.Keep(DuplicateRemapTables(source.keys, keys));
     }
     try {
         KFSp_ThrowIf(error.Code());
-        cache = stream->CloneCache(source.cache);
+        cache = owner->CloneCache(source.cache);
     } catch (...) {
         KFSp_DisposeKeyList(keys);
         throw;
     }
-    valueOwner_ = stream->GetDisposeItemFunc() ? stream : nullptr;
+    valueOwner_ = owner->GetDisposeItemFunc() ? owner : nullptr;
 }
 
 KFS_StreamKeyData::~KFS_StreamKeyData()
@@ -148,35 +151,74 @@ KFS_Stream::KFS_Stream(short dimension, unsigned int timeScale, unsigned char no
             spInterp_ = KFS_SpInterp_Auto;
         }
     }
+    isWhole_ = true;
 }
 
 KFS_Stream::KFS_Stream(KFS_Stream const& source, KFS_CloneStreamParams const& params)
     : KFS_StreamBase(Undamaged(source)),
-      stamp_(KFS_StreamValidStamp),
-      dimension_(source.dimension_),
-      kfsFlags_(source.kfsFlags_),
-      spInterp_(source.spInterp_),
-      spInterpMask_(source.spInterpMask_),
-      interpMask_(source.interpMask_),
-      timeScale_(source.timeScale_),
-      accuracy_(source.accuracy_),
-      multiplier_(source.multiplier_),
-      valueDesc_(source.valueDesc_),
-      interpFunc_(source.interpFunc_),
-      copyItemFunc_(source.copyItemFunc_),
-      disposeItemFunc_(source.disposeItemFunc_),
-      temporarilyNonCustom_(source.temporarilyNonCustom_)
+      stamp_(KFS_StreamValidStamp)
 {
+    TakeForm(source);  // in any case, for the way out of a failure
     int const code = KFSp_Boundary([&] {
-        keyData_.cache = source.CloneCache(source.GetCache());
-        if (params.cloneKeys && source.keyData_.keys) CopyKeysFrom(source);
-        if (params.cloneExpression && source.HasExpression()) CopyExpressionFrom(source);
+        KFS_Stream const& seen = *source.GetKeyData()->stream;
+        TakeForm(seen);
+        keyData_.cache = seen.CloneCache(seen.GetCache());
+        if (params.cloneKeys && seen.keyData_.keys) CopyKeysFrom(seen);
+        if (params.cloneExpression && seen.HasExpression()) CopyExpressionFrom(seen);
     });
     if (code != 0) {
         if (keyData_.cache) KFSp_ClearCacheRecord(this, keyData_.cache);
         SetCanonical(true);  // silent: listeners who hear the source have never seen this one, nor do they its end
         throw int{code};
     }
+    isWhole_ = true;
+}
+
+// Canonical, so that nobody hears of it.
+KFS_Stream::KFS_Stream(KFS_Stream const& original, KFS_StreamKeyData const& source)
+    : KFS_StreamBase(nullptr, nullptr, true),
+      original_(&original),
+      stamp_(KFS_StreamValidStamp),
+      keyData_(source, &original)
+{
+    TakeForm(original);
+    exprInfo_ = original.exprInfo_;
+    disabledUpdateCount_ = original.disabledUpdateCount_;
+    // From here on the copy is this one's: K7, and the destructor gives back what the cache record holds.
+    keyData_.stream = this;
+    keyData_.valueOwner_ = nullptr;
+    if (keyData_.keys) (*keyData_.keys)->refcon = this;
+}
+
+// What a stream is, beside its key data and its expression.
+void KFS_Stream::TakeForm(KFS_Stream const& original)
+{
+    dimension_ = original.dimension_;
+    kfsFlags_ = original.kfsFlags_;
+    spInterp_ = original.spInterp_;
+    spInterpMask_ = original.spInterpMask_;
+    interpMask_ = original.interpMask_;
+    timeScale_ = original.timeScale_;
+    accuracy_ = original.accuracy_;
+    multiplier_ = original.multiplier_;
+    valueDesc_ = original.valueDesc_;
+    interpFunc_ = original.interpFunc_;
+    copyItemFunc_ = original.copyItemFunc_;
+    disposeItemFunc_ = original.disposeItemFunc_;
+    temporarilyNonCustom_ = original.temporarilyNonCustom_;
+}
+
+void KFS_Stream::ShowChangeInCopy() const
+{
+    Q_RenderContext const* const context = Q_RenderContext::PeekCurrent();
+    if (!isWhole_ || !context || !context->GetIsTempCloneContext()) [[likely]]
+        return;
+    KFS_StreamCacheState const* const state = KFSp_GetRenderStates(context).cacheState;
+    KFS_StreamKeyData const* const copy = state ? state->Find(this) : nullptr;
+    if (!copy) return;
+    auto* const standIn = const_cast<KFS_Stream*>(copy->stream);
+    standIn->TakeForm(*this);
+    standIn->exprInfo_ = exprInfo_;
 }
 
 // Everything goes into the clone's own key data, whatever context the thread is in.
@@ -203,9 +245,13 @@ void KFS_Stream::CopyExpressionFrom(KFS_Stream const& source)
 }
 
 // The stream's own key data throughout, whatever context the thread is in. The client's dispose function still finds a
-// whole stream.
+// whole stream, also for the current context's copy, which the next stream at this address mustn't be given.
 KFS_Stream::~KFS_Stream()
 {
+    Q_RenderContext const* const context = Q_RenderContext::PeekCurrent();
+    if (std::exchange(isWhole_, false) && context && context->GetIsTempCloneContext()) {
+        if (KFS_StreamCacheState* const state = KFSp_GetRenderStates(context).cacheState) state->Forget(this);
+    }
     static_cast<void>(KFSp_CheckStream(KFSp_Op_StreamDestroy, this, KFSp_Row_Dispose));
     if (keyData_.cache) static_cast<void>(KFSp_ClearCacheRecord(this, keyData_.cache));
     KFSp_DisposeKeyList(std::exchange(keyData_.keys, nullptr));
@@ -250,6 +296,7 @@ KFS_StreamKeyData const* KFS_Stream::GetKeyData() const
     Q_RenderContext const* const context = Q_RenderContext::PeekCurrent();
     if (!context || !context->GetIsTempCloneContext()) [[likely]]
         return &keyData_;
+    if (!isWhole_) return &keyData_;
     return KFSp_GetRenderStates(context).cacheState->GetOverrideKeyData(this, keyData_);
 }
 
@@ -267,12 +314,14 @@ bool KFS_Stream::HasActiveExpression() const
 
 int KFS_Stream::GetKeyCount() const
 {
-    return KFSp_KeyCount(this, GetKeyData());
+    KFS_StreamKeyData const* const data = GetKeyData();
+    return KFSp_KeyCount(data->stream, data);
 }
 
 bool KFS_Stream::HasNoValue() const
 {
-    return KFSp_HasNoValue(this, GetKeyData());
+    KFS_StreamKeyData const* const data = GetKeyData();
+    return KFSp_HasNoValue(data->stream, data);
 }
 
 void KFS_Stream::NotifyValueChanged()
@@ -298,12 +347,9 @@ int KFS_SetValueDescription(KFS_Stream* stream, KFS_ValueDesc const* newDesc, KF
     if (int const code = KFSp_CheckStream(KFSp_Op_SetValueDesc, stream, KFSp_Row_SetValueDesc)) return code;
     if (oldDesc) *oldDesc = *stream->GetValueDesc();
     if (!newDesc) return 0;
-    if (stream->IsCustom() && !newDesc->isCustom) {
-        stream->MarkTemporarilyNonCustom(true);
-    } else if (newDesc->isCustom) {
-        stream->MarkTemporarilyNonCustom(false);
-        return SetCustomDescription(stream, *newDesc);
-    }
-    stream->GetValueDescForModify()->isCustom = 0;
-    return SetPlainDescription(stream, *newDesc);
+    if (stream->IsCustom() || newDesc->isCustom) stream->MarkTemporarilyNonCustom(!newDesc->isCustom);
+    if (!newDesc->isCustom) stream->GetValueDescForModify()->isCustom = 0;
+    int const code = newDesc->isCustom ? SetCustomDescription(stream, *newDesc) : SetPlainDescription(stream, *newDesc);
+    stream->ShowChangeInCopy();
+    return code;
 }

@@ -24,7 +24,28 @@ struct KFS_EvalData {
 //
 // Reads write it: the cache record is scratch, and derived data of stale keys is repaired where it is needed. So one
 // key data serves one thread at a time.
+//
+// What always holds, between any two operations of the library; code that relies on one names its number:
+//   K1  Times ascend and no two keys share one, as signed differences with wrap-around (KFSp_TimeDifference).
+//   K2  No key stands at KFS_INVALID_INDEX.
+//   K3  The first and the last key aren't float keys in what they do, whatever their flags say.
+//   K4  A key's flag KFS_KeyFlag_SpatialBlock, and nothing else, says where its value data begins.
+//   K5  An arc table belongs to one key: a copy of the key has none.
+//   K6  Derived data of a key outside the two stale ranges is right; a range has both ends or neither, and lies within
+//       the list.
+//   K7  The list's refcon is `stream`, by which the item functions find what the items are.
+// The cache record:
+//   C1  It is empty exactly if its time is KFS_INVALID_INDEX; then its value data belongs to nobody.
+//   C2  Not empty, it owns its value; of a constant (KFS_StreamFlag_NoKeys) that is the stream's value.
+//   C3  On a stream with keys it is what a read at its time answers, or empty. An edit leaves it empty.
+//   C4  It never has an arc table.
+// The packed times:
+//   T1  If they mirror as many keys as the list has, they are the keys' times in order. Whoever inserts, removes or
+//       retimes a key goes through keystore/keylist_private.h, or drops them.
 struct KFS_API KFS_StreamKeyData {
+    // The stream as this data's reader sees it: for a stream's own data the stream itself, for a render's private copy
+    // its stand-in, which says what the stream was when the copy was made.
+    KFS_Stream const* stream = nullptr;
     SEQ_Head** keys = nullptr;                                        // null while none was made
     int invalidKeyIndex[2] = {KFS_INVALID_INDEX, KFS_INVALID_INDEX};  // first and last key whose tangents are stale
     int arcInvalidKeyIndex[2] = {KFS_INVALID_INDEX,
@@ -32,14 +53,17 @@ struct KFS_API KFS_StreamKeyData {
     KFS_KeyScalar* cache = nullptr;                   // with room for a full value
     mutable KFS_KeyTimes times;                       // derived from `keys`
 
-    KFS_StreamKeyData() = default;
-    // A copy that shares nothing with `source`. Throws an int: the list service's code, 4, or the copy function's.
-    KFS_StreamKeyData(KFS_StreamKeyData const& source, KFS_Stream const* stream);
+    explicit KFS_StreamKeyData(KFS_Stream const* owner) : stream(owner) {}
+    // A copy that shares nothing with `source`, the data of `owner`. Throws an int: the list service's code, 4, or the
+    // copy function's.
+    KFS_StreamKeyData(KFS_StreamKeyData const& source, KFS_Stream const* owner);
     ~KFS_StreamKeyData();
     KFS_StreamKeyData(KFS_StreamKeyData const&) = delete;
     KFS_StreamKeyData& operator=(KFS_StreamKeyData const&) = delete;
 
 private:
+    friend class KFS_Stream;
+
     // In a copy: the stream whose dispose function gives back what the cache record holds. Null where nothing has to be
     // given back, so that the copy of a plain stream may outlive the stream.
     KFS_Stream const* valueOwner_ = nullptr;
@@ -51,7 +75,9 @@ private:
 // Errors: exported functions on a stream refuse one whose validity stamp is wrong with code 2 and touch nothing else of
 // it. Class operations throw their code as an int.
 // Threads: edits belong to the main thread. Accessors marked "key data" answer for the calling thread's key data: the
-// stream's own, or on a temporary clone context that render's private copy.
+// stream's own, or on a temporary clone context that render's private copy. What reads answer there is the stream as it
+// stood when the copy was made, whatever the main thread edits meanwhile: keys, time scale, description, constant or
+// keyed, the text and flags of its expression. The other accessors answer for the stream as it is now.
 class KFS_API KFS_Stream : public KFS_StreamBase {
 public:
     // `dimension`: components of the value. `timeScale`: time units a second. `spatial`: keys carry tangents in space.
@@ -172,6 +198,11 @@ public:
     // Key data.
     KFS_StreamKeyData const* GetKeyData() const;
     KFS_StreamKeyData* GetKeyDataForModify() const { return const_cast<KFS_StreamKeyData*>(GetKeyData()); }
+    // The stream that a stand-in in a render's copy stands for; of any other stream the stream itself.
+    KFS_Stream const* GetOriginal() const { return original_; }
+    // On a temporary clone context an edit works on that render's copy. Whoever has changed there what isn't key data
+    // (flags, time scale, description, expression) calls this, and the copy's reads see it. Does nothing elsewhere.
+    void ShowChangeInCopy() const;
     SEQ_Head** GetKeys() const { return GetKeyData()->keys; }
     // Takes over a list whose head names this stream; the earlier one isn't disposed. Also to be called by whoever has
     // rewritten the times of keys through the list's handle.
@@ -275,9 +306,18 @@ public:
     void NotifyValueChanged();
 
 private:
+    friend class KFS_StreamCacheState;
+    friend struct KFSp_StandIn;  // makes them
+
+    // The stand-in for `original` in a render's copy of its key data.
+    explicit KFS_Stream(KFS_Stream const& original, KFS_StreamKeyData const& source);
+    void TakeForm(KFS_Stream const& original);
     void CopyKeysFrom(KFS_Stream const& source);
     void CopyExpressionFrom(KFS_Stream const& source);
 
+    KFS_Stream const* original_ = this;
+    // While it is made and unmade, a stream has its own key data alone.
+    bool isWhole_ = false;
     unsigned short stamp_;
     short dimension_;
     unsigned short kfsFlags_ = 0;
@@ -292,7 +332,7 @@ private:
     KFS_CopyItemFunc copyItemFunc_ = nullptr;
     KFS_DisposeItemFunc disposeItemFunc_ = nullptr;
     KFS_ExprInfo exprInfo_;
-    KFS_StreamKeyData keyData_;
+    KFS_StreamKeyData keyData_{this};
     bool temporarilyNonCustom_ = false;
     unsigned int disabledUpdateCount_ = 0;
     unsigned int disabledLegalizeCount_ = 0;

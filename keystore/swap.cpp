@@ -1,3 +1,5 @@
+// The exchange of two leaves, which has to name every field.
+
 #include "frame/boundary_private.h"
 #include "keystore/stream.h"
 #include "tree/listener_private.h"
@@ -12,7 +14,8 @@ void KFS_Stream::swap(KFS_Stream& other)
     unsigned int const oldFlags = GetStreamBaseFlags();
 
     SwapBase(other);
-    std::swap(stamp_, other.stamp_);
+    if (stamp_ != other.stamp_)
+        std::swap(stamp_, other.stamp_);  // which renders read meanwhile, and isn't written then
     std::swap(dimension_, other.dimension_);
     std::swap(kfsFlags_, other.kfsFlags_);
     std::swap(spInterp_, other.spInterp_);
@@ -34,6 +37,8 @@ void KFS_Stream::swap(KFS_Stream& other)
     other.exprInfo_ = std::move(mine);
     std::swap(keyData_.cache, other.keyData_.cache);
 
+    ShowChangeInCopy();
+    other.ShowChangeInCopy();
     // A list hands its owner to the item functions.
     KFSp_FirstError error;
     for (KFS_Stream* const owner : {this, &other})

@@ -1,11 +1,12 @@
+// Names of units and of components, as the parameter record of the stream says.
+
 #include "frame/messages_private.h"
 #include "keystore/stream.h"
 
 #include <array>
 #include <cstddef>
 
-// Names of units and of components, as the parameter record of the stream says. Each name stands in the message table,
-// where it can be translated, and here in English.
+// Each name stands in the message table, where it can be translated, and here in English.
 
 namespace {
 

@@ -1,3 +1,5 @@
+// The expression of a stream from outside: whoever hears of values hears of these changes too.
+
 #include "overrides/streamexpression.h"
 
 #include "frame/boundary_private.h"
@@ -17,6 +19,7 @@ u16str KFS_SetStreamExpression(KFS_Stream* stream, u16str const& text)
     u16str old = stream->GetExprInfo().GetExpression();
     stream->GetExprInfoForModify().SetExpression(text);
     ForgetError(stream);
+    stream->ShowChangeInCopy();
     stream->NotifyValueChanged();
     return old;
 }
@@ -31,6 +34,7 @@ int KFS_SetStreamExprFlags(KFS_Stream* stream, unsigned int mask, unsigned int v
     KFSp_FirstError error;
     if ((mask & KFS_ExprFlag_Disabled) != 0) error.Keep(KFSp_Boundary([stream] { ForgetError(stream); }));
     stream->GetExprInfoForModify().SetFlagMask(value, mask);
+    error.Keep(KFSp_Boundary([stream] { stream->ShowChangeInCopy(); }));
     error.Keep(KFSp_Boundary([stream] { stream->NotifyValueChanged(); }));
     return error.Code();
 }

@@ -205,12 +205,6 @@ void KFSp_ConvertFromKeyDiskList(KFS_Stream* stream, SEQ_Head** list)
     stream->SetKeys(keys);
 }
 
-int KFSp_KeyScalarDiskSwap(KFS_Stream const* stream, KFS_KeyScalarDisk* record)
-{
-    SwapRecord(Layout(stream), record);
-    return 0;
-}
-
 int KFSp_KeyScalarDataSwap(KFS_Stream const* stream, KFS_KeyScalar* record)
 {
     Layout const layout(stream);

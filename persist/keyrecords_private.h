@@ -50,9 +50,8 @@ void KFSp_ConvertFromKeyDiskList(KFS_Stream* stream, SEQ_Head** list);
 // Disposes the stream's key list, if it has one, arc tables included. The stream's flags stay.
 void KFSp_DropKeyList(KFS_Stream* stream);
 
-// Swap one record in place, in either direction: a disk record whole; of a record in memory the value data, which is
-// that of a spatial record where the stream is spatial. A client's bytes stay as they are. Always 0.
-int KFSp_KeyScalarDiskSwap(KFS_Stream const* stream, KFS_KeyScalarDisk* record);
+// Swaps a record in memory in place, in either direction: its value data, which is that of a spatial record where the
+// stream is spatial. A client's bytes stay as they are. Always 0.
 int KFSp_KeyScalarDataSwap(KFS_Stream const* stream, KFS_KeyScalar* record);
 
 // A list that is disposed at the end of the scope.

@@ -77,14 +77,14 @@ TEST_F(Cache, AConstantFollowsTheAskedTime)
     stream.Key(0, {7.0});
     unsigned char atKey = 0;
     for (int const time : {5, -3, 100000}) {
-        KFSp_UpdateStreamCacheToTime(stream, time, 0, &atKey, &atKey, nullptr, 0);
+        KFSp_UpdateCacheToTime(stream, stream->GetKeyData(), time, {.atKey = &atKey});
         EXPECT_EQ(time, stream->GetCache()->time);
         EXPECT_EQ(1, atKey);
     }
     stream->ValidateCacheAtTime({1, 2});
     EXPECT_EQ(300, stream->GetCache()->time);
     // The sentinel isn't a time: it would say that the constant has no value.
-    KFSp_UpdateStreamCacheToTime(stream, KFS_INVALID_INDEX, 0, &atKey, nullptr, nullptr, 0);
+    KFSp_UpdateCacheToTime(stream, stream->GetKeyData(), KFS_INVALID_INDEX);
     EXPECT_FALSE(stream->HasNoValue());
     stream->ValidateCacheAtTime({KFS_INVALID_INDEX, 600});
     EXPECT_FALSE(stream->HasNoValue());
@@ -105,7 +105,7 @@ TEST_F(Cache, WhatIsAskedForIsAllThatIsDone)
     EXPECT_EQ(1, atKey);
     stream.At1(40);
     atKey = 7;
-    KFSp_UpdateStreamCacheToTime(stream, 100, 0, nullptr, &atKey, nullptr, 0);
+    KFSp_UpdateCacheToTime(stream, stream->GetKeyData(), 100, {.wantsValue = false, .atKey = &atKey});
     EXPECT_EQ(1, atKey);
     EXPECT_EQ(40, stream->GetCache()->time) << "whether a key is there needs no value";
 }
@@ -197,6 +197,30 @@ TEST_F(Cache, ARenderReadsItsOwnCopyAndLeavesTheStreamAlone)
     EXPECT_EQ(seen, stream.At(450)) << "as it stood at the first read";
     static_cast<KFS_StreamCacheState*>(render->PeekState(KFS_StreamCacheState::S_StateName))->FreeCacheData();
     EXPECT_NE(seen, stream.At(450));
+}
+
+TEST_F(Cache, AStreamsEndIsItsCopysEnd)
+{
+    OwnedValues::Scope const owned;
+    auto const custom = OwnedValues::MakeStream(false);
+    OwnedValues::InsertKey(custom.get(), 0, 5.0);
+    Q_ScSetCurrentRenderContext const current(kfshost::MakeRenderContext(true));
+    std::unique_ptr<KFS_Stream> clone(custom->CloneLeaf({true, true}));
+    EXPECT_EQ(5.0, OwnedValues::Read(clone.get(), 10));
+    clone.reset();
+    alignas(KFS_Stream) std::byte place[sizeof(KFS_Stream)];
+    for (short const dimension : {1, 3}) {  // at one address
+        KFS_ValueDesc desc;
+        desc.dataType = KFS_Type_Double;
+        auto* const stream =
+            new (place) KFS_Stream(dimension, 600, 1, 0, KFS_InterpMask_All, 0, desc, nullptr, nullptr, false);
+        std::vector<double> const value(static_cast<std::size_t>(dimension), dimension);
+        std::vector<double> read(value.size(), -1.0);
+        EXPECT_EQ(0, KFS_InsertKeyF(stream, nullptr, 1, value.data(), 0, 0));
+        EXPECT_EQ(0, KFS_GetValueFPlus(stream, nullptr, 0, read.data(), nullptr, nullptr));
+        EXPECT_EQ(value, read);
+        stream->~KFS_Stream();
+    }
 }
 
 TEST_F(Cache, ACopyOwnsItsArcTables)

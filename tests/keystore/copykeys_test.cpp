@@ -1,5 +1,6 @@
 #include "keystore/copykeys.h"
 
+#include "curves/floatkeys.h"
 #include "keystore/edit.h"
 #include "tests/support/listening.h"
 #include "tests/support/ownedvalues.h"
@@ -152,34 +153,29 @@ TEST_F(CopyKeys, TheDestinationPreparesAndMayRefuse)
     }
 }
 
-TEST_F(CopyKeys, RecordsThatAreTooShortAreRefused)
+TEST_F(CopyKeys, RecordsOfAnotherSizeAreTakenAsFarAsTheyGo)
 {
     struct Row {
         StreamOptions source, destination;
-        bool refused;
     };
     Row const rows[] = {
-        {{.dimension = 1}, {.dimension = 2}, true},
-        {{.dimension = 2}, {.dimension = 1}, false},
-        {{.dimension = 2, .spatial = true}, {.dimension = 2}, true},
-        {{.dimension = 2}, {.dimension = 2, .spatial = true}, false},
+        {{.dimension = 1}, {.dimension = 2}},
+        {{.dimension = 2}, {.dimension = 1}},
+        {{.dimension = 2, .spatial = true}, {.dimension = 2}},
+        {{.dimension = 2}, {.dimension = 2, .spatial = true, .spInterpMask = 0}},
     };
     for (Row const& row : rows) {
         TestStream source(row.source);
-        TestStream destination(row.destination);
-        source.Key(10, std::vector<double>(2, 1.0)).Key(20, std::vector<double>(2, 2.0));
-        int index = 77;
-        EXPECT_EQ(row.refused ? 3 : 0, KFS_CopyKey(source, 0, 1, nullptr, destination, &index));
-        EXPECT_EQ(row.refused ? 3 : 0, KFS_CopyKeys(source, nullptr, destination));
-        if (row.refused) {
-            EXPECT_EQ(reports.Take(), (std::vector<Reported>{{0x1D0013, 8, "key data size mismatch", 3},
-                                                             {0x1D0015, 8, "key data size mismatch", 3}}));
-            EXPECT_EQ(0, destination.Count());
-        } else {
-            EXPECT_EQ((std::vector<int>{10, 20}), destination.Times());
-            EXPECT_EQ(row.destination.spatial, KFSp_HasSpatialBlock(destination.Record(0)))
-                << "records keep their layout";
-        }
+        source.Key(10, {1.0, 1.5}).Key(20, {2.0, 2.5});
+        TestStream one(row.destination), all(row.destination);
+        ASSERT_EQ(0, KFS_CopyKey(source, 1, 1, nullptr, one, nullptr));
+        ASSERT_EQ(0, KFS_CopyKeys(source, nullptr, all));
+        EXPECT_EQ((std::vector<int>{10, 20}), all.Times());
+        EXPECT_EQ(row.destination.spatial, KFSp_HasSpatialBlock(all.Record(0))) << "records keep their layout";
+        std::vector<double> expected = source.Numbers(1);
+        expected.resize(all.Numbers(1).size());  // the rest is zero
+        EXPECT_EQ(expected, all.Numbers(1));
+        EXPECT_EQ(expected, one.Numbers(0));
     }
 }
 
@@ -279,9 +275,31 @@ TEST_F(CopyKeys, AFailureTakesEverythingBack)
     EXPECT_EQ((std::vector<int>{0, 300, 450, 600}), destination.Times());
 }
 
+// A listener who reads gives the float key among the copies its own time.
+TEST_F(CopyKeys, AFailureTakesBackWhatAReadHasMoved)
+{
+    TestStream source({.dimension = 2, .spatial = true});
+    source.Key(0, {0, 0}).Key(100, {8, 0}).Key(600, {9, 1}).Key(900, {0, 0});
+    ASSERT_EQ(0, KFS_SetKeyFloat(source, 1, 1));
+    TestStream destination({.dimension = 2, .spatial = true});
+    destination.Key(300, {5, 5}).Key(700, {-5, 5});
+    auto const before = destination.Times();
+    HeardRoot root;
+    root.Store(destination);
+    int calls = 0;
+    ValueListener listener([&] {
+        destination.At(10);
+        if (++calls == 4) throw 4711;
+    });
+    EXPECT_EQ(4711, KFS_CopyKeys(source, nullptr, destination));
+    EXPECT_EQ(before, destination.Times());
+}
+
 TEST_F(CopyKeys, CustomValuesAreCopiedAndGivenBack)
 {
-    for (int const failure : {0, 1, 2, 3}) {  // which key's insertion fails
+    for (int const run : {0, 1, 2, 3, 4, 5, 6, 7}) {
+        int const failure = run % 4;  // which key's insertion fails
+        bool const reads = run >= 4;  // a listener, and what is read stays in the cache record
         OwnedValues::Scope const owned;
         HeardRoot root;
         auto const source = OwnedValues::MakeStream(false), destination = OwnedValues::MakeStream(false);
@@ -290,10 +308,11 @@ TEST_F(CopyKeys, CustomValuesAreCopiedAndGivenBack)
         root.Store(destination.get());
         int calls = 0;
         ValueListener listener([&] {
+            if (reads && destination->GetKeyCount() > 0) OwnedValues::Read(destination.get(), 50);
             if (++calls == failure) throw 4711;
         });
         EXPECT_EQ(failure != 0 ? 4711 : 0, KFS_CopyKeys(source.get(), nullptr, destination.get()));
-        EXPECT_EQ(failure != 0 ? 4 : 6, OwnedValues::Live());
+        EXPECT_EQ((failure != 0 ? 4 : 6) + (reads ? 1 : 0), OwnedValues::Live());
         EXPECT_EQ(failure != 0 ? 50.0 : 1.0, OwnedValues::RemoveKey(destination.get(), failure != 0 ? 0 : 1));
     }
 }

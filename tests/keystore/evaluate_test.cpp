@@ -8,6 +8,8 @@
 #include "tests/support/streams.h"
 #include "tests/support/text.h"
 
+#include <boost/weak_ptr.hpp>
+
 #include <stdexcept>
 
 namespace {
@@ -124,6 +126,23 @@ TEST_F(Evaluate, TheStagesGoInTheirOrder)
     int const asked = engine->asked;
     EXPECT_EQ(0, KFS_GetValueFPlus(stream, &at, 0, nullptr, nullptr, nullptr)) << "nobody wants a value";
     EXPECT_EQ(asked, engine->asked);
+}
+
+TEST_F(Evaluate, AnExpressionMayHaveItsEngineReplaced)
+{
+    Q_ScSetCurrentRenderContext const current(context);
+    TestStream stream;
+    stream.Key(0, {1.0});
+    stream->GetExprInfoForModify().SetExpression(Text("x"));
+    boost::weak_ptr<Engine> const old(engine);
+    engine->expression = [&](KFS_Stream const*, int, double*) {
+        context->SetState(boost::shared_ptr<Engine>(new Engine));
+        engine.reset();
+        EXPECT_FALSE(old.expired()) << "it is running";
+        return KFS_Err_ExprNoValue;
+    };
+    EXPECT_EQ(1.0, stream.At1(0)) << "the keys, as the old one reads them";
+    EXPECT_TRUE(old.expired());
 }
 
 TEST_F(Evaluate, AnotherStreamsExpressionIsConvertedThroughDoubles)

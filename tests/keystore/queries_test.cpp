@@ -165,6 +165,10 @@ public:
     {}
     bool HasMinValue() const override { return hasMin_; }
     bool HasMaxValue() const override { return hasMax_; }
+    double GetMinValue() const override { return own != 0.0 ? -own : KFS_Stream::GetMinValue(); }
+    double GetMaxValue() const override { return own != 0.0 ? own : KFS_Stream::GetMaxValue(); }
+
+    double own = 0.0;  // not 0: the class has limits of its own
 
 private:
     bool hasMin_;
@@ -209,6 +213,11 @@ TEST_F(Queries, LimitsComeFromTheParameterRecord)
         EXPECT_EQ(row.uiMin, limited.GetUIMinValue());
         EXPECT_EQ(row.uiMax, limited.GetUIMaxValue());
         EXPECT_EQ(row.precision, limited.GetPrecision());
+        limited.own = 42.0;
+        bool const asksTheClass = row.kind == FX_Param_FIXED_ANGLE;
+        EXPECT_EQ(asksTheClass ? -42.0 : row.uiMin, limited.GetUIMinValue());
+        EXPECT_EQ(asksTheClass ? 42.0 : row.uiMax, limited.GetUIMaxValue());
+        limited.own = 0.0;
         bool const isSlider = row.uiMin != row.min;
         limited.SetUIMinValue(-4.0);
         limited.SetUIMaxValue(2.0);

@@ -1,7 +1,17 @@
+#include "curves/floatkeys.h"
+#include "curves/spacetangents.h"
+#include "curves/tangents.h"
+#include "keystore/attributes.h"
 #include "keystore/cachestate.h"
+#include "keystore/copykeys.h"
 #include "keystore/keyflags.h"
+#include "keystore/lookup.h"
+#include "overrides/streamexpression.h"
 #include "tests/support/streams.h"
+#include "tests/support/text.h"
 
+#include <algorithm>
+#include <array>
 #include <atomic>
 #include <random>
 #include <thread>
@@ -21,39 +31,150 @@ protected:
         for (int i = 0; i < Keys; ++i) {
             plain.Key(i * 60, {value(random), value(random)}, i % 3 ? KFS_Interp_Spline : KFS_Interp_Linear);
             spatial.Key(i * 60, {value(random), value(random), value(random)}, KFS_Interp_Spline);
+            words.Key(i * 60, {value(random)}, KFS_Interp_Spline);
             if (i % 4 == 2) EXPECT_EQ(0, KFS_SetKeyModifiable(plain, 1, i));
         }
+        constant.Key(0, {1.0, 2.0, 3.0});
+        for (KFS_Stream* const stream : All()) EXPECT_EQ(0, KFS_CopyKeys(stream, nullptr, Donor(stream)));
     }
 
+    // What a render asks: values in both forms, and where keys stand.
     std::vector<double> Sample() const
     {
         std::vector<double> samples;
         for (int time = -30; time < Span + 30; time += 7) {
-            for (TestStream const* const stream : {&plain, &spatial}) {
-                std::vector<double> const value = stream->At(time);
-                samples.insert(samples.end(), value.begin(), value.end());
+            T_Time const at{time, 600};
+            for (KFS_Stream const* const stream : All()) {
+                double value[3] = {};
+                float element[1] = {};
+                int index = 0;
+                bool const asDoubles = stream != words.get() || time % 2 == 0;
+                int const code = asDoubles ? KFS_GetValueFPlus(stream, &at, 0, value, nullptr, nullptr)
+                                           : KFS_GetValuePlus(stream, &at, 0, element, nullptr, nullptr, nullptr, 0);
+                EXPECT_EQ(0, code);
+                EXPECT_EQ(0, KFS_FindNearestKeyTime(stream, &at, &index, nullptr));
+                if (!asDoubles) value[0] = element[0];
+                samples.insert(samples.end(), std::begin(value), std::end(value));
+                samples.push_back(index);
             }
         }
         return samples;
     }
 
-    // Only the external forms: the double forms change a stream's description for the length of the call.
+    // One of each kind of edit on each stream, in a drawn order.
     void Edit(std::mt19937& random)
     {
-        int const time = static_cast<int>(random() % static_cast<unsigned>(Span));
-        double const value[3] = {1.0 * time, -1.0 * time, 5.0};
-        T_Time const at{time, 600};
-        for (KFS_Stream* const stream : {plain.get(), spatial.get()}) {
-            EXPECT_EQ(0, KFS_InsertKey(stream, &at, 1, value, KFS_Interp_Spline, KFS_Interp_Linear));
-            if (stream->GetKeyCount() > Keys)
-                EXPECT_EQ(0, KFS_RemoveKey(stream, static_cast<int>(random() % Keys), nullptr));
-            double read[3];
-            EXPECT_EQ(0, KFS_GetValuePlus(stream, &at, 0, read, nullptr, nullptr, nullptr, 0));
+        std::vector<KindOfEdit> kinds = Kinds;
+        std::shuffle(kinds.begin(), kinds.end(), random);
+        for (KindOfEdit const& kind : kinds) {
+            for (KFS_Stream* const stream : All()) {
+                Draw const draw{stream,
+                                *Donor(stream),
+                                *constant,
+                                {static_cast<int>(random() % Span), 600},
+                                static_cast<int>(random() % static_cast<unsigned>(stream->GetKeyCount() - 2)) + 1};
+                ASSERT_EQ(0, kind.edit(draw)) << kind.what;
+                double read[3];
+                EXPECT_EQ(0, KFS_GetValueFPlus(stream, &draw.at, 0, read, nullptr, nullptr)) << "after " << kind.what;
+            }
         }
     }
 
-    TestStream plain{{.dimension = 2}};
-    TestStream spatial{{.dimension = 3, .spatial = true}};
+    struct Draw {
+        KFS_Stream* stream;
+        KFS_Stream& donor;     // of the same kind
+        KFS_Stream& constant;  // one value
+        T_Time at;
+        int index;  // of a key that isn't at an end
+    };
+    struct KindOfEdit {
+        char const* what;
+        int (*edit)(Draw const& draw);
+    };
+    static constexpr double Numbers[3] = {17.0, -3.0, 0.25};
+    static std::vector<KindOfEdit> const Kinds;
+
+    std::array<KFS_Stream*, 3> All() const { return {plain.get(), spatial.get(), words.get()}; }
+    TestStream const& Donor(KFS_Stream const* stream) const
+    {
+        return stream == plain.get() ? plainDonor : stream == spatial.get() ? spatialDonor : wordsDonor;
+    }
+
+    TestStream plain{{.dimension = 2}}, plainDonor{{.dimension = 2}};
+    TestStream spatial{{.dimension = 3, .spatial = true}}, spatialDonor{{.dimension = 3, .spatial = true}};
+    TestStream words{{.type = KFS_Type_Float}}, wordsDonor{{.type = KFS_Type_Float}};
+    TestStream constant{{.dimension = 3, .noKeys = true}};
+};
+
+// The first code that isn't 0. In a list the calls happen in their order.
+int FirstOf(std::initializer_list<int> codes)
+{
+    auto const failed = std::find_if(codes.begin(), codes.end(), [](int code) { return code != 0; });
+    return failed == codes.end() ? 0 : *failed;
+}
+
+std::vector<RenderThreads::KindOfEdit> const RenderThreads::Kinds = {
+    {"insert",
+     [](Draw const& d) { return KFS_InsertKeyF(d.stream, &d.at, 1, Numbers, KFS_Interp_Spline, KFS_Interp_Linear); }},
+    {"insert on the curve", [](Draw const& d) { return KFS_InsertKeyF(d.stream, &d.at, 1, nullptr, 0, 0); }},
+    {"insert in external form",
+     [](Draw const& d) { return KFS_InsertKey(d.stream, &d.at, 1, Numbers, KFS_Interp_Spline, KFS_Interp_Spline); }},
+    {"set", [](Draw const& d) { return KFS_SetKeyF(d.stream, d.index, Numbers, KFS_Interp_Spline, 0); }},
+    {"remove",
+     [](Draw const& d) { return d.stream->GetKeyCount() > Keys / 2 ? KFS_RemoveKey(d.stream, d.index, nullptr) : 0; }},
+    {"velocity", [](Draw const& d) { return KFS_SetKeyVelocityF(d.stream, d.index, Numbers, Numbers); }},
+    {"continuous", [](Draw const& d) { return KFS_SetKeyContinuous(d.stream, 1, d.index); }},
+    {"modifiable", [](Draw const& d) { return KFS_SetKeyModifiable(d.stream, 1, d.index); }},
+    {"path tangents",
+     [](Draw const& d) {
+         return d.stream->IsSpatial() ? KFS_SetKeySpaceTangentsF(d.stream, d.index, 0, Numbers, Numbers) : 0;
+     }},
+    {"float", [](Draw const& d) { return d.stream->IsSpatial() ? KFS_SetKeyFloat(d.stream, 1, d.index) : 0; }},
+    {"copies", [](Draw const& d) { return KFS_CopyKeys(&d.donor, nullptr, d.stream); }},
+    {"copy of a constant", [](Draw const& d) { return KFS_CopyKeys(&d.constant, nullptr, d.stream); }},
+    {"constant and back",
+     [](Draw const& d) {
+         int const code = FirstOf({d.stream->SetConstant(1, 0), d.stream->SetConstant(0, 0)});
+         return code != 0 ? code : KFS_CopyKeys(&d.donor, nullptr, d.stream);
+     }},
+    {"rescale",
+     [](Draw const& d) {
+         return FirstOf({KFS_RescaleStream(d.stream, 24), KFS_RescaleStream(d.stream, 600)});
+     }},
+    {"description",
+     [](Draw const& d) {
+         KFS_ValueDesc const old = *d.stream->GetValueDesc();
+         KFS_ValueDesc bytes = old;
+         bytes.dataType = KFS_Type_U8;
+         return FirstOf(
+             {KFS_SetValueDescription(d.stream, &bytes, nullptr), KFS_SetValueDescription(d.stream, &old, nullptr)});
+     }},
+    {"arc-length parametrisation",
+     [](Draw const& d) {
+         return d.stream->IsSpatial()
+                    ? FirstOf({KFS_SetStreamSParametrize(d.stream, 0), KFS_SetStreamSParametrize(d.stream, 1)})
+                    : 0;
+     }},
+    {"multiplier",
+     [](Draw const& d) { return d.stream->IsSpatial() ? KFS_SetStreamMultiplier(d.stream, Numbers, nullptr) : 0; }},
+    {"automatic path",
+     [](Draw const& d) {
+         return FirstOf(
+             {KFS_SetStreamSpInterp(d.stream, KFS_SpInterp_None),
+              KFS_SetStreamSpInterp(d.stream, d.stream->IsSpatial() ? KFS_SpInterp_Auto : KFS_SpInterp_None)});
+     }},
+    {"expression",
+     [](Draw const& d) {
+         KFS_SetStreamExpression(d.stream, Text("not run"));
+         KFS_SetStreamExpression(d.stream, u16str());
+         return 0;
+     }},
+    {"swap",
+     [](Draw const& d) {
+         d.stream->swap(d.donor);
+         d.donor.swap(*d.stream);
+         return 0;
+     }},
 };
 
 // The host's gate: the main thread holds its edits until every render has its copies. From then on reads and edits run
