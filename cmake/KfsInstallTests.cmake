@@ -25,6 +25,31 @@ add_custom_target(update-exports
     DEPENDS kfs
     COMMENT "Writing tests/install/exports.txt")
 
+add_test(NAME install.virtuals
+    COMMAND bash "${installTests}/virtuals.sh" "${CMAKE_CXX_COMPILER}" "${installPrefix}/${CMAKE_INSTALL_INCLUDEDIR}/kfs")
+add_custom_target(update-virtuals
+    COMMAND "${CMAKE_COMMAND}" -DBUILD=${CMAKE_BINARY_DIR} -DPREFIX=${installPrefix} -P "${installTests}/install.cmake"
+    COMMAND bash "${installTests}/virtuals.sh" "${CMAKE_CXX_COMPILER}" "${installPrefix}/${CMAKE_INSTALL_INCLUDEDIR}/kfs"
+        --update
+    COMMENT "Writing tests/install/virtuals.txt")
+
+# A host that loads the library late: what room others left, and whose services it meets.
+add_library(static_tls_filler MODULE "${installTests}/filler.cpp")
+foreach(name IN ITEMS load load_beside_others)
+    add_executable(test_${name} "${installTests}/load.cpp")
+    target_link_libraries(test_${name} PRIVATE ${CMAKE_DL_LIBS})
+    add_dependencies(test_${name} kfs static_tls_filler)
+endforeach()
+add_test(NAME install.load COMMAND test_load "$<TARGET_FILE:kfs>" "$<TARGET_FILE:static_tls_filler>")
+set(loadTests install.load)
+if(NOT KFS_FOREIGN_SERVICES)
+    target_compile_definitions(test_load_beside_others PRIVATE OTHER_SERVICES)
+    set_target_properties(test_load_beside_others PROPERTIES ENABLE_EXPORTS ON)
+    add_test(NAME install.load_beside_others COMMAND test_load_beside_others "$<TARGET_FILE:kfs>")
+    list(APPEND loadTests install.load_beside_others)
+endif()
+set_tests_properties(${loadTests} PROPERTIES LABELS install TIMEOUT 120)
+
 add_test(NAME install.consumer
     COMMAND "${CMAKE_CTEST_COMMAND}"
         --build-and-test "${PROJECT_SOURCE_DIR}/tests/consumer" "${CMAKE_BINARY_DIR}/consumer"
@@ -36,5 +61,5 @@ add_test(NAME install.consumer
             "-DCMAKE_BUILD_TYPE=${CMAKE_BUILD_TYPE}"
             "-DCMAKE_FIND_USE_PACKAGE_REGISTRY=OFF"
         --test-command consumer)
-set_tests_properties(install.headers install.exports install.consumer PROPERTIES FIXTURES_REQUIRED installed_tree)
-set_tests_properties(install.tree install.headers install.exports install.consumer PROPERTIES LABELS install TIMEOUT 600)
+set_tests_properties(install.headers install.exports install.virtuals install.consumer PROPERTIES FIXTURES_REQUIRED installed_tree)
+set_tests_properties(install.tree install.headers install.exports install.virtuals install.consumer PROPERTIES LABELS install TIMEOUT 600)

@@ -7,7 +7,8 @@ find_package(Threads REQUIRED)
 find_package(nlohmann_json REQUIRED)
 
 # What every shared library here has in common. Calls inside a library don't go through the PLT and can be inlined, and
-# a thread-local is one load: hence the last four. The TLS model costs a few bytes of the loader's static TLS space.
+# a thread-local is one load: hence the last four. Whatever is thread-local takes static TLS by that, of which a process that
+# loads libkfs late has little left (install.load): pointers are fine, buffers belong on the heap.
 function(kfs_shared_library target)
     set_target_properties(${target} PROPERTIES VERSION ${PROJECT_VERSION} SOVERSION ${PROJECT_VERSION_MAJOR})
     target_link_options(${target} PRIVATE -Wl,-Bsymbolic-functions)
@@ -38,6 +39,9 @@ set(KFS_LIBRARY_FOLDERS frame tree keystore curves persist overrides)
 kfs_sources(librarySources ${KFS_LIBRARY_FOLDERS})
 add_library(kfs_objects OBJECT ${librarySources})
 kfs_library_code(kfs_objects)
+if(KFS_FOREIGN_SERVICES)
+    target_compile_definitions(kfs_objects PRIVATE KFS_FOREIGN_SERVICES)
+endif()
 target_link_libraries(kfs_objects PUBLIC kfs_services Boost::headers PRIVATE Boost::thread Threads::Threads)
 
 add_library(kfs SHARED $<TARGET_OBJECTS:kfs_objects>)

@@ -44,10 +44,23 @@ function(kfs_add_test_folder name)
 endfunction()
 
 kfs_subfolders(testFolders tests)
-list(REMOVE_ITEM testFolders support install consumer)
+list(REMOVE_ITEM testFolders support install consumer foreign)
 foreach(name IN LISTS testFolders)
     kfs_add_test_folder(${name})
 endforeach()
+
+# The library with KFS_FOREIGN_SERVICES. Only the files that ask whether there are shortcuts are compiled once more.
+set(shortcutSources tree/birth.cpp keystore/cache.cpp curves/interpolate.cpp curves/spatial.cpp)
+add_library(kfs_foreign_objects OBJECT ${shortcutSources})
+kfs_library_code(kfs_foreign_objects)
+target_compile_definitions(kfs_foreign_objects PRIVATE KFS_FOREIGN_SERVICES)
+target_link_libraries(kfs_foreign_objects PUBLIC kfs_services Boost::headers PRIVATE Boost::thread Threads::Threads)
+list(JOIN shortcutSources "|" shortcutObjects)
+add_executable(test_foreign tests/foreign/list.cpp tests/foreign/services_test.cpp host/session.cpp host/kinds.cpp host/names.cpp
+    "$<FILTER:$<TARGET_OBJECTS:kfs_objects>,EXCLUDE,/(${shortcutObjects})\\.o>" $<TARGET_OBJECTS:kfs_foreign_objects>)
+target_link_libraries(test_foreign PRIVATE kfs_test_base kfs_services Boost::thread Threads::Threads ${CMAKE_DL_LIBS})
+gtest_discover_tests(test_foreign DISCOVERY_MODE PRE_TEST DISCOVERY_TIMEOUT 120 TEST_PREFIX "foreign."
+    PROPERTIES LABELS foreign TIMEOUT 600)
 
 # Fifty digits are slow enough without a debug build or a sanitizer around them.
 set(museum "${PROJECT_SOURCE_DIR}/tests/services/museum")

@@ -108,8 +108,8 @@ int EvaluateCurved(KFS_Stream const* stream, Segment keys, int time, double* res
         KFSp_TemporalEnd const a = segment.First(i);
         KFSp_TemporalEnd const b = segment.Last(i);
         KFSp_TemporalHandles const handles = KFSp_GetTemporalHandles(a, b, segment.dt);
-        bool const stands = !mayNotFall || CRVp_IsInside(a.value, handles.y1, handles.y2, b.value) ||
-                            CRVp_IsInside(b.value, handles.y2, handles.y1, a.value);
+        bool const stands = !mayNotFall || KFSp_IsKnownToRise(a.value, handles.y1, handles.y2, b.value) ||
+                            KFSp_IsKnownToRise(b.value, handles.y2, handles.y1, a.value);
         if (!stands || !KFSp_SolveSegment(a, b, handles, u, &result[i])) [[unlikely]]
             return EvaluateCurvedSlow(stream, keys, time, i, result);
     }

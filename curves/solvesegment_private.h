@@ -1,7 +1,7 @@
 #pragma once
 
 #include "curves/segment_private.h"
-#include "services/curvekernel/solve_private.h"
+#include "keystore/shortcuts_private.h"
 
 // What CRV_EvaluateYFromX answers for the curve of a temporal segment, at the share `u` of its time, without building the
 // curve: influences are the handles of the unit cubic that is to be solved. False, and `value` untouched, where the
@@ -11,12 +11,5 @@
 {
     double const out = a.spline ? a.influence : KFSp_OneSixth;
     double const in = b.spline ? b.influence : KFSp_OneSixth;
-    double t = 0.0;
-    if (!CRVp_UnitRoot(out, 1.0 - in, u, t)) [[unlikely]]
-        return false;
-    double const found = CRVp_Blend(a.value, handles.y1, handles.y2, b.value, t);
-    if (!CRVp_IsFinite(found)) [[unlikely]]
-        return false;
-    *value = CRVp_LimitToHull(a.value, handles.y1, handles.y2, b.value, found);
-    return true;
+    return KFSp_SolveUnitSegment(out, in, u, a.value, handles.y1, handles.y2, b.value, value);
 }

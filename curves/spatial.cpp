@@ -41,6 +41,7 @@ struct PathPlace {
 {
     if (keyIndex < 0 || keyIndex >= KFSp_ItemCount(data) - 1) return false;
     auto const [a, b] = KFSp_GetKeyPair(data, keyIndex);
+    if (!KFSp_HasShortcuts && !a) return false;
     run->a = a;
     run->b = b;
     run->aIndex = keyIndex;
@@ -95,7 +96,7 @@ double LinearFraction(KFS_KeyScalar const* a, KFS_KeyScalar const* b, int time)
     KFSp_SpeedGraphEnds const ends(run.a, run.b, run.total);
     double const dt = KFSp_Seconds(run.b->time, run.a->time, stream->GetTimeScale());
     KFSp_TemporalHandles const handles = KFSp_GetTemporalHandles(ends.a, ends.b, dt);
-    return CRVp_IsInside(0.0, handles.y1, handles.y2, run.total) &&
+    return KFSp_IsKnownToRise(0.0, handles.y1, handles.y2, run.total) &&
            KFSp_SolveSegment(ends.a, ends.b, handles, LinearFraction(run.a, run.b, time), s);
 }
 
@@ -186,17 +187,13 @@ void WriteStraight(KFS_Stream const* stream, Run const& run, double t, double* r
         result[2 * dimension] = t;
 }
 
-// What CRV_EvaluatePoint answers. It is asked only about a point that isn't finite, and says what is wrong then.
+// What CRV_EvaluatePoint answers. Of a point that isn't finite it says itself what is wrong.
 [[gnu::always_inline]] inline int EvaluatePoint(CRV_Curve const& curve, double t, double* result)
 {
-    double const at = CRVp_LimitToUnit(t);
     double point[KFSp_SegmentCurve::MaxDimension];
-    for (int i = 0; i < curve.dimension; ++i) {
-        double const value = CRVp_Blend(curve.p0[i], curve.p1[i], curve.p2[i], curve.p3[i], at);
-        if (!CRVp_IsFinite(value)) [[unlikely]]
+    for (int i = 0; i < curve.dimension; ++i)
+        if (!KFSp_EvaluateCoordinate(curve.p0[i], curve.p1[i], curve.p2[i], curve.p3[i], t, &point[i])) [[unlikely]]
             return CRV_EvaluatePoint(&curve, result, t);
-        point[i] = CRVp_LimitToHull(curve.p0[i], curve.p1[i], curve.p2[i], curve.p3[i], value);
-    }
     std::copy_n(point, curve.dimension, result);
     return 0;
 }

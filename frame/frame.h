@@ -16,7 +16,9 @@ class KFS_StreamIDPath;
 struct KFS_AppCallbacks {
     // An old file stored a type number in place of a path: fills the path in. If null, the path stays as read.
     void (*oldPathFixupFunc)(int oldType, KFS_StreamIDPath* path) = nullptr;
-    int (*layerDefaultValueFunc)(KFS_ParamLayerStream const* stream) = nullptr;
+    // The layer that a stream has by default: what a layer parameter holds, so null for none.
+    void* (*layerDefaultValueFunc)(KFS_ParamLayerStream const* stream) = nullptr;
+    // The flat number of a stream's layer, or the layer of its flat number.
     long (*layerIndependentFunc)(KFS_ParamLayerStream const* stream, bool independent) = nullptr;
     hearth::utility::Guid (*layerRenderGuidFunc)(KFS_ParamLayerStream const* stream,
                                                  KFS_RenderOptionsBase const& options,
@@ -28,6 +30,10 @@ struct KFS_AppCallbacks {
 
 // Bracket all use of the library: make and destroy the default stream factory and what the tree shares. On the main
 // thread. 0 or an error code; a failed Birth is followed by Death as well.
+//
+// Libkfs reaches into its own services where a read can't afford a call. Loaded with others, Birth reports that and answers
+// KFS_Err_ForeignServices; built with KFS_FOREIGN_SERVICES it uses their operations only, and takes any.
+inline constexpr int KFS_Err_ForeignServices = 7447;
 KFS_API int KFS_Birth();
 KFS_API int KFS_Death();
 

@@ -14,6 +14,18 @@ int ToScale(int code, unsigned int scale, T_Time* result)
     return converted;
 }
 
+int Subtract(T_Time const& a, T_Time const& b, T_Time* result)
+{
+    // The least value has no negative; the difference may fit all the same.
+    if (b.value == INT_MIN)
+        return KFSp_Boundary([&] {
+            *result = a - b;
+            return 0;
+        });
+    T_Time const negated{-b.value, b.scale};
+    return T_AddTime(&a, &negated, result);
+}
+
 }  // namespace
 
 int KFS_AddTime(T_Time const* a, T_Time const* b, unsigned int scale, T_Time* result)
@@ -23,9 +35,7 @@ int KFS_AddTime(T_Time const* a, T_Time const* b, unsigned int scale, T_Time* re
 
 int KFS_SubTime(T_Time const* a, T_Time const* b, unsigned int scale, T_Time* result)
 {
-    if (b->value == INT_MIN) return T_Err_Overflow;  // has no negative
-    T_Time const negated{-b->value, b->scale};
-    return ToScale(T_AddTime(a, &negated, result), scale, result);
+    return ToScale(Subtract(*a, *b, result), scale, result);
 }
 
 int KFS_MulTime(T_Time const* a, M_Ratio const* ratio, unsigned int scale, T_Time* result)

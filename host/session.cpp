@@ -25,7 +25,7 @@ KFS_AppCallbacks HarmlessCallbacks()
 {
     KFS_AppCallbacks callbacks;
     callbacks.oldPathFixupFunc = [](int, KFS_StreamIDPath*) {};
-    callbacks.layerDefaultValueFunc = [](KFS_ParamLayerStream const*) { return 0; };
+    callbacks.layerDefaultValueFunc = [](KFS_ParamLayerStream const*) -> void* { return nullptr; };
     callbacks.layerIndependentFunc = [](KFS_ParamLayerStream const*, bool) { return 0L; };
     callbacks.layerRenderGuidFunc = [](KFS_ParamLayerStream const*, KFS_RenderOptionsBase const&,
                                        GetRenderGuidFilter*) { return hearth::utility::Guid(); };

@@ -55,28 +55,43 @@ int InterpolateToCache(KFS_Stream const* stream, KFS_StreamKeyData const* data, 
     return code;
 }
 
-// The value between, before or after keys. `next` is the index of the first key after the time. Only a function that
-// may call the list again while it holds a key runs under a pin.
+// What needs no function that may call the list again while it holds a key. False, and nothing done, where one does.
+[[gnu::always_inline]] inline bool FillFromPair(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time,
+                                                int next, KFS_InterpFunc* interpFunc, int* code)
+{
+    if (stream->IsSpatial()) return false;
+    auto const [a, b] = KFSp_GetKeyPair(data, next - 1);
+    if (!KFSp_HasShortcuts && !a) return false;
+    // A hold on the far side takes the later key's value, and is meant to.
+    if (a->outInterp == KFS_Interp_Hold)
+        *code = CopyKeyToCache(data, next - 1);
+    else if (b->inInterp == KFS_Interp_Hold)
+        *code = CopyKeyToCache(data, next);
+    else if ((interpFunc ? *interpFunc : stream->GetInterpFunc()) == KFSp_Interpolate) [[likely]] {
+        *code = KFSp_InterpolateBetween(stream, a, b, time, KFSp_Numbers(data->cache));
+        data->cache->time = *code == 0 ? time : KFS_INVALID_INDEX;
+    } else {
+        return false;
+    }
+    return true;
+}
+
+// The value between, before or after keys. `next` is the index of the first key after the time. The items of our own
+// lists stand still while nobody calls the list, those of others while it is pinned.
 inline int FillBetweenKeys(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int next,
                            KFS_InterpFunc* interpFunc, long refcon)
 {
     if (next == 0) return CopyKeyToCache(data, 0);
     if (next >= KFSp_ItemCount(data)) return CopyKeyToCache(data, next - 1);
-    if (!stream->IsSpatial()) {
-        auto const [a, b] = KFSp_GetKeyPair(data, next - 1);
-        if (a->outInterp == KFS_Interp_Hold) return CopyKeyToCache(data, next - 1);
-        // A hold on the far side takes the later key's value, and is meant to.
-        if (b->inInterp == KFS_Interp_Hold) return CopyKeyToCache(data, next);
-        if ((interpFunc ? *interpFunc : stream->GetInterpFunc()) == KFSp_Interpolate) [[likely]] {
-            int const code = KFSp_InterpolateBetween(stream, a, b, time, KFSp_Numbers(data->cache));
-            data->cache->time = code == 0 ? time : KFS_INVALID_INDEX;
-            return code;
-        }
-    }
+    int code = 0;
+    if (KFSp_HasShortcuts && FillFromPair(stream, data, time, next, interpFunc, &code)) return code;
     KFSp_FirstError error;
     {
         KFSp_ScConstPin const pin(data->keys, error);
-        if (error.None()) error.Keep(InterpolateToCache(stream, data, time, next - 1, interpFunc, refcon));
+        if (error.None()) {
+            bool const filled = !KFSp_HasShortcuts && FillFromPair(stream, data, time, next, interpFunc, &code);
+            error.Keep(filled ? code : InterpolateToCache(stream, data, time, next - 1, interpFunc, refcon));
+        }
     }
     return error.Code();
 }

@@ -20,7 +20,7 @@ int SearchList(KFS_StreamKeyData const* data, int time, bool* found, int* index)
 {
     KFS_KeyScalar const probe = MakeProbe(time);
     unsigned char foundByte = 0;
-    int const code = SEQ_GetSortedConstItem(data->keys, 0, &probe, &foundByte, 0, index);
+    int const code = SEQ_GetSortedConstItem(data->keys, 0, 0, &probe, &foundByte, 0, index);
     *found = foundByte != 0;
     return code;
 }

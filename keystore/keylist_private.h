@@ -1,8 +1,8 @@
 #pragma once
 
 #include "keystore/items.h"
+#include "keystore/shortcuts_private.h"
 #include "keystore/stream.h"
-#include "services/sequence/list_private.h"
 
 #include <climits>
 
@@ -140,16 +140,15 @@ inline bool KFSp_Roves(KFS_StreamKeyData const* data, KFS_KeyScalar const* key, 
     return KFSp_Floats(key) && index > 0 && index < KFSp_ItemCount(data) - 1;
 }
 
-// Two neighbours, read-only, without a call: there is a key at `index` and one after it.
+// KFSp_GetItemPair of keys.
 struct KFSp_KeyPair {
     KFS_KeyScalar const* a;
     KFS_KeyScalar const* b;
 };
-inline KFSp_KeyPair KFSp_GetKeyPair(KFS_StreamKeyData const* data, int index)
+[[gnu::always_inline]] inline KFSp_KeyPair KFSp_GetKeyPair(KFS_StreamKeyData const* data, int index)
 {
-    SEQ_Head const& head = **data->keys;
-    unsigned char const* const first = SEQp_Item(head, index);
-    return {reinterpret_cast<KFS_KeyScalar const*>(first), reinterpret_cast<KFS_KeyScalar const*>(first + head.stride)};
+    auto const [first, second] = KFSp_GetItemPair(data->keys, index);
+    return {static_cast<KFS_KeyScalar const*>(first), static_cast<KFS_KeyScalar const*>(second)};
 }
 
 // Inserts a copy of `record` so that it stands at `index`; the list exists.

@@ -55,7 +55,7 @@ void KFS_ParamLayerStream::FillInParamDef() const
 
 void KFS_ParamLayerStream::InsertDefaultKey(T_Time const&)
 {
-    GetParamDef().value.layer.reservedPointer = Q_IntPtrToPointer(KFSp_GetCallbacks().layerDefaultValueFunc(this));
+    GetParamDef().value.layer.reservedPointer = KFSp_GetCallbacks().layerDefaultValueFunc(this);
 }
 
 void* KFS_ParamLayerStream::GetFlattenedReserved0() const

@@ -113,18 +113,17 @@ SEQ_Head** MakeKeyList(KFS_Stream* stream, int count)
     return keys;
 }
 
-void CheckDiskSize(KFS_Stream const* stream, Layout const& layout, SEQ_Head const* list)
+void CheckDiskSize(KFS_Stream const* stream, Layout const& layout, int diskSize)
 {
-    if (!stream->IsCustomValuePointer() && layout.DiskSize() > list->itemSize) {
+    if (!stream->IsCustomValuePointer() && layout.DiskSize() > diskSize) {
         Q_ReportError(ReadKeysReportId, Q_SeverityWarning, Q_ZStringToUTF16String(TooSmallText));
         throw int{MissingDataCode};
     }
 }
 
-void ReportIfTooBig(SEQ_Head const* list, SEQ_Head const* keys)
+void ReportIfTooBig(int diskSize, int keySize)
 {
-    if (list->itemSize > keys->itemSize)
-        Q_ReportError(ReadKeysReportId, Q_SeverityError, Q_ZStringToUTF16String(TooBigText));
+    if (diskSize > keySize) Q_ReportError(ReadKeysReportId, Q_SeverityError, Q_ZStringToUTF16String(TooBigText));
 }
 
 }  // namespace
@@ -179,14 +178,15 @@ void KFSp_ConvertFromKeyDiskList(KFS_Stream* stream, SEQ_Head** list)
 {
     Layout const layout(stream);
     int const count = (*list)->count;
-    int const diskSize = (*list)->itemSize;
-    CheckDiskSize(stream, layout, *list);
+    int const diskSize = SEQ_GetItemSize(list);
+    CheckDiskSize(stream, layout, diskSize);
     SEQ_Head** const keys = MakeKeyList(stream, count);
+    int const keySize = SEQ_GetItemSize(keys);
     KFSp_FirstError error;
     KFSp_ScPin const diskPin(list, error);
     KFSp_ScPin const pin(keys, error);
     KFSp_ThrowIf(error.Code());
-    ReportIfTooBig(*list, *keys);
+    ReportIfTooBig(diskSize, keySize);
     // A record that is shorter than the stream's own, which the check lets pass for pointers, counts as ending in
     // zeros.
     int const recordSize = std::max(diskSize, layout.DiskSize());
@@ -200,7 +200,7 @@ void KFSp_ConvertFromKeyDiskList(KFS_Stream* stream, SEQ_Head** list)
         std::memcpy(bytes, record, static_cast<std::size_t>(diskSize));
         std::memset(bytes + diskSize, 0, static_cast<std::size_t>(recordSize - diskSize));
         SwapRecord(layout, reinterpret_cast<KFS_KeyScalarDisk*>(bytes));
-        FromDiskRecord(layout, bytes, recordSize, key, (*keys)->itemSize);
+        FromDiskRecord(layout, bytes, recordSize, key, keySize);
     }
     stream->SetKeys(keys);
 }

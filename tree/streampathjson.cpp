@@ -1,3 +1,5 @@
+// Without it boost::none is an object that is made when the library loads, and nothing but frame/statics.cpp may do that.
+#define BOOST_OPTIONAL_USE_OLD_DEFINITION_OF_NONE
 #include "frame/services/anyvalue.h"
 #include "tree/streampath.h"
 

@@ -103,6 +103,9 @@ KFS_SERVICE_API int SEQ_LockConst(int reserved, SEQ_Head const* const* list);
 KFS_SERVICE_API int SEQ_Unlock(SEQ_Head** list);
 KFS_SERVICE_API int SEQ_UnlockConst(SEQ_Head const* const* list);
 
+// The item size that a list was made with; 0 for a null handle.
+KFS_SERVICE_API int SEQ_GetItemSize(SEQ_Head const* const* list);
+
 // The number of pins that are still owed an unlock; 0 for a null handle.
 KFS_SERVICE_API int SEQ_GetPinCount(SEQ_Head const* const* list);
 
@@ -139,10 +142,10 @@ KFS_SERVICE_API int SEQ_Remove(int index, SEQ_Head** list, long reserved, void* 
 //   index  out: the first item that compares equal; if there is none, the index of the first item after the probe,
 //          which is the count if the probe comes after all items
 // On failure both are untouched.
-KFS_SERVICE_API int SEQ_GetSortedItem(SEQ_Head** list, long reserved, void const* probe, unsigned char* found,
-                                      long reserved2, int* index);
-KFS_SERVICE_API int SEQ_GetSortedConstItem(SEQ_Head const* const* list, long reserved, void const* probe,
-                                           unsigned char* found, long reserved2, int* index);
+KFS_SERVICE_API int SEQ_GetSortedItem(SEQ_Head** list, long reserved, long reserved2, void const* probe,
+                                      unsigned char* found, long reserved3, int* index);
+KFS_SERVICE_API int SEQ_GetSortedConstItem(SEQ_Head const* const* list, long reserved, long reserved2,
+                                           void const* probe, unsigned char* found, long reserved3, int* index);
 
 // ---- all items
 

@@ -72,7 +72,8 @@ KFS_SERVICE_API char const* Q_ZLookupLStrCache(Q_ZTable const* const* table, int
 KFS_SERVICE_API u16str Q_ZStringToUTF16String(char const* text);
 
 // Gives the UTF-8 translation for a key, or null to keep the built-in text. Set it before the first lookup: rows that
-// were looked up keep their text. Null removes it. The result must stay valid during the call only.
+// were looked up keep their text. Null removes it. The result must stay valid during the call only. A translation is
+// taken only if its printf conversions are those of the built-in text, each spelled the same and in the same order.
 using Q_TranslateFunc = char const* (*)(std::string_view key);
 KFS_SERVICE_API void Q_SetTranslateFunc(Q_TranslateFunc translate) noexcept;
 

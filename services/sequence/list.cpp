@@ -217,6 +217,11 @@ int SEQ_Unlock(SEQ_Head** list)
     return SEQ_UnlockConst(list);
 }
 
+int SEQ_GetItemSize(SEQ_Head const* const* list)
+{
+    return SEQp_IsList(list) ? (*list)->itemSize : 0;
+}
+
 int SEQ_GetPinCount(SEQ_Head const* const* list)
 {
     return SEQp_IsList(list) ? (*list)->pins : 0;

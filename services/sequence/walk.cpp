@@ -21,7 +21,8 @@ int CallForEach(List list, long refcon, Func func)
 
 }  // namespace
 
-int SEQ_GetSortedConstItem(SEQ_Head const* const* list, long, void const* probe, unsigned char* found, long, int* index)
+int SEQ_GetSortedConstItem(SEQ_Head const* const* list, long, long, void const* probe, unsigned char* found, long,
+                           int* index)
 {
     if (!SEQp_IsList(list)) return SEQ_Err_BadList;
     SEQ_Head const& head = **list;
@@ -54,10 +55,10 @@ int SEQ_GetSortedConstItem(SEQ_Head const* const* list, long, void const* probe,
     return 0;
 }
 
-int SEQ_GetSortedItem(SEQ_Head** list, long reserved, void const* probe, unsigned char* found, long reserved2,
-                      int* index)
+int SEQ_GetSortedItem(SEQ_Head** list, long reserved, long reserved2, void const* probe, unsigned char* found,
+                      long reserved3, int* index)
 {
-    return SEQ_GetSortedConstItem(list, reserved, probe, found, reserved2, index);
+    return SEQ_GetSortedConstItem(list, reserved, reserved2, probe, found, reserved3, index);
 }
 
 int SEQ_ForEach(SEQ_Head** list, long refcon, SEQ_IterFunc func, long)

@@ -10,7 +10,7 @@
 namespace {
 
 thread_local int lastError = 0;
-thread_local char loggingBuffer[Q_LoggingBufferSize];
+thread_local std::unique_ptr<char[]> loggingBuffer;  // made when it is first asked for: static TLS is scarce
 thread_local bool inReport = false;
 thread_local bool inLog = false;
 
@@ -122,12 +122,15 @@ int Qp_GetThreadLastError() noexcept
 
 char* Qp_GetThreadLoggingBuffer() noexcept
 {
-    return loggingBuffer;
+    if (!loggingBuffer) loggingBuffer.reset(new (std::nothrow) char[Q_LoggingBufferSize]{});
+    // Without memory a message may be garbled by that of another thread, but it is told.
+    static char shared[Q_LoggingBufferSize];
+    return loggingBuffer ? loggingBuffer.get() : shared;
 }
 
 void Qp_ReportError(int id, int severity) noexcept
 {
-    Qp_ReportErrString(id, severity, loggingBuffer);
+    Qp_ReportErrString(id, severity, Qp_GetThreadLoggingBuffer());
 }
 
 void Qp_ReportErrString(int id, int severity, char const* text) noexcept

@@ -1,3 +1,5 @@
+// UTF-8 and UTF-16 by hand. ICU has these two conversions too, but it would bring 36 MB and a version of its own to every
+// host for them.
 #include "frame/services/strings.h"
 
 #include <cstring>

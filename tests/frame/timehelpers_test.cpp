@@ -48,6 +48,11 @@ TEST(TimeHelpers, AFailedConversionLeavesNoScale)
     EXPECT_EQ(T_Err_Overflow, KFS_AddTime(&large, &zero, 600, &result));
     EXPECT_EQ(0u, result.scale);
     EXPECT_EQ(T_Err_Overflow, KFS_AddTime(&large, &large, 0, &result));
+    T_Time const least{INT_MIN, 1};
+    EXPECT_EQ(T_Err_Overflow, KFS_SubTime(&zero, &least, 0, &result));
+    T_Time const before{-1, 1};
+    EXPECT_EQ(0, KFS_SubTime(&before, &least, 0, &result)) << "what has no negative can be taken away";
+    EXPECT_TRUE(result == large);
 }
 
 TEST(TimeHelpers, EqualInstantsHashAlike)

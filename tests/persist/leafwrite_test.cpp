@@ -194,7 +194,7 @@ protected:
     {
         KFS_AppCallbacks callbacks{};
         callbacks.layerIndependentFunc = [](KFS_ParamLayerStream const*, bool) { return 1234L; };
-        callbacks.layerDefaultValueFunc = [](KFS_ParamLayerStream const*) { return 0; };
+        callbacks.layerDefaultValueFunc = [](KFS_ParamLayerStream const*) -> void* { return nullptr; };
         KFS_SetCallbacks(callbacks);
     }
     ~LayerWrite() override { KFS_ClearCallbacks(); }

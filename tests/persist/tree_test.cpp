@@ -103,7 +103,7 @@ public:
 TEST_F(Tree, LayersAreAlwaysWritten)
 {
     KFS_AppCallbacks callbacks{};
-    callbacks.layerDefaultValueFunc = [](KFS_ParamLayerStream const*) { return 0; };
+    callbacks.layerDefaultValueFunc = [](KFS_ParamLayerStream const*) -> void* { return nullptr; };
     callbacks.layerIndependentFunc = [](KFS_ParamLayerStream const*, bool) { return 0L; };
     KFS_SetCallbacks(callbacks);
     KFS_ScRegisterStreams batch(Get_VX_StreamFactory());

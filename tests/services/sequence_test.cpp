@@ -340,20 +340,20 @@ TEST(Sequence, SearchAgreesWithTheStandardLibraryAtEveryCount)
         unsigned char found = 77;
         int index = 77;
         int const nine = 9;
-        EXPECT_EQ(SEQ_Err_NoSortFunc, SEQ_GetSortedItem(list, 0, &nine, &found, 0, &index));
+        EXPECT_EQ(SEQ_Err_NoSortFunc, SEQ_GetSortedItem(list, 0, 0, &nine, &found, 0, &index));
         EXPECT_TRUE(found == 77 && index == 77) << "nothing is answered";
         SEQ_Funcs const sorted{nullptr, nullptr, Compare}, keeps{SEQ_RemoveFunc, SEQ_RemoveFunc, nullptr};
         EXPECT_EQ(0, SEQ_SetFuncs(list, 3, &sorted));
         EXPECT_EQ(0, SEQ_SetFuncs(list, 3, &keeps)) << "null leaves the sort function";
         for (int probe = -1; probe <= 81; ++probe) {
             auto const place = std::lower_bound(items.begin(), items.end(), probe);
-            ASSERT_EQ(0, SEQ_GetSortedConstItem(list, 0, &probe, &found, 0, &index));
+            ASSERT_EQ(0, SEQ_GetSortedConstItem(list, 0, 0, &probe, &found, 0, &index));
             ASSERT_EQ(place - items.begin(), index) << count << " items, probe " << probe;
             ASSERT_EQ(place != items.end() && *place == probe, found == 1) << count << " items, probe " << probe;
         }
         SEQ_Funcs const none{nullptr, nullptr, SEQ_RemoveFunc};
         EXPECT_EQ(0, SEQ_SetFuncs(list, 3, &none));
-        EXPECT_EQ(SEQ_Err_NoSortFunc, SEQ_GetSortedItem(list, 0, &nine, &found, 0, &index));
+        EXPECT_EQ(SEQ_Err_NoSortFunc, SEQ_GetSortedItem(list, 0, 0, &nine, &found, 0, &index));
     }
 }
 
@@ -467,7 +467,7 @@ TEST(Sequence, NonsenseIsRefused)
                     SEQ_GetAddress(none, 0, 1, &item), SEQ_GetConstAddress(none, 0, &constItem),
                     SEQ_GetItemCopy(none, 0, 0, &number), SEQ_SetItemCopy(&number, 0, none, 0, 0),
                     SEQ_InsertCopy(&number, 0, none, 0), SEQ_Remove(0, none, 0, nullptr),
-                    SEQ_GetSortedItem(none, 0, &number, &found, 0, &number), SEQ_ForEach(none, 0, visit, 0),
+                    SEQ_GetSortedItem(none, 0, 0, &number, &found, 0, &number), SEQ_ForEach(none, 0, visit, 0),
                     SEQ_ReserveSpace(1, none), SEQ_Compact(none), SEQ_SetNumItems(1, none, 0)));
     EXPECT_EQ(std::vector<int>(14, SEQ_Err_BadArgument),
               Codes(SEQ_Duplicate(list, 0, nullptr), SEQ_SetFuncs(list, 2, &funcs), SEQ_SetFuncs(list, 3, nullptr),

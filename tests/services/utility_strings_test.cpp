@@ -7,6 +7,7 @@
 #include <limits>
 #include <random>
 #include <string>
+#include <tuple>
 #include <vector>
 
 namespace {
@@ -176,6 +177,25 @@ TEST(Messages, ATranslationTakesThePlaceOfTheTextForEver)
     u16str wanted = A("bersetzt: $$$/Tests/Single");
     wanted.insert(wanted.begin(), 0xFC);
     EXPECT_EQ(wanted, Q_ZStringToUTF16String("$$$/Tests/Single=single"));
+    // What reads another argument than the caller passes is no translation of a format.
+    for (auto const& [text, translation, fits] : {std::tuple("%s", "%s%n", false),
+                                                  {"%s", "%n", false},
+                                                  {"%s", "%d", false},
+                                                  {"%s", "", false},
+                                                  {"%s", "%-5s", false},
+                                                  {"%s", "%2$s", false},
+                                                  {"", "%s", false},
+                                                  {"a %% of %s %d", "%d %s", false},
+                                                  {"a %% of %s %d", "%s 100 %%, %d", true},
+                                                  {"percent", "%", true},
+                                                  {"percent", "%  d", false},
+                                                  {"%5.2lf", "x%5.2lfx", true}}) {
+        static char const* given;
+        given = translation;
+        Q_SetTranslateFunc([](std::string_view) { return given; });
+        std::string const entry = std::string("$$$/k=") + text;
+        EXPECT_EQ(A(fits ? translation : text), Q_ZStringToUTF16String(entry.c_str())) << entry << ' ' << translation;
+    }
     Q_SetTranslateFunc(nullptr);
     EXPECT_STREQ("\xC3\xBC"
                  "bersetzt: $$$/Tests/0004",
