@@ -25,7 +25,20 @@ int Fail(std::string const& message)
     return ExitFailed;
 }
 
+bool anyChanged = false;
+
 }  // namespace
+
+void TellAbout(std::string const& fileName, std::string const& what)
+{
+    std::fprintf(stderr, "kfs: %s: %s\n", kfshost::ShownFileName(fileName).c_str(), what.c_str());
+}
+
+void TellChanges(std::string const& fileName, kfshost::LoadNotes const& notes)
+{
+    for (std::string const& report : notes.reports) TellAbout(fileName, report);
+    anyChanged = anyChanged || !notes.reports.empty();
+}
 
 void ListenToReports()
 {
@@ -34,7 +47,8 @@ void ListenToReports()
 
 int RunTold(std::function<int()> const& work)
 try {
-    return work();
+    int const code = work();
+    return code == ExitDone && anyChanged ? ExitFound : code;
 } catch (kfshost::StoreError const& error) {
     return Fail(firstReport.empty() ? error.what() : error.what() + (": " + firstReport));
 } catch (std::bad_alloc const&) {

@@ -2,15 +2,48 @@
 #include "cli/options.h"
 #include "cli/output.h"
 #include "cli/table.h"
+#include "host/framegrid.h"
 #include "host/paths.h"
+#include "host/timescale.h"
 
 #include <fmt/format.h>
 
 #include <iterator>
 
+using kfshost::Rational;
 using kfshost::StreamItem;
 
 namespace {
+
+// Seconds for people, and where that isn't all the exact fraction behind.
+std::string SecondsText(Rational const& time)
+{
+    std::string text = fmt::format("{:.3f}", time.ToDouble());
+    text.erase(text.find_last_not_of('0') + 1);
+    if (text.ends_with('.')) text.pop_back();
+    bool const isAll = Rational::Parse(text) == time;
+    return isAll ? text : fmt::format("{} ({})", text, time.ToString());
+}
+
+std::string TimesText(kfshost::Scene const& scene)
+{
+    std::string const times = fmt::format("times in 1/{} s: ", scene.timeScale);
+    if (!scene.exactTimes)
+        return times + fmt::format("keys are up to {:.2g} s from the file's times\n", scene.worstTimeError);
+    return times +
+           fmt::format("every key time of the file is one of these, to {} units in the last place of its float\n",
+                       kfshost::FrameTolerance);
+}
+
+std::string FramesText(std::vector<StreamItem const*> const& items)
+{
+    kfshost::FrameGrid const grid = kfshost::FindFrameGrid(items);
+    std::string const frames = fmt::format("frames of {} a second", grid.rate.ToString());
+    if (grid.times == 0) return "";
+    if (grid.offGrid == 0) return "all keys are on " + frames + '\n';
+    return fmt::format("{} of {} aren't on {}, but up to {:.2g} of a frame beside them\n", grid.offGrid,
+                       Plural(grid.times, "key time", "key times"), frames, grid.worst);
+}
 
 std::string Summary(kfshost::Scene const& scene, std::vector<StreamItem const*> const& items)
 {
@@ -19,10 +52,8 @@ std::string Summary(kfshost::Scene const& scene, std::vector<StreamItem const*> 
     std::string text =
         fmt::format("{}: {}, {}", scene.name, Plural(items.size(), "stream", "streams"), Plural(keys, "key", "keys"));
     if (auto const span = SpanOf(items))
-        text += fmt::format(", {} s to {} s", TimeText(span->first), TimeText(span->last));
-    text += fmt::format("\ntimes in 1/{} s: ", scene.timeScale);
-    return text + (scene.exactTimes ? "every key time of the file is one of these, or the nearest float to one\n"
-                                    : fmt::format("key times are rounded by up to {:.2g} s\n", scene.worstTimeError));
+        text += fmt::format(", {} s to {} s", SecondsText(span->first), SecondsText(span->last));
+    return text + '\n' + TimesText(scene) + FramesText(items);
 }
 
 // What goes on between keys. Of a path the file's word is about its route; its keys tell whether they float.
@@ -58,8 +89,8 @@ int Run(Selection const& selection)
         int const keys = kfshost::KeyCount(*item->stream);
         table.AddRow({item->path, std::string(NameOf(item->kind)), std::to_string(item->stream->GetDimension()),
                       Joined(item->components), std::to_string(keys),
-                      keys == 0 ? "-" : TimeText(kfshost::KeyTime(*item->stream, 0)),
-                      keys == 0 ? "-" : TimeText(kfshost::KeyTime(*item->stream, keys - 1)), Interpolation(*item)});
+                      keys == 0 ? "-" : SecondsText(kfshost::KeyTime(*item->stream, 0)),
+                      keys == 0 ? "-" : SecondsText(kfshost::KeyTime(*item->stream, keys - 1)), Interpolation(*item)});
     }
     WriteToStandardOutput(Summary(scene, items) + '\n' + table.ToText());
     return ExitDone;

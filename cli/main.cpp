@@ -35,15 +35,17 @@ int Run(int argc, char** argv)
         works.emplace_back(words, command->prepare(*words));
     }
     // After the commands were made, so that they don't take it over.
-    app.footer("Examples:\n"
-               "  kfs info walk.glb\n"
-               "  kfs eval walk.glb --stream '*/Hips/*' --fps 30 --format csv\n"
-               "  kfs plot walk.glb --stream '*/Hips/translation' -o hips.svg\n"
-               "  kfs plot walk.glb --motion --stream '*/Hips/translation' -o path.svg\n"
-               "  kfs import walk.glb -o walk.kfs\n"
-               "\n"
-               "Exit codes: 0 done; 1 diff or dump found something; 2 failed. What failed, a command line that isn't\n"
-               "understood included, is one line on the standard error, and nothing is written then.");
+    app.footer(
+        "Examples:\n"
+        "  kfs info walk.glb\n"
+        "  kfs eval walk.glb --stream '*/Hips/*' --fps 30 --format csv\n"
+        "  kfs plot walk.glb --stream '*/Hips/translation' -o hips.svg\n"
+        "  kfs plot walk.glb --motion --stream '*/Hips/translation' -o path.svg\n"
+        "  kfs import walk.glb -o walk.kfs\n"
+        "\n"
+        "Exit codes: 0 done; 1 diff or dump found something, or a project had to be changed so that it could be\n"
+        "loaded, which lines on the standard error tell; 2 failed. What failed, a command line that isn't\n"
+        "understood included, is one line on the standard error, and nothing is written then.");
     try {
         app.parse(argc, argv);
     } catch (CLI::ParseError const& error) {

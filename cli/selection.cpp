@@ -55,12 +55,17 @@ void HoldAsPaths(kfshost::Scene& scene, Selection const& selection)
     }
 }
 
-// A project is known by how it begins, whatever its name is.
+// The file is read once, since it may be a pipe.
 kfshost::Scene ReadScene(Selection const& selection)
 {
-    if (!kfshost::IsProjectFile(selection.file)) return kfshost::ImportFile(selection.file, {selection.timeScale});
+    kfshost::FileInput const input = kfshost::ReadInput(selection.file);
+    if (input.kind != kfshost::FileKind::Project)
+        return kfshost::ImportFile(input, {.timeScale = selection.timeScale, .arcTolerance = 0.0});
     if (selection.timeScale != 0) throw UserError("--time-scale", "a project has the times with which it was imported");
-    return kfshost::TakeScene(kfshost::LoadProject(selection.file));
+    kfshost::LoadNotes notes;
+    kfshost::Scene scene = kfshost::TakeScene(kfshost::LoadProject(input, &notes));
+    TellChanges(selection.file, notes);
+    return scene;
 }
 
 }  // namespace

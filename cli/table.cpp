@@ -14,32 +14,43 @@ std::size_t Width(std::string const& text)
 
 }  // namespace
 
-Table::Table(std::vector<Column> columns) : columns_(std::move(columns))
+TableLayout::TableLayout(std::vector<Column> columns) : columns_(std::move(columns))
+{
+    for (Column const& column : columns_) widths_.push_back(Width(column.title));
+}
+
+void TableLayout::Measure(std::vector<std::string> const& cells)
+{
+    for (std::size_t i = 0; i < cells.size(); ++i) widths_[i] = std::max(widths_[i], Width(cells[i]));
+}
+
+std::string TableLayout::TitleLine() const
 {
     std::vector<std::string> titles;
     for (Column const& column : columns_) titles.push_back(column.title);
-    rows_.push_back(std::move(titles));
+    return Line(titles);
+}
+
+std::string TableLayout::Line(std::vector<std::string> const& cells) const
+{
+    std::string line;
+    for (std::size_t i = 0; i < cells.size(); ++i) {
+        std::string const blanks(widths_[i] - Width(cells[i]), ' ');
+        line += (i == 0 ? "" : "  ") + (columns_[i].align == Align::Left ? cells[i] + blanks : blanks + cells[i]);
+    }
+    line.erase(line.find_last_not_of(' ') + 1);
+    return line + '\n';
 }
 
 void Table::AddRow(std::vector<std::string> cells)
 {
+    layout_.Measure(cells);
     rows_.push_back(std::move(cells));
 }
 
 std::string Table::ToText() const
 {
-    std::vector<std::size_t> widths(columns_.size(), 0);
-    for (auto const& row : rows_)
-        for (std::size_t i = 0; i < row.size(); ++i) widths[i] = std::max(widths[i], Width(row[i]));
-    std::string text;
-    for (auto const& row : rows_) {
-        std::string line;
-        for (std::size_t i = 0; i < row.size(); ++i) {
-            std::string const blanks(widths[i] - Width(row[i]), ' ');
-            line += (i == 0 ? "" : "  ") + (columns_[i].align == Align::Left ? row[i] + blanks : blanks + row[i]);
-        }
-        line.erase(line.find_last_not_of(' ') + 1);
-        text += line + '\n';
-    }
+    std::string text = layout_.TitleLine();
+    for (auto const& row : rows_) text += layout_.Line(row);
     return text;
 }

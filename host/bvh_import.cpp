@@ -1,5 +1,4 @@
 #include "host/bvh_parse_private.h"
-#include "host/filebytes_private.h"
 #include "host/import.h"
 #include "host/import_error.h"
 #include "host/names.h"
@@ -9,34 +8,14 @@
 
 #include <algorithm>
 #include <cmath>
-#include <limits>
 
 namespace kfshost {
 
 namespace {
 
-// The scale that most of our files have, in which all common frame rates are whole numbers.
-constexpr unsigned int UsualScale = 120000;
-
 bool Fits(Rational const& last, unsigned int scale)
 {
     return std::abs(last.ToUnits(scale)) <= MaxKeyUnits;
-}
-
-// A scale in which each multiple of the frame time is a whole number, fine enough to read between frames; without one
-// that fits, the finest power of two.
-unsigned int ChooseScale(Rational const& frameTime, Rational const& last)
-{
-    auto const isWhole = [&](unsigned int scale) { return scale % frameTime.Denominator() == 0; };
-    if (isWhole(UsualScale) && Fits(last, UsualScale)) return UsualScale;
-    if (frameTime.Denominator() <= MaxKeyUnits && Fits(last, static_cast<unsigned int>(frameTime.Denominator()))) {
-        auto scale = static_cast<unsigned int>(frameTime.Denominator());
-        while (scale < UsualScale && Fits(last, scale * 2)) scale *= 2;
-        return scale;
-    }
-    for (int power = 30; power >= 0; --power)
-        if (Fits(last, 1U << power)) return 1U << power;
-    return 0;
 }
 
 // The channels of one kind that a joint has, by their columns in the frames.
@@ -72,7 +51,7 @@ private:
     try {
         auto const lastFrame = static_cast<std::int64_t>(motion_.frames == 0 ? 0 : motion_.frames - 1);
         Rational const last = motion_.frameTime * Rational(lastFrame, 1);
-        scene_.timeScale = options.timeScale == 0 ? ChooseScale(motion_.frameTime, last) : options.timeScale;
+        scene_.timeScale = options.timeScale == 0 ? ChooseScaleForFrames(motion_.frameTime, last) : options.timeScale;
         if (scene_.timeScale == 0 || !Fits(last, scene_.timeScale))
             throw ImportError("Frame Time", "the frames don't fit a 32-bit time line of that scale");
         for (std::int64_t frame = 0; frame <= lastFrame; ++frame) {
@@ -140,11 +119,6 @@ private:
 };
 
 }  // namespace
-
-Scene ImportBvh(std::string const& fileName, ImportOptions const& options)
-{
-    return ImportBvhFromMemory(ReadFileBytes(fileName, "", std::numeric_limits<std::size_t>::max()), fileName, options);
-}
 
 Scene ImportBvhFromMemory(std::string_view bytes, std::string const& fileName, ImportOptions const& options)
 {

@@ -2,6 +2,7 @@
 
 #include "host/import_error.h"
 #include "host/names.h"
+#include "host/timescale.h"
 
 #include <algorithm>
 #include <array>
@@ -19,7 +20,11 @@ constexpr std::string_view Blanks = " \t\r\n\v\f";
 // Hands out the words of a text and knows on which line it is.
 class Words {
 public:
-    explicit Words(std::string_view text) : rest_(text) {}
+    explicit Words(std::string_view text) : rest_(text)
+    {
+        constexpr std::string_view byteOrderMark = "\xEF\xBB\xBF";
+        if (rest_.starts_with(byteOrderMark)) rest_.remove_prefix(byteOrderMark.size());
+    }
 
     bool AtEnd()
     {
@@ -166,8 +171,8 @@ private:
         words_.Expect("Frame");
         words_.Expect("Time:");
         std::string_view const time = words_.Next("the frame time");
-        auto const frameTime = Rational::Parse(time);
-        if (!frameTime || *frameTime <= Rational())
+        auto const frameTime = ParseFrameTime(time);
+        if (!frameTime)
             throw ImportError(words_.Place(), '"' + Words::Shown(time) + "\" isn't a frame time in seconds");
         motion_.frameTime = *frameTime;
         ParseFrames();

@@ -19,7 +19,7 @@ struct BvhMotion {
     std::vector<BvhJoint> joints;
     std::size_t channelCount = 0;
     std::size_t frames = 0;
-    Rational frameTime;
+    Rational frameTime;           // as ParseFrameTime understands it
     std::vector<double> numbers;  // frames x channelCount
 };
 

@@ -26,6 +26,11 @@ constexpr std::size_t MostNumbers = 8;
 constexpr std::size_t MostRawBytes = 16;
 constexpr std::size_t MostText = 60;
 
+Bytes AsBytes(std::string_view text)
+{
+    return {reinterpret_cast<unsigned char const*>(text.data()), text.size()};
+}
+
 std::uint64_t Unsigned(Bytes data, std::size_t offset, std::size_t size)
 {
     std::uint64_t number = 0;
@@ -54,7 +59,7 @@ std::string QuotedLines(Bytes data)
 {
     std::string text(data.begin(), data.end());
     std::ranges::replace(text, '\n', ' ');
-    return Quoted(Bytes(reinterpret_cast<unsigned char const*>(text.data()), text.size()));
+    return Quoted(AsBytes(text));
 }
 
 std::string Version(Bytes data)
@@ -76,7 +81,8 @@ std::string MatchName(Bytes data)
 std::string StreamRecord(Bytes data)
 {
     std::uint64_t const flags = Unsigned(data, 4, 2);
-    std::string text = fmt::format("dimension {}, 1/{} s", Unsigned(data, 2, 2), Unsigned(data, 12, 4));
+    std::string text =
+        fmt::format("dimension {}, 1/{} s", static_cast<std::int16_t>(Unsigned(data, 2, 2)), Unsigned(data, 12, 4));
     text += (flags & KFS_StreamFlag_NoKeys) != 0 ? ", constant" : ", keys";
     text += (flags & KFS_StreamFlag_Spatial) != 0 ? ", spatial" : "";
     text += Unsigned(data, 56, 2) != 0 ? fmt::format(", custom, {} bytes", Unsigned(data, 58, 2)) : "";
@@ -114,6 +120,47 @@ std::string Number(Bytes data)
     return fmt::format("{}", Long(data, 0));
 }
 
+// Of its 32 bits a reader keeps the low 16.
+std::string Selector(Bytes data)
+{
+    return fmt::format("selector {}", static_cast<std::int16_t>(Unsigned(data, 2, 2)));
+}
+
+std::string Layer(Bytes data)
+{
+    return fmt::format("layer {}", Long(data, 0));
+}
+
+std::string SliderMin(Bytes data)
+{
+    return fmt::format("slider from {}", Double(data, 0));
+}
+
+std::string SliderMax(Bytes data)
+{
+    return fmt::format("slider to {}", Double(data, 0));
+}
+
+std::string PathIdentifier(Bytes data)
+{
+    return fmt::format("path {}", Unsigned(data, 0, 4));
+}
+
+std::string Index(Bytes data)
+{
+    return Long(data, 0) == -1 ? "no index" : fmt::format("index {}", Long(data, 0));
+}
+
+std::string OldType(Bytes data)
+{
+    return Long(data, 0) == -1 ? "whole path" : fmt::format("old kind {}", Long(data, 0));
+}
+
+std::string Steps(Bytes data)
+{
+    return fmt::format("{} steps", Long(data, 0));
+}
+
 struct Decoder {
     int id;
     std::size_t least;  // bytes that it takes; data that is shorter is shown raw
@@ -121,10 +168,13 @@ struct Decoder {
 };
 
 constexpr Decoder Decoders[] = {
-    {CKF_Id("vers"), 12, Version},  {CKF_Id("kfsb"), 4, Flags},          {CKF_Id("kfsn"), 0, Quoted},
-    {CKF_Id("kfmn"), 0, MatchName}, {CKF_Id("kfb4"), 124, StreamRecord}, {CKF_Id("cdat"), 8, Doubles},
-    {CKF_Id("seql"), 8, Keys},      {CKF_Id("Utf8"), 0, Quoted},         {CKF_Id("khti"), 16, SceneTimes},
-    {CKF_Id("khin"), 4, Number},    {CKF_Id("khco"), 0, QuotedLines},
+    {CKF_Id("vers"), 12, Version},       {CKF_Id("kfsb"), 4, Flags},          {CKF_Id("kfsn"), 0, Quoted},
+    {CKF_Id("kfmn"), 0, MatchName},      {CKF_Id("kfb4"), 124, StreamRecord}, {CKF_Id("cdat"), 8, Doubles},
+    {CKF_Id("seql"), 8, Keys},           {CKF_Id("Utf8"), 0, Quoted},         {CKF_Id("khti"), 16, SceneTimes},
+    {CKF_Id("khin"), 4, Number},         {CKF_Id("khco"), 0, QuotedLines},    {CKF_Id("kfpi"), 4, Layer},
+    {CKF_Id("kfps"), 4, Selector},       {CKF_Id("kfum"), 8, SliderMin},      {CKF_Id("kfuM"), 8, SliderMax},
+    {CKF_Id("kfli"), 4, PathIdentifier}, {CKF_Id("kfix"), 4, Index},          {CKF_Id("kfot"), 4, OldType},
+    {CKF_Id("kfpl"), 4, Steps},
 };
 
 std::string Raw(Bytes data)
@@ -163,16 +213,22 @@ std::string Line(CKF_RawChunk const& chunk)
 
 }  // namespace
 
+// What isn't a project at all is known by its first bytes, however long it is.
 ChunkDump DumpChunks(std::string const& fileName)
 {
-    std::string const bytes = ReadFileBytes(fileName, "", std::numeric_limits<std::uint32_t>::max());
-    CKF_ChunkWalk walk(Bytes(reinterpret_cast<unsigned char const*>(bytes.data()), bytes.size()));
+    constexpr std::string_view magic = "KFSF";
+    FileReader reader(fileName, "");
+    std::string_view const head = reader.Head();
+    if (head.empty()) return {"       0  <-- the file is empty\n", 1};
+    if (!magic.starts_with(head.substr(0, magic.size())))
+        return {"       0  " + Quoted(AsBytes(head.substr(0, magic.size()))) + "  <-- no project begins so\n", 1};
+    std::string const bytes = reader.Take(std::numeric_limits<std::uint32_t>::max());
+    CKF_ChunkWalk walk(AsBytes(bytes));
     ChunkDump dump;
     for (CKF_RawChunk chunk; walk.Next(&chunk);) {
         dump.text += Line(chunk);
         dump.problems += chunk.problem ? 1 : 0;
     }
-    if (bytes.empty()) dump = {"       0  <-- the file is empty\n", 1};
     return dump;
 }
 

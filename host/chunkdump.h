@@ -11,7 +11,7 @@ struct ChunkDump {
     std::size_t problems = 0;  // chunks with which something is wrong; their lines say what
 };
 
-// Of any file, however broken. Throws ImportError when it can't be read.
+// Of any file, however broken; "-" is the standard input. Throws ImportError when it can't be read.
 ChunkDump DumpChunks(std::string const& fileName);
 
 }  // namespace kfshost

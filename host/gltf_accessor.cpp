@@ -48,10 +48,10 @@ std::size_t ReadIndex(unsigned char const* bytes, std::size_t size)
 
 }  // namespace
 
-AccessorReader::AccessorReader(tinygltf::Model const& model, int index, std::string const& place)
-    : model_(&model),
+AccessorReader::AccessorReader(GltfDocument const& document, int index, std::string const& place)
+    : document_(&document),
       place_("accessors[" + std::to_string(index) + ']'),
-      accessor_(FindAccessor(model, index, place)),
+      accessor_(FindAccessor(document.model, index, place)),
       components_(
           static_cast<std::size_t>(tinygltf::GetNumComponentsInType(static_cast<std::uint32_t>(accessor_->type))))
 {
@@ -87,17 +87,17 @@ void AccessorReader::RequireFloats() const
 AccessorReader::Elements AccessorReader::Find(int view, std::size_t offset, std::size_t count, std::size_t size,
                                               char const* what) const
 {
-    if (view < 0 || static_cast<std::size_t>(view) >= model_->bufferViews.size()) {
+    if (view < 0 || static_cast<std::size_t>(view) >= document_->model.bufferViews.size()) {
         throw ImportError(place_, std::string("asks for bufferView ") + std::to_string(view) + " of " +
-                                      std::to_string(model_->bufferViews.size()));
+                                      std::to_string(document_->model.bufferViews.size()));
     }
-    tinygltf::BufferView const& bufferView = model_->bufferViews[static_cast<std::size_t>(view)];
+    tinygltf::BufferView const& bufferView = document_->model.bufferViews[static_cast<std::size_t>(view)];
     std::string const viewPlace = "bufferViews[" + std::to_string(view) + ']';
-    if (bufferView.buffer < 0 || static_cast<std::size_t>(bufferView.buffer) >= model_->buffers.size()) {
+    if (bufferView.buffer < 0 || static_cast<std::size_t>(bufferView.buffer) >= document_->buffers.size()) {
         throw ImportError(viewPlace, "asks for buffer " + std::to_string(bufferView.buffer) + " of " +
-                                         std::to_string(model_->buffers.size()));
+                                         std::to_string(document_->buffers.size()));
     }
-    auto const& data = model_->buffers[static_cast<std::size_t>(bufferView.buffer)].data;
+    auto const data = document_->buffers[static_cast<std::size_t>(bufferView.buffer)];
     if (bufferView.byteOffset > data.size() || bufferView.byteLength > data.size() - bufferView.byteOffset)
         throw ImportError(viewPlace, "reaches beyond its buffer of " + std::to_string(data.size()) + " bytes");
     std::size_t const stride = bufferView.byteStride == 0 ? size : bufferView.byteStride;

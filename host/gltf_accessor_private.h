@@ -13,7 +13,7 @@ namespace kfshost {
 class AccessorReader {
 public:
     // `index` is as the file has it; `place` is who asks.
-    AccessorReader(tinygltf::Model const& model, int index, std::string const& place);
+    AccessorReader(GltfDocument const& document, int index, std::string const& place);
 
     std::string const& Place() const { return place_; }
     std::size_t Count() const { return accessor_->count; }
@@ -37,7 +37,7 @@ private:
     void ReadElement(unsigned char const* bytes, double* numbers) const;
     void ApplySparse(std::vector<double>& numbers) const;
 
-    tinygltf::Model const* model_;
+    GltfDocument const* document_;
     std::string place_;
     tinygltf::Accessor const* accessor_;
     std::size_t components_;

@@ -8,10 +8,8 @@
 #include <algorithm>
 #include <charconv>
 #include <cstdint>
-#include <cstring>
 #include <filesystem>
 #include <limits>
-#include <map>
 #include <string_view>
 
 namespace kfshost {
@@ -37,11 +35,6 @@ std::uint32_t ReadWord(std::string_view bytes, std::size_t offset)
 {
     auto const byte = [&](std::size_t i) { return std::uint32_t{static_cast<unsigned char>(bytes[offset + i])}; };
     return byte(0) | byte(1) << 8 | byte(2) << 16 | byte(3) << 24;
-}
-
-void AppendWord(std::string& bytes, std::uint32_t word)
-{
-    for (int shift = 0; shift < 32; shift += 8) bytes += static_cast<char>(word >> shift & 0xFF);
 }
 
 // Takes the chunk that `rest` begins with off it.
@@ -126,70 +119,56 @@ std::string Lacking(std::size_t has, std::uint64_t wants)
     return "has " + std::to_string(has) + " bytes of its " + std::to_string(wants);
 }
 
-// All buffers' bytes by the names under which the reader is to ask for them.
-using BufferFiles = std::map<std::string, std::string>;
+std::span<unsigned char const> AsBytes(std::string_view text)
+{
+    return {reinterpret_cast<unsigned char const*>(text.data()), text.size()};
+}
 
-// Puts where each buffer's bytes are at hand into the JSON, and leaves nothing for the reader to look for on the disk.
-// The bytes may be more than the buffer's, which then grows.
-void ResolveBuffer(json& buffer, std::string const& place, std::string const& fileName, Container const& container,
-                   BufferFiles& files)
+std::span<unsigned char const> Decode(std::string const& uri, std::uint64_t length, std::string const& place,
+                                      GltfDocument& document)
+{
+    constexpr std::string_view marker = ";base64,";
+    std::size_t const start = uri.find(marker);
+    if (start == std::string::npos) throw ImportError(place, "has embedded data that isn't base64");
+    std::string const data = uri.substr(start + marker.size());
+    if (Base64Size(data) < length) throw ImportError(place, Lacking(Base64Size(data), length));
+    std::vector<unsigned char>& bytes = document.decoded.emplace_back();
+    std::string type;
+    bool const isDecoded =
+        tinygltf::DecodeDataURI(&bytes, type, "data:application/octet-stream;base64," + data, 0, false);
+    if (!isDecoded || bytes.size() < length) throw ImportError(place, Lacking(bytes.size(), length));
+    return bytes;
+}
+
+// Where a buffer's bytes are, as many as it says. Nothing is left for the reader to look for on the disk.
+std::span<unsigned char const> FindBuffer(json const& buffer, std::string const& place, std::string const& fileName,
+                                          Container const& container, GltfDocument& document)
 {
     auto const length = buffer["byteLength"].get<std::uint64_t>();
     if (length == 0) throw ImportError(place, "has no bytes");
     std::string const uri = buffer.value("uri", "");
+    std::span<unsigned char const> bytes;
     if (uri.empty()) {
-        if (container.binary.size() < length)
-            throw ImportError(place, container.isBinary ? Lacking(container.binary.size(), length) : "has no uri");
+        if (!container.isBinary) throw ImportError(place, "has no uri");
+        bytes = AsBytes(container.binary);
     } else if (uri.starts_with("data:")) {
-        constexpr std::string_view marker = ";base64,";
-        std::size_t const start = uri.find(marker);
-        if (start == std::string::npos) throw ImportError(place, "has embedded data that isn't base64");
-        std::string const data = uri.substr(start + marker.size());
-        if (Base64Size(data) < length) throw ImportError(place, Lacking(Base64Size(data), length));
-        buffer["uri"] = "data:application/octet-stream;base64," + data;
-        buffer["byteLength"] = Base64Size(data);
+        bytes = Decode(uri, length, place, document);
     } else {
-        std::string const name = "buffer" + std::to_string(files.size());
-        std::string& bytes = files[name];
-        bytes = ReadFileBytes(FindBufferFile(uri, fileName, place), place, length);
-        if (bytes.size() < length) throw ImportError(place, Lacking(bytes.size(), length));
-        buffer["uri"] = name;
+        bytes =
+            AsBytes(document.files.emplace_back(ReadFileBytes(FindBufferFile(uri, fileName, place), place, length)));
     }
+    if (bytes.size() < length) throw ImportError(place, Lacking(bytes.size(), length));
+    return bytes.first(length);
 }
 
-// The file again, with other JSON.
-std::string Reassemble(std::string text, std::string_view binary)
-{
-    text.append((4 - text.size() % 4) % 4, ' ');
-    std::size_t const binarySize = binary.empty() ? 0 : ChunkHeaderSize + binary.size();
-    std::size_t const length = HeaderSize + ChunkHeaderSize + text.size() + binarySize;
-    if (length > std::numeric_limits<std::uint32_t>::max()) throw ImportError("", "is too long for a binary glTF file");
-    std::string bytes(Magic);
-    AppendWord(bytes, 2);
-    AppendWord(bytes, static_cast<std::uint32_t>(length));
-    AppendWord(bytes, static_cast<std::uint32_t>(text.size()));
-    AppendWord(bytes, JsonChunk);
-    bytes += text;
-    if (!binary.empty()) {
-        AppendWord(bytes, static_cast<std::uint32_t>(binary.size()));
-        AppendWord(bytes, BinaryChunk);
-        bytes += binary;
-    }
-    return bytes;
-}
-
-tinygltf::FsCallbacks InMemory(BufferFiles* files)
+// The reader gets texts alone.
+tinygltf::FsCallbacks NoFiles()
 {
     tinygltf::FsCallbacks callbacks{};
-    callbacks.user_data = files;
-    callbacks.FileExists = [](std::string const& name, void* user) {
-        return static_cast<BufferFiles*>(user)->contains(name);
-    };
+    callbacks.FileExists = [](std::string const&, void*) { return false; };
     callbacks.ExpandFilePath = [](std::string const& name, void*) { return name; };
-    callbacks.ReadWholeFile = [](std::vector<unsigned char>* out, std::string*, std::string const& name, void* user) {
-        std::string const& bytes = static_cast<BufferFiles*>(user)->at(name);
-        out->assign(bytes.begin(), bytes.end());
-        return true;
+    callbacks.ReadWholeFile = [](std::vector<unsigned char>*, std::string*, std::string const&, void*) {
+        return false;
     };
     callbacks.WriteWholeFile = [](std::string*, std::string const&, std::vector<unsigned char> const&, void*) {
         return false;
@@ -204,24 +183,17 @@ std::string FirstLine(std::string const& text)
     return line.size() > 160 ? CleanName(line.substr(0, 160)) + "..." : line;
 }
 
-tinygltf::Model Parse(json const& document, Container const& container, BufferFiles& files)
+tinygltf::Model Parse(json const& document)
 {
     tinygltf::TinyGLTF reader;
-    reader.SetFsCallbacks(InMemory(&files));
+    reader.SetFsCallbacks(NoFiles());
     tinygltf::Model model;
     std::string error;
     std::string warning;
-    bool done = false;
     std::string const text = document.dump();
-    if (container.isBinary) {
-        std::string const bytes = Reassemble(text, container.binary);
-        done =
-            reader.LoadBinaryFromMemory(&model, &error, &warning, reinterpret_cast<unsigned char const*>(bytes.data()),
-                                        static_cast<unsigned int>(bytes.size()), "");
-    } else if (text.size() <= std::numeric_limits<unsigned int>::max()) {
-        done = reader.LoadASCIIFromString(&model, &error, &warning, text.data(), static_cast<unsigned int>(text.size()),
-                                          "");
-    }
+    bool const done =
+        text.size() <= std::numeric_limits<unsigned int>::max() &&
+        reader.LoadASCIIFromString(&model, &error, &warning, text.data(), static_cast<unsigned int>(text.size()), "");
     if (!done || !error.empty())
         throw ImportError("", error.empty() ? "isn't glTF that can be read" : FirstLine(error));
     return model;
@@ -229,18 +201,22 @@ tinygltf::Model Parse(json const& document, Container const& container, BufferFi
 
 }  // namespace
 
-tinygltf::Model LoadGltfDocument(std::string_view bytes, std::string const& fileName)
+GltfDocument LoadGltfDocument(std::string_view bytes, std::string const& fileName)
 {
     Container const container = Open(bytes, fileName);
-    json document = ParseGltfJson(container.text);
-    BufferFiles files;
+    json text = ParseGltfJson(container.text);
+    GltfDocument document;
     std::size_t index = 0;
-    for (json& buffer : document["buffers"])
-        ResolveBuffer(buffer, "buffers[" + std::to_string(index++) + ']', fileName, container, files);
+    for (json const& buffer : text["buffers"]) {
+        document.buffers.push_back(
+            FindBuffer(buffer, "buffers[" + std::to_string(index++) + ']', fileName, container, document));
+    }
+    text.erase("buffers");
     // The reader drops channels without a node, and with them the count of those that follow.
-    for (json& animation : document["animations"])
+    for (json& animation : text["animations"])
         for (json& channel : animation["channels"]) channel["target"].emplace("node", -1);
-    return Parse(document, container, files);
+    document.model = Parse(text);
+    return document;
 }
 
 }  // namespace kfshost

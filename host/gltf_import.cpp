@@ -1,15 +1,13 @@
-#include "host/filebytes_private.h"
 #include "host/gltf_accessor_private.h"
 #include "host/import.h"
 #include "host/import_error.h"
 #include "host/names.h"
+#include "host/rotations.h"
 #include "host/storeerror.h"
 #include "host/streambuilder.h"
 #include "host/timescale.h"
 
 #include <algorithm>
-#include <cstdint>
-#include <limits>
 #include <map>
 #include <stdexcept>
 #include <utility>
@@ -80,13 +78,14 @@ struct Values {
 
 class GltfImport {
 public:
-    GltfImport(std::string_view bytes, std::string const& fileName) : model_(LoadGltfDocument(bytes, fileName))
+    GltfImport(std::string_view bytes, std::string const& fileName) : document_(LoadGltfDocument(bytes, fileName))
     {
         scene_.name = StemOf(fileName);
     }
 
     Scene Run(ImportOptions const& options)
     {
+        arcTolerance_ = options.arcTolerance;
         CollectChannels();
         ReadTimes();
         MeasureChannels();
@@ -101,8 +100,8 @@ public:
 private:
     void CollectChannels()
     {
-        for (std::size_t i = 0; i < model_.animations.size(); ++i) {
-            tinygltf::Animation const& animation = model_.animations[i];
+        for (std::size_t i = 0; i < document_.model.animations.size(); ++i) {
+            tinygltf::Animation const& animation = document_.model.animations[i];
             std::string const name =
                 animation.name.empty() ? "animation" + std::to_string(i) : CleanName(animation.name);
             for (std::size_t j = 0; j < animation.channels.size(); ++j)
@@ -119,9 +118,9 @@ private:
         if (source.target_node < 0 || path == std::end(PathKinds)) return;
         Channel channel{};
         channel.item.place = place + '.' + At("channels", index);
-        if (static_cast<std::size_t>(source.target_node) >= model_.nodes.size()) {
+        if (static_cast<std::size_t>(source.target_node) >= document_.model.nodes.size()) {
             throw ImportError(channel.item.place, "asks for node " + std::to_string(source.target_node) + " of " +
-                                                      std::to_string(model_.nodes.size()));
+                                                      std::to_string(document_.model.nodes.size()));
         }
         if (source.sampler < 0 || static_cast<std::size_t>(source.sampler) >= animation.samplers.size()) {
             throw ImportError(channel.item.place, "asks for sampler " + std::to_string(source.sampler) + " of " +
@@ -142,7 +141,7 @@ private:
 
     std::string NodeName(int index) const
     {
-        std::string const& name = model_.nodes[static_cast<std::size_t>(index)].name;
+        std::string const& name = document_.model.nodes[static_cast<std::size_t>(index)].name;
         return name.empty() ? "node" + std::to_string(index) : CleanName(name);
     }
 
@@ -151,7 +150,7 @@ private:
     {
         for (Channel const& channel : channels_) {
             if (times_.contains(channel.input)) continue;
-            AccessorReader const accessor(model_, channel.input, channel.samplerPlace);
+            AccessorReader const accessor(document_, channel.input, channel.samplerPlace);
             accessor.RequireType(TINYGLTF_TYPE_SCALAR, "SCALAR");
             accessor.RequireFloats();
             std::vector<double> const numbers = accessor.ReadNumbers();
@@ -174,6 +173,7 @@ private:
         try {
             TimeScale const scale =
                 options.timeScale == 0 ? ChooseTimeScale(all) : JudgeTimeScale(all, options.timeScale);
+            scale_ = scale;
             scene_.timeScale = scale.scale;
             scene_.exactTimes = scale.exact;
             scene_.worstTimeError = scale.worstError;
@@ -186,7 +186,7 @@ private:
     void MeasureChannels()
     {
         std::size_t most = FreeNumbers;
-        for (tinygltf::Buffer const& buffer : model_.buffers) most += buffer.data.size() * NumbersPerByte;
+        for (auto const& buffer : document_.buffers) most += buffer.size() * NumbersPerByte;
         std::size_t numbers = 0;
         for (Channel& channel : channels_) {
             std::size_t const keys = times_.at(channel.input).size();
@@ -199,7 +199,7 @@ private:
 
     std::size_t DimensionOf(Channel const& channel, std::size_t keys) const
     {
-        AccessorReader const accessor(model_, channel.output, channel.samplerPlace);
+        AccessorReader const accessor(document_, channel.output, channel.samplerPlace);
         accessor.RequireType(channel.path->type, channel.path->typeName);
         bool const isSpline = channel.item.interpolation == SourceInterpolation::CubicSpline;
         std::size_t const elementsPerKey = isSpline ? 3 : 1;
@@ -218,37 +218,61 @@ private:
 
     void MakeStream(Channel& channel)
     {
-        std::vector<float> const& times = times_.at(channel.input);
-        AccessorReader const accessor(model_, channel.output, channel.samplerPlace);
-        Values const values{accessor.ReadNumbers(), channel.dimension};
+        std::vector<int> const times = PlaceTimes(channel);
+        Values values{AccessorReader(document_, channel.output, channel.samplerPlace).ReadNumbers(), channel.dimension};
         channel.item.components = UsualComponents(channel.item.kind, values.dimension);
+        bool const isSpline = channel.item.interpolation == SourceInterpolation::CubicSpline;
+        bool const isRotation = IsRotation(channel.item);
+        // A spline is the curve of the numbers as they stand: with another sign it would be another curve.
+        if (isRotation && !isSpline) AlignSigns(values.numbers);
         try {
             StreamBuilder builder(static_cast<int>(values.dimension), scene_.timeScale, channel.item.path);
-            AppendKeys(builder, channel, times, values);
-            if (channel.item.interpolation == SourceInterpolation::CubicSpline)
-                SetTangents(builder, times.size(), values);
+            if (isRotation && channel.item.interpolation == SourceInterpolation::Linear && arcTolerance_ > 0.0)
+                AppendArcs(builder, times, values);
+            else
+                AppendKeys(builder, channel, times, values);
+            if (isSpline) SetTangents(builder, times.size(), values);
             channel.item.stream = builder.Take();
         } catch (StoreError const& error) {
             throw ImportError(channel.item.place, error.what());
         }
     }
 
-    void AppendKeys(StreamBuilder& builder, Channel const& channel, std::vector<float> const& times,
-                    Values const& values) const
+    std::vector<int> PlaceTimes(Channel const& channel) const
+    {
+        std::vector<float> const& times = times_.at(channel.input);
+        std::vector<int> placed(times.size());
+        std::ranges::transform(times, placed.begin(), [this](float time) { return scale_.ToUnits(time); });
+        for (std::size_t i = 1; i < placed.size(); ++i) {
+            if (placed[i] <= placed[i - 1]) {
+                throw ImportError(channel.item.place, "keys " + std::to_string(i - 1) + " and " + std::to_string(i) +
+                                                          " are closer than 1/" + std::to_string(scene_.timeScale) +
+                                                          " s");
+            }
+        }
+        return placed;
+    }
+
+    static void AppendKeys(StreamBuilder& builder, Channel const& channel, std::vector<int> const& times,
+                           Values const& values)
     {
         bool const isSpline = channel.item.interpolation == SourceInterpolation::CubicSpline;
         std::size_t const stride = values.dimension * (isSpline ? 3 : 1);
         std::size_t const offset = isSpline ? values.dimension : 0;
         KFS_Interp const code = CodeOf(channel.item.interpolation);
+        for (std::size_t i = 0; i < times.size(); ++i)
+            builder.Append(times[i], values.numbers.data() + i * stride + offset, code, code);
+    }
+
+    void AppendArcs(StreamBuilder& builder, std::vector<int> const& times, Values const& values) const
+    {
+        std::vector<RotationKey> keys(times.size());
         for (std::size_t i = 0; i < times.size(); ++i) {
-            int const time = ToUnits(times[i], scene_.timeScale);
-            if (i > 0 && time <= ToUnits(times[i - 1], scene_.timeScale)) {
-                throw ImportError(channel.item.place, "keys " + std::to_string(i - 1) + " and " + std::to_string(i) +
-                                                          " are closer than 1/" + std::to_string(scene_.timeScale) +
-                                                          " s");
-            }
-            builder.Append(time, values.numbers.data() + i * stride + offset, code, code);
+            keys[i].time = times[i];
+            std::ranges::copy_n(&values.numbers[i * 4], 4, keys[i].value);
         }
+        for (RotationKey const& key : WithArcKeys(keys, arcTolerance_))
+            builder.Append(key.time, key.value, KFS_Interp_Linear, KFS_Interp_Linear);
     }
 
     // A Hermite segment is the Bezier segment with handles at its thirds, whose slopes are the tangents.
@@ -262,20 +286,16 @@ private:
         }
     }
 
-    tinygltf::Model model_;
+    GltfDocument document_;
     Scene scene_;
     UniqueNames paths_;
     std::vector<Channel> channels_;
     std::map<int, std::vector<float>> times_;
+    TimeScale scale_;
+    double arcTolerance_ = 0.0;
 };
 
 }  // namespace
-
-Scene ImportGltf(std::string const& fileName, ImportOptions const& options)
-{
-    return ImportGltfFromMemory(ReadFileBytes(fileName, "", std::numeric_limits<std::uint32_t>::max()), fileName,
-                                options);
-}
 
 Scene ImportGltfFromMemory(std::string_view bytes, std::string const& fileName, ImportOptions const& options)
 {

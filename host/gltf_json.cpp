@@ -120,6 +120,18 @@ std::string LineAndColumn(std::string_view text, std::size_t byte)
     return "line " + std::to_string(line) + ", column " + std::to_string(byte - lineStart);
 }
 
+// Programs that print numbers as they come write these, which JSON doesn't have.
+std::string WhatIsNoJson(std::string_view text, std::size_t byte)
+{
+    constexpr std::string_view ofWords = "+-ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz";
+    std::size_t const start = text.substr(0, byte).find_last_not_of(ofWords) + 1;  // npos + 1 is 0
+    std::string_view word = text.substr(start);
+    word = word.substr(0, word.find_first_not_of(ofWords));
+    for (std::string_view const name : {"NaN", "nan", "Infinity", "-Infinity", "inf", "-inf"})
+        if (word == name) return '"' + std::string(word) + "\" isn't a number that JSON has";
+    return "this isn't JSON";
+}
+
 json ParseText(std::string_view text)
 {
     auto const limitDepth = [](int depth, json::parse_event_t, json&) {
@@ -131,7 +143,7 @@ json ParseText(std::string_view text)
         return json::parse(text.begin(), text.end(), limitDepth);
     } catch (json::parse_error const& error) {
         throw ImportError(LineAndColumn(text, error.byte),
-                          error.byte > text.size() ? "the JSON text ends too early" : "this isn't JSON");
+                          error.byte > text.size() ? "the JSON text ends too early" : WhatIsNoJson(text, error.byte));
     } catch (json::exception const&) {
         throw ImportError("", "the JSON has a number that is out of range");
     }

@@ -40,6 +40,23 @@ bool IsControl(std::string_view sequence)
     return first < 0x20 || first == 0x7F || (first == 0xC2 && static_cast<unsigned char>(sequence[1]) < 0xA0);
 }
 
+// As a C program would write it.
+void AppendEscaped(std::string& text, std::string_view bytes)
+{
+    constexpr std::string_view digits = "0123456789abcdef";
+    for (char const c : bytes) {
+        std::size_t const named = std::string_view("\n\t\r").find(c);
+        text += '\\';
+        if (named != std::string_view::npos) {
+            text += "ntr"[named];
+        } else {
+            text += 'x';
+            text += digits[static_cast<unsigned char>(c) >> 4];
+            text += digits[static_cast<unsigned char>(c) & 15];
+        }
+    }
+}
+
 }  // namespace
 
 std::string CleanName(std::string_view name)
@@ -50,7 +67,7 @@ std::string CleanName(std::string_view name)
         std::size_t const length = SequenceLength(name);
         std::string_view const sequence = name.substr(0, length == 0 ? 1 : length);
         if (length == 0 || IsControl(sequence))
-            clean += '?';
+            AppendEscaped(clean, sequence);
         else
             clean += sequence;
         name.remove_prefix(sequence.size());
@@ -60,7 +77,7 @@ std::string CleanName(std::string_view name)
 
 std::string StemOf(std::string const& fileName)
 {
-    return CleanName(std::filesystem::path(fileName).stem().string());
+    return fileName == "-" ? "stdin" : CleanName(std::filesystem::path(fileName).stem().string());
 }
 
 std::string UniqueNames::Make(std::string const& wanted)

@@ -8,10 +8,10 @@
 namespace kfshost {
 
 // A name from a file as text that can be shown and written anywhere: control characters and bytes that aren't UTF-8
-// become '?'.
+// are escaped, \n, \t, \r and \x1b.
 std::string CleanName(std::string_view name);
 
-// The file's name without folder and last ending.
+// The file's name without folder and last ending; "stdin" for "-".
 std::string StemOf(std::string const& fileName);
 
 // Hands out names of which no two are alike: a second "a" becomes "a#2".

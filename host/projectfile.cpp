@@ -3,6 +3,8 @@
 #include "frame/errors.h"
 #include "frame/frame.h"
 #include "frame/services/chunkfile.h"
+#include "frame/services/reports.h"
+#include "host/import.h"
 #include "host/names.h"
 #include "host/storeerror.h"
 #include "keystore/lookup.h"
@@ -10,7 +12,6 @@
 #include <algorithm>
 #include <bit>
 #include <cmath>
-#include <fstream>
 #include <limits>
 #include <optional>
 #include <unordered_map>
@@ -211,9 +212,31 @@ void SaveInto(CKF_File& file, int created, SceneGroup const& tree, std::string c
 
 // ---- reading
 
+// Takes the reports for its scope.
+class ScTakeReports {
+public:
+    explicit ScTakeReports(LoadNotes* notes) : notes_(notes)
+    {
+        if (!notes_) return;
+        previous_ = Q_SetReportSink([this](Q_Report const& report) {
+            notes_->reports.push_back(report.text ? CleanName(report.text) : "error " + std::to_string(report.code));
+        });
+    }
+    ~ScTakeReports()
+    {
+        if (notes_) Q_SetReportSink(previous_);
+    }
+    ScTakeReports(ScTakeReports const&) = delete;
+    ScTakeReports& operator=(ScTakeReports const&) = delete;
+
+private:
+    LoadNotes* notes_;
+    Q_ReportSink previous_;
+};
+
 class ProjectReader {
 public:
-    explicit ProjectReader(std::string const& fileName) : fileName_(fileName) {}
+    ProjectReader(std::string const& fileName, LoadNotes* notes) : fileName_(fileName), notes_(notes), taken_(notes) {}
 
     // `source` is what CKF_File opens: a path, or bytes.
     template <class Source>
@@ -239,8 +262,10 @@ private:
         throw ProjectError(fileName_, text.empty() ? "damaged: " + Reason(code) : text);
     }
 
-    static std::string Reason(int code)
+    // The sentence that was reported says more than a code.
+    std::string Reason(int code) const
     {
+        if (notes_ && !notes_->reports.empty()) return notes_->reports.back();
         switch (code) {
         case CKF_Err_NoSuchChunk: return "something is missing that files of its version have";
         case KFS_Err_BadFileInfo: return "a stream has a form that this program doesn't know";
@@ -319,7 +344,9 @@ private:
         return facts;
     }
 
-    std::string const& fileName_;
+    std::string fileName_;
+    LoadNotes* notes_;
+    ScTakeReports taken_;
     CKF_File file_;
     std::unique_ptr<SceneGroup> tree_;
 };
@@ -403,21 +430,21 @@ std::vector<unsigned char> SaveProjectToMemory(SceneGroup const& tree, std::stri
     return {file.GetBytes().begin(), file.GetBytes().end()};
 }
 
-std::unique_ptr<SceneGroup> LoadProject(std::string const& fileName)
+std::unique_ptr<SceneGroup> LoadProject(std::string const& fileName, LoadNotes* notes)
 {
-    return ProjectReader(fileName).Run(fileName.c_str());
+    return ProjectReader(fileName, notes).Run(fileName.c_str());
 }
 
-std::unique_ptr<SceneGroup> LoadProjectFromMemory(std::span<unsigned char const> bytes, std::string const& name)
+std::unique_ptr<SceneGroup> LoadProject(FileInput const& input, LoadNotes* notes)
 {
-    return ProjectReader(name).Run(bytes);
+    auto const* const bytes = reinterpret_cast<unsigned char const*>(input.bytes.data());
+    return LoadProjectFromMemory({bytes, input.bytes.size()}, ShownFileName(input.name), notes);
 }
 
-bool IsProjectFile(std::string const& fileName)
+std::unique_ptr<SceneGroup> LoadProjectFromMemory(std::span<unsigned char const> bytes, std::string const& name,
+                                                  LoadNotes* notes)
 {
-    char magic[4] = {};
-    std::ifstream(fileName, std::ios::binary).read(magic, sizeof magic);
-    return std::string_view(magic, sizeof magic) == "KFSF";
+    return ProjectReader(name, notes).Run(bytes);
 }
 
 }  // namespace kfshost

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "host/import.h"
 #include "host/kinds.h"
 #include "host/scene.h"
 
@@ -35,12 +36,20 @@ void SaveProject(SceneGroup const& tree, std::string const& fileName, CKF_IoHook
 // The bytes that SaveProject puts into the file; `name` is the file's in the text of an error.
 std::vector<unsigned char> SaveProjectToMemory(SceneGroup const& tree, std::string const& name);
 
+// What the library reported while it loaded a project: a sentence for each time that the file isn't what its version
+// says and was cut or changed to fit. A load without any took the file as it stands.
+struct LoadNotes {
+    std::vector<std::string> reports;
+};
+
 // All of a project, or ProjectError. Its streams are made of numbers, their keys have finite values and stand in the
 // order of their times, and the scale is the scene's.
-std::unique_ptr<SceneGroup> LoadProject(std::string const& fileName);
-std::unique_ptr<SceneGroup> LoadProjectFromMemory(std::span<unsigned char const> bytes, std::string const& name);
-
-// Whether a file begins as projects do, whatever its name says.
-bool IsProjectFile(std::string const& fileName);
+//
+// The library reports what it has to cut or change for that, such as key records that are longer than the stream's. With
+// `notes` these reports are put there, and go nowhere else; without, they go where reports go.
+std::unique_ptr<SceneGroup> LoadProject(std::string const& fileName, LoadNotes* notes = nullptr);
+std::unique_ptr<SceneGroup> LoadProject(FileInput const& input, LoadNotes* notes = nullptr);
+std::unique_ptr<SceneGroup> LoadProjectFromMemory(std::span<unsigned char const> bytes, std::string const& name,
+                                                  LoadNotes* notes = nullptr);
 
 }  // namespace kfshost

@@ -7,7 +7,6 @@
 #include <functional>
 #include <limits>
 #include <numeric>
-#include <random>
 
 using kfshost::Rational;
 using nlohmann::json;
@@ -68,8 +67,8 @@ TEST_F(GltfInput, NamesMakePathsOfWhichNoTwoAreAlike)
     auto const scene = Import(file);
     ASSERT_EQ(2U, scene.streams.size());
     EXPECT_EQ("file", scene.name);
-    EXPECT_EQ("up?and down/node0/translation", scene.streams[0].path);
-    EXPECT_EQ("up?and down/node0/translation#2", scene.streams[1].path);
+    EXPECT_EQ(R"(up\nand down/node0/translation)", scene.streams[0].path);
+    EXPECT_EQ(R"(up\nand down/node0/translation#2)", scene.streams[1].path);
     EXPECT_EQ("animations[0].channels[1]", scene.streams[1].place);
 }
 
@@ -267,7 +266,10 @@ TEST_F(GltfInput, SaysWhereTextIsNotJson)
     EXPECT_EQ("the JSON is nested more than 64 deep", ErrorOf("a.gltf", std::string(100000, '[')));
     EXPECT_EQ("the JSON has a number that is out of range", ErrorOf("a.gltf", "{\"asset\":1e999}"));
     EXPECT_EQ("isn't an object", ErrorOf("a.gltf", "[]"));
-    EXPECT_EQ("isn't a project, and its name doesn't end in .gltf, .glb or .bvh", ErrorOf("a.fbx", "{}"));
+    EXPECT_EQ("line 1, column 12: \"-Infinity\" isn't a number that JSON has",
+              ErrorOf("a.gltf", "{\"a\": [1, -Infinity]}"));
+    EXPECT_EQ("begins neither as a project nor as glTF or BVH, and its name doesn't end in .gltf, .glb or .bvh",
+              ErrorOf("a.fbx", "Kaydara"));
 }
 
 // Channels may share data, so that a file of some kilobytes asks for any number of keys.
@@ -291,22 +293,4 @@ TEST_F(GltfInput, ASmallFileCannotAskForAnyNumberOfKeys)
     for (int i = 1; i < 700; ++i) channels.push_back(channel);
     EXPECT_EQ("animations[0].channels[41]: the file's channels ask for more keys than are accepted",
               ErrorOf("a.gltf", file.Text()));
-}
-
-// Bytes changed and bytes missing, anywhere: an answer or one line, never anything else.
-TEST_F(GltfInput, SurvivesAnything)
-{
-    std::mt19937 random(5);
-    for (bool const isBinary : {false, true}) {
-        std::string const good = isBinary ? GltfFile().Binary() : GltfFile().Text();
-        std::uniform_int_distribution<std::size_t> place(0, good.size() - 1);
-        std::uniform_int_distribution<int> byte(0, 255);
-        for (int round = 0; round < 300; ++round) {
-            std::string bytes = good;
-            for (int change = 0; change <= round % 3; ++change) bytes[place(random)] = static_cast<char>(byte(random));
-            if (round % 5 == 0) bytes.resize(place(random));
-            std::string const error = ErrorOf(isBinary ? "a.glb" : "a.gltf", bytes);
-            EXPECT_EQ(std::string::npos, error.find_first_of("\n\r\x1B")) << error;
-        }
-    }
 }

@@ -1,8 +1,11 @@
 #include "host/import.h"
+#include "host/rotations.h"
 #include "tests/host/hosttest.h"
 
 #include <cmath>
 #include <map>
+#include <numbers>
+#include <numeric>
 
 using kfshost::ImportOptions;
 using kfshost::Rational;
@@ -62,21 +65,113 @@ std::vector<Met> MetAround(StreamItem const& item, Rational const& time, double 
     return met;
 }
 
-// `nearKeys`: whether the scale is fine enough to trust samples next to keys.
+// The greatest angle between an arc and its chord, for rotations so far apart: the tangent of the turned share of half
+// the angle, which is the angle between the quaternions.
+double ArcDeviation(double between)
+{
+    double worst = 0.0;
+    for (int i = 1; i < 2000; ++i) {
+        double const u = i / 2000.0;
+        double const chord = std::atan2(u * std::sin(between), 1.0 - u + u * std::cos(between));
+        worst = std::max(worst, 2.0 * std::abs(chord - u * between));
+    }
+    return worst;
+}
+
+using Row = std::vector<double>;
+
+double Dot(Row const& a, Row const& b)
+{
+    return std::inner_product(a.begin(), a.end(), b.begin(), 0.0);
+}
+
+Row ReadRow(KFS_Stream const& stream, Rational const& time)
+{
+    Row row(static_cast<std::size_t>(stream.GetDimension()));
+    kfshost::ReadAt(stream, time, row.data());
+    return row;
+}
+
+// The keys around a time, and how far it is from the one to the other.
+struct Segment {
+    Row before, after;
+    double share = 0.0;
+};
+
+Segment SegmentAt(KFS_Stream const& stream, Rational const& time)
+{
+    int end = 0;
+    while (end + 1 < kfshost::KeyCount(stream) && kfshost::KeyTime(stream, end) <= time) ++end;
+    Rational const from = kfshost::KeyTime(stream, std::max(end - 1, 0));
+    Rational const to = kfshost::KeyTime(stream, end);
+    return {ReadRow(stream, from), ReadRow(stream, to), from < to ? ((time - from) / (to - from)).ToDouble() : 0.0};
+}
+
+double Distance(Row const& a, Row const& b)
+{
+    double most = 0.0;
+    for (std::size_t d = 0; d < a.size(); ++d) most = std::max(most, std::abs(a[d] - b[d]));
+    return most;
+}
+
+// Whether a row is what lies between two keys of which one has its sign turned: the long way round.
+bool IsLongWay(Segment const& segment, Row const& row)
+{
+    double plus = 0.0;
+    double minus = 0.0;
+    for (std::size_t d = 0; d < row.size(); ++d) {
+        double const number = (1.0 - segment.share) * segment.before[d] - segment.share * segment.after[d];
+        plus = std::max(plus, std::abs(number - row[d]));
+        minus = std::max(minus, std::abs(number + row[d]));
+    }
+    return std::min(plus, minus) < 1e-6;
+}
+
+// Degrees between two rotations.
+double AngleBetween(Row const& a, Row const& b)
+{
+    double const cosine = std::abs(Dot(a, b)) / std::sqrt(Dot(a, a) * Dot(b, b));
+    return 2.0 * std::acos(std::min(cosine, 1.0)) * 180.0 / std::numbers::pi;
+}
+
+// Against the arc: off by what the documented bound says for the keys around, and by no more.
+void CompareWithArc(StreamItem const& item, Rational const& time, Row const& slerp, double rounding)
+{
+    auto const [before, after, share] = SegmentAt(*item.stream, time);
+    ASSERT_GE(Dot(before, after), 0.0) << item.path << ": neighbours of opposite sign at " << time.ToString();
+    double const apart = AngleBetween(before, after);
+    double const bound = kfshost::ArcDeviationBound(apart);
+    EXPECT_LE(ArcDeviation(apart / 360.0 * std::numbers::pi) * 180.0 / std::numbers::pi, bound + 1e-9);
+    // The lengths of keys, which are floats, and the angle's own rounding.
+    ASSERT_LE(AngleBetween(ReadRow(*item.stream, time), slerp), bound + rounding * 360.0 * 120.0 + 1e-4)
+        << item.path << " at " << time.ToString() << " s, keys " << apart << " degrees apart";
+}
+
+// `nearKeys`: whether the scale is fine enough to trust samples next to keys. A rotation's values are held up to their
+// sign, and where a sign was turned between two keys only against the arc, not against the long way round.
 void CompareChannel(StreamItem const& item, json const& channel, double keyRounding, bool nearKeys)
 {
     // Some curves barely move; a number near 1 is good to some 1e-16.
     double const tolerance = std::max(1e-9 * RangeOf(channel.at("v")), 1e-14);
     std::string const kinds = channel.at("kind");
+    bool const isSigned = item.kind != kfshost::StreamKind::Rotation || channel.at("interp") == "CUBICSPLINE";
     for (std::size_t i = 0; i < kinds.size(); ++i) {
         if (kinds[i] == 'n' && !nearKeys) continue;
         Rational const time = TimeOf(channel.at("t")[i]);
-        bool const isExact = channel.at("interp") == "STEP" || kinds[i] == 'k' || kinds[i] == 'o';
+        bool const isExact = channel.at("interp") == "STEP" || kinds[i] == 'o' || (kinds[i] == 'k' && nearKeys);
         double const rounding = isExact ? 0.0 : keyRounding + RoundingOf(time, item.stream->GetTimeScale());
         std::vector<Met> const met = MetAround(item, time, rounding);
-        auto const expected = channel.at("v")[i].get<std::vector<double>>();
+        auto expected = channel.at("v")[i].get<Row>();
         ASSERT_EQ(expected.size(), met.size());
-        for (std::size_t d = 0; d < met.size(); ++d) {
+        if (channel.contains("slerp"))
+            ASSERT_NO_FATAL_FAILURE(CompareWithArc(item, time, channel.at("slerp")[i].get<Row>(), rounding));
+        Row const found = ReadRow(*item.stream, time);
+        double const sign = !isSigned && Dot(found, expected) < 0.0 ? -1.0 : 1.0;
+        for (double& number : expected) number *= sign;
+        bool const differs = Distance(found, expected) > tolerance;
+        bool const isTurned =
+            channel.contains("slerp") && differs && IsLongWay(SegmentAt(*item.stream, time), expected);
+        for (std::size_t d = 0; d < met.size() && !isTurned; ++d) {
             double const allowed = isExact ? 0.0 : tolerance;
             ASSERT_TRUE(met[d].low - allowed <= expected[d] && expected[d] <= met[d].high + allowed)
                 << item.path << ", component " << d << " at " << time.ToString() << " s, kind " << kinds[i]
