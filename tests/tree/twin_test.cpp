@@ -431,6 +431,9 @@ TEST_F(TwinTest, EditsInsideOfEdits)
     std::vector<Step> const scripts[] = {
         // the list becomes shorter, or loses the stream, before it is changed
         {{{Op::Append, 0, 0, 0}, 0, {}}, {{Op::Insert, 0, 1, 0}, 1, {Op::Remove, 0, 0, 0}}},
+        {{{Op::Append, 0, 0, 0}, 0, {}},
+         {{Op::Append, 0, 0, 0}, 0, {}},
+         {{Op::Insert, 0, 0, 0}, 1, {Op::Remove, 0, 0, 0}}},
         {{{Op::Append, 0, 0, 0}, 0, {}}, {{Op::Remove, 0, 0, 0}, 3, {Op::Remove, 0, 0, 0}}},
         {{{Op::Append, 0, 0, 0}, 0, {}}, {{Op::Swap, 0, 0, 0}, 5, {Op::Remove, 0, 0, 0}}},
         // the slot is made real, or canonical again, by somebody else
