@@ -58,7 +58,6 @@ char code;
 unsigned char byte;
 unsigned short flags;
 unsigned int spFlags;
-char** handle;
 KFS_Stream* other;
 
 double const* In()

@@ -70,40 +70,6 @@ TEST_F(FloatKeys, TakeTheTimeAtWhichThePointPasses)
     }
 }
 
-TEST_F(FloatKeys, AreWhereTheReadFindsThem)
-{
-    std::mt19937 random(4242);
-    std::uniform_real_distribution<double> influence(0.1, 0.9);
-    std::uniform_real_distribution<double> step(0.5, 10.0);
-    for (int round = 0; round < 30; ++round) {
-        SCOPED_TRACE(round);
-        std::vector<std::pair<int, double>> keys;
-        double x = 0.0;
-        for (int i = 0; i < 7; ++i) {
-            keys.emplace_back(i * 1000, x);
-            x += step(random);
-        }
-        PathStream stream = Line(keys, KFS_Interp_Spline);
-        stream.Settle();
-        for (int i = 0; i < 7; ++i)
-            stream.SetHandle(i, {step(random), influence(random), step(random), influence(random)});
-        if (round % 3 == 1) stream.Codes(0, 1, KFS_Interp_Linear);
-        if (round % 3 == 2) stream.Codes(6, KFS_Interp_Linear, 1);
-        Float(stream, {1, 2, 4, 5});
-        stream.Record(3)->flags |= KFS_KeyFlag_Float;
-        ASSERT_EQ(0, KFS_ForceUpdateStream(stream));
-        std::vector<int> const times = stream.Times();
-        for (std::size_t i = 1; i < times.size(); ++i) EXPECT_LT(times[i - 1], times[i]);
-        for (int i = 1; i < 6; ++i) {
-            // A unit of time to either side the point is on either side of the key.
-            int const at = times[static_cast<std::size_t>(i)];
-            double const place = KFSp_Numbers(stream.Record(i))[0];
-            EXPECT_LE(stream.At(at - 1)[0], place + 2e-2) << "key " << i;
-            EXPECT_GE(stream.At(at + 1)[0], place - 2e-2) << "key " << i;
-        }
-    }
-}
-
 // Many keys that want the same unit of time, or stand one behind the other where they pass each other. Were each moved
 // tick by tick, this would take hours.
 TEST_F(FloatKeys, InGreatNumbersFindRoomAtOnce)
@@ -151,19 +117,6 @@ TEST_F(FloatKeys, GiveWayToALaterKeyThatHasNotMovedYet)
     EXPECT_EQ((std::vector<int>{0, 40, 70, 100}), stream.Times());
 }
 
-TEST_F(FloatKeys, OneAtATimeGiveTheSameTimes)
-{
-    std::vector<std::pair<int, double>> const keys = {{0, 0}, {1, 3}, {2, 9}, {3, 20}, {1000, 50}};
-    PathStream together = Line(keys, KFS_Interp_Spline);
-    Float(together, {1, 2, 3});
-    PathStream single = Line(keys, KFS_Interp_Spline);
-    for (int const index : {3, 2, 1}) single.Flag(index, KFS_KeyFlag_Float);
-    for (int const index : {3, 2, 1}) ASSERT_EQ(0, KFSp_ComputeFloatTime(single, index));
-    EXPECT_EQ(together.Times(), single.Times());
-    EXPECT_EQ(0, KFSp_ComputeFloatTime(single, 0));  // not a float key
-    EXPECT_EQ(together.Times(), single.Times());
-}
-
 TEST_F(FloatKeys, StayAtTheEndsOfTheListAndRefuseOtherDimensions)
 {
     PathStream line = Line({{0, 0}, {10, 5}, {100, 10}});
@@ -182,96 +135,6 @@ TEST_F(FloatKeys, StayAtTheEndsOfTheListAndRefuseOtherDimensions)
     stream.StreamFlag(KFS_StreamFlag_SParametrize).Flag(1, KFS_KeyFlag_Float);
     EXPECT_EQ(KFS_Err_Only2D3D, KFSp_ComputeFloatTime(stream, 1));
     EXPECT_REPORT(reports, 45, "only 2d or 3d spatial streams are allowed for this operation.");
-}
-
-TEST_F(FloatKeys, KeepTheSpeedGraphWhenTheyStop)
-{
-    PathStream stream = Line({{0, 0}, {1, 30}, {600, 100}}, KFS_Interp_Spline);
-    stream.Settle().SetHandle(0, {0, 0, 20, 0.4}).SetHandle(2, {60, 0.3, 0, 0});
-    Float(stream, {1});
-    std::vector<Vector> before;
-    for (int time = 1; time < 600; time += 7) before.push_back(stream.At(time));
-    int const stopped = stream.Record(1)->time;
-    ASSERT_EQ(0, KFS_SetKeyFloat(stream, 0, 1));
-    ASSERT_EQ(0, stream->UpdateStream());
-    EXPECT_EQ(stopped, stream.Record(1)->time);
-    EXPECT_EQ(0, stream.Record(1)->flags & KFS_KeyFlag_Float);
-    std::size_t i = 0;
-    // The key's own unit of time is rounded, which moves the point by less than its way in one unit.
-    for (int time = 1; time < 600; time += 7) EXPECT_LT(Distance(before[i++], stream.At(time)), 0.4) << "at " << time;
-}
-
-struct MoveCase {
-    char const* why;
-    std::vector<int> keys;
-    std::vector<int> floats;
-    int index, target;
-    std::vector<int> times;  // before the next repair
-    int newIndex;
-    std::array<int, 2> stale;
-};
-
-MoveCase const MoveCases[] = {
-    {"between its neighbours", {0, 10, 20, 30}, {}, 1, 15, {0, 15, 20, 30}, 1, {0, 2}},
-    {"to its own place", {0, 10, 20, 30}, {}, 1, 10, {0, 10, 20, 30}, 1, {0, 2}},
-    {"past its neighbour", {0, 10, 20, 30}, {}, 1, 25, {0, 20, 25, 30}, 2, {0, 3}},
-    {"past all others", {0, 10, 20, 30}, {}, 1, 99, {0, 20, 30, 99}, 3, {0, 3}},
-    {"onto another key", {0, 10, 20, 30}, {}, 1, 20, {0, 20, 30}, 1, {0, 2}},
-    {"the first past its neighbour", {0, 10, 20}, {}, 0, 15, {10, 15, 20}, 1, {0, 2}},
-    {"the last past its neighbour", {0, 10, 20, 30}, {}, 3, 15, {0, 10, 15, 20}, 2, {1, 3}},
-    {"the first further out", {0, 10, 20}, {}, 0, -50, {-50, 10, 20}, 0, {0, 1}},
-    {"the only one", {10}, {}, 0, 500, {500}, 0, {0, 0}},
-    {"between float keys", {0, 10, 20, 30, 40, 50}, {1, 3, 4}, 2, 25, {0, 1, 25, 48, 49, 50}, 2, {0, 5}},
-    {"in place between float keys", {0, 10, 20, 30, 40, 50}, {1, 3, 4}, 2, 20, {0, 1, 20, 48, 49, 50}, 2, {0, 5}},
-    {"the first into a run of float keys", {0, 10, 20, 30, 50}, {2, 3}, 0, 25, {10, 25, 48, 49, 50}, 1, {0, 4}},
-    {"the first onto an anchor past a float key", {-1, 0, 2, 4}, {1}, 0, 2, {1, 2, 4}, 1, {0, 3}},
-    {"the last onto an anchor between float keys",
-     {0, 10, 20, 30, 40, 50},
-     {1, 3},
-     5,
-     20,
-     {0, 1, 20, 21, 40},
-     2,
-     {0, 5}},
-    {"the last into a run of float keys", {0, 10, 20, 40, 50}, {1, 2}, 4, 25, {0, 1, 2, 25, 40}, 3, {0, 4}},
-};
-
-TEST_F(SetKeyTime, MovesTheKeyAndPacksFloatKeys)
-{
-    for (MoveCase const& c : MoveCases) {
-        for (int const finer : {0, 1, 3}) {  // 0: the target as a bare value
-            SCOPED_TRACE(testing::Message() << c.why << ", scale x" << finer);
-            std::vector<std::pair<int, double>> keys;
-            for (int const time : c.keys) keys.emplace_back(time, 100.0 + time);
-            PathStream stream = Line(keys);
-            for (int const index : c.floats) stream.Flag(index, KFS_KeyFlag_Float);
-            double const x = KFSp_Numbers(stream.Record(c.index))[0];
-            stream.At(5);
-
-            T_Time const target{c.target * finer, 600U * static_cast<unsigned>(finer)};
-            int newIndex = 77;
-            T_Time old{77, 77};
-            ASSERT_EQ(0, KFS_SetKeyTime(stream, c.index, finer == 0 ? nullptr : &target, finer == 0 ? c.target : 1234,
-                                        &newIndex, &old));
-            EXPECT_EQ(c.times, stream.Times());
-            EXPECT_EQ(c.newIndex, newIndex);
-            EXPECT_EQ(std::pair(c.keys[static_cast<std::size_t>(c.index)], 600U), std::pair(old.value, old.scale));
-            EXPECT_EQ(x, KFSp_Numbers(stream.Record(newIndex))[0]);
-            EXPECT_LE(stream.Stale()[0], c.stale[0]);
-            EXPECT_GE(stream.Stale()[1], std::min(c.stale[1], stream.Count() - 1));
-            EXPECT_TRUE(stream.CacheIsEmpty());
-            EXPECT_EQ(0, stream.Pins());
-            // What the search says of the list is what the list says.
-            for (int i = 0; i < stream.Count(); ++i) {
-                T_Time const at = stream.Time(stream.Record(i)->time);
-                int found = -1;
-                stream->SetDisabledUpdateStream(true);
-                EXPECT_EQ(0, KFS_TimeToIndex(stream, &at, &found));
-                stream->SetDisabledUpdateStream(false);
-                EXPECT_EQ(i, found);
-            }
-        }
-    }
 }
 
 TEST_F(SetKeyTime, MovesThePlainKeyWithItsHandlesPastListenersThatRead)
@@ -300,40 +163,6 @@ TEST_F(SetKeyTime, MovesThePlainKeyWithItsHandlesPastListenersThatRead)
     EXPECT_EQ((std::vector<int>{0, 200, 250}), stream.Times());
     EXPECT_EQ(2, newIndex);
     stream->SetParent(nullptr);
-}
-
-TEST_F(SetKeyTime, ResetsTheInfluenceBesideTheEnds)
-{
-    for (short const dimension : {1, 6}) {
-        KeyedStream stream = MakeKeyed({{0, 1}, {100, 5}, {200, 2}}, KFS_Interp_Spline, {.dimension = dimension});
-        for (int i = 0; i < 3; ++i) {
-            stream.Flag(i, KFS_KeyFlag_Modifiable);
-            for (int d = 0; d < dimension; ++d) stream.SetHandle(i, {1, 0.9, 1, 0.9}, d);
-        }
-        stream->SetDisabledUpdateStream(true);
-        for (int i = 0; i < 3; ++i) {
-            ASSERT_EQ(0, KFS_SetKeyTime(stream, i, nullptr, 100 * i + 5, nullptr, nullptr));
-            Handle const handle = stream.GetHandle(i, dimension - 1);
-            EXPECT_EQ(i == 0 ? KFSp_OneSixth : 0.9, handle.inInfluence);
-            EXPECT_EQ(i == 2 ? KFSp_OneSixth : 0.9, handle.outInfluence);
-            EXPECT_EQ(i == 1, (stream.Record(i)->flags & KFS_KeyFlag_Modifiable) != 0);
-        }
-        stream->SetDisabledUpdateStream(false);
-    }
-}
-
-TEST_F(SetKeyTime, OfAConstantIsWhereItsValueStands)
-{
-    TestStream stream({.noKeys = true});
-    stream.Key(40, {3.5});
-    stream.At(40);
-    T_Time old{};
-    ASSERT_EQ(0, KFS_SetKeyTime(stream, 12, nullptr, 90, nullptr, &old));
-    EXPECT_EQ(40, old.value);
-    EXPECT_EQ(90, stream->GetCache()->time);
-    EXPECT_EQ(KFS_Err_TimeNotRepresentable, KFS_SetKeyTime(stream, 0, nullptr, KFS_INVALID_INDEX, nullptr, nullptr));
-    EXPECT_EQ(1U, reports.Take().size());
-    EXPECT_EQ(3.5, stream.At1(0));
 }
 
 TEST_F(SetKeyTime, RefusesWhatItCannotMove)

@@ -8,64 +8,6 @@ using HandleQuestionsTest = StreamTest;
 
 // ---- KFS_GetClampedVelInflF
 
-struct Clamp {
-    char const* why;
-    bool in;
-    double speed, influence;
-    bool clamped;
-    double newSpeed, newInfluence;
-};
-
-// The middle key's value is 10 after one second; before it 0, one second away, after it 40, two seconds away.
-Clamp const Clamps[] = {
-    {"inside", true, 4, 0.5, false, 4, 0.5},
-    {"up to the neighbour's value", true, 20, 0.5, false, 20, 0.5},
-    {"beyond it", true, 40, 0.5, true, 40, 0.25},
-    {"far beyond it", true, 1000, 1, true, 1000, 0.01},
-    {"in the wrong direction", true, -4, 0.5, true, 0, 0.5},
-    {"flat", true, 0, 0.9, false, 0, 0.9},
-    {"without length", true, 99, 0, false, 99, 0},
-    {"out, inside", false, 10, 0.5, false, 10, 0.5},
-    {"out, beyond", false, 100, 0.5, true, 100, 0.15},
-    {"out, in the wrong direction", false, -1, 0.25, true, 0, 0.25},
-};
-
-TEST_F(HandleQuestionsTest, ProposedHandlesStayBetweenTheValues)
-{
-    for (Clamp const& c : Clamps) {
-        SCOPED_TRACE(c.why);
-        KeyedStream stream = MakeThree();
-        std::vector<unsigned char> const before = stream.Bytes();
-        double speed = c.speed;
-        double influence = c.influence;
-        unsigned char clamped = 0;
-        auto const ask = [&](double* speeds, double* influences) {
-            return c.in ? KFS_GetClampedVelInflF(stream, 1, -1, speeds, influences, nullptr, nullptr, &clamped)
-                        : KFS_GetClampedVelInflF(stream, 1, 1, nullptr, nullptr, speeds, influences, &clamped);
-        };
-        ASSERT_EQ(0, ask(&speed, &influence));
-        EXPECT_NEAR(c.newSpeed, speed, 1e-9);
-        EXPECT_NEAR(c.newInfluence, influence, 1e-12);
-        EXPECT_EQ(c.clamped, clamped);
-        EXPECT_EQ(before, stream.Bytes());
-        // What is clamped already stays, up to rounding.
-        double again = speed;
-        ASSERT_EQ(0, ask(&again, &influence));
-        EXPECT_NEAR(speed, again, 1e-9);
-
-        // A missing number is the stored one.
-        stream.SetHandle(1, {c.speed, c.influence, c.speed, c.influence});
-        speed = c.speed;
-        influence = c.influence;
-        clamped = 0;
-        ASSERT_EQ(0, ask(&speed, nullptr));
-        ASSERT_EQ(0, ask(nullptr, &influence));
-        EXPECT_NEAR(c.newSpeed, speed, 1e-9);
-        EXPECT_NEAR(c.newInfluence, influence, 1e-12);
-        EXPECT_EQ(c.clamped, clamped);
-    }
-}
-
 TEST_F(HandleQuestionsTest, ClampingIsPerComponentAndOnlyEverSetsItsFlag)
 {
     KeyedStream stream = MakeKeyed({{0, 0.0}, {600, 10.0}}, S, {.dimension = 2});

@@ -355,7 +355,8 @@ Done Leaf::CopyKey(Leaf& source, int index, bool replace, int const* time, int* 
     std::optional<int> const own = Rescaled(source.set.constant ? 0 : key.time, source.set.scale, set.scale);
     if (set.constant && single && !replace) return Refuse(KFS_Err_KeyValue, 17, Overwrite);
     if (set.constant && this == &source) {
-        if (Switches::ConstantMovesOntoItself) single->time = time ? *time : 0;
+        single->time = time ? *time : 0;
+        if (set.interpMask == 4) single->in = single->out = KFS_Interp_Hold;
         *newIndex = 0;
         return {0, {}, 1};
     }

@@ -19,11 +19,6 @@ namespace leafmodel {
 
 using Numbers = std::vector<double>;
 
-// Readings that the library is about to take; each row goes when it has.
-struct Switches {
-    static constexpr bool ConstantMovesOntoItself = false;
-};
-
 // What a call did: its result, what it reported, how often it told the listeners.
 struct Done {
     int code = 0;

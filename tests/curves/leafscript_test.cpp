@@ -260,9 +260,11 @@ public:
     {
         std::string const calls = calls_;
         for (Pair& pair : pairs_) {
-            for (int time = -60; time < 440 && fault_.empty(); time += 7) {
+            std::vector<Numbers> const rendered = Render(pair);
+            for (std::size_t i = 0; i < Samples && fault_.empty(); ++i) {
                 calls_ = calls;
-                Ask(pair, pair.stream.Time(time * row_.grid / 10));
+                Ask(pair, Sample(pair, i));
+                if (i < rendered.size()) Same("rendered value", rendered[i], pair.stream.At(Sample(pair, i).value));
             }
         }
         return std::exchange(fault_, {});
@@ -305,7 +307,7 @@ private:
     void Say(char const* function, Args const&... args)
     {
         std::ostringstream out;
-        bool first = true;
+        [[maybe_unused]] bool first = true;
         ((Print(out << (std::exchange(first, false) ? "" : ", "), args)), ...);
         calls_ += std::string("    ") + function + "(" + out.str() + ");\n";
     }
@@ -321,6 +323,12 @@ private:
         Same(std::string(what) + " notifications", expected.told, listener_.Take());
     }
 
+    static constexpr std::size_t Samples = 72;
+    T_Time Sample(Pair const& pair, std::size_t i) const
+    {
+        return pair.stream.Time((static_cast<int>(i) * 7 - 60) * row_.grid / 10);
+    }
+    std::vector<Numbers> Render(Pair const& pair);
     void CompareStored(Pair& pair);
     void CompareKey(std::string const& what, leafmodel::Key const& key, KFS_KeyScalar const* record, Pair const& pair);
     void Run(Pair& pair, Pair& other, Step const& step);
@@ -379,6 +387,22 @@ void World::CompareKey(std::string const& what, leafmodel::Key const& key, KFS_K
     Same(what + " in influence", key.inInfluence, runs.inInfluence);
     Same(what + " out speed", key.outSpeed, runs.outSpeed);
     Same(what + " out influence", key.outInfluence, runs.outInfluence);
+}
+
+// What a render reads, which works the marks down on a copy of its own and leaves the stream alone.
+std::vector<Numbers> World::Render(Pair const& pair)
+{
+    // Without arc parametrisation a read moves float keys on, each time.
+    bool const moves = pair.leaf.set.spatial && !pair.leaf.set.sParametrize;
+    if (moves || (pair.leaf.set.constant ? !pair.leaf.single : pair.leaf.keys.empty())) return {};
+    std::vector<unsigned char> const before = pair.stream.Bytes();
+    std::vector<Numbers> values;
+    {
+        Q_ScSetCurrentRenderContext const current(kfshost::MakeRenderContext(true));
+        for (std::size_t i = 0; i < Samples; ++i) values.push_back(pair.stream.At(Sample(pair, i).value));
+    }
+    Same("untouched by a render", true, before == pair.stream.Bytes());
+    return values;
 }
 
 void World::CompareStored(Pair& pair)

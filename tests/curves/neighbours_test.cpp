@@ -10,19 +10,6 @@ namespace {
 
 using NeighboursTest = StreamTest;
 
-constexpr int Unwritten = 777;
-
-struct Found {
-    int at = Unwritten;
-    int prev = Unwritten;
-    int next = Unwritten;
-    bool operator==(Found const&) const = default;
-    friend std::ostream& operator<<(std::ostream& out, Found const& found)
-    {
-        return out << "at " << found.at << " prev " << found.prev << " next " << found.next;
-    }
-};
-
 // Keys are written as a string: 'A' is a key, 'f' a float key, at times 10, 20, 30 ...
 KeyedStream MakeRow(std::string const& row, bool spatial, bool sParametrized)
 {
@@ -33,102 +20,6 @@ KeyedStream MakeRow(std::string const& row, bool spatial, bool sParametrized)
     for (std::size_t i = 0; i < row.size(); ++i) stream.Flag(static_cast<int>(i), KFS_KeyFlag_Float, row[i] == 'f');
     stream.StreamFlag(KFS_StreamFlag_SParametrize, sParametrized);
     return stream;
-}
-
-Found FromTime(KeyedStream const& stream, int time, bool allKeys)
-{
-    Found found;
-    KFS_KeyScalar *at = nullptr, *prev = nullptr, *next = nullptr;
-    EXPECT_EQ(0,
-              KFSp_GetNeighborsFromTime(stream, time, allKeys, &at, &prev, &next, &found.prev, &found.next, &found.at));
-    // An index is written exactly where a key was found, and names that key.
-    EXPECT_EQ(stream.Index(at), found.at == Unwritten ? -1 : found.at);
-    EXPECT_EQ(stream.Index(prev), found.prev == Unwritten ? -1 : found.prev);
-    EXPECT_EQ(stream.Index(next), found.next == Unwritten ? -1 : found.next);
-    KFS_KeyScalar* again[3] = {};
-    EXPECT_EQ(0, KFSp_GetNeighborsFromTime(stream, time, allKeys, &again[0], &again[1], &again[2], nullptr, nullptr,
-                                           nullptr));
-    EXPECT_TRUE(again[0] == at && again[1] == prev && again[2] == next);
-    return found;
-}
-
-Found FromIndex(KeyedStream const& stream, int index, bool allKeys)
-{
-    Found found{index, Unwritten, Unwritten};
-    KFS_KeyScalar *prev = nullptr, *next = nullptr;
-    EXPECT_EQ(0, KFSp_GetNeighborsFromIndex(stream, index, allKeys, &prev, &next, &found.prev, &found.next));
-    EXPECT_EQ(stream.Index(prev), found.prev == Unwritten ? -1 : found.prev);
-    EXPECT_EQ(stream.Index(next), found.next == Unwritten ? -1 : found.next);
-    return found;
-}
-
-// The key at the time and those beside it. Where only anchors count float keys are passed over; behind them the list's
-// end stands in for an anchor.
-Found Model(std::string const& row, int time, bool anchorsOnly)
-{
-    Found found;
-    bool settled = false;
-    for (int i = 0; i < static_cast<int>(row.size()); ++i) {
-        bool const counts = !anchorsOnly || row[static_cast<std::size_t>(i)] == 'A';
-        int const keyTime = 10 * (i + 1);
-        if (keyTime == time) found.at = i;
-        if (keyTime < time && (counts || i == 0)) found.prev = i;
-        if (keyTime > time && !settled) {
-            found.next = i;
-            settled = counts;
-        }
-    }
-    return found;
-}
-
-// Every row of up to five keys, every time on and around them. Float keys are no anchors of a path with arc lengths;
-// elsewhere, or with all keys asked for, they are keys like any other.
-TEST_F(NeighboursTest, FloatKeysAreNoAnchorsOfAnArcLengthPath)
-{
-    EXPECT_EQ((Found{1, 0, 3}), Model("AffA", 20, true));
-    EXPECT_EQ((Found{Unwritten, 0, 2}), Model("fff", 25, true));
-    for (int count = 1; count <= 5; ++count) {
-        for (int floats = 0; floats < (1 << count); ++floats) {
-            std::string row;
-            for (int i = 0; i < count; ++i) row += (floats >> i) & 1 ? 'f' : 'A';
-            for (int form = 0; form < 8; ++form) {
-                bool const spatial = form & 1, sParametrized = form & 2, allKeys = form & 4;
-                KeyedStream const stream = MakeRow(row, spatial, sParametrized);
-                for (int time = 5; time <= 10 * count + 5; time += 5) {
-                    SCOPED_TRACE(testing::Message() << row << " at " << time << ", form " << form);
-                    Found const expected = Model(row, time, spatial && sParametrized && !allKeys);
-                    EXPECT_EQ(expected, FromTime(stream, time, allKeys));
-                    EXPECT_EQ(expected, time % 10 ? expected : FromIndex(stream, expected.at, allKeys));
-                }
-            }
-        }
-    }
-}
-
-TEST_F(NeighboursTest, RefusesStreamsWithoutKeysAndIndicesFarOutside)
-{
-    std::string const text = NoKeysText("inquire about a key value in");
-    TestStream const empty;
-    TestStream const single({.noKeys = true});
-    for (KFS_Stream const* stream : {empty.get(), single.get()}) {
-        KFS_KeyScalar stale{};
-        KFS_KeyScalar *at = &stale, *prev = &stale, *next = &stale;
-        int index = Unwritten;
-        EXPECT_EQ(KFS_Err_NoKeys, KFSp_GetNeighborsFromTime(stream, 0, 0, &at, &prev, &next, &index, &index, &index));
-        EXPECT_REPORT(reports, 85, text);
-        EXPECT_TRUE(!at && !prev && !next);
-        prev = next = &stale;
-        EXPECT_EQ(KFS_Err_NoKeys, KFSp_GetNeighborsFromIndex(stream, 0, 0, &prev, &next, &index, &index));
-        EXPECT_REPORT(reports, 84, text);
-        EXPECT_TRUE(!prev && !next);
-        EXPECT_EQ(Unwritten, index);
-    }
-    for (bool const arcs : {false, true}) {
-        KeyedStream const stream = MakeRow("AfA", true, arcs);
-        KFS_KeyScalar *prev = nullptr, *next = nullptr;
-        for (int const index : {99, std::numeric_limits<int>::max(), -7, KFS_INVALID_INDEX + 1})
-            EXPECT_EQ(SEQ_Err_BadIndex, KFSp_GetNeighborsFromIndex(stream, index, 0, &prev, &next, nullptr, nullptr));
-    }
 }
 
 // ---- curves

@@ -151,19 +151,6 @@ TEST_F(InterpolateSpatial, NeedsNoMemory)
     Q_FailAllocation(0);
 }
 
-TEST_F(InterpolateSpatial, StaysOnTheFirstAnchorOfAHold)
-{
-    for (int side = 0; side < 2; ++side) {
-        for (bool const automatic : {true, false}) {
-            PathStream stream({{0, {1, 2}}, {100, {5, 5}}}, KFS_Interp_Linear, PathOptions(2, automatic));
-            stream.Codes(0, 1, side == 0 ? KFS_Interp_Hold : KFS_Interp_Spline);
-            stream.Codes(1, side == 1 ? KFS_Interp_Hold : KFS_Interp_Linear, 1);
-            EXPECT_EQ((Vector{1, 2}), Interpolate(stream, 60));
-            EXPECT_EQ(0.0, ParameterAt(stream, 60, automatic ? 2 : 4));
-        }
-    }
-}
-
 TEST_F(InterpolateSpatial, NeverMovesBackwards)
 {
     for (bool const flagged : {true, false}) {
@@ -203,23 +190,6 @@ TEST_F(InterpolateSpatial, LeavesTheParameterBehindTheResult)
     }
 }
 
-TEST_F(InterpolateSpatial, GoesStraightInAnyDimensionWithoutCurves)
-{
-    for (short const dimension : {1, 4, 6}) {
-        SCOPED_TRACE(dimension);
-        auto const size = static_cast<std::size_t>(dimension);
-        PathStream stream({{0, Vector(size, 0.0)}, {100, Vector(size, 10.0)}, {200, Vector(size, 10.0)}},
-                          KFS_Interp_Linear, PathOptions(dimension, false));
-        stream.StreamFlag(KFS_StreamFlag_SParametrize, false);
-        for (int time : {25, 50, 99}) {
-            Vector const at = Interpolate(stream, time);
-            for (double const component : at) EXPECT_NEAR(time / 10.0, component, 1e-12);
-        }
-        EXPECT_EQ(Vector(size, 10.0), Interpolate(stream, 150));  // a way of no length: no division
-        EXPECT_EQ(0.0, ParameterAt(stream, 150, 2 * dimension));
-    }
-}
-
 TEST_F(InterpolateSpatial, RefusesCodesWithoutAShapeAndCurvesInOtherDimensions)
 {
     PathStream shapeless({{0, {0, 0}}, {100, {10, 0}}});
@@ -241,62 +211,6 @@ TEST_F(InterpolateSpatial, RefusesCodesWithoutAShapeAndCurvesInOtherDimensions)
             EXPECT_EQ(automatic ? 0 : KFS_Err_Only2D3D, KFSp_InterpTangentSpatial(stream, 0, 50, 0));
             EXPECT_EQ(automatic ? 0 : KFS_Err_Only2D3D, KFSp_InterpDerivSpatial(stream, 0, 50, 0));
             EXPECT_EQ(automatic ? 0U : 2U, reports.Take().size());
-        }
-    }
-}
-
-// Anchors at 0 and 1000, float keys in between, all on a straight line, so that a distance is an abscissa.
-PathStream FloatingLine(bool automatic)
-{
-    PathStream stream({{0, {0, 0}}, {100, {10, 0}}, {200, {40, 0}}, {1000, {100, 0}}}, KFS_Interp_Linear,
-                      PathOptions(2, automatic));
-    stream.Straighten();
-    EXPECT_EQ(0, KFS_SetKeyFloat(stream, 1, 1));
-    EXPECT_EQ(0, KFS_SetKeyFloat(stream, 1, 2));
-    EXPECT_EQ(0, stream->UpdateStream());
-    return stream;
-}
-
-TEST_F(InterpolateSpatial, WalksOverFloatKeysToThePieceOfThePath)
-{
-    PathStream stream = FloatingLine(true);
-    ASSERT_EQ((std::vector<int>{0, 100, 400, 1000}), stream.Times());
-    // A table whose parameter runs evenly tells the piece by its fraction.
-    for (auto const& [time, onPiece] : {std::pair{50, 0.5L}, {250, 0.5L}, {550, 0.25L}, {999, 59.9L / 60}}) {
-        EXPECT_NEAR(time / 10.0, Interpolate(stream, time)[0], 1e-2) << "at " << time;
-        long double const p[4] = {0, 0, 1, 1};  // a piece without tangents
-        EXPECT_NEAR(static_cast<double>(SolveCubic(p, onPiece)), ParameterAt(stream, time, 2), 2e-3) << "at " << time;
-    }
-    // A distance exactly at a float key belongs to the piece before it: its end, not the next one's start.
-    EXPECT_EQ(1.0, ParameterAt(stream, 100, 2));
-    EXPECT_EQ(10.0, Interpolate(stream, 100)[0]);
-}
-
-TEST_F(InterpolateSpatial, DoesNotBendAtFloatKeysWithoutAPath)
-{
-    PathStream stream = FloatingLine(false);
-    KFSp_GetSpatialRuns(stream.Record(1), 2).value[1] = 70.0;  // off the line, which only a path would go through
-    ASSERT_EQ(0, KFS_ForceUpdateStream(stream));
-    Vector const at = Interpolate(stream, 500);
-    EXPECT_EQ(0.0, at[1]);
-    // The whole distance goes to the first anchor's table, which ends at its own arc.
-    EXPECT_EQ(100.0, at[0]);
-    EXPECT_EQ(1.0, ParameterAt(stream, 500, 4));
-}
-
-TEST_F(InterpolateSpatial, RunsAForcedUpdateWithoutArcTables)
-{
-    for (bool const measured : {true, false}) {
-        PathStream stream({{0, {0, 0}}, {100, {3, 4}}, {200, {6, 0}}}, KFS_Interp_Spline);
-        stream.StreamFlag(KFS_StreamFlag_SParametrize, measured);
-        ASSERT_EQ(0, KFS_DisposeRemapTables(stream));
-        ASSERT_EQ(0, KFS_ForceUpdateStream(stream));
-        stream.Flag(2, KFS_KeyFlag_Modifiable);
-        for (int again = 0; again < 2; ++again) {
-            stream.Record(2)->inSpeed = 1234.0;  // automatic, and not marked stale
-            Interpolate(stream, 150);
-            Interpolate(stream, 50);
-            EXPECT_EQ(measured, stream.Record(2)->inSpeed == 1234.0);
         }
     }
 }

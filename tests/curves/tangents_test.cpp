@@ -20,47 +20,6 @@ using TangentsTest = StreamTest;
 
 // ---- influences
 
-TEST_F(TangentsTest, InfluencesAreKeptBetweenNoneAndAll)
-{
-    for (bool const spatial : {false, true}) {
-        for (double const given : {0.0, 0.3, 1.0, 1.5, -0.1, 1e-9}) {
-            double const stored = std::clamp(given, 0.0, 1.0);
-            KeyedStream stream = MakeThree(spatial);
-            stream.Flag(1, KFS_KeyFlag_Modifiable).Flag(1, KFS_KeyFlag_Continuous);
-            ASSERT_EQ(0, KFS_SetKeyInfluence(stream, 1, &given, nullptr));
-            EXPECT_EQ(stored, stream.GetHandle(1).inInfluence);
-            EXPECT_EQ(0.5, stream.GetHandle(1).outInfluence) << "sides don't move together";
-            EXPECT_FALSE(stream.Record(1)->flags & KFS_KeyFlag_Modifiable);
-            EXPECT_EQ((spatial ? Range{0, 1} : TestStream::NotStale), stream.Stale());
-            ASSERT_EQ(0, KFS_SetKeyInfluence(stream, 1, nullptr, &given));
-            EXPECT_EQ(stored, stream.GetHandle(1).outInfluence);
-            EXPECT_EQ((spatial ? Range{0, 2} : TestStream::NotStale), stream.Stale());
-            double in = Unanswered;
-            double out = Unanswered;
-            ASSERT_EQ(0, KFS_GetKeyInfluence(stream, 1, &in, &out));
-            EXPECT_TRUE(in == stored && out == stored) << in << " and " << out;
-        }
-    }
-}
-
-TEST_F(TangentsTest, OnlySplineSidesHaveAnInfluence)
-{
-    for (bool const spatial : {false, true}) {
-        for (int const code : {L, H, 0}) {
-            KeyedStream stream = MakeThree(spatial);
-            stream.Codes(1, code, S);
-            double in = 0.0;
-            double out = 0.0;
-            ASSERT_EQ(0, KFS_GetKeyInfluence(stream, 1, &in, &out));
-            EXPECT_TRUE(in == 0.16666666667 && out == 0.5) << in << " and " << out;
-            stream.Codes(1, S, code);
-            ASSERT_EQ(0, KFS_GetKeyInfluence(stream, 1, nullptr, &out));
-            EXPECT_EQ(0.16666666667, out);
-            EXPECT_EQ((Handle{3, 0.25, 2, 0.5}), stream.GetHandle(1));
-        }
-    }
-}
-
 // Setters and flags bring nothing up to date: what was just given is what stays.
 TEST_F(TangentsTest, WhatWasGivenStandsWhenAKeyStopsBeingAutomatic)
 {
@@ -83,21 +42,6 @@ TEST_F(TangentsTest, WhatWasGivenStandsWhenAKeyStopsBeingAutomatic)
             EXPECT_EQ(0.25, stream.GetHandle(1).outInfluence);
         }
     }
-}
-
-// ---- the cache record
-
-TEST_F(TangentsTest, GettersMayUseTheCacheButNeverLeaveANumberInItAsAValue)
-{
-    KeyedStream stream = MakeThree(false, L);
-    double const before = stream.At1(300);
-    double number[4] = {};
-    ASSERT_EQ(0, KFS_GetKeyVelocityF(stream, 1, 0, &number[0], &number[1]));
-    EXPECT_EQ(before, stream.At1(300));
-    ASSERT_EQ(0, KFS_GetKeyInfluence(stream, 1, &number[2], &number[3]));
-    EXPECT_EQ(before, stream.At1(300));
-    EXPECT_EQ((std::array{10.0, 15.0, 0.16666666667, 0.16666666667}),
-              (std::array{number[0], number[1], number[2], number[3]}));
 }
 
 // ---- all doors
@@ -146,33 +90,6 @@ std::vector<Door> Doors()
     };
 }
 
-TEST_F(TangentsTest, EveryDoorRefusesInItsOwnWords)
-{
-    StreamOptions constant;
-    constant.noKeys = true;
-    for (Door const& door : Doors()) {
-        SCOPED_TRACE(door.name);
-        DamagedStream const damaged;
-        EXPECT_EQ(KFS_Err_DamagedStream, door.call(damaged.get(), 0));
-        EXPECT_EQ(reports.Take(), std::vector<Reported>{DamagedReport(door.damagedOperation, door.damagedAction)});
-        EXPECT_TRUE(damaged.Untouched());
-
-        TestStream const empty;
-        TestStream const withoutValue(constant);
-        for (TestStream const* stream : {&empty, &withoutValue}) {
-            EXPECT_EQ(KFS_Err_NoKeys, door.call(stream->get(), 0));
-            EXPECT_REPORT(reports, door.noKeysOperation, NoKeysText(door.noKeysAction));
-        }
-
-        KeyedStream const stream = MakeThree();
-        std::vector<unsigned char> const before = stream.Bytes();
-        for (int const index : {3, 99, -1, -2, KFS_INVALID_INDEX, std::numeric_limits<int>::max()})
-            EXPECT_EQ(SEQ_Err_BadIndex, door.call(stream, index)) << index;
-        EXPECT_EQ(before, stream.Bytes());
-        EXPECT_EQ(0, stream.Pins());
-    }
-}
-
 // A render's copy of the keys is made by whatever reads first.
 TEST_F(TangentsTest, NoDoorLetsThroughWhatACopyThrows)
 {
@@ -188,24 +105,6 @@ TEST_F(TangentsTest, NoDoorLetsThroughWhatACopyThrows)
         EXPECT_EQ(4, code);
         reports.Take();  // std::bad_alloc is reported where it is translated
         EXPECT_EQ(0, door.call(stream, 1));
-    }
-}
-
-TEST_F(TangentsTest, AConstantsRecordStandsInForTheKey)
-{
-    for (bool const spatial : {false, true}) {
-        TestStream stream({.dimension = 2, .noKeys = true, .spatial = spatial});
-        stream.Key(0, {4.0, 5.0}, S);
-        double const number = 0.5;
-        EXPECT_EQ(0, KFS_SetKeyTangentsF(stream, 0, &number, &number, &number, &number, 1.0));
-        EXPECT_EQ(0, KFS_SetKeyInfluence(stream, 0, &number, &number));
-        double const speeds[] = {1.0, 1.0};
-        EXPECT_EQ(0, KFS_SetKeyVelocityF(stream, 0, speeds, speeds));
-        double x[2] = {9, 9}, y[2] = {9, 9}, outX[2] = {9, 9}, outY[2] = {9, 9}, in[2] = {9, 9};
-        EXPECT_EQ(0, KFS_GetKeyTangentsF(stream, 0, x, y, outX, outY));
-        EXPECT_EQ(0, KFS_GetKeyVelocityF(stream, 0, 1, in, nullptr));
-        for (double const* answer : {x, y, outX, outY, in}) EXPECT_EQ(0.0, answer[0]);
-        EXPECT_EQ((std::vector<double>{4.0, 5.0}), stream.At(100));  // the value is where it was
     }
 }
 
@@ -301,40 +200,6 @@ TEST_F(TangentsTest, ACachedCustomValueIsDisposedAsWhatItIs)
 }
 
 // ---- notifications
-
-// A value that was read once must not outlive the curve that it came from either.
-TEST_F(TangentsTest, SettersDropTheCachedValueAndTellOnceAndOnlyOnSuccess)
-{
-    for (Door const& door : Doors()) {
-        SCOPED_TRACE(door.name);
-        bool const setter = std::string_view(door.name).starts_with("KFS_Set");
-        HeardRoot root;
-        KeyedStream stream = MakeThree();
-        root.Store(stream);
-        double const before = stream.At1(300);
-        EXPECT_FALSE(stream.CacheIsEmpty());
-        std::function<void()> answer = [] {};
-        ValueListener listener([&] { answer(); });
-        EXPECT_EQ(0, door.call(stream, 1));
-        EXPECT_EQ(setter ? 1 : 0, listener.Take());
-        EXPECT_EQ(SEQ_Err_BadIndex, door.call(stream, 7));
-        EXPECT_EQ(0, listener.Take());
-        if (setter) {
-            EXPECT_TRUE(stream.CacheIsEmpty());
-            EXPECT_GT(std::fabs(before - stream.At1(300)), 0.01);
-            answer = [] { throw 4711; };
-            EXPECT_EQ(4711, door.call(stream, 1));
-            answer = [] { throw std::runtime_error("no ears"); };
-            EXPECT_EQ(Q_Err_Exception, door.call(stream, 1));
-            EXPECT_EQ(1U, reports.Take().size());
-            answer = [] { throw "something else"; };
-            EXPECT_THROW(door.call(stream, 1), char const*);
-            EXPECT_EQ(8, stream->GetValueDesc()->itemSize);
-            EXPECT_EQ(nullptr, stream->GetCopyItemFunc());
-        }
-        stream->SetParent(nullptr);
-    }
-}
 
 // A listener that reads in the stream's own type would get doubles otherwise, for which it has no room.
 TEST_F(TangentsTest, ListenersHearOfDoublesWhenTheStreamIsItselfAgain)

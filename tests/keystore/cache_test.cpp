@@ -42,54 +42,6 @@ TEST_F(Cache, AskingTwiceForOneTimeInterpolatesOnce)
     EXPECT_EQ(2, Counting::calls);
 }
 
-TEST_F(Cache, WhichKeyAnswersWithoutACurve)
-{
-    struct Row {
-        char const* why;
-        char aOut, bIn;
-        int time;
-        double value;
-        int cacheTime;
-    };
-    Row const rows[] = {
-        {"before the first key, with that key's time", KFS_Interp_Linear, KFS_Interp_Linear, -50, 2.0, 0},
-        {"after the last key", KFS_Interp_Linear, KFS_Interp_Linear, 500, 6.0, 100},
-        {"a hold on the near side", KFS_Interp_Hold, KFS_Interp_Linear, 50, 2.0, 0},
-        {"a hold on both sides", KFS_Interp_Hold, KFS_Interp_Hold, 99, 2.0, 0},
-        {"a hold on the far side takes the later value", KFS_Interp_Linear, KFS_Interp_Hold, 1, 6.0, 100},
-        {"on a key", KFS_Interp_Linear, KFS_Interp_Linear, 100, 6.0, 100},
-    };
-    for (Row const& row : rows) {
-        SCOPED_TRACE(row.why);
-        TestStream stream;
-        stream.Key(0, {2.0}, KFS_Interp_Linear, row.aOut).Key(100, {6.0}, row.bIn, KFS_Interp_Linear);
-        Counting::Install(stream);
-        EXPECT_EQ(row.value, stream.At1(row.time));
-        EXPECT_EQ(row.cacheTime, stream->GetCache()->time);
-        EXPECT_EQ(0, Counting::calls);
-        EXPECT_EQ(0, stream.Pins());
-    }
-}
-
-TEST_F(Cache, AConstantFollowsTheAskedTime)
-{
-    TestStream stream({.noKeys = true});
-    stream.Key(0, {7.0});
-    unsigned char atKey = 0;
-    for (int const time : {5, -3, 100000}) {
-        KFSp_UpdateCacheToTime(stream, stream->GetKeyData(), time, {.atKey = &atKey});
-        EXPECT_EQ(time, stream->GetCache()->time);
-        EXPECT_EQ(1, atKey);
-    }
-    stream->ValidateCacheAtTime({1, 2});
-    EXPECT_EQ(300, stream->GetCache()->time);
-    // The sentinel isn't a time: it would say that the constant has no value.
-    KFSp_UpdateCacheToTime(stream, stream->GetKeyData(), KFS_INVALID_INDEX);
-    EXPECT_FALSE(stream->HasNoValue());
-    stream->ValidateCacheAtTime({KFS_INVALID_INDEX, 600});
-    EXPECT_FALSE(stream->HasNoValue());
-}
-
 TEST_F(Cache, WhatIsAskedForIsAllThatIsDone)
 {
     TestStream stream;
@@ -108,17 +60,6 @@ TEST_F(Cache, WhatIsAskedForIsAllThatIsDone)
     KFSp_UpdateCacheToTime(stream, stream->GetKeyData(), 100, {.wantsValue = false, .atKey = &atKey});
     EXPECT_EQ(1, atKey);
     EXPECT_EQ(40, stream->GetCache()->time) << "whether a key is there needs no value";
-}
-
-// A read on a key needs no derived data; a read between keys repairs it.
-TEST_F(Cache, OnlyReadsThatNeedItRunTheUpdatePass)
-{
-    TestStream stream;
-    stream.Key(0, {0.0}, KFS_Interp_Spline).Key(100, {1.0}, KFS_Interp_Spline).Key(200, {5.0}, KFS_Interp_Spline);
-    stream.At1(100);
-    EXPECT_NE(TestStream::NotStale, stream.Stale());
-    stream.At1(150);
-    EXPECT_EQ(TestStream::NotStale, stream.Stale());
 }
 
 TEST_F(Cache, FailedInterpolationLeavesItEmptyAndUnpinned)

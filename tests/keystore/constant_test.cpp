@@ -8,29 +8,6 @@ namespace {
 
 class Constants : public StreamTest {};
 
-TEST_F(Constants, AValueBecomesTheFirstKeyIfItIsKept)
-{
-    for (bool const spatial : {false, true}) {
-        SCOPED_TRACE(spatial);
-        StreamOptions const options{.dimension = 2, .noKeys = true, .spatial = spatial};
-        TestStream kept(options), dropped(options);
-        kept.Key(70, {4.0, 5.0});
-        dropped.Key(70, {4.0, 5.0});
-        EXPECT_EQ(0, kept->SetConstant(0, 1));
-        EXPECT_TRUE(kept->HasKeys());
-        EXPECT_EQ((std::vector{70}), kept.Times());
-        EXPECT_TRUE(kept.CacheIsEmpty());
-        EXPECT_EQ((std::vector{4.0, 5.0}), kept.At(0));
-        EXPECT_EQ(0, dropped->SetConstant(0, 0));
-        EXPECT_EQ(0, dropped.Count());
-        EXPECT_TRUE(dropped.CacheIsEmpty());
-        TestStream const empty(options);
-        EXPECT_EQ(0, empty->SetConstant(0, 1));
-        EXPECT_TRUE(empty->HasKeys());
-        EXPECT_EQ(0, empty.Count());
-    }
-}
-
 TEST_F(Constants, KeysGoAndTheLastReadValueStays)
 {
     for (bool const spatial : {false, true}) {
@@ -51,45 +28,6 @@ TEST_F(Constants, KeysGoAndTheLastReadValueStays)
         stream.Key(stream.Times()[0] + 100, {0.0, 0.0});
         EXPECT_EQ(read, stream.At(stream.Times()[0]));
     }
-}
-
-// A value that was read at a key comes with that key's tangents in space, which mean nothing among other neighbours.
-TEST_F(Constants, AKeptValueGetsTangentsForItsNewNeighbours)
-{
-    TestStream stream({.dimension = 2, .spatial = true}), fresh({.dimension = 2, .spatial = true});
-    stream.Key(0, {0.0, 0.0}, KFS_Interp_Spline).Key(100, {10.0, 20.0}, KFS_Interp_Spline);
-    stream.Key(200, {0.0, 40.0}, KFS_Interp_Spline);
-    ASSERT_EQ(0, stream->UpdateStream());
-    KFSp_Numbers(stream.Record(1))[4] = 7.0;  // out of the key along x
-    ASSERT_EQ((std::vector{10.0, 20.0}), stream.At(100));
-    ASSERT_NE(0, stream->GetCache()->flags & KFS_KeyFlag_TangentsSet);
-    ASSERT_EQ(0, stream->SetConstant(1, 0));
-    ASSERT_EQ(0, stream->SetConstant(0, 1));
-    fresh.Key(100, {10.0, 20.0}, KFS_Interp_Spline);
-    for (TestStream* const either : {&stream, &fresh}) {
-        either->Key(0, {90.0, 0.0}, KFS_Interp_Spline).Key(300, {-90.0, -5.0}, KFS_Interp_Spline);
-        ASSERT_EQ(0, (*either)->UpdateStream());
-    }
-    EXPECT_EQ(fresh.Numbers(1), stream.Numbers(1));
-}
-
-TEST_F(Constants, OnlyAChangeIsHeardAndWithoutAReadThereIsNoValueLeft)
-{
-    HeardRoot root;
-    TestStream stream;
-    stream.Key(0, {1.0});
-    root.Store(stream);
-    ValueListener listener;
-    EXPECT_EQ(0, stream->SetConstant(1, 1));
-    EXPECT_EQ(1, listener.Take());
-    double value = 77.0;
-    EXPECT_EQ(7427, KFS_GetValueFPlus(stream, nullptr, 0, &value, nullptr, nullptr));
-    EXPECT_EQ(1u, reports.Take().size());
-    EXPECT_EQ(0, stream->SetConstant(1, 0));
-    EXPECT_EQ(0, stream->SetConstant(7, 1));
-    EXPECT_EQ(0, listener.Take());
-    EXPECT_EQ(0, stream->SetConstant(0, 0));
-    EXPECT_EQ(1, listener.Take());
 }
 
 TEST_F(Constants, AFailureIsTheResultAndIsHeardAllTheSame)

@@ -27,97 +27,6 @@ private:
     SEQ_Head** list_ = nullptr;
 };
 
-std::string const OverwriteText = "attempt to overwrite an already existing time stream key value.";
-
-TEST_F(CopyKeys, AKeyArrivesWithHandlesAndFlags)
-{
-    struct Row {
-        char const* why;
-        unsigned int scale;
-        bool givenTime;
-        int at;
-        bool holdOnly;
-    };
-    for (Row const& row : {Row{"its own time", 600, false, 600, false}, Row{"in another scale", 24, false, 24, false},
-                           Row{"a given time", 600, true, 50, true}, Row{"in another scale", 1200, true, 100, false}}) {
-        SCOPED_TRACE(row.why);
-        TestStream source;
-        source.Key(0, {0}, KFS_Interp_Spline)
-            .Key(1200, {10}, KFS_Interp_Spline)
-            .Key(600, {7}, KFS_Interp_Spline, KFS_Interp_Hold);
-        source.Record(1)->flags |= KFS_KeyFlag_Modifiable;
-        TestStream const destination({.timeScale = row.scale, .type = KFS_Type_Float});
-        if (row.holdOnly) destination->SetInterpMask(KFS_InterpMask_Hold);
-        T_Time const given{50, 600};
-        int index = 77;
-        ASSERT_EQ(0, KFS_CopyKey(source, 1, 0, row.givenTime ? &given : nullptr, destination, &index));
-        EXPECT_EQ(0, index);
-        EXPECT_EQ(std::vector<int>{row.at}, destination.Times());
-        EXPECT_EQ(source.Numbers(1), destination.Numbers(0)) << "data types aren't compared";
-        EXPECT_EQ(source.Record(1)->flags, destination.Record(0)->flags);
-        EXPECT_EQ(row.holdOnly ? KFS_Interp_Hold : KFS_Interp_Spline, destination.Record(0)->inInterp);
-        EXPECT_EQ(KFS_Interp_Hold, destination.Record(0)->outInterp);
-        EXPECT_TRUE(destination.CacheIsEmpty());
-        EXPECT_EQ(0, source.Pins() + destination.Pins());
-    }
-}
-
-TEST_F(CopyKeys, AKeyIsReplacedOnlyOnDemand)
-{
-    TestStream source;
-    source.Key(10, {1}).Key(20, {2}, KFS_Interp_Hold);
-    TestStream destination;
-    destination.Key(20, {9}).Key(30, {8});
-    auto const before = destination.Bytes();
-    int index = 77;
-    EXPECT_EQ(7425, KFS_CopyKey(source, 1, 0, nullptr, destination, &index));
-    EXPECT_REPORT(reports, 38, OverwriteText);
-    EXPECT_EQ(KFS_INVALID_INDEX, index);
-    EXPECT_EQ(before, destination.Bytes());
-    EXPECT_EQ(0, KFS_CopyKey(source, 1, 1, nullptr, destination, &index));
-    EXPECT_EQ(0, index);
-    EXPECT_EQ(2.0, destination.At1(20));
-    // Within one stream, where the source is pinned too.
-    T_Time const at = source.Time(20);
-    EXPECT_EQ(7425, KFS_CopyKey(source, 0, 0, &at, source, &index));
-    EXPECT_REPORT(reports, 38, OverwriteText);
-    EXPECT_EQ(0, source.Pins());
-    EXPECT_EQ(0, KFS_CopyKey(source, 0, 1, &at, source, &index));
-    EXPECT_EQ(1.0, source.At1(20));
-    for (int i = 0; i < 20; ++i) {  // the list moves under the pinned source
-        T_Time const later = source.Time(100 + i);
-        ASSERT_EQ(0, KFS_CopyKey(source, 0, 0, &later, source, &index));
-        EXPECT_EQ(2 + i, index);
-        EXPECT_EQ(1.0, source.Numbers(index)[0]);
-    }
-    EXPECT_EQ(0, source.Pins());
-}
-
-TEST_F(CopyKeys, ConstantsAndKeysConvertIntoEachOther)
-{
-    TestStream constant({.noKeys = true});
-    TestStream keyed;
-    keyed.Key(600, {5}, KFS_Interp_Linear);
-    int index = 77;
-    EXPECT_EQ(7427, KFS_CopyKey(constant, 0, 1, nullptr, keyed, &index));
-    EXPECT_REPORT(reports, 19, "attempt to copy a key value from a time stream with no key values.");
-    EXPECT_EQ(KFS_INVALID_INDEX, index);
-    EXPECT_EQ(7427, KFS_CopyKeys(constant, nullptr, keyed));
-    EXPECT_REPORT(reports, 21, "attempt to copy a key value from a time stream with no key values.");
-    EXPECT_EQ(7426, KFS_CopyKeys(keyed, nullptr, constant));
-    EXPECT_REPORT(reports, 21, "attempt to copy a key value to a constant time stream.");
-    ASSERT_EQ(0, KFS_CopyKey(keyed, 0, 0, nullptr, constant, &index));
-    EXPECT_EQ(0, index);
-    EXPECT_EQ(5.0, constant.At1(0));
-    EXPECT_EQ(7425, KFS_CopyKey(keyed, 0, 0, nullptr, constant, &index));
-    EXPECT_REPORT(reports, 17, OverwriteText);
-    EXPECT_EQ(5.0, constant.At1(0));
-    ASSERT_EQ(0, KFS_CopyKey(constant, 99, 0, nullptr, keyed, &index));
-    EXPECT_EQ((std::vector<int>{0, 600}), keyed.Times()) << "a constant arrives at time 0";
-    ASSERT_EQ(0, KFS_CopyKey(constant, 0, 1, nullptr, constant, &index));
-    EXPECT_EQ(5.0, constant.At1(0)) << "onto itself";
-}
-
 // A destination that may refuse a foreign value.
 class PickyStream : public KFS_Stream {
 public:
@@ -177,36 +86,6 @@ TEST_F(CopyKeys, RecordsOfAnotherSizeAreTakenAsFarAsTheyGo)
         EXPECT_EQ(expected, all.Numbers(1));
         EXPECT_EQ(expected, one.Numbers(0));
     }
-}
-
-TEST_F(CopyKeys, SpatialKeysTakeTheirPathAndNoTable)
-{
-    StreamOptions const options{.dimension = 2, .spatial = true};
-    TestStream source(options);
-    source.Key(0, {0, 0}).Key(300, {10, 0}).Key(600, {10, 10});
-    ASSERT_EQ(0, source->UpdateStream());
-    for (bool const many : {false, true}) {
-        TestStream destination(options);
-        destination.Key(300, {5, 5}).Key(900, {7, 7});
-        ASSERT_EQ(0, destination->UpdateStream());
-        if (many) ASSERT_EQ(0, KFS_CopyKeys(source, nullptr, destination));
-        for (int i = 0; i < 3; ++i) {
-            if (!many) ASSERT_EQ(0, KFS_CopyKey(source, i, 1, nullptr, destination, nullptr));
-            KFS_KeyScalar const* const from = source.Record(i);
-            KFS_KeyScalar const* const to = destination.Record(i);
-            EXPECT_EQ(source.Numbers(i), destination.Numbers(i));
-            EXPECT_EQ(from->arcLength, to->arcLength);
-            EXPECT_EQ(from->spFlags, to->spFlags);
-            EXPECT_TRUE(!from->remapTable || from->remapTable != to->remapTable);
-        }
-        EXPECT_EQ((std::vector<int>{0, 300, 600, 900}), destination.Times());
-        EXPECT_EQ(source.At(450), destination.At(450));
-        EXPECT_EQ(source.At(30), destination.At(30));
-    }
-    std::vector<double> const before = source.At(400);
-    ASSERT_EQ(0, KFS_CopyKeys(source, nullptr, source)) << "onto itself";
-    EXPECT_EQ((std::vector<int>{0, 300, 600}), source.Times());
-    EXPECT_EQ(before, source.At(400));
 }
 
 TEST_F(CopyKeys, AllOrTheNamedKeysAreCopied)
@@ -314,42 +193,6 @@ TEST_F(CopyKeys, CustomValuesAreCopiedAndGivenBack)
         EXPECT_EQ(failure != 0 ? 4711 : 0, KFS_CopyKeys(source.get(), nullptr, destination.get()));
         EXPECT_EQ((failure != 0 ? 4 : 6) + (reads ? 1 : 0), OwnedValues::Live());
         EXPECT_EQ(failure != 0 ? 50.0 : 1.0, OwnedValues::RemoveKey(destination.get(), failure != 0 ? 0 : 1));
-    }
-}
-
-TEST_F(CopyKeys, EveryFailingAllocationLeavesTheDestinationAsItWas)
-{
-    for (bool const spatial : {false, true}) {
-        struct Fixture {
-            TestStream source, destination;
-            std::vector<unsigned char> before;
-        };
-        auto const make = [spatial] {
-            StreamOptions const options{.dimension = 2, .spatial = spatial};
-            auto fixture = std::make_unique<Fixture>(Fixture{TestStream(options), TestStream(options), {}});
-            for (int i = 0; i < 6; ++i) {
-                fixture->source.Key(i * 100, {i * 1.0, i * 2.0}, KFS_Interp_Spline);
-                fixture->destination.Key(i * 200, {-i * 1.0, i * i * 1.0}, KFS_Interp_Spline);
-            }
-            EXPECT_EQ(0, fixture->source->UpdateStream());
-            EXPECT_EQ(0, fixture->destination->UpdateStream());
-            fixture->before = fixture->destination.Bytes();
-            return fixture;
-        };
-        auto const check = [spatial](Fixture& fixture, int code, Q_MemoryCount const&) {
-            EXPECT_EQ(0, fixture.source.Pins() + fixture.destination.Pins());
-            EXPECT_TRUE(fixture.destination.CacheIsEmpty());
-            if (code == 0) return;  // without memory for the packed times a copy gets through all the same
-            EXPECT_EQ(6, fixture.destination.Count());
-            if (!spatial) {  // an overwritten key may have lost its arc table, which the next read makes again
-                EXPECT_EQ(fixture.before, fixture.destination.Bytes());
-            }
-            EXPECT_NEAR(-5.0, fixture.destination.At(1000)[0], 1e-9);
-        };
-        EXPECT_LT(2, FailEveryAllocation(
-                         make, [](Fixture& f) { return KFS_CopyKeys(f.source, nullptr, f.destination); }, check));
-        FailEveryAllocation(
-            make, [](Fixture& f) { return KFS_CopyKey(f.source, 1, 1, nullptr, f.destination, nullptr); }, check);
     }
 }
 

@@ -1,9 +1,14 @@
+#include "curves/spacetangents.h"
+#include "curves/tangents.h"
 #include "keystore/edit.h"
+#include "keystore/items.h"
 
 #include "tests/support/ownedvalues.h"
 #include "tests/support/streams.h"
 
 #include <algorithm>
+#include <array>
+#include <random>
 
 // What the forms that take doubles do to a stream of another kind, and leave of it.
 
@@ -78,6 +83,58 @@ TEST_F(DoubleValues, DoublesGoIntoACustomStreamThatHasRoom)
             EXPECT_EQ(4711, stream.GetValueDesc()->dataType);
             EXPECT_EQ(OwnedValues::Interpolate, stream.GetInterpFunc());
             EXPECT_FALSE(stream.IsTemporarilyNonCustom());
+        }
+    }
+}
+
+// One script through the typed functions and through those that take doubles.
+TEST_F(DoubleValues, TypedFormsDoWhatDoubleFormsDo)
+{
+    for (signed char const type :
+         {KFS_Type_S8, KFS_Type_S16, KFS_Type_S32, KFS_Type_Fixed, KFS_Type_Float, KFS_Type_Double}) {
+        for (bool const spatial : {false, true}) {
+            SCOPED_TRACE(testing::Message() << "type " << int{type} << (spatial ? ", spatial" : ""));
+            StreamOptions const options{.dimension = 2, .spatial = spatial, .type = type};
+            TestStream const typed(options), doubles(options);
+            std::mt19937 random(7);
+            auto const pick = [&](int count) { return static_cast<int>(random() % static_cast<unsigned>(count)); };
+            for (int step = 0; step < 200; ++step) {
+                double const value[2] = {pick(200) - 100.0, pick(200) - 100.0};
+                std::array<double, 2> external{};
+                ASSERT_EQ(0, KFS_ConvertItemFromFloat(2, type, value, external.data()));
+                T_Time const at = typed.Time(pick(40) * 50);
+                auto const in = static_cast<char>(pick(4)), out = static_cast<char>(pick(4));
+                int const index = pick(std::max(1, typed.Count()));
+                int a = 0, b = 0;
+                switch (pick(typed.Count() < 4 ? 1 : 4)) {
+                case 0:
+                    a = KFS_InsertKey(typed, &at, 1, external.data(), in, out);
+                    b = KFS_InsertKeyF(doubles, &at, 1, value, in, out);
+                    break;
+                case 1:
+                    a = KFS_SetKey(typed, index, external.data(), in, out);
+                    b = KFS_SetKeyF(doubles, index, value, in, out);
+                    break;
+                case 2:
+                    a = spatial ? KFS_SetKeySpaceTangents(typed, index, 0, external.data(), nullptr)
+                                : KFS_SetKeyVelocity(typed, index, external.data(), nullptr);
+                    b = spatial ? KFS_SetKeySpaceTangentsF(doubles, index, 0, value, nullptr)
+                                : KFS_SetKeyVelocityF(doubles, index, value, nullptr);
+                    break;
+                default: {
+                    std::array<unsigned char, 16> read{}, expected{};
+                    a = KFS_GetValue(typed, &at, 0, read.data(), nullptr, nullptr);
+                    std::vector<double> const number = doubles.At(at.value);
+                    ASSERT_EQ(0, KFS_ConvertItemFromFloat(2, type, number.data(), expected.data()));
+                    EXPECT_EQ(expected, read);
+                }
+                }
+                ASSERT_EQ(a, b) << "step " << step;
+                ASSERT_EQ(typed.Stale(), doubles.Stale());
+                ASSERT_EQ(typed.Times(), doubles.Times());
+                for (int i = 0; i < typed.Count(); ++i)
+                    ASSERT_EQ(typed.Numbers(i), doubles.Numbers(i)) << "step " << step;
+            }
         }
     }
 }

@@ -195,25 +195,6 @@ TEST_F(Evaluate, TimesComeInAnyScale)
     EXPECT_NE(0, KFS_GetValuePlus(stream, &noScale, 0, &value, nullptr, nullptr, nullptr, 0));
 }
 
-TEST_F(Evaluate, WhatHasNoValueSaysSo)
-{
-    TestStream const keyed;
-    TestStream const constant({.noKeys = true});
-    T_Time const at{0, 600};
-    double value = -1.0;
-    for (KFS_Stream* const stream : {keyed.get(), constant.get()}) {
-        EXPECT_EQ(7427, KFS_GetValueFPlus(stream, &at, 0, &value, nullptr, nullptr));
-        EXPECT_EQ(7427, KFS_GetValuePlus(stream, &at, 0, &value, nullptr, nullptr, nullptr, 0));
-        Q_MemoryCount const before = Q_MemoryLive(nullptr);
-        EXPECT_THROW(stream->ForceInterpolateAtTime({0, 600}), int);
-        EXPECT_EQ(before, Q_MemoryLive(nullptr));
-        EXPECT_EQ(
-            std::vector<Reported>(3, KfsReport(36, "attempt to get a value from a time stream with no key values.")),
-            reports.Take());
-    }
-    EXPECT_EQ(-1.0, value);
-}
-
 TEST_F(Evaluate, DoublesAreRefusedForCustomValues)
 {
     KFS_ValueDesc const desc{1, 8, 0, [](KFS_Stream const*, long, int, int) { return 0; }};

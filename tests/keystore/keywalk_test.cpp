@@ -37,56 +37,6 @@ protected:
     TestStream stream;
 };
 
-TEST_F(KeyWalk, WalksTheKeysOfARangeOfTimes)
-{
-    constexpr int Null = 12345;
-    struct Row {
-        int first, last;
-        std::vector<int> times;
-    };
-    // What lies between two times is the random test's.
-    Row const rows[] = {
-        {Null, Null, {10, 20, 30}}, {Null, 20, {10, 20}}, {20, Null, {20, 30}}, {Null, 9, {}}, {31, Null, {}},
-        {10, 30, {10, 20, 30}},     {30, 15, {30, 20}},   {11, 19, {}},
-    };
-    for (Row const& row : rows) {
-        for (unsigned const finer : {1u, 5u}) {
-            SCOPED_TRACE(testing::Message() << row.first << " to " << row.last << " scale x" << finer);
-            T_Time const first{row.first * static_cast<int>(finer), 600 * finer};
-            T_Time const last{row.last, 600};
-            Visitor visitor;
-            T_Time lastTime{77, 77};
-            EXPECT_EQ(0, KFS_ForRange(stream, row.first == Null ? nullptr : &first, row.last == Null ? nullptr : &last,
-                                      visitor.Word(), Visitor::Visit, &lastTime));
-            EXPECT_EQ(row.times, visitor.times);
-            EXPECT_EQ(row.times.empty() ? None : row.times.back(), lastTime.value);
-            EXPECT_EQ(600u, lastTime.scale);
-            for (std::size_t i = 0; i < visitor.times.size(); ++i)
-                EXPECT_EQ(visitor.times[i] / 10 - 1, visitor.indices[i]);
-        }
-    }
-}
-
-TEST_F(KeyWalk, AgreesWithAFilterOverRandomKeys)
-{
-    std::mt19937 random(34);
-    for (int round = 0; round < 30; ++round) {
-        TestStream keys;
-        for (int i = 0; i < 20; ++i) keys.Key(static_cast<int>(random() % 100), {0.0});
-        for (int ask = 0; ask < 20; ++ask) {
-            int const a = static_cast<int>(random() % 120) - 10;
-            int const b = static_cast<int>(random() % 120) - 10;
-            std::vector<int> expected = keys.Times();
-            std::erase_if(expected, [&](int time) { return time < std::min(a, b) || time > std::max(a, b); });
-            if (a > b) std::reverse(expected.begin(), expected.end());
-            T_Time const first = keys.Time(a), last = keys.Time(b);
-            Visitor visitor;
-            EXPECT_EQ(0, KFS_ForRange(keys, &first, &last, visitor.Word(), Visitor::Visit, nullptr));
-            EXPECT_EQ(expected, visitor.times) << a << " to " << b;
-        }
-    }
-}
-
 TEST_F(KeyWalk, WalksTheKeysOfARangeOfIndices)
 {
     struct Row {
@@ -141,39 +91,6 @@ TEST_F(KeyWalk, AConstantIsOneKeyWithoutAnIndex)
     EXPECT_EQ(0, lastIndex);
     EXPECT_EQ((std::vector{15, 15}), visitor.times);
     EXPECT_EQ((std::vector{None, None}), visitor.indices);
-}
-
-TEST_F(KeyWalk, NothingToWalkOverIsReported)
-{
-    TestStream const empty;
-    TestStream const unset({.noKeys = true});
-    Visitor visitor;
-    for (KFS_Stream* const nothing : {empty.get(), unset.get()}) {
-        T_Time lastTime{77, 77};
-        int lastIndex = 77;
-        EXPECT_EQ(7427, KFS_ForRange(nothing, nullptr, nullptr, visitor.Word(), Visitor::Visit, &lastTime));
-        EXPECT_REPORT(reports, 34, "attempt to iterate over a time stream with no key values.");
-        EXPECT_EQ(7427, KFS_ForIndexRange(nothing, 0, 0, visitor.Word(), Visitor::Visit, &lastIndex));
-        EXPECT_REPORT(reports, 35, "attempt to iterate over a time stream with no key values.");
-        EXPECT_EQ(None, lastTime.value);
-        EXPECT_EQ(0u, lastTime.scale);
-        EXPECT_EQ(None, lastIndex);
-    }
-    T_Time const noScale{0, 0}, fine{0, 600};
-    EXPECT_NE(0, KFS_ForRange(stream, &noScale, &fine, visitor.Word(), Visitor::Visit, nullptr));
-    EXPECT_NE(0, KFS_ForRange(stream, nullptr, &noScale, visitor.Word(), Visitor::Visit, nullptr));
-    EXPECT_TRUE(visitor.times.empty());
-}
-
-TEST_F(KeyWalk, TheStreamIsUpToDateWhenTheWalkBegins)
-{
-    ASSERT_EQ(0, stream->SetInvalid(-1, 3));
-    Visitor visitor;
-    EXPECT_EQ(0, KFS_ForRange(stream, nullptr, nullptr, visitor.Word(), Visitor::Visit, nullptr));
-    EXPECT_EQ(TestStream::NotStale, stream.Stale());
-    ASSERT_EQ(0, stream->SetInvalid(-1, 3));
-    EXPECT_EQ(0, KFS_ForIndexRange(stream, 0, 2, visitor.Word(), Visitor::Visit, nullptr));
-    EXPECT_EQ(TestStream::NotStale, stream.Stale());
 }
 
 }  // namespace

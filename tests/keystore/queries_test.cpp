@@ -108,24 +108,6 @@ TEST_F(Queries, SameHoldSameValue)
     EXPECT_EQ(1u, reports.Take().size());
 }
 
-TEST_F(Queries, ASetValueFindsAKeyAtItsTime)
-{
-    TestStream stream;
-    stream.Key(0, {0.0}).Key(100, {10.0});
-    auto const bytes = stream.Bytes();
-    stream->PrepareSetValue(stream.Time(100));
-    EXPECT_EQ(bytes, stream.Bytes()) << "there is one";
-    stream->PrepareSetValue({50, 1200});
-    EXPECT_EQ((std::vector{0, 25, 100}), stream.Times());
-    EXPECT_DOUBLE_EQ(2.5, stream.Numbers(1)[0]) << "with the value that the stream has there";
-    EXPECT_EQ(T_Err_Overflow, KFSp_Boundary([&] { stream->PrepareSetValue({2000000000, 1}); }));
-    TestStream constant({.noKeys = true});
-    constant.Key(0, {1.0});
-    constant->PrepareSetValue(constant.Time(50));
-    EXPECT_TRUE(constant->HasNoKeys());
-    EXPECT_EQ(0, constant->GetCache()->time);
-}
-
 // Remembers what it was asked to evaluate.
 class EvaluatingRoot : public HeardRoot {
 public:

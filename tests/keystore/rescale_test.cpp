@@ -57,60 +57,6 @@ TEST_F(Rescale, OfTwoKeysOnATickTheNearerStays)
     }
 }
 
-// Against the ticks worked out key by key in exact arithmetic: every tick that a key comes to holds one key in the end,
-// the nearest.
-TEST_F(Rescale, EveryTickKeepsOneOfItsKeys)
-{
-    std::mt19937 random(28);
-    unsigned const scales[] = {24, 25, 30, 100, 600, 1000, 48000};
-    for (int round = 0; round < 60; ++round) {
-        std::int64_t const from = scales[random() % 7];
-        std::int64_t const to = scales[random() % 7];
-        std::vector<int> times;
-        for (int time = -40; times.size() < 30; time += 1 + static_cast<int>(random() % 7)) times.push_back(time);
-        auto const stream = WithKeys(times, static_cast<unsigned>(from));
-        ASSERT_EQ(0, KFS_RescaleStream(*stream, static_cast<unsigned>(to)));
-        std::map<int, std::vector<int>> met;  // by tick, the keys
-        for (std::size_t i = 0; i < times.size(); ++i) {
-            std::int64_t const doubled = 2 * times[i] * to;
-            std::int64_t const rounded =
-                doubled >= 0 ? (doubled + from) / (2 * from) : -((-doubled + from) / (2 * from));
-            met[static_cast<int>(rounded)].push_back(static_cast<int>(i));
-        }
-        ASSERT_EQ(met.size(), static_cast<std::size_t>(stream->Count()));
-        std::vector<int> const survivors = Survivors(*stream);
-        int position = 0;
-        for (auto const& [tick, keys] : met) {
-            SCOPED_TRACE(testing::Message() << "round " << round << ", " << from << " to " << to << ", tick " << tick);
-            EXPECT_EQ(tick, stream->Record(position)->time);
-            auto const far = [&](int key) { return std::abs(times[static_cast<std::size_t>(key)] * to - tick * from); };
-            int const nearest =
-                *std::min_element(keys.begin(), keys.end(), [&](int a, int b) { return far(a) < far(b); });
-            EXPECT_EQ(nearest, survivors[static_cast<std::size_t>(position)]) << "a tie goes to the earlier";
-            // And look-ups know of it.
-            int index = 77;
-            T_Time const at{tick, static_cast<unsigned>(to)};
-            EXPECT_EQ(0, KFS_TimeToIndex(*stream, &at, &index));
-            EXPECT_EQ(position, index);
-            ++position;
-        }
-    }
-}
-
-TEST_F(Rescale, ValuesStayWhereTheyAreInSeconds)
-{
-    TestStream stream;
-    stream.Key(0, {0.0}, KFS_Interp_Spline).Key(300, {4.0}, KFS_Interp_Spline).Key(600, {1.0}, KFS_Interp_Spline);
-    std::vector<double> before;
-    for (int time = 0; time <= 600; time += 30) before.push_back(stream.At1(time));
-    auto const bytes = stream.Bytes();
-    EXPECT_EQ(0, KFS_RescaleStream(stream, 600));
-    EXPECT_EQ(bytes, stream.Bytes()) << "the same scale is no edit";
-    EXPECT_EQ(600, stream->GetCache()->time);
-    ASSERT_EQ(0, KFS_RescaleStream(stream, 2400));
-    for (std::size_t i = 0; i <= 20; ++i) EXPECT_DOUBLE_EQ(before[i], stream.At1(static_cast<int>(120 * i)));
-}
-
 // Told of a removal it finds some times in the one scale and some in the other; what it makes of them doesn't last.
 TEST_F(Rescale, AListenerMayReadMeanwhile)
 {
@@ -136,18 +82,6 @@ TEST_F(Rescale, AListenerMayReadMeanwhile)
     ASSERT_EQ(0, (*alone)->UpdateStream());
     ASSERT_EQ(0, (*heard)->UpdateStream());
     EXPECT_EQ(alone->Bytes(), heard->Bytes());
-}
-
-TEST_F(Rescale, AStreamWithoutKeysOnlyTakesTheScale)
-{
-    TestStream constant({.noKeys = true});
-    constant.Key(7, {1.0});
-    TestStream const empty;
-    for (KFS_Stream* const stream : {constant.get(), empty.get()}) {
-        EXPECT_EQ(0, KFS_RescaleStream(stream, 30));
-        EXPECT_EQ(30u, stream->GetTimeScale());
-    }
-    EXPECT_EQ(7, constant->GetCache()->time);
 }
 
 TEST_F(Rescale, ATimeThatDoesNotFitEndsIt)
