@@ -1,7 +1,9 @@
+#include "keystore/attributes.h"
 #include "overrides/streamexpression.h"
 #include "tests/persist/treefile.h"
 
 #include <climits>
+#include <limits>
 #include <random>
 
 // Saves and loads that go wrong, whatever is saved and whatever goes wrong: what they leave can be used and saved again,
@@ -16,6 +18,8 @@ struct Saved {
     virtual void Read(CKF_File* file) = 0;
     // Whatever can be done with it. What comes out doesn't matter.
     virtual void Use() {}
+    // What decides about how its content lies in memory.
+    virtual std::vector<int> Shape() const { return {}; }
 };
 
 struct SavedLeaf : Saved {
@@ -27,12 +31,16 @@ struct SavedLeaf : Saved {
         EXPECT_EQ(KFS_StreamValidStamp, stream->GetStamp());
         EXPECT_EQ(0, stream.Pins());
         std::vector<double> value(static_cast<std::size_t>(stream->GetDimension()) * 8 + 1);
-        for (int const time : {INT_MIN + 1, 0, 50, INT_MAX}) {
+        for (int const time : {INT_MIN + 1, -7, 0, 1, 50, 100, 101, INT_MAX}) {
             T_Time const at{time, stream->GetTimeScale()};
             if (!stream->IsCustom())
                 static_cast<void>(KFS_GetValueFPlus(stream, &at, 0, value.data(), nullptr, nullptr));
         }
         std::unique_ptr<KFS_Stream> const clone(stream->CloneLeaf({true, true}));
+    }
+    std::vector<int> Shape() const override
+    {
+        return {stream->GetDimension(), stream->IsSpatial(), stream->HasNoKeys(), stream->GetValueDesc()->itemSize};
     }
     TestStream stream;
 };
@@ -176,6 +184,7 @@ TEST_F(Failures, EveryAllocationMayFail)
     for (Scenario const& scenario : scenarios) {
         SCOPED_TRACE(scenario.name);
         auto const whole = Bytes(scenario, *scenario.full());
+        auto const before = scenario.fresh()->Shape(), after = scenario.full()->Shape();
         Q_MemoryCount const empty = Q_MemoryLive(nullptr);
         int failures = FailEveryAllocation(
             scenario.full,
@@ -187,8 +196,8 @@ TEST_F(Failures, EveryAllocationMayFail)
                 EXPECT_TRUE(code == 0 || file.Commit() != 0) << "a save that failed isn't committed";
                 return code;
             },
-            [&](Saved& saved, int, Q_MemoryCount const& before) {
-                EXPECT_EQ(before, Q_MemoryLive(nullptr));
+            [&](Saved& saved, int, Q_MemoryCount const& live) {
+                EXPECT_EQ(live, Q_MemoryLive(nullptr));
                 reports.Take();
                 EXPECT_EQ(whole, Bytes(scenario, saved));
             });
@@ -199,8 +208,10 @@ TEST_F(Failures, EveryAllocationMayFail)
                 KFSp_ThrowIf(file.Open(whole));
                 return Thrown([&] { saved.Read(&file); });
             },
-            [&](Saved& saved, int, Q_MemoryCount const&) {
+            [&](Saved& saved, int code, Q_MemoryCount const&) {
                 reports.Take();
+                auto const shape = saved.Shape();
+                EXPECT_TRUE(shape == after || (code != 0 && shape == before)) << "one or the other, never a mix";
                 static_cast<void>(KFSp_Boundary([&] { saved.Use(); }));
                 reports.Take();
                 EXPECT_EQ(0, Read(saved, whole)) << "it can be tried again";
@@ -273,6 +284,58 @@ TEST_F(Failures, GroupsInGroupsHaveAnEnd)
         SavedTree tree;
         EXPECT_EQ(depth > CKF_MaxDepth ? CKF_Err_TooDeep : 0, ReadGroup(tree.group, Form(file)));
     }
+}
+
+// Times in no order, all the same, and at both ends of what an int can be; numbers that are none.
+TEST_F(Failures, KeysThatMakeNoSense)
+{
+    double const infinity = std::numeric_limits<double>::infinity();
+    double const values[] = {0.0, 1e300, -infinity, infinity, std::numeric_limits<double>::quiet_NaN(), 1.0};
+    int const times[] = {INT_MAX, INT_MIN, 5, 5, 5, 0, -1, 100, INT_MIN};
+    std::mt19937 random(13);
+    for (int round = 0; round < 400; ++round) {
+        bool const spatial = round % 2 == 1;
+        int const dimension = spatial ? 1 + round % 5 : 1;
+        std::vector<std::string> items;
+        for (std::size_t i = 0; i < 2 + random() % 6; ++i) {
+            std::string item = KeyHead(times[random() % std::size(times)], static_cast<int>(random() % 7) - 2,
+                                       static_cast<int>(random() % 7) - 2, random() & 0xFFFF);
+            if (spatial) item += Long(random()) + Long(0);
+            for (int n = 0; n < (spatial ? 5 + 3 * dimension : 5); ++n)
+                item += Double(values[random() % std::size(values)]);
+            items.push_back(item);
+        }
+        LeafRecord record;
+        unsigned const flags = (random() & 0xFFFC) | (spatial ? 2U : 0U);
+        record.Dimension(dimension).Flags(flags).HasList().Put(6, Short(random() & 0xFFFF));
+        record.Put(24, Double(values[random() % std::size(values)]));
+        SavedLeaf leaf({});
+        ASSERT_EQ(0, ReadLeaf(leaf.stream, Form(Leaf(record, Keys(static_cast<int>(items[0].size()), items)))));
+        static_cast<void>(KFSp_Boundary([&] { leaf.Use(); }));
+        static_cast<void>(KFS_RescaleStream(leaf.stream, 24000));
+        static_cast<void>(KFSp_Boundary([&] { leaf.Use(); }));
+        reports.Take();
+    }
+}
+
+// Memory in proportion to the file: nothing is made for what a file only claims.
+TEST_F(Failures, ClaimsCostNothing)
+{
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
+    {
+        TestStream stream;
+        std::string const claims[] = {Atom("seql", Long(1) + Long(0x7FFFFFFF)),
+                                      Atom("seql", Long(32767) + Long(0x10001)),
+                                      Atom("seql", Long(48) + Long(0xFFFFFFFF)), Atom("seql", Long(0) + Long(5)),
+                                      Atom("seql", Long(0x10030) + Long(1) + std::string(48, '\0'))};
+        for (std::string const& claim : claims) {
+            EXPECT_NE(0, ReadLeaf(stream, Form(Leaf(LeafRecord().Flags(0).HasList(), claim))));
+            EXPECT_EQ(0, stream.Count());
+            reports.Take();
+        }
+        EXPECT_LT(Q_MemoryLive(nullptr).bytes - before.bytes, 8192);
+    }
+    EXPECT_EQ(before, Q_MemoryLive(nullptr));
 }
 
 }  // namespace

@@ -193,19 +193,10 @@ TEST_F(KeyRecords, TheLayoutOfAKeyIsTheStreams)
 // A stream whose values are pointers, which mean nothing in a file.
 class PointerStream : public KFS_Stream {
 public:
-    explicit PointerStream(bool noKeys, bool spatial = false)
-        : KFS_Stream(1, 600, noKeys, spatial, KFS_InterpMask_All, 0, Desc(), nullptr, nullptr, false)
+    explicit PointerStream(bool spatial)
+        : KFS_Stream(1, 600, 0, spatial, KFS_InterpMask_All, 0, {.isCustom = 1, .itemSize = 8}, nullptr, nullptr, false)
     {}
     bool IsCustomValuePointer() const override { return true; }
-
-private:
-    static KFS_ValueDesc Desc()
-    {
-        KFS_ValueDesc desc;
-        desc.isCustom = 1;
-        desc.itemSize = 8;
-        return desc;
-    }
 };
 
 TEST_F(KeyRecords, AStreamOfPointersTakesRecordsOfAnySize)
@@ -213,7 +204,7 @@ TEST_F(KeyRecords, AStreamOfPointersTakesRecordsOfAnySize)
     for (bool const spatial : {false, true}) {
         for (int const size : {1, 8, 10, 57, 100}) {
             SCOPED_TRACE(testing::Message() << spatial << ' ' << size);
-            PointerStream stream(false, spatial);
+            PointerStream stream(spatial);
             std::string const item(static_cast<std::size_t>(size), '\x01');
             ASSERT_EQ(0, FromDisk(&stream, size, {item, item}));
             void const* key = nullptr;

@@ -16,8 +16,9 @@ class LeafRead : public StreamTest {};
 // A leaf of a class of its own: its dimension and what its values are can't change.
 class FixedLeaf : public KFS_Stream {
 public:
-    explicit FixedLeaf(short dimension = 1, bool spatial = false, KFS_MatchName const* name = nullptr)
-        : KFS_Stream(dimension, 600, 1, spatial, KFS_InterpMask_All, 0, Desc(), name, nullptr, false)
+    explicit FixedLeaf(short dimension = 1, KFS_MatchName const* name = nullptr)
+        : KFS_Stream(dimension, 600, 1, false, KFS_InterpMask_All, 0, {.dataType = KFS_Type_Double}, name, nullptr,
+                     false)
     {
         FixedLeaf::InsertDefaultKey(T_Time{0, 600});
     }
@@ -37,14 +38,6 @@ public:
     int Count() const { return GetKeys() ? (*GetKeys())->count : 0; }
 
     bool canBeAnimated = true;
-
-private:
-    static KFS_ValueDesc Desc()
-    {
-        KFS_ValueDesc desc;
-        desc.dataType = KFS_Type_Double;
-        return desc;
-    }
 };
 
 std::string Value(std::vector<double> const& numbers)
@@ -158,7 +151,7 @@ TEST_F(LeafRead, AStreamOfTheBaseClassBecomesACustomOne)
 TEST_F(LeafRead, ADerivedClassKeepsItsDimension)
 {
     KFS_MatchName const name("@1 knob", true);
-    FixedLeaf stream(2, false, &name);
+    FixedLeaf stream(2, &name);
     EXPECT_EQ(KFS_Err_BadFileInfo, ReadLeaf(&stream, Form(Leaf(LeafRecord().Dimension(-3), OneValue))));
     EXPECT_EQ((std::vector<Reported>{
                   {0x1D000C, 4, "property of type \"@1 knob\" had dimension -3 in file, but we expected 2", 0}}),
@@ -339,19 +332,12 @@ TEST_F(LeafRead, AllKeysAreStaleHoweverMany)
 // A class whose values own something.
 class OwnedLeaf : public KFS_Stream {
 public:
-    OwnedLeaf() : KFS_Stream(1, 600, 1, 0, KFS_InterpMask_All, 0, Desc(), nullptr, nullptr, false)
+    OwnedLeaf()
+        : KFS_Stream(1, 600, 1, 0, KFS_InterpMask_All, 0,
+                     {.isCustom = 1, .itemSize = sizeof(OwnedValues::Ticket), .interpFunc = OwnedValues::Interpolate},
+                     nullptr, nullptr, false)
     {
         EXPECT_EQ(0, KFS_SetCustomFuncs(this, OwnedValues::Copy, OwnedValues::Dispose));
-    }
-
-private:
-    static KFS_ValueDesc Desc()
-    {
-        KFS_ValueDesc desc;
-        desc.isCustom = 1;
-        desc.itemSize = sizeof(OwnedValues::Ticket);
-        desc.interpFunc = OwnedValues::Interpolate;
-        return desc;
     }
 };
 
@@ -369,19 +355,17 @@ TEST_F(LeafRead, ValuesThatOwnSomething)
             ASSERT_EQ(0, KFS_InsertKey(stream.get(), &at, 1, &first, 0, 0));
             OwnedValues::Free(first);
             ASSERT_EQ(1, OwnedValues::Live());
-            OwnedValues::Ticket const second = OwnedValues::Make(2.0);
-            std::string const data(reinterpret_cast<char const*>(&second), sizeof second);
             LeafRecord constant;
             constant.Put(56, Short(1)).Put(58, Short(4));
-            ASSERT_EQ(0, ReadLeaf(stream.get(), Form(Leaf(constant, Atom("cdat", data)))));
-            EXPECT_EQ(1, OwnedValues::Live());
-            OwnedValues::Ticket const third = OwnedValues::Make(3.0);
-            std::string const key =
-                KeyHead(0, 1, 1, 0) + std::string(reinterpret_cast<char const*>(&third), sizeof third);
-            LeafRecord keyed = constant;
-            keyed.Flags(0).HasList();
-            ASSERT_EQ(0, ReadLeaf(stream.get(), Form(Leaf(keyed, Keys(12, {key})))));
-            EXPECT_EQ(1, OwnedValues::Live());
+            for (bool const keyed : {false, true}) {
+                OwnedValues::Ticket const ticket = OwnedValues::Make(2.0);
+                std::string const data(reinterpret_cast<char const*>(&ticket), sizeof ticket);
+                std::string const leaf =
+                    keyed ? Leaf(LeafRecord(constant).Flags(0).HasList(), Keys(12, {KeyHead(0, 1, 1, 0) + data}))
+                          : Leaf(constant, Atom("cdat", data));
+                ASSERT_EQ(0, ReadLeaf(stream.get(), Form(leaf)));
+                EXPECT_EQ(1, OwnedValues::Live());
+            }
         }
         EXPECT_EQ(0, OwnedValues::Live());
     }

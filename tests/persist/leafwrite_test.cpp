@@ -147,27 +147,25 @@ TEST_F(LeafWrite, TextOfAnExpressionByVersion)
     EXPECT_EQ("-", DataOf("Utf8", inVersion(71)));
 }
 
-struct ParamCase {
-    int kind;
-    Lines lines;
-};
-
 TEST_F(LeafWrite, AtomsByKindOfParameter)
 {
     std::string const low = HexLine("kfum", Double(-1.5));
     std::string const high = HexLine("kfuM", Double(8.25));
-    std::vector<ParamCase> const cases{{FX_Param_NotFilledIn, {}},
-                                       {FX_Param_INT_SLIDER, {HexLine("kfum", Double(-2)), HexLine("kfuM", Double(8))}},
-                                       {FX_Param_FIXED_SLIDER, {low, high}},
-                                       {FX_Param_FIXED_ANGLE, {}},
-                                       {FX_Param_COLOR, {}},
-                                       {FX_Param_FLOAT_SLIDER, {low, high}},
-                                       {FX_Param_ALWAYS_SAVED, {}},
-                                       {FX_Param_PATH, {HexLine("kfli", Long(0xFFFFFFFE))}},
-                                       {FX_Param_LABEL, {}},
-                                       {FX_Param_POINT_3D, {}},
-                                       {99, {}}};
-    for (ParamCase const& c : cases) {
+    struct {
+        int kind;
+        Lines lines;
+    } const cases[]{{FX_Param_NotFilledIn, {}},
+                    {FX_Param_INT_SLIDER, {HexLine("kfum", Double(-2)), HexLine("kfuM", Double(8))}},
+                    {FX_Param_FIXED_SLIDER, {low, high}},
+                    {FX_Param_FIXED_ANGLE, {}},
+                    {FX_Param_COLOR, {}},
+                    {FX_Param_FLOAT_SLIDER, {low, high}},
+                    {FX_Param_ALWAYS_SAVED, {}},
+                    {FX_Param_PATH, {HexLine("kfli", Long(0xFFFFFFFE))}},
+                    {FX_Param_LABEL, {}},
+                    {FX_Param_POINT_3D, {}},
+                    {99, {}}};
+    for (auto const& c : cases) {
         SCOPED_TRACE(c.kind);
         TestStream stream = Constant(0.0);
         SetParam(stream, c.kind);

@@ -5,72 +5,38 @@
 #include "tests/support/notifications.h"
 
 #include <limits>
-#include <utility>
 
 namespace {
 
 using Lines = std::vector<std::string>;
 
-struct Edit {
-    char const* what;
-    std::function<void(KFS_StreamBase*)> make;
-    bool isWritten;
-};
-
-// What is to be known of a leaf that isn't canonical any more is in the file; a leaf that equals its canonical one
-// isn't.
-TEST_F(Tree, LeavesThatDifferAreWritten)
-{
-    auto const setParam = [](KFS_StreamBase* leaf, auto change) {
-        FX_ParamDef def{};
-        def.paramType = FX_Param_NotFilledIn;
-        change(def);
-        leaf->SetParamDef(def);
-    };
-    std::vector<Edit> const edits{
-        {"nothing", [](KFS_StreamBase*) {}, false},
-        {"value", [](KFS_StreamBase* leaf) { SetValue(leaf, 1.0); }, true},
-        {"the default again", [](KFS_StreamBase* leaf) { SetValue(leaf, 1.0), SetValue(leaf, 100.0); }, false},
-        {"keys", [](KFS_StreamBase* leaf) { EXPECT_EQ(0, leaf->GetAsLeaf()->SetConstant(0, 1)); }, true},
-        {"flags", [](KFS_StreamBase* leaf) { leaf->SetHidden(true); }, true},
-        {"a flag that isn't saved", [](KFS_StreamBase* leaf) { leaf->SetElided(true); }, true},
-        {"name", [](KFS_StreamBase* leaf) { leaf->SetDisplayName(Text("Fade")); }, true},
-        {"always saved",
-         [&](KFS_StreamBase* leaf) { setParam(leaf, [](FX_ParamDef& def) { def.paramType = FX_Param_ALWAYS_SAVED; }); },
-         true},
-        {"parameter's name",
-         [&](KFS_StreamBase* leaf) {
-             setParam(leaf, [](FX_ParamDef& def) { def.paramType = FX_Param_COLOR, def.name[0] = 'p'; });
-         },
-         true},
-    };
-    for (Edit const& edit : edits) {
-        SCOPED_TRACE(edit.what);
-        auto const node = MakeNode();
-        edit.make(node->GetEditableStream(Name("opacity")));
-        Lines const expected = edit.isWritten ? Lines{"opacity", "transform"} : Lines{"transform"};
-        EXPECT_EQ(expected, NamesIn(WrittenGroup(node.get())));
-    }
-}
-
-// Either end of a slider's range that isn't the canonical one's is a difference; a NaN is one even from itself.
-TEST_F(Tree, RangesThatDifferAreWritten)
+// A parameter that isn't its canonical one's is in the file, though the value is: another name, another end of a
+// slider's range, where a NaN differs even from itself.
+TEST_F(Tree, ParametersThatDifferAreWritten)
 {
     float const nan = std::numeric_limits<float>::quiet_NaN();
     struct {
+        int kind;
+        char initial;
         float low, high, canonicalLow, canonicalHigh;
         bool isWritten;
-    } const cases[] = {{0, 10, 0, 10, false}, {-1, 10, 0, 10, true},  {1, 10, 0, 10, true},
-                       {0, 9, 0, 10, true},   {0, 11, 0, 10, true},   {nan, 10, 0, 10, true},
-                       {0, nan, 0, 10, true}, {0, 10, nan, 10, true}, {0, nan, 0, nan, true}};
+    } const cases[] = {
+        {FX_Param_FLOAT_SLIDER, 0, 0, 10, 0, 10, false},  {FX_Param_FLOAT_SLIDER, 0, -1, 10, 0, 10, true},
+        {FX_Param_FLOAT_SLIDER, 0, 1, 10, 0, 10, true},   {FX_Param_FLOAT_SLIDER, 0, 0, 9, 0, 10, true},
+        {FX_Param_FLOAT_SLIDER, 0, 0, 11, 0, 10, true},   {FX_Param_FLOAT_SLIDER, 0, nan, 10, 0, 10, true},
+        {FX_Param_FLOAT_SLIDER, 0, 0, nan, 0, 10, true},  {FX_Param_FLOAT_SLIDER, 0, 0, 10, nan, 10, true},
+        {FX_Param_FLOAT_SLIDER, 0, 0, nan, 0, nan, true}, {FX_Param_ALWAYS_SAVED, 0, 0, 0, 0, 0, true},
+        {FX_Param_COLOR, 'p', 0, 0, 0, 0, true}};
     for (auto const& c : cases) {
-        SCOPED_TRACE(testing::Message() << c.low << ' ' << c.high << ' ' << c.canonicalLow << ' ' << c.canonicalHigh);
+        SCOPED_TRACE(testing::Message() << c.kind << ' ' << c.low << ' ' << c.high << ' ' << c.canonicalLow << ' '
+                                        << c.canonicalHigh);
         FX_ParamDef def{};
-        def.paramType = FX_Param_FLOAT_SLIDER;
+        def.paramType = c.kind;
         def.value.floatSlider.sliderMin = c.canonicalLow;
         def.value.floatSlider.sliderMax = c.canonicalHigh;
         Get_VX_StreamFactory()->GetCanonicalStream(Name("opacity"))->SetParamDef(def);
         auto const node = MakeNode();
+        def.name[0] = c.initial;
         def.value.floatSlider.sliderMin = c.low;
         def.value.floatSlider.sliderMax = c.high;
         node->GetEditableStream(Name("opacity"))->SetParamDef(def);
@@ -156,6 +122,13 @@ TEST_F(Tree, NamesThatAreWritten)
     EXPECT_EQ("Fade", nameIn(child));
     child->SetMatchName(Name("unheard of"));
     EXPECT_EQ(Marker, nameIn(child)) << "without a canonical one";
+    // A host may put a stream into a list that it has made without a factory.
+    Q_ScAutoPtr<KFS_StreamBase> stray(new TestLeaf(Name("opacity"), nullptr, true, 600U, false, short{1}, 0.0));
+    stray->SetDisplayName(Text("mine"));
+    child = stray.get();
+    layers->AppendStream(&stray);
+    EXPECT_EQ(Marker, nameIn(child));
+    EXPECT_EQ((Lines{"unheard of", "opacity"}), NamesIn(WrittenGroup(layers.get())));
 
     Q_ScAutoPtr<KFS_StreamBase> const root = TestKinds::Make("opacity");
     EXPECT_EQ("opacity", nameIn(root.get()));
@@ -166,7 +139,6 @@ TEST_F(Tree, NamesThatAreWritten)
 TEST_F(Tree, NamesThatAreTaken)
 {
     std::string const leaf = MatchName("opacity") + OneLeaf("Fade", 1.0);
-    std::string const nameless = MatchName("opacity") + OneLeaf(Marker, 1.0);
     auto const nameAfter = [](KFS_StreamGroup* group, std::string const& children) {
         EXPECT_EQ(0, ReadGroup(group, Form(Group("Top", children))));
         KFS_StreamBase const* const child = group->GetStream(0);
@@ -176,44 +148,28 @@ TEST_F(Tree, NamesThatAreTaken)
     EXPECT_EQ("opacity", nameAfter(MakeNode().get(), leaf));
     OpenGroup open(Name("node"), Get_VX_StreamFactory(), false, {});
     EXPECT_EQ("opacity", nameAfter(&open, leaf)) << "it has one already";
-    EXPECT_EQ("Fade", nameAfter(MakeLayers().get(), leaf));
-    EXPECT_EQ("opacity", nameAfter(MakeLayers().get(), nameless));
-    auto const root = MakeLayers();
-    nameAfter(root.get(), leaf);
-    EXPECT_EQ(Text("Top"), root->GetDisplayName());
 }
 
 // A leaf whose name only its file knows.
-class NamelessLeaf : public TestLeaf {
-public:
-    template <class... Arguments>
-    explicit NamelessLeaf(Arguments&&... arguments) : TestLeaf(std::forward<Arguments>(arguments)...)
-    {
-        pSetDisplayName(u16str());
-    }
-};
-
 TEST_F(Tree, NamesThatNobodyElseKnows)
 {
     KFS_ScRegisterStreams batch(Get_VX_StreamFactory());
     batch.Register(
         Name("foreign"),
         [](KFS_MatchName const& name, KFS_StreamFactory* factory, bool constant, unsigned int scale, bool canonical) {
-            return new NamelessLeaf(name, factory, constant, scale, canonical, short{1}, 0.0);
+            auto leaf = std::make_unique<TestLeaf>(name, factory, constant, scale, canonical, short{1}, 0.0);
+            leaf->pSetDisplayName(u16str());
+            return leaf.release();
         },
         false);
     {
         TestKinds more;
         more.Named("plug-in", {Name("foreign")});
         for (bool const couldGoMissing : {false, true}) {
-            std::unique_ptr<KFS_NamedStreamGroup> group;
-            if (couldGoMissing) {
-                group = std::make_unique<OpenGroup>(Name("plug-in"), Get_VX_StreamFactory(), false,
-                                                    std::vector<KFS_MatchName>{});
-            } else {
-                group.reset(TestKinds::Make("plug-in").release()->GetAsNamedGroup());
-            }
-            ASSERT_EQ(0, ReadGroup(group.get(), Form(Group("", MatchName("foreign") + OneLeaf("Fade", 1.0)))));
+            OpenGroup open(Name("plug-in"), Get_VX_StreamFactory(), false, {});
+            Q_ScAutoPtr<KFS_StreamBase> const closed = TestKinds::Make("plug-in");
+            KFS_StreamGroup* const group = couldGoMissing ? &open : closed->GetAsGroup();
+            ASSERT_EQ(0, ReadGroup(group, Form(Group("", MatchName("foreign") + OneLeaf("Fade", 1.0)))));
             EXPECT_EQ(Text(couldGoMissing ? "Fade" : ""), group->GetStream(0)->GetDisplayName());
         }
     }
@@ -311,16 +267,9 @@ TEST_F(Tree, OldFiles)
 
 class Follower : public KFS_Stream {
 public:
-    Follower() : KFS_Stream(1, 600, 1, 0, KFS_InterpMask_All, 0, Desc(), nullptr, nullptr, false) {}
+    Follower() : KFS_Stream(1, 600, 1, 0, KFS_InterpMask_All, 0, {.dataType = KFS_Type_Double}, nullptr, nullptr, false)
+    {}
     bool IsSeparationFollower() const override { return true; }
-
-private:
-    static KFS_ValueDesc Desc()
-    {
-        KFS_ValueDesc desc;
-        desc.dataType = KFS_Type_Double;
-        return desc;
-    }
 };
 
 TEST_F(Tree, FollowersOfOldFilesAreActive)
