@@ -7,21 +7,16 @@
 #include "tree/listener.h"
 
 #include <stdexcept>
+#include <tuple>
 
 namespace {
 
-struct Logged {
-    int level;
-    std::string tag, topic, text;
-    bool operator==(Logged const&) const = default;
-};
+using Logged = std::tuple<int, std::string, std::string, std::string>;
 
 TEST(Frame, LifeCycleIsLoggedAndLeavesNothingBehind)
 {
     std::vector<Logged> log;
-    Q_LogSink const previous = Q_SetLogSink([&log](int level, char const* tag, char const* topic, char const* text) {
-        log.push_back({level, tag, topic, text});
-    });
+    Q_LogSink const previous = Q_SetLogSink([&log](auto... parts) { log.emplace_back(parts...); });
     Q_MemoryCount const before = Q_MemoryLive(nullptr);
     EXPECT_EQ(nullptr, Get_VX_StreamFactory());
     EXPECT_EQ(0, KFS_Birth());
@@ -41,7 +36,7 @@ TEST(Frame, LifeCycleIsLoggedAndLeavesNothingBehind)
 
 TEST(Frame, BirthWithoutMemoryAnswers4AndDeathCleansUp)
 {
-    ReportRecorder const reports;
+    ReportRecorder reports;
     Q_MemoryCount const before = Q_MemoryLive(nullptr);
     int failures = 0;
     for (bool fired = true; fired;) {
@@ -53,7 +48,7 @@ TEST(Frame, BirthWithoutMemoryAnswers4AndDeathCleansUp)
         failures += fired ? 1 : 0;
         EXPECT_EQ(0, KFS_Death());
         EXPECT_EQ(before, Q_MemoryLive(nullptr));
-        const_cast<ReportRecorder&>(reports).Take();
+        reports.Take();
         ASSERT_LT(failures, 20);
     }
     EXPECT_GE(failures, 2) << "the factory and the listener manager are tracked objects";

@@ -29,34 +29,21 @@ TEST_F(Projects, TheCurrentProjectIsTheThreadsContexts)
     EXPECT_EQ(&session.GetProject(), KFS_GetProject(static_cast<KFS_Project*>(nullptr), false));
     EXPECT_EQ(&session.GetProject(), KFS_GetProject(static_cast<KFS_StreamBase*>(nullptr), false));
     EXPECT_EQ(&session.GetProject(), KFS_GetConstProject(TestStream().get(), true)) << "a stream without a parent";
-}
 
-TEST_F(Projects, TheCurrentRenderContextIsUsedOnlyWhenAsked)
-{
-    kfshost::Project other;
     Q_RenderContext* const own = other.GetRenderContext(false);
     EXPECT_NE(own, Q_RenderContext::PeekCurrent());
     EXPECT_EQ(Q_RenderContext::PeekCurrent(), other.GetRenderContext(true));
-    Q_ScSetCurrentRenderContext const none{boost::shared_ptr<Q_RenderContext>()};
-    EXPECT_EQ(own, other.GetRenderContext(true));
-}
-
-TEST_F(Projects, InitializingAgainReplacesBothContexts)
-{
-    kfshost::Project project;
-    boost::shared_ptr<KFS_Context> const context = project.GetContext();
-    project.InitializeContexts();
-    EXPECT_NE(context, project.GetContext());
-    EXPECT_EQ(&project, project.GetContext()->GetProject());
-    EXPECT_EQ(nullptr, project.GetRenderContext(false)->PeekState(KFS_ExpState::S_StateName))
-        << "states are the host's affair";
-}
-
-TEST_F(Projects, StatesAreFoundByTheirNames)
-{
-    Q_RenderContext const* const context = Q_RenderContext::PeekCurrent();
     for (char const* const name : {"ExpState", "RenderState", "KFS_CapsuleOverrides", "KFS_StreamCacheState"})
-        EXPECT_NE(nullptr, context->PeekState(hearth::utility::ImmutableString::Create(name))) << name;
+        EXPECT_NE(nullptr, own->PeekState(hearth::utility::ImmutableString::Create(name))) << name;
+    Q_ScSetCurrentRenderContext const none{boost::shared_ptr<Q_RenderContext>()};
+    EXPECT_EQ(own, other.GetRenderContext(true)) << "the current one, if there is one and it is asked for";
+
+    boost::shared_ptr<KFS_Context> const context = other.GetContext();
+    other.InitializeContexts();
+    EXPECT_NE(context, other.GetContext()) << "initializing again replaces both";
+    EXPECT_EQ(&other, other.GetContext()->GetProject());
+    EXPECT_EQ(nullptr, other.GetRenderContext(false)->PeekState(KFS_ExpState::S_StateName))
+        << "states are the host's affair";
 }
 
 TEST_F(Projects, DetectingErrorsAndSuspensionsNest)

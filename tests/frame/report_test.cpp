@@ -1,23 +1,17 @@
 #include "frame/report_private.h"
 
-#include "keystore/check_private.h"
 #include "tests/support/streams.h"
 
 #include <cstring>
+#include <tuple>
 
 namespace {
 
 class Reports : public StreamTest {};
 
-struct Sentence {
-    int code;
-    short argument;
-    char const* text;
-};
-
 TEST_F(Reports, EveryCodeHasItsSentence)
 {
-    Sentence const sentences[] = {
+    std::tuple<int, short, char const*> const sentences[] = {
         {2, 4, "attempt to get a value from an internally damaged time stream."},
         {7425, 7, "attempt to overwrite an already existing time stream key value."},
         {7426, 13, "attempt to get a key value from a constant time stream."},
@@ -41,15 +35,11 @@ TEST_F(Reports, EveryCodeHasItsSentence)
         {9999, 12, "unknown error (9999)."},
         {-1, 12, "unknown error (-1)."},
     };
-    for (Sentence const& sentence : sentences) {
-        SCOPED_TRACE(sentence.code);
-        EXPECT_EQ(sentence.code, KFSp_ReportErr(36, sentence.code, sentence.argument));
-        EXPECT_REPORT(reports, 36, sentence.text);
+    for (auto const& [code, argument, text] : sentences) {
+        SCOPED_TRACE(code);
+        EXPECT_EQ(code, KFSp_ReportErr(36, code, argument));
+        EXPECT_REPORT(reports, 36, text);
     }
-}
-
-TEST_F(Reports, NothingIsReportedForSuccess)
-{
     EXPECT_EQ(0, KFSp_ReportErr(36, 0, 4));
     EXPECT_NO_REPORT(reports);
 }
@@ -69,12 +59,6 @@ TEST_F(Reports, LastErrorAndIdFollowTheKindOfSentence)
     EXPECT_EQ(0x1D0024, seen[1].id);
 }
 
-TEST_F(Reports, RefusedCustomValuesNameWhatWasAsked)
-{
-    EXPECT_EQ(7441, KFSp_RefuseCustomValue(81, 65));
-    EXPECT_REPORT(reports, 81, "can#{rsquo}t convert to custom value");
-}
-
 // The texts and their order are what translators and readers of reports hold on to: one hundred rows, each with its own
 // number.
 TEST_F(Reports, TableHoldsOneHundredNumberedRowsAndACloser)
@@ -90,15 +74,6 @@ TEST_F(Reports, TableHoldsOneHundredNumberedRowsAndACloser)
     }
     EXPECT_EQ(nullptr, table.rows[100].entry);
     EXPECT_STREQ("blue", KFSp_MessageText(99));
-}
-
-TEST_F(Reports, DamagedStreamIsKnownByItsStampAlone)
-{
-    DamagedStream const damaged;
-    EXPECT_EQ(2, KFSp_CheckStream(23, damaged.get(), 14));
-    EXPECT_EQ(std::vector{DamagedReport(23, "inquire about a key value in")}, reports.Take());
-    EXPECT_TRUE(damaged.Untouched());
-    EXPECT_EQ(0, KFSp_CheckStream(23, TestStream().get(), 14));
 }
 
 }  // namespace

@@ -1,10 +1,11 @@
 #include "frame/services/anyvalue.h"
 
-#include <gtest/gtest.h>
+#include "tests/services/chunkbytes.h"
 
 #include <limits>
 #include <random>
 #include <string>
+#include <tuple>
 
 namespace {
 
@@ -21,17 +22,6 @@ std::string Narrow(u16str const& text)
 std::string Json(Q_AnyTree& tree)
 {
     return Narrow(Q_AnyTreeWrapper(tree).GetAs_JSON());
-}
-
-template <class Call>
-int Thrown(Call call)
-{
-    try {
-        call();
-        return 0;
-    } catch (int code) {
-        return code;
-    }
 }
 
 TEST(AnyValue, TextAndNumberTurnIntoEachOther)
@@ -80,15 +70,9 @@ TEST(AnyTree, HasExactlyThisText)
     EXPECT_EQ("{\"x\xEF\xBF\xBD\":\"x\xEF\xBF\xBD\"}", Json(surrogate));
 }
 
-struct Parsed {
-    char const* why;
-    std::string text;
-    std::string again;  // what it is written as
-};
-
 TEST(AnyTree, ReadsWhatIsJson)
 {
-    Parsed const rows[] = {
+    std::tuple<char const*, std::string, std::string> const rows[] = {
         {"nothing in it", " { } ", "{}"},
         {"an empty array is an empty tree", "[]", "{}"},
         {"blanks", "{ \"a\" :\t1 ,\r\n\"b\":-2}", "{\"a\":1,\"b\":-2}"},
@@ -103,12 +87,12 @@ TEST(AnyTree, ReadsWhatIsJson)
         {"the key of a value elsewhere is a key", R"({"a":{"b":6,"$value":5}})", R"({"a":{"b":6,"$value":5}})"},
         {"and it holds one value only", R"({"a":{"$value":{"b":1},"c":2}})", R"({"a":{"$value":{"b":1},"c":2}})"},
     };
-    for (Parsed const& row : rows) {
-        SCOPED_TRACE(row.why);
+    for (auto const& [why, text, again] : rows) {
+        SCOPED_TRACE(why);
         Q_AnyTree tree;
         Q_AnyTreeWrapper(tree).put(U("old"), Q_Any(U("gone")));
-        ASSERT_EQ(0, Thrown([&] { Q_AnyTreeWrapper(tree).SetFrom_JSON_HackRecoverMagicMixed(U(row.text)); }));
-        EXPECT_EQ(row.again, Json(tree));
+        ASSERT_EQ(0, Thrown([&] { Q_AnyTreeWrapper(tree).SetFrom_JSON_HackRecoverMagicMixed(U(text)); }));
+        EXPECT_EQ(again, Json(tree));
     }
 }
 

@@ -7,6 +7,7 @@
 #include <gtest/gtest.h>
 
 #include <cstdint>
+#include <initializer_list>
 #include <ostream>
 #include <span>
 #include <string>
@@ -49,6 +50,11 @@ inline std::string Bytes(CKF_File const& file)
 inline u16str Text(char const* ascii)
 {
     return Q_AsciiToUTF16String(ascii);
+}
+
+inline u16str Units(std::initializer_list<int> units)
+{
+    return u16str(units.begin(), units.end());
 }
 
 // The code that a call throws, or 0.

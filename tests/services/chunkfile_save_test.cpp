@@ -158,29 +158,6 @@ TEST(ChunkFileSave, WhatIsNotCommittedLeavesNothing)
     EXPECT_EQ("the old file", FileContent(folder.Path(Project)));
 }
 
-TEST(ChunkFileSave, TwoSavesToOnePlaceDontMeet)
-{
-    ScratchFolder const folder;
-    CKF_File first, second;
-    ASSERT_EQ(0, first.Create(folder.Path(Project).c_str()));
-    ASSERT_EQ(0, second.Create(folder.Path(Project).c_str()));
-    CKF_WriteAtom(&first, CKF_Id("who_"), 5, "first");
-    CKF_WriteAtom(&second, CKF_Id("who_"), 6, "second");
-    EXPECT_EQ(0, second.Commit());
-    EXPECT_EQ(Form(Atom("who_", "second")), FileContent(folder.Path(Project)));
-    EXPECT_EQ(0, first.Commit());
-    EXPECT_EQ(Form(Atom("who_", "first")), FileContent(folder.Path(Project)));
-    EXPECT_EQ(Names{Project}, folder.Names());
-}
-
-// The only file that is being written in a folder.
-std::string TemporaryIn(ScratchFolder const& folder)
-{
-    for (std::string const& name : folder.Names())
-        if (name.find(".saving-") != std::string::npos) return folder.Path(name);
-    return {};
-}
-
 TEST(ChunkFileSave, ALinkStaysALinkAndRightsStay)
 {
     auto const owner = ::geteuid() == 0 ? std::pair<uid_t, gid_t>(12, 34) : std::pair(::geteuid(), ::getegid());
@@ -196,7 +173,10 @@ TEST(ChunkFileSave, ALinkStaysALinkAndRightsStay)
             if (!exists) fs::remove(real);
             CKF_File file;
             ASSERT_EQ(0, file.Create(folder.Path("link.kfs").c_str()));
-            EXPECT_EQ("", TemporaryIn(folder)) << "it is where the file is to be";
+            EXPECT_EQ((Names{"deep", "link.kfs"}), folder.Names()) << "it is where the file is to be";
+            for (fs::directory_entry const& entry : fs::directory_iterator(folder.Path("deep")))
+                if (exists && entry.path().string().find(".saving-") != std::string::npos)
+                    EXPECT_EQ(fs::perms(0600), entry.status().permissions()) << "nobody else may read it meanwhile";
             ASSERT_EQ(0, file.Commit());
             EXPECT_TRUE(fs::is_symlink(folder.Path("link.kfs")) && fs::is_symlink(folder.Path("deep/near.kfs")));
             EXPECT_TRUE(!fs::is_symlink(real) && FileContent(real) == Form(""));
@@ -206,17 +186,6 @@ TEST(ChunkFileSave, ALinkStaysALinkAndRightsStay)
             EXPECT_TRUE(!exists || std::pair(now.st_uid, now.st_gid) == owner) << now.st_uid;
         }
     }
-}
-
-// While it is written nobody else may read what will be a private file.
-TEST(ChunkFileSave, WhatIsWrittenIsNeverOpenToMore)
-{
-    ScratchFolder const folder;
-    folder.Write(Project, "the old file");
-    ASSERT_EQ(0, ::chmod(folder.Path(Project).c_str(), 0600));
-    CKF_FileWriter file;
-    ASSERT_EQ(0, file.Create(folder.Path(Project).c_str()));
-    EXPECT_EQ(fs::perms(0600), fs::status(TemporaryIn(folder)).permissions());
 }
 
 // A process that begins to write and then dies by a signal; whether it takes care of signals itself.
@@ -251,8 +220,12 @@ TEST(ChunkFileSave, WhatADeadProcessLeftGoesWithTheNextSave)
     EXPECT_EQ(2u, folder.Names().size()) << "the dead one's is gone, that of the other target isn't";
     ASSERT_EQ(0, file.Create(folder.Path(Project).c_str()));
     EXPECT_EQ(3u, folder.Names().size()) << "nobody takes it from the living";
+    file.Append("second", 6);
+    living.Append("first", 5);
     EXPECT_EQ(0, file.Commit());
+    EXPECT_EQ("second", FileContent(folder.Path(Project)));
     EXPECT_EQ(0, living.Commit());
+    EXPECT_EQ("first", FileContent(folder.Path(Project))) << "two saves to one place don't meet";
     ASSERT_EQ(0, file.Create(folder.Path(other).c_str()));
     EXPECT_EQ(0, file.Commit());
     EXPECT_EQ((Names{Project, other}), folder.Names());
@@ -310,19 +283,13 @@ TEST(ChunkFileSave, OnlyRegularProjectFilesAreOpened)
         EXPECT_STRNE("", file.LastErrorText());
         EXPECT_EQ(before, Q_MemoryLive("project file")) << "a file that didn't open holds nothing";
     }
-}
-
-TEST(ChunkFileSave, AFileThatIsOpenDoesNotNeedThePathAnyMore)
-{
-    ScratchFolder const folder;
-    folder.Write(Project, NestedSample());
-    const Q_MemoryCount before = Q_MemoryLive("project file");
     {
+        folder.Write(Project, NestedSample());
         CKF_File file;
         ASSERT_EQ(0, file.Open(folder.Path(Project).c_str()));
         EXPECT_EQ(static_cast<long long>(NestedSample().size()), Q_MemoryLive("project file").bytes - before.bytes);
         ASSERT_EQ(0, ::truncate(folder.Path(Project).c_str(), 10));
-        EXPECT_EQ(NestedOutline, Outline(&file));
+        EXPECT_EQ(NestedOutline, Outline(&file)) << "an open file doesn't need its path any more";
     }
     EXPECT_EQ(before, Q_MemoryLive("project file"));
 }

@@ -11,11 +11,6 @@
 
 namespace {
 
-u16str Units(std::initializer_list<int> units)
-{
-    return u16str(units.begin(), units.end());
-}
-
 struct Golden {
     char const* why;
     std::function<void(CKF_File*)> write;
@@ -495,10 +490,9 @@ TEST(ChunkFileReading, AFailureStays)
 
 TEST(ChunkFileReading, NothingIsOpenInTheBeginning)
 {
-    CKF_File file;
+    CKF_File file, other;
     EXPECT_EQ(0, file.LastError());
     EXPECT_EQ(CKF_Err_NotOpen, CKF_ReadAtom(&file, CKF_Id("aaaa"), nullptr, 0, nullptr));
-    CKF_File other;
     EXPECT_EQ(CKF_Err_NotOpen, other.Commit());
     EXPECT_EQ(CKF_Err_BadArgument, CKF_WriteAtom(nullptr, CKF_Id("aaaa"), 0, nullptr));
     EXPECT_EQ(CKF_Err_BadArgument, other.Open(static_cast<char const*>(nullptr)));

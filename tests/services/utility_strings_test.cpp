@@ -1,6 +1,6 @@
 #include "frame/services/strings.h"
 
-#include <gtest/gtest.h>
+#include "tests/services/chunkbytes.h"
 
 #include <climits>
 #include <initializer_list>
@@ -11,18 +11,6 @@
 #include <vector>
 
 namespace {
-
-u16str U(std::initializer_list<int> units)
-{
-    u16str text;
-    for (int const unit : units) text.push_back(static_cast<unsigned short>(unit));
-    return text;
-}
-
-u16str A(char const* ascii)
-{
-    return Q_AsciiToUTF16String(ascii);
-}
 
 std::string Narrow(u16str const& text)
 {
@@ -38,28 +26,28 @@ struct Utf8 {
 };
 
 std::vector<Utf8> const WellFormed = {
-    {"ascii", "a~\x7F", U({'a', '~', 0x7F})},
-    {"the first and last of two bytes", "\xC2\x80\xDF\xBF", U({0x80, 0x7FF})},
-    {"the first and last of three bytes", "\xE0\xA0\x80\xEF\xBF\xBF", U({0x800, 0xFFFF})},
-    {"around the surrogates", "\xED\x9F\xBF\xEE\x80\x80", U({0xD7FF, 0xE000})},
-    {"the first and last of four bytes", "\xF0\x90\x80\x80\xF4\x8F\xBF\xBF", U({0xD800, 0xDC00, 0xDBFF, 0xDFFF})},
-    {"a zero inside", std::string("a\0b", 3), U({'a', 0, 'b'})},
-    {"a replacement as such", "\xEF\xBF\xBD", U({0xFFFD})},
+    {"ascii", "a~\x7F", Units({'a', '~', 0x7F})},
+    {"the first and last of two bytes", "\xC2\x80\xDF\xBF", Units({0x80, 0x7FF})},
+    {"the first and last of three bytes", "\xE0\xA0\x80\xEF\xBF\xBF", Units({0x800, 0xFFFF})},
+    {"around the surrogates", "\xED\x9F\xBF\xEE\x80\x80", Units({0xD7FF, 0xE000})},
+    {"the first and last of four bytes", "\xF0\x90\x80\x80\xF4\x8F\xBF\xBF", Units({0xD800, 0xDC00, 0xDBFF, 0xDFFF})},
+    {"a zero inside", std::string("a\0b", 3), Units({'a', 0, 'b'})},
+    {"a replacement as such", "\xEF\xBF\xBD", Units({0xFFFD})},
     {"nothing", "", {}},
 };
 
 std::vector<Utf8> const IllFormed = {
-    {"a continuation alone", "\x80", U({0xFFFD})},
-    {"each continuation counts", "\xBF\xBF", U({0xFFFD, 0xFFFD})},
-    {"bytes that UTF-8 hasn't", "\xC0\xC1\xF5\xFF", U({0xFFFD, 0xFFFD, 0xFFFD, 0xFFFD})},
-    {"an overlong slash", "\xC0\xAF", U({0xFFFD, 0xFFFD})},
-    {"an overlong form of three bytes", "\xE0\x9F\xBF", U({0xFFFD, 0xFFFD, 0xFFFD})},
-    {"an overlong form of four bytes", "\xF0\x8F\xBF\xBF", U({0xFFFD, 0xFFFD, 0xFFFD, 0xFFFD})},
-    {"a surrogate", "\xED\xA0\x80", U({0xFFFD, 0xFFFD, 0xFFFD})},
-    {"above the last code point", "\xF4\x90\x80\x80", U({0xFFFD, 0xFFFD, 0xFFFD, 0xFFFD})},
-    {"three of four bytes at the end are one", "\xF0\x9F\x98", U({0xFFFD})},
-    {"a break in the middle gives the breaker back", "\xE2\x82z", U({0xFFFD, 'z'})},
-    {"a lead broken by a lead", "\xE2\xC3\xA4", U({0xFFFD, 0xE4})},
+    {"a continuation alone", "\x80", Units({0xFFFD})},
+    {"each continuation counts", "\xBF\xBF", Units({0xFFFD, 0xFFFD})},
+    {"bytes that UTF-8 hasn't", "\xC0\xC1\xF5\xFF", Units({0xFFFD, 0xFFFD, 0xFFFD, 0xFFFD})},
+    {"an overlong slash", "\xC0\xAF", Units({0xFFFD, 0xFFFD})},
+    {"an overlong form of three bytes", "\xE0\x9F\xBF", Units({0xFFFD, 0xFFFD, 0xFFFD})},
+    {"an overlong form of four bytes", "\xF0\x8F\xBF\xBF", Units({0xFFFD, 0xFFFD, 0xFFFD, 0xFFFD})},
+    {"a surrogate", "\xED\xA0\x80", Units({0xFFFD, 0xFFFD, 0xFFFD})},
+    {"above the last code point", "\xF4\x90\x80\x80", Units({0xFFFD, 0xFFFD, 0xFFFD, 0xFFFD})},
+    {"three of four bytes at the end are one", "\xF0\x9F\x98", Units({0xFFFD})},
+    {"a break in the middle gives the breaker back", "\xE2\x82z", Units({0xFFFD, 'z'})},
+    {"a lead broken by a lead", "\xE2\xC3\xA4", Units({0xFFFD, 0xE4})},
 };
 
 TEST(Strings, Utf8AndUtf16AreTheSameText)
@@ -82,24 +70,21 @@ TEST(Strings, IllFormedTextBecomesReplacements)
 {
     for (Utf8 const& row : IllFormed) EXPECT_EQ(row.units, Q_MBToUTF16String(row.bytes)) << row.why;
     const std::string replacement = "\xEF\xBF\xBD";
-    EXPECT_EQ(replacement, Narrow(U({0xD800})));
-    EXPECT_EQ(replacement, Narrow(U({0xDC00})));
-    EXPECT_EQ(replacement + "a", Narrow(U({0xD800, 'a'})));
-    EXPECT_EQ(replacement + replacement, Narrow(U({0xDC00, 0xD800})));
-    EXPECT_EQ(replacement + "\xF0\x90\x80\x80", Narrow(U({0xD800, 0xD800, 0xDC00})));
-    EXPECT_EQ(U({'a', 0xFFFD, 'b'}), Q_AsciiToUTF16String("a\xE4"
-                                                          "b"));
+    EXPECT_EQ(replacement, Narrow(Units({0xD800})));
+    EXPECT_EQ(replacement, Narrow(Units({0xDC00})));
+    EXPECT_EQ(replacement + "a", Narrow(Units({0xD800, 'a'})));
+    EXPECT_EQ(replacement + replacement, Narrow(Units({0xDC00, 0xD800})));
+    EXPECT_EQ(replacement + "\xF0\x90\x80\x80", Narrow(Units({0xD800, 0xD800, 0xDC00})));
+    EXPECT_EQ(Units({'a', 0xFFFD, 'b'}), Q_AsciiToUTF16String("a\xE4"
+                                                              "b"));
 }
 
 TEST(Strings, EveryCodePointSurvivesAndAnyBytesConverge)
 {
     for (char32_t point = 1; point < 0x110000; point += point < 0x11000 ? 1 : 97) {
         if (point >= 0xD800 && point <= 0xDFFF) continue;
-        u16str text;
-        if (point >= 0x10000)
-            text = U({int(0xD800 + ((point - 0x10000) >> 10)), int(0xDC00 + (point & 0x3FF))});
-        else
-            text = U({int(point)});
+        int const units = static_cast<int>(point), high = 0xD800 + ((units - 0x10000) >> 10);
+        u16str const text = units < 0x10000 ? Units({units}) : Units({high, 0xDC00 + (units & 0x3FF)});
         ASSERT_EQ(text, Q_MBToUTF16String(Narrow(text))) << std::hex << static_cast<unsigned>(point);
     }
     std::mt19937 random(3);
@@ -164,17 +149,17 @@ TEST(Messages, TheTextFollowsTheFirstEqualsSign)
     for (int const row : {5, 6, -1, INT_MIN, INT_MAX}) EXPECT_STREQ("", Q_ZLookupLStrCache(&tableHandle, row, 0, 0));
     EXPECT_EQ(Q_ZLookupLStrCache(&tableHandle, 0, 0, 0), Q_ZLookupLStrCache(&tableHandle, 0, 0, 0));
 
-    EXPECT_EQ(A("Some, text = more"), Q_ZStringToUTF16String("$$$/Tests/Key=Some, text = more"));
-    EXPECT_EQ(A("x = y"), Q_ZStringToUTF16String("x = y")) << "no key, so all of it is text";
+    EXPECT_EQ(Text("Some, text = more"), Q_ZStringToUTF16String("$$$/Tests/Key=Some, text = more"));
+    EXPECT_EQ(Text("x = y"), Q_ZStringToUTF16String("x = y")) << "no key, so all of it is text";
     EXPECT_TRUE(Q_ZStringToUTF16String(nullptr).empty());
 }
 
 TEST(Messages, ATranslationTakesThePlaceOfTheTextForEver)
 {
     Q_SetTranslateFunc(Translate);
-    char const* const text = Q_ZLookupLStrCache(&tableHandle, 4, 0, 0);
-    EXPECT_EQ(A("text"), Q_ZStringToUTF16String("$$$/Tests/Untranslated=text"));
-    u16str wanted = A("bersetzt: $$$/Tests/Single");
+    char const* const kept = Q_ZLookupLStrCache(&tableHandle, 4, 0, 0);
+    EXPECT_EQ(Text("text"), Q_ZStringToUTF16String("$$$/Tests/Untranslated=text"));
+    u16str wanted = Text("bersetzt: $$$/Tests/Single");
     wanted.insert(wanted.begin(), 0xFC);
     EXPECT_EQ(wanted, Q_ZStringToUTF16String("$$$/Tests/Single=single"));
     // What reads another argument than the caller passes is no translation of a format.
@@ -194,15 +179,16 @@ TEST(Messages, ATranslationTakesThePlaceOfTheTextForEver)
         given = translation;
         Q_SetTranslateFunc([](std::string_view) { return given; });
         std::string const entry = std::string("$$$/k=") + text;
-        EXPECT_EQ(A(fits ? translation : text), Q_ZStringToUTF16String(entry.c_str())) << entry << ' ' << translation;
+        EXPECT_EQ(Text(fits ? translation : text), Q_ZStringToUTF16String(entry.c_str()))
+            << entry << ' ' << translation;
     }
     Q_SetTranslateFunc(nullptr);
     EXPECT_STREQ("\xC3\xBC"
                  "bersetzt: $$$/Tests/0004",
-                 text)
+                 kept)
         << "the translator's buffer was used again since";
-    EXPECT_EQ(text, Q_ZLookupLStrCache(&tableHandle, 4, 0, 0));
-    EXPECT_EQ(A("single"), Q_ZStringToUTF16String("$$$/Tests/Single=single"));
+    EXPECT_EQ(kept, Q_ZLookupLStrCache(&tableHandle, 4, 0, 0));
+    EXPECT_EQ(Text("single"), Q_ZStringToUTF16String("$$$/Tests/Single=single"));
 }
 
 // ---- placeholders
@@ -216,7 +202,7 @@ TEST(SubString, FillsPlaceholdersOnce)
     EXPECT_STREQ("property of type #{ldquo}KFS ^^2#{rdquo}had dimension 3 in file, but we expecte", text);
     EXPECT_EQ(0, Q_SubString(text, sizeof text, "^^2^^1^^2 ^1 ^^ ^^0 ^^3 ^^L ^^^1^", "a", std::string("b")));
     EXPECT_STREQ("bab ^1 ^^ ^^0 ^^3 ^^L ^a^", text);
-    EXPECT_EQ(0, Q_SubString(text, 4, "^^1", U({0xE4, 0xE4, 0xE4})));
+    EXPECT_EQ(0, Q_SubString(text, 4, "^^1", Units({0xE4, 0xE4, 0xE4})));
     EXPECT_STREQ("\xC3\xA4\xC3", text);
     EXPECT_EQ(0, Q_SubString(text, sizeof text, "^^1|", static_cast<char const*>(nullptr)));
     EXPECT_STREQ("|", text);
@@ -226,10 +212,10 @@ TEST(SubString, FillsPlaceholdersOnce)
 
 TEST(SubString, Utf16TakesTheShortFormToo)
 {
-    u16str text = A("reading the ^1 parameter ^^1, ^^L2, ^3 and ^0");
-    u16str const name = U({0xD83D, 0xDE00, 0xE4});
+    u16str text = Text("reading the ^1 parameter ^^1, ^^L2, ^3 and ^0");
+    u16str const name = Units({0xD83D, 0xDE00, 0xE4});
     Q_SubString(&text, text, name, -7L);
-    u16str wanted = A("reading the ") + name + A(" parameter ") + name + A(", -7, ^3 and ^0");
+    u16str wanted = Text("reading the ") + name + Text(" parameter ") + name + Text(", -7, ^3 and ^0");
     EXPECT_EQ(wanted, text);
 }
 
@@ -289,11 +275,11 @@ TEST(Numbers, AreReadUpToWhatIsNone)
             SCOPED_TRACE(testing::Message() << "\"" << row.text << "\", flags " << flags);
             int const wanted = flags ? row.assigned : row.plain;
             int number = None;
-            EXPECT_EQ(wanted != None, hearth::string::StringToNumber(A(row.text), &number, flags));
+            EXPECT_EQ(wanted != None, hearth::string::StringToNumber(Text(row.text), &number, flags));
             EXPECT_EQ(wanted, number);
         }
     int number = None;
-    EXPECT_FALSE(hearth::string::StringToNumber(U({0x0665}), &number, 0)) << "digits of other scripts aren't read";
+    EXPECT_FALSE(hearth::string::StringToNumber(Units({0x0665}), &number, 0)) << "digits of other scripts aren't read";
 }
 
 TEST(ReplaceInString, ReplacesEachOccurrenceOfTheSource)
@@ -310,8 +296,8 @@ TEST(ReplaceInString, ReplacesEachOccurrenceOfTheSource)
         {"@0@0", "@0", "@0", "@0@0", 2},
     };
     for (auto const& row : table16) {
-        u16str text = A(row.text);
-        EXPECT_EQ(row.count, hearth::string::ReplaceInString(&text, A(row.what), A(row.with)));
+        u16str text = Text(row.text);
+        EXPECT_EQ(row.count, hearth::string::ReplaceInString(&text, Text(row.what), Text(row.with)));
         EXPECT_EQ(row.result, Narrow(text));
     }
 }

@@ -20,6 +20,7 @@
 #include <functional>
 #include <limits>
 #include <list>
+#include <memory>
 #include <random>
 #include <set>
 #include <stdexcept>
@@ -104,26 +105,21 @@ TEST(Memory, IsCountedByTheTextOfItsLabel)
 }
 
 // Every way to get memory: each tries once, cleans up, and says whether it got what it wanted.
+bool FreesPtr(void* block)
+{
+    Q_FreePtr(block);
+    return block != nullptr;
+}
+
 bool (*const Ways[])() = {
-    [] {
-        void* const block = Q_AllocatePtr(1, "tests", 8);
-        Q_FreePtr(block);
-        return block != nullptr;
-    },
-    [] {
-        void* const block = Q_AllocatePtrClear(1, "tests", 8);
-        Q_FreePtr(block);
-        return block != nullptr;
-    },
+    [] { return FreesPtr(Q_AllocatePtr(1, "tests", 8)); },
+    [] { return FreesPtr(Q_AllocatePtrClear(1, "tests", 8)); },
     [] {
         char** const handle = Q_AllocateHandleClear(1, "tests", 8);
         Q_FreeHandle(handle);
         return handle != nullptr;
     },
-    [] {
-        delete new Tracked;
-        return true;
-    },
+    [] { return std::make_unique<Tracked>() != nullptr; },
     [] { return std::vector<int, Q_Allocator<int>>(5).size() == 5; },
     [] { return u16str(100, 'x').size() == 100; },
 };
@@ -587,15 +583,12 @@ TYPED_TEST(HashStates, DoNotDependOnHowTheBytesCome)
 TEST(Identifiers, OrderByUnsignedBytesFromTheFirst)
 {
     Dice dice(4);
-    EXPECT_EQ("00000000000000000000000000000000", Hex(Guid()));
+    EXPECT_EQ(std::string(32, '0'), Hex(Guid()));
     for (int i = 0; i < 2000; ++i) {
-        std::array<unsigned char, 16> a{}, b{};
-        int const common = dice.Below(17);
-        for (int k = 0; k < 16; ++k) {
-            a[static_cast<std::size_t>(k)] = static_cast<unsigned char>(dice.Bits());
-            b[static_cast<std::size_t>(k)] =
-                k < common ? a[static_cast<std::size_t>(k)] : static_cast<unsigned char>(dice.Bits());
-        }
+        std::array<unsigned char, 16> a{};
+        for (unsigned char& byte : a) byte = static_cast<unsigned char>(dice.Bits());
+        auto b = a;
+        std::generate(b.begin() + dice.Below(17), b.end(), [&] { return static_cast<unsigned char>(dice.Bits()); });
         EXPECT_EQ(a < b, Guid(a) < Guid(b));
         EXPECT_EQ(a == b, Guid(a) == Guid(b));
         unsigned char bytes[16];

@@ -5,7 +5,9 @@
 #include "frame/services/curvekernel.h"
 
 #include <array>
+#include <bit>
 #include <cstddef>
+#include <cstdint>
 #include <ostream>
 #include <vector>
 
@@ -33,6 +35,17 @@ inline std::ostream& operator<<(std::ostream& out, Curve const& curve)
             out << (i ? ", " : "(") << point[i] << (i + 1 < curve.Size() ? "" : ") ");
     return out;
 }
+
+// Hashes the bits of answers. The pinned numbers are those of every build so far, with gcc and clang, with and without
+// optimisation. A change means that saved render identities no longer match: it needs a reason.
+struct BitHash {
+    void Mix(double value)
+    {
+        hash = (hash ^ std::bit_cast<std::uint64_t>(value)) * 0x100000001b3u;
+        hash ^= hash >> 29;
+    }
+    std::uint64_t hash = 0xcbf29ce484222325u;
+};
 
 struct Exhibit {
     char const* name;
