@@ -63,8 +63,7 @@ TEST(AnyTree, HasExactlyThisText)
     EXPECT_EQ(U("again"), wrapper.get_child_any(U("00")).GetAs_Str());
     EXPECT_EQ(Q_Err_NoChild, Thrown([&] { wrapper.get_child_any(U("a")); }));
 
-    u16str lone = U("x");
-    lone.push_back(0xD800);
+    u16str const lone = Units({'x', 0xD800});
     Q_AnyTree surrogate;
     Q_AnyTreeWrapper(surrogate).put(lone, Q_Any(lone));
     EXPECT_EQ("{\"x\xEF\xBF\xBD\":\"x\xEF\xBF\xBD\"}", Json(surrogate));

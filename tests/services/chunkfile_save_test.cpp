@@ -132,10 +132,10 @@ TEST(ChunkFileSave, WhatIsNotCommittedLeavesNothing)
         ASSERT_EQ(2u, folder.Names().size());
     };
     {
-        CKF_File file;
-        begin(file);
+        CKF_File destroyed;
+        begin(destroyed);
     }
-    EXPECT_EQ(Names{Project}, folder.Names()) << "destroyed";
+    EXPECT_EQ(Names{Project}, folder.Names());
     {
         CKF_File made;
         ASSERT_EQ(0, made.Create(folder.Path("new.kfs").c_str()));

@@ -417,8 +417,8 @@ TEST(ChunkFileReading, AFailureStays)
     Call const noPlace = [](CKF_File* f) { return CKF_ReadAtom(f, CKF_Id("aaaa"), nullptr, 1, nullptr); };
     Call const negative = [](CKF_File* f) { return CKF_ReadAtom(f, CKF_Id("aaaa"), nullptr, -1, f); };
     Call const write = [](CKF_File* f) { return CKF_WriteAtom(f, CKF_Id("aaaa"), 0, nullptr); };
-    auto const readPast = [](CKF_File* f) {
-        CKF_ScDescend const atom(f, 0, 0, nullptr, nullptr);
+    auto const readThree = [](CKF_File* f) {
+        CKF_ScDescend const first(f, 0, 0, nullptr, nullptr);
         int size = 3;
         char data[4];
         return CKF_ReadChunkData(f, &size, data);
@@ -438,11 +438,6 @@ TEST(ChunkFileReading, AFailureStays)
         CKF_ScDescend const atom(f, 0, 0, nullptr, nullptr);
         return CKF_ReadAtom(f, CKF_Id("aaaa"), nullptr, 0, nullptr);
     };
-    auto const readInList = [](CKF_File* f) {
-        CKF_ScDescend const list(f, 0, 0, nullptr, nullptr);
-        int size = 0;
-        return CKF_ReadChunkData(f, &size, nullptr);
-    };
     auto const useTwice = [](CKF_File* f) {
         CKF_ScDescend list(f, 0, 0, nullptr, nullptr);
         return Thrown([&] { list.Descend(f, 0, 0, nullptr, nullptr); });
@@ -455,11 +450,11 @@ TEST(ChunkFileReading, AFailureStays)
         int code;
         std::uint64_t offset;
     } rows[] = {
-        {"more data than there is", Atom("aaaa", "12"), readPast, CKF_Err_PastEnd, 40},
+        {"more data than there is", Atom("aaaa", "12"), readThree, CKF_Err_PastEnd, 40},
         {"a list that isn't open", list, searchOutside, CKF_Err_Unbalanced, 44},
         {"a list that isn't the innermost", list, searchOuter, CKF_Err_Unbalanced, 56},
         {"chunks in an atom", Atom("bbbb", "12"), searchInAtom, CKF_Err_BadArgument, 40},
-        {"data of a list", list, readInList, CKF_Err_BadArgument, 44},
+        {"data of a list", list, readThree, CKF_Err_BadArgument, 44},
         {"a descent that is in use", list, useTwice, CKF_Err_Unbalanced, 44},
         {"an atom without a place", Atom("aaaa", "12"), noPlace, CKF_Err_BadArgument, 0},
         {"a negative size", Atom("aaaa", "12"), negative, CKF_Err_BadArgument, 0},

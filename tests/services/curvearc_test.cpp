@@ -166,9 +166,8 @@ TEST(CurveArc, AnyFiniteCurveHasATableWithoutNaN)
 
 TEST(CurveArc, ScaleDoesntMatter)
 {
-    Curve const plain = Exhibited("a loop");
-    Curve same = plain;
-    Table unit(same, 1e-3);
+    Curve plain = Exhibited("a loop");
+    Table unit(plain, 1e-3);
     for (int const power : {-1000, -500, -20, 20, 500, 1000}) {
         Curve curve = plain;
         for (auto& point : curve.p)
