@@ -2,6 +2,7 @@
 
 #include "cli/rates.h"
 #include "curves/tangents.h"
+#include "host/rotations.h"
 #include "host/storeerror.h"
 #include "keystore/evaluate.h"
 #include "keystore/lookup.h"
@@ -14,19 +15,21 @@ using kfshost::ThrowIfFailed;
 
 namespace {
 
-// One sampler walks a stream from key to key. Times are whole units of the stream's scale, as its keys are.
+// One sampler walks a stream from key to key. Times are whole units of the stream's scale, as its keys are. Of a rotation
+// it takes what the quaternion stands for, of length 1, as all that is shown of one.
 class Sampler {
 public:
-    Sampler(KFS_Stream const& stream, std::vector<std::size_t> const& components, TimeSpan const& part,
+    Sampler(kfshost::StreamItem const& item, std::vector<std::size_t> const& components, TimeSpan const& part,
             double pointsPerSecond)
-        : stream_(stream),
+        : stream_(*item.stream),
+          isRotation_(kfshost::IsRotation(item)),
           components_(components),
-          scale_(stream.GetTimeScale()),
+          scale_(stream_.GetTimeScale()),
           first_(part.first.ToUnits(scale_)),
           last_(part.last.ToUnits(scale_)),
           pointsPerSecond_(pointsPerSecond),
-          row_(static_cast<std::size_t>(stream.GetDimension())),
-          rates_(stream)
+          row_(static_cast<std::size_t>(stream_.GetDimension())),
+          rates_(stream_, isRotation_)
     {
         curves_.components.resize(components.size());
     }
@@ -56,6 +59,7 @@ private:
     {
         T_Time const time{units, scale_};
         ThrowIfFailed(KFS_GetValueFPlus(&stream_, &time, 0, row.data(), nullptr, nullptr));
+        if (isRotation_) kfshost::Normalise(row.data());
     }
 
     void AddKey(int index, int time)
@@ -63,14 +67,15 @@ private:
         char inInterp = 0;
         char outInterp = 0;
         ThrowIfFailed(KFS_GetKeyF(&stream_, index, row_.data(), &inInterp, &outInterp));
+        if (isRotation_) kfshost::Normalise(row_.data());
         double const seconds = Seconds(time);
         for (std::size_t c = 0; c < components_.size(); ++c) {
             Point const key{seconds, row_[components_[c]]};
             curves_.components[c].keys.push_back(key);
             curves_.components[c].value.push_back(key);
         }
-        if (!stream_.IsSpatial())  // a path's handles belong to the graph of its distance, not to these
-            AddHandles(index, seconds, inInterp, outInterp);
+        // A path's handles belong to the graph of its distance, a rotation's to its stored components, not to these.
+        if (!stream_.IsSpatial() && !isRotation_) AddHandles(index, seconds, inInterp, outInterp);
     }
 
     // Those whose ends lie in the part that is drawn.
@@ -97,14 +102,15 @@ private:
         ThrowIfFailed(KFS_GetKeyF(&stream_, index + 1, nullptr, &inInterp, nullptr));
         int const from = std::max(start, first_);
         int const to = std::min(end, last_);
+        bool const isLinear = outInterp == KFS_Interp_Linear && inInterp == KFS_Interp_Linear;
         if (outInterp == KFS_Interp_Hold || inInterp == KFS_Interp_Hold) {
             AddHold(from, to);
-        } else if (outInterp == KFS_Interp_Linear && inInterp == KFS_Interp_Linear) {
+        } else if (isLinear && !isRotation_) {
             AddPieces(from, to, 1, start, end);
         } else {
             double const wanted = (static_cast<double>(to) - from) / scale_ * pointsPerSecond_;
-            AddPieces(from, to, std::clamp(static_cast<std::int64_t>(wanted), std::int64_t{24}, std::int64_t{4000}),
-                      start, end);
+            std::int64_t const least = isLinear ? 1 : 24;  // the arc of a rotation bends little
+            AddPieces(from, to, std::clamp(static_cast<std::int64_t>(wanted), least, std::int64_t{4000}), start, end);
         }
     }
 
@@ -138,6 +144,7 @@ private:
     }
 
     KFS_Stream const& stream_;
+    bool isRotation_;
     std::vector<std::size_t> const& components_;
     unsigned int scale_;
     int first_;
@@ -153,5 +160,5 @@ private:
 StreamCurves SampleCurves(kfshost::StreamItem const& item, std::vector<std::size_t> const& components,
                           TimeSpan const& part, double pointsPerSecond)
 {
-    return Sampler(*item.stream, components, part, pointsPerSecond).Run();
+    return Sampler(item, components, part, pointsPerSecond).Run();
 }

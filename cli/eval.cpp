@@ -46,23 +46,27 @@ std::int64_t FrameBefore(Rational const& seconds, Rational const& fps)
 std::vector<Rational> SampleTimes(Options const& options, Rational const& fps, std::optional<TimeSpan> const& span)
 {
     TimeSpan const keys = span.value_or(TimeSpan{});
-    Rational const from =
-        options.from.empty() ? Rational(FrameBefore(keys.first, fps), 1) / fps : ParseTime(options.from, "--from", fps);
+    Rational const from = options.from.empty()
+                              ? Fitting("--fps", [&] { return Rational(FrameBefore(keys.first, fps), 1) / fps; })
+                              : ParseTime(options.from, "--from", fps);
     Rational const to = options.to.empty() ? std::max(keys.last, from) : ParseTime(options.to, "--to", fps);
     if (options.to.empty() && span && from > keys.last) {
         throw UserError("--from", TimeText(from) + " s is after the last key, " + TimeText(keys.last) +
                                       " s; --to says how far to go then");
     }
     if (to < from) throw UserError("--to", TimeText(to) + " s is before --from, " + TimeText(from) + " s");
-    Rational const steps = (to - from) * fps;
+    Rational const length = Fitting(
+        options.from.empty() ? "--to" : "--from", [&] { return to - from; });
+    Rational const steps = Fitting("--fps", [&] { return length * fps; });
     bool const isBetween = options.to.empty() && steps.Denominator() != 1;
-    std::int64_t const last = FrameBefore(to - from, fps) + (isBetween ? 1 : 0);
+    std::int64_t const last = FrameBefore(length, fps) + (isBetween ? 1 : 0);
     if (last >= MaxSamples) {
         throw UserError("--fps", fmt::format("asks for more than {} times from {} s to {} s", MaxSamples,
                                              TimeText(from), TimeText(to)));
     }
     std::vector<Rational> times;
-    for (std::int64_t i = 0; i <= last; ++i) times.push_back(from + Rational(i, 1) / fps);
+    for (std::int64_t i = 0; i <= last; ++i)
+        times.push_back(Fitting("--fps", [&] { return from + Rational(i, 1) / fps; }));
     return times;
 }
 

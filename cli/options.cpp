@@ -1,7 +1,5 @@
 #include "cli/options.h"
 
-#include "cli/usererror.h"
-
 #include <fmt/format.h>
 
 #include <charconv>
@@ -78,5 +76,5 @@ Rational ParseTime(std::string const& text, char const* option, Rational const& 
     bool const inFrames = text.ends_with('f');
     auto const number = Rational::Parse(std::string_view(text).substr(0, text.size() - (inFrames ? 1 : 0)));
     if (!number) throw UserError(option, '"' + text + "\" isn't a time: seconds like 0.5 or 1/24, or frames like 12f");
-    return inFrames ? *number / fps : *number;
+    return inFrames ? Fitting(option, [&] { return *number / fps; }) : *number;
 }

@@ -3,6 +3,7 @@
 #include "cli/options.h"
 #include "cli/output.h"
 #include "cli/usererror.h"
+#include "host/framegrid.h"
 
 #include <algorithm>
 #include <cctype>
@@ -59,9 +60,11 @@ int Run(Options const& options, bool formGiven)
     }
     std::optional<Rational> const fps = options.fps.empty() ? std::nullopt : std::optional(ParseFps(options.fps));
     kfshost::Scene const scene = LoadScene(drawing.selection);
-    drawing.fps = fps ? *fps : RateOfKeys(SelectStreams(scene, drawing.selection));
+    drawing.fps = fps ? *fps : kfshost::FindFrameGrid(SelectStreams(scene, drawing.selection)).rate;
     ReadPart(options, drawing);
-    WriteWholeFile(options.output, options.motion ? DrawMotions(drawing, scene) : DrawValues(drawing, scene));
+    std::string const svg =
+        Fitting("--fps", [&] { return options.motion ? DrawMotions(drawing, scene) : DrawValues(drawing, scene); });
+    WriteWholeFile(options.output, svg);
     return ExitDone;
 }
 

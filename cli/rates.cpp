@@ -1,14 +1,16 @@
 // Rates from values, in the one place that asks for differences.
 #include "cli/rates.h"
 
+#include "host/rotations.h"
 #include "host/storeerror.h"
 #include "keystore/evaluate.h"
 
 #include <algorithm>
 #include <cstdint>
 
-Rates::Rates(KFS_Stream const& stream)
+Rates::Rates(KFS_Stream const& stream, bool asRotation)
     : stream_(stream),
+      asRotation_(asRotation),
       before_(static_cast<std::size_t>(stream.GetDimension())),
       here_(before_),
       after_(before_),
@@ -19,6 +21,7 @@ void Rates::Read(std::int64_t time, std::vector<double>& row) const
 {
     T_Time const at{static_cast<int>(time), stream_.GetTimeScale()};
     kfshost::ThrowIfFailed(KFS_GetValueFPlus(&stream_, &at, 0, row.data(), nullptr, nullptr));
+    if (asRotation_) kfshost::Normalise(row.data());
 }
 
 // The derivative of the parabola through three values around the time, or beside it at the ends of the segment.

@@ -107,22 +107,6 @@ std::optional<TimeSpan> SpanOf(std::vector<StreamItem const*> const& items)
     return span;
 }
 
-Rational RateOfKeys(std::vector<StreamItem const*> const& items)
-{
-    Rational const usual[] = {{24, 1},       {25, 1},       {30, 1},       {48, 1}, {50, 1}, {60, 1}, {120, 1},
-                              {24000, 1001}, {30000, 1001}, {60000, 1001}, {72, 1}, {90, 1}, {144, 1}};
-    auto const fits = [&items](Rational const& rate) {
-        for (StreamItem const* item : items)
-            for (int i = 0; i < kfshost::KeyCount(*item->stream); ++i)
-                if (!kfshost::IsFloatKey(*item->stream, i) &&
-                    (kfshost::KeyTime(*item->stream, i) * rate).Denominator() != 1)
-                    return false;
-        return true;
-    };
-    auto const found = std::ranges::find_if(usual, fits);
-    return found == std::end(usual) ? usual[0] : *found;
-}
-
 std::string TimeText(Rational const& time)
 {
     constexpr int frameUnits = 120000;  // whole numbers of these are the frames of the usual rates

@@ -30,8 +30,5 @@ struct TimeSpan {
 // From the first to the last key of all these streams; nothing if no stream has a key.
 std::optional<TimeSpan> SpanOf(std::vector<kfshost::StreamItem const*> const& items);
 
-// The first usual rate on whose frames all keys of these streams lie; 24 if there is none.
-kfshost::Rational RateOfKeys(std::vector<kfshost::StreamItem const*> const& items);
-
 // A time as "5/24"; as a decimal where the fraction would say nothing to anybody.
 std::string TimeText(kfshost::Rational const& time);

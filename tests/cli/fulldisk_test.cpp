@@ -15,16 +15,6 @@
 
 namespace {
 
-// An animation of so many frames.
-std::string Bvh(int frames)
-{
-    std::string text = "HIERARCHY\nROOT hip\n{\nOFFSET 0 0 0\nCHANNELS 3 Xposition Yposition Zposition\n"
-                       "End Site\n{\nOFFSET 0 1 0\n}\n}\nMOTION\nFrames: " +
-                       std::to_string(frames) + "\nFrame Time: 0.04\n";
-    for (int frame = 0; frame < frames; ++frame) text += std::to_string(frame % 7) + " 0 1\n";
-    return text;
-}
-
 // What a piece of work in a process of its own writes to its end of a pipe, and that process's exit code in `code`.
 template <class Work>
 std::string InAnotherProcess(Work const& work, int* code)
@@ -52,8 +42,12 @@ class KfsFullDisk : public testing::Test {
 protected:
     void SetUp() override
     {
-        for (auto const& [frames, project] : {std::pair{2, old_}, std::pair{4000, new_}})
-            ASSERT_EQ(0, RunKfs({"import", folder_.Write("animation.bvh", Bvh(frames)), "-o", project}).code);
+        for (auto const& [frames, project] : {std::pair{2U, old_}, std::pair{4000U, new_}})
+            ASSERT_EQ(0,
+                      RunKfs({"import",
+                              folder_.Write("animation.bvh", Motion(std::vector<std::string>(frames, "1 0 1"), "0.04")),
+                              "-o", project})
+                          .code);
         std::filesystem::remove(folder_.Path("animation.bvh"));
     }
 

@@ -1,11 +1,9 @@
 #include "tests/cli/command.h"
-#include "tests/support/places.h"
 
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
 
 #include <cmath>
-#include <filesystem>
 #include <sstream>
 #include <string>
 #include <vector>
@@ -14,18 +12,6 @@ using nlohmann::json;
 
 namespace {
 
-std::string Sample()
-{
-    return kfstest::SamplesFolder() / "bouncing_ball.gltf";
-}
-
-std::size_t Count(std::string const& text, std::string const& part)
-{
-    std::size_t count = 0;
-    for (std::size_t at = 0; (at = text.find(part, at)) != std::string::npos; at += part.size()) ++count;
-    return count;
-}
-
 json Eval(std::vector<std::string> arguments)
 {
     arguments.insert(arguments.begin(), "eval");
@@ -33,22 +19,6 @@ json Eval(std::vector<std::string> arguments)
     Outcome const outcome = RunKfs(arguments);
     EXPECT_EQ("", outcome.errors);
     return json::parse(outcome.output);
-}
-
-void ExpectFailure(Outcome const& outcome, std::string const& error)
-{
-    EXPECT_EQ(2, outcome.code);
-    EXPECT_EQ("", outcome.output);
-    EXPECT_EQ("kfs: " + error + '\n', outcome.errors);
-}
-
-// A joint that goes through these rows of "x y z", one a second.
-std::string Motion(std::vector<std::string> const& rows)
-{
-    std::string text = "HIERARCHY\nROOT a\n{\nCHANNELS 3 Xposition Yposition Zposition\n}\nMOTION\nFrames: " +
-                       std::to_string(rows.size()) + "\nFrame Time: 1\n";
-    for (std::string const& row : rows) text += row + '\n';
-    return text;
 }
 
 std::string DrawMotion(std::string const& file, std::vector<std::string> const& more = {})
@@ -66,8 +36,8 @@ std::string DrawMotion(std::string const& file, std::vector<std::string> const& 
 // The keys are where they were; between them the ball is elsewhere on its way, but nothing else changes.
 TEST(KfsMotion, SpatialAgreesWithPlainAtKeysAndInAllThatIsNoPosition)
 {
-    json const plain = Eval({Sample(), "--fps", "12"});
-    json const spatial = Eval({Sample(), "--fps", "12", "--as", "spatial"});
+    json const plain = Eval({Sample, "--fps", "12"});
+    json const spatial = Eval({Sample, "--fps", "12", "--as", "spatial"});
     ASSERT_EQ(3U, spatial.at("streams").size());
     json const& places = spatial.at("streams")[0].at("values");
     for (std::size_t frame : {0U, 6U, 15U, 22U, 27U, 30U})
@@ -75,7 +45,7 @@ TEST(KfsMotion, SpatialAgreesWithPlainAtKeysAndInAllThatIsNoPosition)
     EXPECT_NE(plain.at("streams")[0].at("values")[3], places[3]);
     EXPECT_EQ(plain.at("streams")[1], spatial.at("streams")[1]);
     EXPECT_EQ(plain.at("streams")[2], spatial.at("streams")[2]);
-    EXPECT_EQ(plain, Eval({Sample(), "--fps", "12", "--as", "plain"}));
+    EXPECT_EQ(plain, Eval({Sample, "--fps", "12", "--as", "plain"}));
 }
 
 TEST(KfsMotion, RovingMakesEqualStepsOfUnequalLegs)
@@ -94,15 +64,15 @@ TEST(KfsMotion, RovingMakesEqualStepsOfUnequalLegs)
 
 TEST(KfsMotion, InfoSaysWhatIsAPath)
 {
-    std::string const text = RunKfs({"info", Sample(), "--as", "spatial", "--rove", "--stream", "*l/t*"}).output;
+    std::string const text = RunKfs({"info", Sample, "--as", "spatial", "--rove", "--stream", "*l/t*"}).output;
     EXPECT_NE(std::string::npos, text.find("spline path, 4 float keys\n")) << text;
-    EXPECT_EQ(std::string::npos, RunKfs({"info", Sample()}).output.find("path"));
+    EXPECT_EQ(std::string::npos, RunKfs({"info", Sample}).output.find("path"));
 }
 
 // 6 keys in space and 6 below the speed, and one more of each kind in the legend; 10 tangents, 61 frames.
 TEST(KfsMotion, TheDrawingHasItsMarks)
 {
-    std::string const svg = DrawMotion(Sample());
+    std::string const svg = DrawMotion(Sample);
     EXPECT_EQ(1U + 1U, Count(svg, "<polyline"));  // five arcs in one, and the speed
     EXPECT_EQ(12U + 1U, Count(svg, "Z\" "));
     EXPECT_EQ(61U + 1U, Count(svg, "h0"));
@@ -110,14 +80,10 @@ TEST(KfsMotion, TheDrawingHasItsMarks)
     EXPECT_EQ(0U, Count(svg, "float key"));
     for (char const* text : {"from the front", ">route<", ">each frame, 1/24 s<", ">tangent<", ">1.25 s<", ">seconds<"})
         EXPECT_EQ(1U, Count(svg, text)) << text;
-}
-
-TEST(KfsMotion, FloatKeysHaveAMarkOfTheirOwn)
-{
-    std::string const svg = DrawMotion(Sample(), {"--rove"});
-    EXPECT_EQ(4U + 1U, Count(svg, "Z\" "));
-    EXPECT_EQ(8U + 1U, Count(svg, "r=\"5\""));
-    EXPECT_EQ(1U, Count(svg, ">float key<"));
+    std::string const roving = DrawMotion(Sample, {"--rove"});  // whose float keys have a mark of their own
+    EXPECT_EQ(4U + 1U, Count(roving, "Z\" "));
+    EXPECT_EQ(8U + 1U, Count(roving, "r=\"5\""));
+    EXPECT_EQ(1U, Count(roving, ">float key<"));
 }
 
 TEST(KfsMotion, ItIsSeenFromTheSideThatShowsMost)
@@ -142,7 +108,7 @@ TEST(KfsMotion, ItIsSeenFromTheSideThatShowsMost)
 // The corners of the route are no dips of the speed, which is one smooth hill.
 TEST(KfsMotion, TheSpeedOfRovingKeysIsSmooth)
 {
-    std::string const svg = DrawMotion(Sample(), {"--rove"});
+    std::string const svg = DrawMotion(Sample, {"--rove"});
     std::istringstream points(svg.substr(svg.rfind("points=\"") + 8));
     std::vector<double> heights;
     for (double x = 0.0, y = 0.0; points >> x && points.ignore(1, ',') && points >> y;) heights.push_back(y);
@@ -162,26 +128,4 @@ TEST(KfsMotion, ManyKeysDontHideTheRoute)
     EXPECT_EQ(1U, Count(svg, ">first, last key<"));
     EXPECT_GT(Count(svg, "h0"), 50U);
     EXPECT_LT(Count(svg, "h0"), 200U);
-}
-
-TEST(KfsMotion, CombinationsThatMeanNothingAreRefused)
-{
-    ScratchFolder const folder;
-    std::string const drawing = folder.Path("x.svg");
-    ExpectFailure(RunKfs({"eval", Sample(), "--as", "spatial", "--stream", "*/scale"}),
-                  Sample() + ": the chosen stream isn't a position in 2 or 3 dimensions");
-    ExpectFailure(RunKfs({"eval", Sample(), "--rove"}),
-                  "--rove: only paths have keys that can float: add --as spatial");
-    ExpectFailure(RunKfs({"plot", "--motion", Sample(), "--as", "plain", "-o", drawing}),
-                  "--motion: draws paths, so it can't go with --as plain");
-    ExpectFailure(RunKfs({"plot", "--motion", Sample(), "--stream", "*/rotation", "-o", drawing}),
-                  Sample() + ": the chosen stream isn't a position in 2 or 3 dimensions");
-    ExpectFailure(RunKfs({"plot", "--motion", folder.Write("a.bvh", Motion({})), "-o", drawing}),
-                  folder.Path("a.bvh") + ": the chosen streams have no keys to draw");
-    ExpectFailure(
-        RunKfs({"plot", "--motion", folder.Write("a.bvh", Motion({"1e308 0 0", "-1e308 0 0"})), "-o", drawing}),
-        folder.Path("a.bvh") + ": joints[0]: positions are too far apart for a path");
-    EXPECT_FALSE(std::filesystem::exists(drawing));
-    Outcome const outcome = RunKfs({"eval", Sample(), "--as", "curves"});
-    EXPECT_EQ("kfs: --as: curves not in {plain,spatial} (kfs --help tells what there is)\n", outcome.errors);
 }

@@ -3,12 +3,8 @@
 
 #include <gtest/gtest.h>
 
-#include <algorithm>
 #include <chrono>
 #include <csignal>
-#include <filesystem>
-#include <fstream>
-#include <iterator>
 #include <random>
 #include <thread>
 
@@ -18,8 +14,6 @@
 
 namespace {
 
-std::string const Sample = kfstest::SamplesFolder() / "bouncing_ball.gltf";
-
 // A folder with the sample as a project.
 class KfsProject : public testing::Test {
 protected:
@@ -28,12 +22,6 @@ protected:
         Outcome const outcome = RunKfs({"import", Sample, "-o", project_});
         ASSERT_EQ(0, outcome.code) << outcome.errors;
         EXPECT_EQ(project_ + ": 3 streams, 20 keys\n", outcome.output);
-    }
-    static void ExpectFailure(Outcome const& outcome, std::string const& error)
-    {
-        EXPECT_EQ(2, outcome.code);
-        EXPECT_EQ("", outcome.output);
-        EXPECT_EQ("kfs: " + error + '\n', outcome.errors);
     }
 
     ScratchFolder folder_;
@@ -119,41 +107,6 @@ TEST_F(KfsProject, AnswersLikeTheFileThatItWasImportedFrom)
             output.replace(at, project_.size(), Sample);
         EXPECT_TRUE(expected.output == output) << found.output;
     }
-}
-
-TEST_F(KfsProject, ImportingTwiceGivesTheSameBytes)
-{
-    std::string const again = folder_.Path("again");
-    EXPECT_EQ(0, RunKfs({"import", Sample, "-o", again}).code);
-    EXPECT_TRUE(FileContent(project_) == FileContent(again));
-    EXPECT_EQ(2, std::distance(std::filesystem::directory_iterator(folder_.Path("")), {}));
-}
-
-TEST_F(KfsProject, WhatCannotBeDoneIsOneLine)
-{
-    EXPECT_TRUE(FileContent(project_) == RunKfs({"import", Sample, "-o", "-"}).output);
-    std::string const saved = folder_.Path("saved");
-    ExpectFailure(RunKfs({"import", Sample, "-o", saved}, "/dev/full"),
-                  "standard output: can't be written: No space left on device (" + saved + " was saved)");
-    EXPECT_TRUE(FileContent(project_) == FileContent(saved));
-    std::string const copy = folder_.Write("copy.gltf", FileContent(Sample));
-    ExpectFailure(RunKfs({"import", project_, "-o", folder_.Path("new")}), project_ + ": this is a project already");
-    ExpectFailure(RunKfs({"import", copy, "-o", copy}), "-o: \"" + copy + "\" is the file that is read");
-    ExpectFailure(RunKfs({"plot", copy, "-o", copy}), "-o: \"" + copy + "\" is the file that is read");
-    EXPECT_TRUE(FileContent(Sample) == FileContent(copy));
-    ExpectFailure(RunKfs({"info", folder_.Path("absent.kfs")}),
-                  folder_.Path("absent.kfs") + ": can't be opened: No such file or directory");
-    ExpectFailure(RunKfs({"info", project_, "--time-scale", "25"}),
-                  "--time-scale: a project has the times with which it was imported");
-    ExpectFailure(RunKfs({"dump", folder_.Path("absent")}),
-                  folder_.Path("absent") + ": can't be opened: No such file or directory");
-    EXPECT_FALSE(std::filesystem::exists(folder_.Path("new")));
-
-    std::string const bytes = FileContent(project_);
-    Outcome const cut = RunKfs({"info", folder_.Write("cut", bytes.substr(0, bytes.size() / 2))});
-    EXPECT_EQ(2, cut.code);
-    EXPECT_TRUE(cut.errors.starts_with("kfs: " + folder_.Path("cut") + ": ")) << cut.errors;
-    EXPECT_EQ(1, std::ranges::count(cut.errors, '\n')) << cut.errors;
 }
 
 TEST_F(KfsProject, DiffTellsWhatFirstDiffers)
