@@ -189,12 +189,6 @@ int PlaceFloatKeys(KFS_Stream const* stream, int first, int last)
 
 }  // namespace
 
-int KFSp_ComputeFloatTime(KFS_Stream const* stream, int index)
-{
-    if (int const code = KFSp_CheckPathDimension(stream); code != 0) return code;
-    return PlaceFloatKeys(stream, index, index);
-}
-
 int KFSp_ComputeFloatTimes(KFS_Stream const* stream, int first, int last)
 {
     int const count = KFSp_ItemCount(stream->GetKeyData());

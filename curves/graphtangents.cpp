@@ -162,6 +162,7 @@ int GetKeyTangents(KFS_Stream const* stream, int index, double* inX, double* inY
 {
     KFSp_Refusal const refusal{KFSp_Op_GetKeyTangents, KFSp_Row_GetValue};
     if (int const code = KFSp_CheckHandleAccess(stream, refusal, refusal)) return code;
+    stream = KFSp_Seen(stream);
     if (int const code = stream->UpdateStreamIfStaleTangents(index)) return code;
     KFS_KeyScalar* key = nullptr;
     if (int const code = KFSp_GetHandleKey(stream, stream->GetKeyData(), index, &key)) return code;

@@ -80,6 +80,7 @@ int GetClamped(KFS_Stream const* stream, int index, ProposedSide const& in, Prop
 {
     KFSp_Refusal const refusal{KFSp_Op_GetClampedVelInfl, KFSp_Row_GetValue};
     if (int const code = KFSp_CheckHandleAccess(stream, refusal, refusal)) return code;
+    stream = KFSp_Seen(stream);
     if (int const code = stream->UpdateStreamIfStaleTangents(index)) return code;
     KFS_KeyScalar* key = nullptr;
     if (int const code = KFSp_GetHandleKey(stream, stream->GetKeyData(), index, &key)) return code;
@@ -97,6 +98,7 @@ int GetZeroVelocityPoints(KFS_Stream const* stream, int index, int dimensionInde
 {
     KFSp_Refusal const refusal{KFSp_Op_GetZeroVelocityPoints, KFSp_Row_AlterKey};
     if (int const code = KFSp_CheckHandleAccess(stream, refusal, refusal)) return code;
+    stream = KFSp_Seen(stream);
     if (int const code = stream->UpdateStream()) return code;
     KFS_KeyScalar* key = nullptr;
     if (int const code = KFSp_GetHandleKey(stream, stream->GetKeyData(), index, &key)) return code;

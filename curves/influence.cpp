@@ -81,6 +81,7 @@ int GetKeyInfluence(KFS_Stream const* stream, int index, double* in, double* out
 {
     KFSp_Refusal const refusal{KFSp_Op_GetKeyInfluence, KFSp_Row_GetValue};
     if (int const code = KFSp_CheckHandleAccess(stream, refusal, refusal)) return code;
+    stream = KFSp_Seen(stream);
     (void)stream->UpdateStreamIfStaleTangents(index);
     KFS_StreamKeyData const* const data = stream->GetKeyData();
     KFS_KeyScalar* key = nullptr;

@@ -5,6 +5,7 @@
 #include "keystore/cache_private.h"
 #include "keystore/check_private.h"
 #include "keystore/keylist_private.h"
+#include "keystore/renderstates_private.h"
 #include "keystore/valuedata_private.h"
 
 // What the doors to a key's temporal handles share.
@@ -53,13 +54,12 @@ struct KFSp_Refusal {
     KFSp_Row action;
 };
 
-// Refuses a damaged stream, then one without a value or a key.
+// Refuses a damaged stream, then one without a value or a key. Throws what making a render's copy throws.
 inline int KFSp_CheckHandleAccess(KFS_Stream const* stream, KFSp_Refusal const& damaged, KFSp_Refusal const& noKeys)
 {
     if (int const code = KFSp_CheckStream(damaged.operation, stream, damaged.action)) return code;
-    return KFSp_HasNoValue(stream, stream->GetKeyData())
-               ? KFSp_ReportErr(noKeys.operation, KFS_Err_NoKeys, noKeys.action)
-               : 0;
+    KFS_StreamKeyData const* const data = stream->GetKeyData();
+    return KFSp_HasNoValue(data->stream, data) ? KFSp_ReportErr(noKeys.operation, KFS_Err_NoKeys, noKeys.action) : 0;
 }
 
 // The key at an index, or a constant's record whatever the index. -1 isn't the last key here: its neighbours would not

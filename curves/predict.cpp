@@ -5,6 +5,7 @@
 #include "keystore/check_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/pins_private.h"
+#include "keystore/renderstates_private.h"
 
 #include <iterator>
 
@@ -98,6 +99,7 @@ int Predict(KFS_Stream const* stream, unsigned short action, T_Time const* time,
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_PredictInvalid, stream, KFSp_Row_PredictInvalid); code != 0)
         return code;
+    stream = KFSp_Seen(stream);
 
     unsigned int const timeScale = stream->GetTimeScale();
     T_Time converted{time ? time->value : 0, timeScale};

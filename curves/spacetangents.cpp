@@ -10,6 +10,7 @@
 #include "keystore/items_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/pins_private.h"
+#include "keystore/renderstates_private.h"
 #include "keystore/valuedata_private.h"
 
 #include <algorithm>
@@ -155,7 +156,8 @@ int ChangeSpFlags(KFS_Stream* stream, int index, unsigned int mask, unsigned int
 int CheckKeys(KFS_Stream const* stream, short operation, short row, short noKeysOperation)
 {
     if (int const code = KFSp_CheckStream(operation, stream, row); code != 0) return code;
-    if (!KFSp_HasNoValue(stream, stream->GetKeyData())) return 0;
+    KFS_StreamKeyData const* const data = stream->GetKeyData();
+    if (!KFSp_HasNoValue(data->stream, data)) return 0;
     return KFSp_ReportErr(noKeysOperation, KFS_Err_NoKeys, KFSp_Row_InquireKey);
 }
 
@@ -172,6 +174,7 @@ int GetTangents(KFS_Stream const* stream, int index, double* inTangent, double* 
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_GetKeySpaceTangents, stream, KFSp_Row_GetValue); code != 0)
         return code;
+    stream = KFSp_Seen(stream);
     if (int const code = CheckSpatial(stream, KFSp_Op_GetKeySpaceTangents); code != 0) return code;
     KFS_StreamKeyData const* const data = stream->GetKeyData();
     if (KFSp_HasNoValue(stream, data))
@@ -199,6 +202,7 @@ int GetSpFlags(KFS_Stream const* stream, int index, unsigned int* flags)
         code != 0)
         return code;
     KFS_StreamKeyData const* const data = stream->GetKeyData();
+    stream = data->stream;
     if (stream->HasNoKeys()) {
         *flags = data->cache->flags;
         return 0;

@@ -345,6 +345,7 @@ int CalculateT(KFS_Stream const* stream, int time, int keyIndex, KFS_KeyScalar**
                double* t)
 {
     KFS_StreamKeyData const* const data = stream->GetKeyData();
+    stream = data->stream;
     if (KFSp_IsStale(data)) {
         if (int const code = stream->UpdateStream(); code != 0) return code;
     }

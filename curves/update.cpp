@@ -13,6 +13,7 @@
 #include "keystore/check_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/pins_private.h"
+#include "keystore/renderstates_private.h"
 #include "keystore/valuedata_private.h"
 
 #include <algorithm>
@@ -217,6 +218,7 @@ int KFS_ForceUpdateStream(KFS_Stream const* stream)
 {
     return KFSp_Boundary([&] {
         if (int const code = KFSp_CheckStream(KFSp_Op_ForceUpdate, stream, KFSp_Row_Merge); code != 0) return code;
+        stream = KFSp_Seen(stream);
         auto const count = static_cast<short>(stream->GetKeyCount());
         if (int const code = stream->SetInvalid(-1, count); code != 0) return code;
         if (stream->IsSpatial()) {

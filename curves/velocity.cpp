@@ -209,6 +209,7 @@ int GetVelocity(KFS_Stream const* stream, int index, bool zeroAtEnds, double* in
 {
     KFSp_Refusal const refusal{KFSp_Op_GetKeyVelocity, KFSp_Row_GetValue};
     if (int const code = KFSp_CheckHandleAccess(stream, refusal, refusal)) return code;
+    stream = KFSp_Seen(stream);
     // Speeds of straight runs come from arcs. What can't be repaired is answered as it stands.
     (void)(stream->IsSpatial() ? stream->UpdateStream() : stream->UpdateStreamIfStaleTangents(index));
     KFS_StreamKeyData const* const data = stream->GetKeyData();

@@ -68,9 +68,10 @@ int ProposeInList(KFS_StreamKeyData const* data, int time, Proposal* proposal)
 
 int Propose(KFS_Stream const* stream, T_Time const* time, Proposal* proposal)
 {
+    KFS_StreamKeyData const* const data = stream->GetKeyData();
+    stream = data->stream;
     int at = 0;
     if (int const code = KFSp_TimeInStream(stream, time, &at)) return code;
-    KFS_StreamKeyData const* const data = stream->GetKeyData();
     if (stream->HasNoKeys()) {
         if (!KFSp_CacheIsEmpty(data->cache)) {
             proposal->in = data->cache->inInterp;

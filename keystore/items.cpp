@@ -3,6 +3,7 @@
 #include "keystore/check_private.h"
 #include "keystore/items_private.h"
 
+#include "frame/boundary_private.h"
 #include "frame/report_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/pins_private.h"
@@ -116,14 +117,16 @@ int KFSp_DisposeKeyItemFunc(void*, SEQ_Head** list, void* item)
 
 int KFS_DisposeRemapTables(KFS_Stream* stream)
 {
-    if (int const code = KFSp_CheckStream(KFSp_Op_DisposeRemapTables, stream, KFSp_Row_Dispose)) return code;
-    KFS_StreamKeyData* const data = stream->GetKeyDataForModify();
-    if (!stream->IsSpatial() || stream->HasNoKeys() || KFSp_ItemCount(data) == 0) return 0;
-    KFSp_FirstError error;
-    {
-        KFSp_ScPin const pin(data->keys, error);
-        if (error.None()) error.Keep(KFSp_DisposeRemapTables(data->keys));
-    }
-    if (error.None()) KFSp_MarkAllKeys(data->arcInvalidKeyIndex, KFSp_ItemCount(data));
-    return error.Code();
+    return KFSp_Boundary([&] {
+        if (int const code = KFSp_CheckStream(KFSp_Op_DisposeRemapTables, stream, KFSp_Row_Dispose)) return code;
+        KFS_StreamKeyData* const data = stream->GetKeyDataForModify();
+        if (!stream->IsSpatial() || stream->HasNoKeys() || KFSp_ItemCount(data) == 0) return 0;
+        KFSp_FirstError error;
+        {
+            KFSp_ScPin const pin(data->keys, error);
+            if (error.None()) error.Keep(KFSp_DisposeRemapTables(data->keys));
+        }
+        if (error.None()) KFSp_MarkAllKeys(data->arcInvalidKeyIndex, KFSp_ItemCount(data));
+        return error.Code();
+    });
 }

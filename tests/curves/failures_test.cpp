@@ -145,7 +145,7 @@ std::vector<Row> const& Rows()
         {"ForceUpdateStream", CALL(KFS_ForceUpdateStream(s)), 0, 59, "merge", 0, ""},
         {"PredictInvalid", CALL(KFS_PredictInvalid(s, 1, &Time, &time_, &time_)), 0, 77, "predict spatial change of", 0,
          ""},
-        {"DisposeRemapTables", CALL(KFS_DisposeRemapTables(s)), ChangesAll, 89, "dispose", 0, ""},
+        {"DisposeRemapTables", CALL(KFS_DisposeRemapTables(s)), 0, 89, "dispose", 0, ""},
         {"RescaleStream", CALL(KFS_RescaleStream(s, 300)), ChangesAll, 7, "time stream rescale", 0, ""},
         {"MergeStream", CALL(KFS_MergeStream(s, nullptr, &other)), 0, 8, "merge", 0, ""},
         {"MergeStream other", CALL(KFS_MergeStream(other, nullptr, &s)), 0, 8, "merge", 0, ""},

@@ -1,6 +1,5 @@
 #include "curves/floatkeys.h"
 
-#include "curves/floatkeys_private.h"
 #include "curves/tangents.h"
 #include "frame/errors.h"
 #include "keystore/lookup.h"
@@ -133,7 +132,7 @@ TEST_F(FloatKeys, StayAtTheEndsOfTheListAndRefuseOtherDimensions)
     PathStream stream({{0, {0, 0, 0, 0}}, {50, {1, 1, 1, 1}}, {100, {2, 2, 2, 2}}}, KFS_Interp_Linear,
                       PathOptions(4, false));
     stream.StreamFlag(KFS_StreamFlag_SParametrize).Flag(1, KFS_KeyFlag_Float);
-    EXPECT_EQ(KFS_Err_Only2D3D, KFSp_ComputeFloatTime(stream, 1));
+    EXPECT_EQ(KFS_Err_Only2D3D, KFS_ForceUpdateStream(stream));
     EXPECT_REPORT(reports, 45, "only 2d or 3d spatial streams are allowed for this operation.");
 }
 

@@ -1,6 +1,8 @@
 #include "curves/floatkeys.h"
 #include "curves/spacetangents.h"
+#include "curves/spatial.h"
 #include "curves/tangents.h"
+#include "curves/update.h"
 #include "keystore/attributes.h"
 #include "keystore/cachestate.h"
 #include "keystore/copykeys.h"
@@ -13,6 +15,7 @@
 #include <algorithm>
 #include <array>
 #include <atomic>
+#include <cmath>
 #include <random>
 #include <thread>
 
@@ -32,13 +35,13 @@ protected:
             plain.Key(i * 60, {value(random), value(random)}, i % 3 ? KFS_Interp_Spline : KFS_Interp_Linear);
             spatial.Key(i * 60, {value(random), value(random), value(random)}, KFS_Interp_Spline);
             words.Key(i * 60, {value(random)}, KFS_Interp_Spline);
-            if (i % 4 == 2) EXPECT_EQ(0, KFS_SetKeyModifiable(plain, 1, i));
+            EXPECT_EQ(0, i % 4 == 2 ? KFS_SetKeyModifiable(plain, 1, i) : 0);
         }
         constant.Key(0, {1.0, 2.0, 3.0});
         for (KFS_Stream* const stream : All()) EXPECT_EQ(0, KFS_CopyKeys(stream, nullptr, Donor(stream)));
     }
 
-    // What a render asks: values in both forms, and where keys stand.
+    // What a render asks: values in both forms, where keys stand, and what they are.
     std::vector<double> Sample() const
     {
         std::vector<double> samples;
@@ -58,7 +61,45 @@ protected:
                 samples.push_back(index);
             }
         }
+        for (KFS_Stream const* const stream : All())
+            for (int index = 0; index < stream->GetKeyCount(); ++index) SampleKey(stream, index, samples);
         return samples;
+    }
+
+    // All that can be asked about a key and the segment that it begins.
+    static void SampleKey(KFS_Stream const* stream, int index, std::vector<double>& samples)
+    {
+        double n[30] = {};
+        EXPECT_EQ(0, KFS_GetKeyTangentsF(stream, index, n, n + 3, n + 6, n + 9));
+        EXPECT_EQ(0, KFS_GetKeyInfluence(stream, index, n + 12, n + 15));
+        std::fill_n(n + 18, 6, 50.0);
+        unsigned char clamped = 0;
+        EXPECT_EQ(0, KFS_GetClampedVelInflF(stream, index, 0, n + 18, nullptr, n + 21, nullptr, &clamped));
+        // Keys may share a place or stand too near to each other for a speed.
+        int codes = 10 * KFS_GetKeyVelocityF(stream, index, 0, n + 24, n + 27) + clamped;
+        samples.insert(samples.end(), std::begin(n), std::end(n));
+        unsigned int flags = 0;
+        EXPECT_EQ(0, KFS_GetKeySpFlags(stream, index, &flags));
+        T_Time time{index * 60, 600}, from{}, to{};
+        EXPECT_EQ(0, KFS_PredictInvalid(stream, 1, &time, &from, &to));
+        samples.insert(samples.end(), {1.0 * flags, 1.0 * from.value, 1.0 * to.value});
+        if (index + 1 < stream->GetKeyCount()) {
+            T_Time times[2] = {};
+            int count = 0;
+            codes += KFS_GetZeroVelocityPoints(stream, index, 0, &count, times, nullptr);
+            samples.insert(samples.end(), {1.0 * count, 1.0 * times[0].value, 1.0 * times[1].value});
+        }
+        samples.push_back(codes);
+        // All in `All` but this one have no path.
+        if (stream->GetDimension() != 3) return;
+        double tangents[6] = {};
+        EXPECT_EQ(0, KFS_GetKeySpaceTangentsF(stream, index, -1, tangents, tangents + 3));
+        samples.insert(samples.end(), std::begin(tangents), std::end(tangents));
+        KFS_KeyScalar *first = nullptr, *second = nullptr;
+        double t = 0.0;
+        if (index + 1 == stream->GetKeyCount()) return;
+        EXPECT_EQ(0, KFS_CalculateTFromStream(stream, 0, index * 60 + 20, index, &first, &second, &t));
+        samples.insert(samples.end(), {1.0 * first->time, 1.0 * second->time, std::isfinite(t) ? t : -1.0});
     }
 
     // One of each kind of edit on each stream, in a drawn order.
@@ -139,7 +180,7 @@ std::vector<RenderThreads::KindOfEdit> const RenderThreads::Kinds = {
      }},
     {"rescale",
      [](Draw const& d) {
-         return FirstOf({KFS_RescaleStream(d.stream, 24), KFS_RescaleStream(d.stream, 600)});
+         return KFS_RescaleStream(d.stream, d.stream->GetTimeScale() == 600 ? 24 : 600);  // and stays so for a while
      }},
     {"description",
      [](Draw const& d) {
@@ -151,9 +192,7 @@ std::vector<RenderThreads::KindOfEdit> const RenderThreads::Kinds = {
      }},
     {"arc-length parametrisation",
      [](Draw const& d) {
-         return d.stream->IsSpatial()
-                    ? FirstOf({KFS_SetStreamSParametrize(d.stream, 0), KFS_SetStreamSParametrize(d.stream, 1)})
-                    : 0;
+         return d.stream->IsSpatial() ? KFS_SetStreamSParametrize(d.stream, d.stream->IsSParametrized() ? 0 : 1) : 0;
      }},
     {"multiplier",
      [](Draw const& d) { return d.stream->IsSpatial() ? KFS_SetStreamMultiplier(d.stream, Numbers, nullptr) : 0; }},
