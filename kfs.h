@@ -2,6 +2,7 @@
 
 // What a host of the animation store includes. Reports, chunk files and the other services have headers of their own in frame/services/.
 
+#include "curves/derivatives.h"
 #include "curves/floatkeys.h"
 #include "curves/spacetangents.h"
 #include "curves/spatial.h"
@@ -20,6 +21,7 @@
 #include "keystore/keyflags.h"
 #include "keystore/lookup.h"
 #include "keystore/paramstreams.h"
+#include "keystore/separation.h"
 #include "keystore/stream.h"
 #include "overrides/parambag.h"
 #include "overrides/streamexpression.h"

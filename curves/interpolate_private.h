@@ -4,5 +4,5 @@
 
 // The rate of change at a time strictly between two keys, in value units a second, in place of the value that
 // KFSp_Interpolate writes. A segment that is linear on both sides writes nothing as well. For a
-// stream's derivatives (operations 57 and 58), which are still to come.
+// stream's derivatives (curves/derivatives.h).
 int KFSp_InterpDeriv(KFS_Stream const* stream, long refcon, int time, int keyIndex);

@@ -25,7 +25,7 @@ struct KFSp_PathPoint {
 int KFSp_FindOnPath(KFS_Stream const* stream, int time, KFSp_PathPoint* point);
 
 // The speed along the path, distance a second, as number 0. Writes nothing on a segment that is linear on both sides or
-// held. This and the next are for a stream's derivatives (operations 57 and 58), which are still to come.
+// held. This and the next are for a stream's derivatives (curves/derivatives.h).
 int KFSp_InterpDerivSpatial(KFS_Stream const* stream, long refCon, int time, int keyIndex);
 
 // The path's direction: a third of the derivative by the path's parameter, so that it is the size of a key's tangent.

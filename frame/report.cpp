@@ -48,6 +48,14 @@ void FormatRow(short row, Value value)
 #pragma GCC diagnostic pop
 }
 
+int RefuseCustom(int operation, short row, short what)
+{
+    Qp_SetThreadLastError(0);
+    FormatRow(row, KFSp_MessageText(what));
+    Qp_ReportError(KFSp_ReportId(operation), KFSp_Severity);
+    return KFS_Err_CustomValue;
+}
+
 }  // namespace
 
 int KFSp_ReportErr(int operation, int error, short argument)
@@ -83,8 +91,10 @@ int KFSp_ReportRow(int operation, int error, short row)
 
 int KFSp_RefuseCustomValue(int operation, short what)
 {
-    Qp_SetThreadLastError(0);
-    FormatRow(KFSp_Row_CantCustomValue, KFSp_MessageText(what));
-    Qp_ReportError(KFSp_ReportId(operation), KFSp_Severity);
-    return KFS_Err_CustomValue;
+    return RefuseCustom(operation, KFSp_Row_CantCustomValue, what);
+}
+
+int KFSp_RefuseCustomInterpolation(int operation, short what)
+{
+    return RefuseCustom(operation, KFSp_Row_CustomInterpolation, what);
 }

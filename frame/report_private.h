@@ -71,6 +71,7 @@ enum KFSp_Op : short {
     KFSp_Op_SetKeySpaceTangentsF = 90,
     KFSp_Op_SetKeyF = 92,
     KFSp_Op_InsertKeyF = 94,
+    KFSp_Op_GetTangent = 95,
     KFSp_Op_GetSpaceTangent = 97,
     KFSp_Op_DirectManipArc = 98,
     KFSp_Op_ConstructCurve = 100,
@@ -106,5 +107,8 @@ int KFSp_ReportNumber(int operation, int error, short row, int number);
 // Reports a row that stands for itself, without formatting, and returns `error`.
 int KFSp_ReportRow(int operation, int error, short row);
 
-// Reports "can't %s custom value" and returns KFS_Err_CustomValue. `what` is one of the rows 65, 66 and 70.
+// Reports "can't %s custom value" and returns KFS_Err_CustomValue. `what` is one of the rows 65, 66, 70 and 75.
 int KFSp_RefuseCustomValue(int operation, short what);
+
+// The same with "stream uses custom interpolation function: %s."; `what` is row 63.
+int KFSp_RefuseCustomInterpolation(int operation, short what);

@@ -83,10 +83,10 @@ int ReadFollowers(Reading const& reading, double* value)
 {
     T_Time const at{reading.time, reading.seen->GetTimeScale()};
     for (int d = 0; d < reading.seen->GetDimension(); ++d) {
-        if (KFS_Stream const* const follower = reading.stream->GetSeparationFollower(d)) {
-            int const code = KFS_GetValueFPlus(follower, &at, reading.flags, value + d, nullptr, reading.bag);
-            if (code != 0) return code;
-        }
+        KFS_Stream const* const follower = reading.stream->GetSeparationFollower(d);
+        if (!follower || follower->GetDimension() != 1) continue;  // a leaf of another kind stands there
+        int const code = KFS_GetValueFPlus(follower, &at, reading.flags, value + d, nullptr, reading.bag);
+        if (code != 0) return code;
     }
     return 0;
 }

@@ -3,6 +3,7 @@
 
 #include "frame/boundary_private.h"
 #include "keystore/attributes.h"
+#include "keystore/separation.h"
 #include "keystore/stream.h"
 
 namespace {
@@ -35,4 +36,24 @@ void KFSp_SetUpClone(KFS_Stream* leaf, unsigned int timeScale, bool constant)
 void KFSp_Rescale(KFS_Stream* leaf, unsigned int timeScale)
 {
     KFSp_ThrowIf(KFS_RescaleStream(leaf, timeScale));
+}
+
+KFS_StreamBase const* KFSp_AsNode(KFS_Stream const* leaf)
+{
+    return leaf;
+}
+
+bool KFSp_IsSeparationLeader(KFS_Stream const* leaf)
+{
+    return leaf->IsSeparationLeader();
+}
+
+int KFSp_CountFollowers(KFS_Stream const* leader)
+{
+    return leader->GetDimension();
+}
+
+KFS_StreamBase* KFSp_MakeFollower(KFS_Stream const* leader, int dimension, KFS_StreamFactory* factory)
+{
+    return new KFS_SeparationFollowerStream(*leader, dimension, factory);
 }

@@ -1,34 +1,14 @@
 // Limits and precision, as the parameter record of the stream says.
 
+#include "keystore/paramnumbers_private.h"
 #include "keystore/stream.h"
-
-#include <limits>
 
 namespace {
 
-constexpr double FixedToDouble = 1.52587890625e-5;  // 1 / 65536
 constexpr double LeastFixed = -32768.0;
 constexpr double GreatestFixed = 32767.99998474121;  // the greatest 16.16 number
 constexpr double NoMinimum = -1e9;
 constexpr double NoMaximum = 1e9;
-
-// Truncated to an int; what doesn't fit, the nearest end of the range, and NaN is 0.
-int Truncate(double number)
-{
-    if (number >= 2147483648.0) return std::numeric_limits<int>::max();
-    if (number <= -2147483649.0) return std::numeric_limits<int>::min();
-    return number == number ? static_cast<int>(number) : 0;
-}
-
-int ToFixed(double number)
-{
-    return Truncate(number * 65536.0 + (number < 0.0 ? -0.5 : 0.5));
-}
-
-double FromFixed(int fixed)
-{
-    return fixed * FixedToDouble;
-}
 
 }  // namespace
 
@@ -47,8 +27,8 @@ double KFS_Stream::GetMinValue() const
     FX_ParamDef const& def = GetParamDef();
     switch (def.paramType) {
     case FX_Param_INT_SLIDER: return def.value.intSlider.validMin;
-    case FX_Param_FIXED_SLIDER: return FromFixed(def.value.fixedSlider.validMin);
-    case FX_Param_FIXED_ANGLE: return HasMinValue() ? FromFixed(def.value.fixedAngle.validMin) : LeastFixed;
+    case FX_Param_FIXED_SLIDER: return KFSp_FromFixed(def.value.fixedSlider.validMin);
+    case FX_Param_FIXED_ANGLE: return HasMinValue() ? KFSp_FromFixed(def.value.fixedAngle.validMin) : LeastFixed;
     case FX_Param_BOOL: return 0.0;
     case FX_Param_CHOICE: return 1.0;
     case FX_Param_FLOAT_SLIDER: return static_cast<double>(def.value.floatSlider.validMin);
@@ -61,8 +41,8 @@ double KFS_Stream::GetMaxValue() const
     FX_ParamDef const& def = GetParamDef();
     switch (def.paramType) {
     case FX_Param_INT_SLIDER: return def.value.intSlider.validMax;
-    case FX_Param_FIXED_SLIDER: return FromFixed(def.value.fixedSlider.validMax);
-    case FX_Param_FIXED_ANGLE: return HasMaxValue() ? FromFixed(def.value.fixedAngle.validMax) : GreatestFixed;
+    case FX_Param_FIXED_SLIDER: return KFSp_FromFixed(def.value.fixedSlider.validMax);
+    case FX_Param_FIXED_ANGLE: return HasMaxValue() ? KFSp_FromFixed(def.value.fixedAngle.validMax) : GreatestFixed;
     case FX_Param_BOOL: return 1.0;
     case FX_Param_CHOICE: return def.value.choice.choiceCount;
     case FX_Param_FLOAT_SLIDER: return static_cast<double>(def.value.floatSlider.validMax);
@@ -75,7 +55,7 @@ double KFS_Stream::GetUIMinValue() const
     FX_ParamDef const& def = GetParamDef();
     switch (def.paramType) {
     case FX_Param_INT_SLIDER: return def.value.intSlider.sliderMin;
-    case FX_Param_FIXED_SLIDER: return FromFixed(def.value.fixedSlider.sliderMin);
+    case FX_Param_FIXED_SLIDER: return KFSp_FromFixed(def.value.fixedSlider.sliderMin);
     case FX_Param_FLOAT_SLIDER: return static_cast<double>(def.value.floatSlider.sliderMin);
     case FX_Param_FIXED_ANGLE: return GetMinValue();  // the only kind whose class has a say
     default: return KFS_Stream::GetMinValue();
@@ -87,7 +67,7 @@ double KFS_Stream::GetUIMaxValue() const
     FX_ParamDef const& def = GetParamDef();
     switch (def.paramType) {
     case FX_Param_INT_SLIDER: return def.value.intSlider.sliderMax;
-    case FX_Param_FIXED_SLIDER: return FromFixed(def.value.fixedSlider.sliderMax);
+    case FX_Param_FIXED_SLIDER: return KFSp_FromFixed(def.value.fixedSlider.sliderMax);
     case FX_Param_FLOAT_SLIDER: return static_cast<double>(def.value.floatSlider.sliderMax);
     case FX_Param_FIXED_ANGLE: return GetMaxValue();
     default: return KFS_Stream::GetMaxValue();
@@ -98,8 +78,8 @@ void KFS_Stream::SetUIMinValue(double value)
 {
     FX_ParamDef& def = GetParamDef();
     switch (def.paramType) {
-    case FX_Param_INT_SLIDER: def.value.intSlider.sliderMin = Truncate(value); break;
-    case FX_Param_FIXED_SLIDER: def.value.fixedSlider.sliderMin = ToFixed(value); break;
+    case FX_Param_INT_SLIDER: def.value.intSlider.sliderMin = KFSp_Truncate(value); break;
+    case FX_Param_FIXED_SLIDER: def.value.fixedSlider.sliderMin = KFSp_ToFixed(value); break;
     case FX_Param_FLOAT_SLIDER: def.value.floatSlider.sliderMin = static_cast<float>(value); break;
     default: break;
     }
@@ -109,8 +89,8 @@ void KFS_Stream::SetUIMaxValue(double value)
 {
     FX_ParamDef& def = GetParamDef();
     switch (def.paramType) {
-    case FX_Param_INT_SLIDER: def.value.intSlider.sliderMax = Truncate(value); break;
-    case FX_Param_FIXED_SLIDER: def.value.fixedSlider.sliderMax = ToFixed(value); break;
+    case FX_Param_INT_SLIDER: def.value.intSlider.sliderMax = KFSp_Truncate(value); break;
+    case FX_Param_FIXED_SLIDER: def.value.fixedSlider.sliderMax = KFSp_ToFixed(value); break;
     case FX_Param_FLOAT_SLIDER: def.value.floatSlider.sliderMax = static_cast<float>(value); break;
     default: break;
     }

@@ -180,54 +180,6 @@ int KFS_Stream::EvaluateExpression(T_Time const* time, double* values, void** cu
     return root ? root->EvaluateExpression(this, time, values, customValue, bag) : 1;
 }
 
-// Separated dimensions. A leader's followers stand behind it in a named group, and no group is one yet, so there are
-// none to find.
-
-bool KFS_Stream::IsSeparationLeader() const
-{
-    return false;
-}
-
-bool KFS_Stream::IsSeparationFollower() const
-{
-    return false;
-}
-
-int KFS_Stream::GetSeparationDimension() const
-{
-    return 0;
-}
-
-KFS_Stream* KFS_Stream::GetSeparationLeader()
-{
-    return const_cast<KFS_Stream*>(std::as_const(*this).GetSeparationLeader());
-}
-
-KFS_Stream const* KFS_Stream::GetSeparationLeader() const
-{
-    return nullptr;
-}
-
-void KFS_Stream::GetSeparationFollowers(std::vector<KFS_Stream*>& followers)
-{
-    followers.clear();
-}
-
-void KFS_Stream::GetSeparationFollowers(std::vector<KFS_Stream const*>& followers) const
-{
-    followers.clear();
-}
-
-KFS_Stream* KFS_Stream::GetSeparationFollower(int dimension)
-{
-    return const_cast<KFS_Stream*>(std::as_const(*this).GetSeparationFollower(dimension));
-}
-
-KFS_Stream const* KFS_Stream::GetSeparationFollower(int) const
-{
-    return nullptr;
-}
-
 // Render identity isn't computed yet: nothing is mixed in, and the Guid is the unset one.
 
 void KFS_Stream::MixInValueAtTime(hearth::utility::MixHashGuidT<hearth::utility::Murmur3MixerState>& hash,

@@ -184,6 +184,16 @@ public:
     virtual int EvaluateExpression(T_Time const* time, double* values, void** customValue,
                                    KFS_ParamBag const* bag) const;
 
+    // Describes the stream in its parameter record: what FillInParamDef of a typed stream calls. `paramType` is one of
+    // FX_ParamKind; the numbers go where records of that kind have a place for them, 16.16 numbers rounded, others cut off
+    // at the point; the default is component by component that of GetDefaultVector4. Throws an int. Threads: any number
+    // at once, with the same content.
+    void FillInParamDefDetails(int paramType, double validMin, double validMax, double sliderMin, double sliderMax,
+                               short precision, short displayFlags, unsigned int floatFlags, int reservedWord,
+                               int paramFlags) const;
+    // Whether that is going on, on this thread: the default can't come from the record then.
+    bool IsFillingInParamDef() const;
+
     unsigned short GetStamp() const { return stamp_; }
 
     unsigned short GetKFSFlags() const { return kfsFlags_; }

@@ -12,7 +12,9 @@
 
 #include <boost/bind/bind.hpp>
 
+#include <algorithm>
 #include <utility>
+#include <vector>
 
 using hearth::threads::ScRecursiveLock;
 
@@ -34,6 +36,7 @@ KFS_StreamBase* RefuseUnknownKind(KFS_MatchName const& name, bool report)
 KFS_StreamFactory::~KFS_StreamFactory()
 {
     ScRecursiveLock const guard(lock_);
+    while (!separationMap_.empty()) UnregisterFollowers(separationMap_.begin()->first);
     canonicalInstances_.clear();
     factoryFuncs_.clear();
     obsoleteParents_.clear();
@@ -48,8 +51,11 @@ bool KFS_StreamFactory::RegisterFactoryFunc(KFS_MatchName const& name, KFS_Facto
         instance.reset(CreateStream(name, true, 600, true, true));
         if (!instance) throw int{KFS_Err_UnknownStream};
         canonicalInstances_.emplace(name, instance.get());
+        KFS_Stream const* const leaf = instance->GetAsLeaf();
+        if (leaf && KFSp_IsSeparationLeader(leaf)) RegisterSeparatedDimensions(leaf);
         if (!deferLayout) instance->SetupCanonicalLayout();
     } catch (...) {
+        UnregisterFollowers(name);
         canonicalInstances_.erase(name);
         factoryFuncs_.erase(name);
         throw;
@@ -74,6 +80,8 @@ bool KFS_StreamFactory::UnregisterFactoryFunc_NullOK(KFS_MatchName const& name, 
     }
     instance.reset(found->second);
     canonicalInstances_.erase(found);
+    for (auto& [leader, followers] : separationMap_) std::erase(followers, instance.get());
+    UnregisterFollowers(name);
     if (factoryFuncs_.erase(name) == 0) KFSp_FailVerification("couldn't find factory method for stream to unregister");
     return true;
 }
@@ -119,6 +127,47 @@ KFS_StreamBase* KFS_StreamFactory::RegisterCanonicalInstance(KFS_StreamBase* str
         throw;
     }
     return instance.release();
+}
+
+void KFS_StreamFactory::RegisterSeparatedDimensions(KFS_Stream const* leader)
+{
+    ScRecursiveLock const guard(lock_);
+    int const count = KFSp_CountFollowers(leader);
+    std::vector<KFS_StreamBase*>& followers = separationMap_[KFSp_AsNode(leader)->GetMatchName()];
+    followers.reserve(static_cast<std::size_t>(std::max(count, 0)));
+    for (int d = 0; d < count; ++d) {
+        KFS_StreamBase* const made = KFSp_MakeFollower(leader, d, this);
+        KFS_StreamBase* const registered = RegisterCanonicalInstance(made);
+        if (registered != made) KFSp_FailVerification("a separation follower's name is taken");
+        followers.push_back(registered);
+    }
+}
+
+void KFS_StreamFactory::SetupCanonicalLayoutForSeperatedDimensions(
+    std::vector<KFS_StreamBase const*, Q_Allocator<KFS_StreamBase const*>>* layout)
+{
+    ScRecursiveLock const guard(lock_);
+    for (std::size_t i = layout->size(); i-- > 0;) {  // from the end, so that what is still to come keeps its place
+        KFS_Stream const* const leaf = (*layout)[i]->GetAsLeaf();
+        if (!leaf || !KFSp_IsSeparationLeader(leaf)) continue;
+        auto const followers = separationMap_.find((*layout)[i]->GetMatchName());
+        if (followers == separationMap_.end()) continue;
+        layout->insert(layout->begin() + static_cast<std::ptrdiff_t>(i) + 1, followers->second.begin(),
+                       followers->second.end());
+    }
+}
+
+void KFS_StreamFactory::UnregisterSeperationMapEntry(
+    std::pair<KFS_MatchName const, std::vector<KFS_StreamBase*>> const& entry)
+{
+    for (KFS_StreamBase* const follower : entry.second) UnregisterFactoryFunc_NullOK(follower->GetMatchName(), false);
+}
+
+void KFS_StreamFactory::UnregisterFollowers(KFS_MatchName const& leader)
+{
+    // Taken out first: each follower that goes is looked for in what remains.
+    auto entry = separationMap_.extract(leader);
+    if (!entry.empty()) UnregisterSeperationMapEntry({entry.key(), std::move(entry.mapped())});
 }
 
 bool KFS_StreamFactory::UnregisterCanonicalInstance(KFS_StreamBase const* stream)

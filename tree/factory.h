@@ -40,7 +40,7 @@ public:
     // False if the name is taken. With `deferLayout` the canonical instance gets its layout by SetupCanonicalStream,
     // which the host calls once all kinds that the layout names are registered. If it throws, the name is free as before.
     bool RegisterFactoryFunc(KFS_MatchName const& name, KFS_FactoryFunc const& func, bool deferLayout);
-    // True if there was such a kind; its canonical instance is deleted. The absence of one is logged, unless `nullOK`.
+    // True if there was such a kind; its canonical instance is deleted, and the followers of a separation leader with it. The absence of one is logged, unless `nullOK`.
     bool UnregisterFactoryFunc(KFS_MatchName const& name);
     bool UnregisterFactoryFunc_NullOK(KFS_MatchName const& name, bool nullOK);
 
@@ -78,17 +78,27 @@ public:
     // False, with `result` untouched, if the stream's kind isn't obsolete.
     bool GatherObsoleteReplacementStreams(KFS_StreamBase* stream, std::vector<KFS_Stream*>& result);
 
+    // Separated dimensions (keystore/separation.h). The first is called for a leader's kind that is being registered: makes
+    // and registers the canonical followers. The second puts the followers of each leader in a layout directly behind it; the
+    // leaders must be registered. The third unregisters a leader's followers.
+    void RegisterSeparatedDimensions(KFS_Stream const* leader);
+    void SetupCanonicalLayoutForSeperatedDimensions(
+        std::vector<KFS_StreamBase const*, Q_Allocator<KFS_StreamBase const*>>* layout);
+    void UnregisterSeperationMapEntry(std::pair<KFS_MatchName const, std::vector<KFS_StreamBase*>> const& entry);
+
     void DebugRegisterStream(KFS_MatchName const&, KFS_MatchName const&) {}
     void DebugUnregisterStream(KFS_MatchName const&, hearth::threads::ScRecursiveLock const&) {}
 
 private:
     std::map<KFS_StreamBase const*, KFS_MatchName> GetNamesOfInstances() const;
+    void UnregisterFollowers(KFS_MatchName const& leader);
     void UnregisterCanonicalInstanceRecursive(KFS_StreamGroup const* group, std::set<KFS_MatchName> const& keep);
 
     std::set<KFS_MatchName> dataFileContainers_;
     std::set<KFS_MatchName> dataFileTextStreams_;
     std::map<KFS_MatchName, KFS_FactoryFunc> factoryFuncs_;
-    std::map<KFS_MatchName, KFS_StreamBase*> canonicalInstances_;  // owned
+    std::map<KFS_MatchName, KFS_StreamBase*> canonicalInstances_;          // owned
+    std::map<KFS_MatchName, std::vector<KFS_StreamBase*>> separationMap_;  // a leader's canonical followers
     std::map<KFS_MatchName, KFS_MatchName>
         obsoleteParents_;  // an obsolete kind's name to that of the group that replaces it
     mutable hearth::threads::RecursiveMutex lock_{"KFS_StreamFactory"};

@@ -108,6 +108,7 @@ void KFS_StreamGroup::SetupCanonicalLayout()
     FillCanonicalLayout(layout.get());
     if (std::find(layout->begin(), layout->end(), nullptr) != layout->end())
         KFSp_FailVerification("UI layout has an unregistered child");
+    if (GetFactory()) GetFactory()->SetupCanonicalLayoutForSeperatedDimensions(layout.get());
     SetLayout(layout);
 }
 
@@ -194,6 +195,26 @@ KFS_Stream const* KFS_StreamGroup::FindEditableLeafStreamNullOK(KFS_StreamIDPath
 {
     KFS_StreamBase const* const found = FindStream(path);
     return found && !found->IsCanonical() ? found->GetAsLeaf() : nullptr;
+}
+
+bool KFS_StreamGroup::AreLeafDimensionsSeparated(KFS_StreamIDPath const& path) const
+{
+    KFS_StreamBase const* const found = FindStream(path);
+    return found && found->IsLeaf() && found->AreDimensionsSeparated();
+}
+
+KFS_StreamIDPath KFS_StreamGroup::GetLeafSeparationPath(KFS_StreamIDPath const& path, int dimension) const
+{
+    KFS_StreamBase const* const found = FindStream(path);
+    KFS_StreamGroup const* const parent = found && found->IsLeaf() ? found->GetParent() : nullptr;
+    KFS_StreamIDPath result;
+    if (!parent) return result;
+    result = path;
+    KFS_StreamID const tail = result.RemoveTail();
+    unsigned int const index =
+        static_cast<unsigned int>(dimension) + parent->GetIndexInUILayout(tail.GetMatchName()) + 1;
+    result.AddTail(KFS_StreamID(index, parent->GetStream(index)->GetMatchName()));
+    return result;
 }
 
 void KFS_StreamGroup::NotifyParentsStreamStored(KFS_StreamBase* stream)

@@ -98,6 +98,12 @@ public:
     KFS_Stream* FindEditableLeafStreamNullOK(KFS_StreamIDPath const& path);
     KFS_Stream const* FindEditableLeafStreamNullOK(KFS_StreamIDPath const& path) const;
 
+    // Whether the leaf at the end of a path has separated dimensions; false if there is no leaf.
+    bool AreLeafDimensionsSeparated(KFS_StreamIDPath const& path) const;
+    // The path of a separation leader's follower: the leader's with the layout entry that stands `dimension` + 1 behind it.
+    // Empty where `path` leads to no leaf with a parent.
+    KFS_StreamIDPath GetLeafSeparationPath(KFS_StreamIDPath const& path, int dimension) const;
+
     // Calls NotifyStreamStored on this group and on each of its ancestors, once: a call from inside such a notification
     // does nothing.
     void NotifyParentsStreamStored(KFS_StreamBase* stream);

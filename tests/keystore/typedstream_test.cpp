@@ -1,0 +1,352 @@
+#include "keystore/separation.h"
+#include "tests/support/groups.h"
+
+#include <cmath>
+#include <limits>
+#include <map>
+
+namespace {
+
+class TypedStream : public StreamTest {};
+
+// ---- the parameter record
+
+struct DescribedTraits {
+    using ValueType = double;
+};
+
+// A float stream that says of itself what a test wants.
+class Described : public KFS_FloatStream<DescribedTraits> {
+public:
+    explicit Described(short dimension = 1)
+        : KFS_FloatStream(dimension, 600, true, false, KFS_InterpMask_All, 0, DoubleDesc(), nullptr, nullptr, false)
+    {}
+    Described(Described const& source, KFS_CloneStreamParams const& params) : KFS_FloatStream(source, params) {}
+    KFS_StreamBase* CloneStream(KFS_CloneStreamParams const& params) const override
+    {
+        return new Described(*this, params);
+    }
+    bool HasMinValue() const override { return hasMin; }
+    bool HasMaxValue() const override { return hasMax; }
+    M_Vector4T<double> GetDefaultVector4() const override { return standard; }
+    void FillInDisplayName() const override { pSetDisplayName(Q_AsciiToUTF16String("Shown")); }
+
+    FX_ParamDef const& Fill(int kind, double min, double max, double sliderMin, double sliderMax) const
+    {
+        FillInParamDefDetails(kind, min, max, sliderMin, sliderMax, 3, 5, 7U, 11, 13);
+        return GetParamDef();
+    }
+
+    bool hasMin = false, hasMax = false;
+    M_Vector4T<double> standard{{2.75, -1.5, 0.1, 300.0}};
+
+private:
+    static KFS_ValueDesc DoubleDesc()
+    {
+        KFS_ValueDesc desc;
+        desc.dataType = KFS_Type_Double;
+        return desc;
+    }
+};
+
+std::vector<double> Fields(FX_ParamDef const& def)
+{
+    auto const& v = def.value;
+    switch (def.paramType) {
+    case 1:
+        return {double(v.intSlider.validMin), double(v.intSlider.validMax), double(v.intSlider.sliderMin),
+                double(v.intSlider.sliderMax), double(v.intSlider.defaultValue)};
+    case 2:
+        return {double(v.fixedSlider.validMin),    double(v.fixedSlider.validMax),     double(v.fixedSlider.sliderMin),
+                double(v.fixedSlider.sliderMax),   double(v.fixedSlider.defaultValue), double(v.fixedSlider.precision),
+                double(v.fixedSlider.displayFlags)};
+    case 3: return {double(v.fixedAngle.defaultValue), double(v.fixedAngle.validMin), double(v.fixedAngle.validMax)};
+    case 4: return {double(v.named.defaultValue)};
+    case 5: return {double(v.color.alpha), double(v.color.red), double(v.color.green), double(v.color.blue)};
+    case 6: return {double(v.point2d.defaultX), double(v.point2d.defaultY)};
+    case 7: return {double(v.choice.defaultValue)};
+    case 10:
+        return {double(v.floatSlider.validMin),     double(v.floatSlider.validMax),     double(v.floatSlider.sliderMin),
+                double(v.floatSlider.sliderMax),    double(v.floatSlider.defaultValue), double(v.floatSlider.precision),
+                double(v.floatSlider.displayFlags), double(v.floatSlider.floatFlags)};
+    case 18: return {v.point3d.defaultX, v.point3d.defaultY, v.point3d.defaultZ};
+    default: return {};
+    }
+}
+
+TEST_F(TypedStream, DescribesItselfByItsKind)
+{
+    constexpr double Lowest = -2147483648.0, Highest = 2147483647.0;
+    double const nan = std::numeric_limits<double>::quiet_NaN();
+    struct Row {
+        int kind;
+        double min, max, sliderMin, sliderMax;
+        bool limited;
+        M_Vector4T<double> standard;
+        std::vector<double> fields;
+    } const rows[] = {
+        {1, -1.9, 1.9, 1e12, nan, false, {{-7.9, 0, 0, 0}}, {-1, 1, Highest, 0, -7}},
+        {2, -1.5, 0.1, 2, 3, false, {{0.5, 0, 0, 0}}, {-98304, 6554, 131072, 196608, 32768, 3, 5}},
+        {3, -1.5, 1.5, 0, 0, false, {{90, 0, 0, 0}}, {5898240, Lowest, Highest}},
+        {3, -1.5, 1.5, 0, 0, true, {{90, 0, 0, 0}}, {5898240, -98304, 98304}},
+        {4, 0, 0, 0, 0, false, {{1.9, 0, 0, 0}}, {1}},
+        {5, 0, 0, 0, 0, false, {{255.9, 1, 300, -1}}, {255, 1, 44, 255}},
+        {6, 0, 0, 0, 0, false, {{1.5, -0.25, 0, 0}}, {9830400, -1638400}},
+        {7, 0, 0, 0, 0, false, {{2.9, 0, 0, 0}}, {2}},
+        {9, 1, 2, 3, 4, false, {{1, 0, 0, 0}}, {}},
+        {10, -1.5, 2.5, -1, 2, false, {{0.25, 0, 0, 0}}, {-1.5, 2.5, -1, 2, 0.25, 3, 5, 7}},
+        {18, 0, 0, 0, 0, false, {{1.5, -2, 0.25, 0}}, {150, -200, 25}},
+    };
+    for (Row const& row : rows) {
+        SCOPED_TRACE(row.kind);
+        Described stream;
+        stream.hasMin = stream.hasMax = row.limited;
+        stream.standard = row.standard;
+        FX_ParamDef const& def = stream.Fill(row.kind, row.min, row.max, row.sliderMin, row.sliderMax);
+        EXPECT_EQ(row.fields, Fields(def));
+        EXPECT_EQ(row.kind, def.paramType);
+        EXPECT_STREQ("Shown", def.name);
+        EXPECT_EQ(11, def.reservedWord);
+        EXPECT_EQ(13u, def.paramFlags);
+    }
+}
+
+// The default of a class that gives neither a default nor a record comes from the record that asks for it.
+TEST_F(TypedStream, ADefaultThatNobodyGivesIsZero)
+{
+    class Circular : public Described {
+    public:
+        M_Vector4T<double> GetDefaultVector4() const override { return KFS_FloatStream::GetDefaultVector4(); }
+        void FillInParamDef() const override { FillInParamDefDetails(10, 0, 1, 0, 1, 1, 0, 0, 0, 0); }
+    };
+    Circular const stream;
+    EXPECT_EQ(0.0, stream.GetDefaultValue());
+    EXPECT_EQ(0.0, stream.GetDefaultVector4()[0]);
+}
+
+// ---- values that own something
+
+struct Token {
+    int id = 0;
+    bool operator==(Token const& other) const { return id / 100 == other.id / 100; }
+};
+struct TokenTraits {
+    using ValueType = Token;
+};
+
+// Hands out numbered values and counts what comes back; the n-th call of GetValueEx or SetValue can fail.
+class Tokens : public KFS_DerivedStream<TokenTraits> {
+public:
+    explicit Tokens(bool noKeys = true)
+        : KFS_DerivedStream(1, 600, noKeys, false, 7, 0, Desc(), nullptr, nullptr, false)
+    {}
+    KFS_StreamBase* CloneStream(KFS_CloneStreamParams const&) const override { return nullptr; }
+    Token GetValueEx(KFS_EvalData const& eval) const override
+    {
+        Step();
+        return Made(200 + eval.time.value);
+    }
+    void SetValue(T_Time const&, Token const& value) override
+    {
+        Step();
+        EXPECT_EQ(1, alive.at(value.id)) << "a dead value was set";
+    }
+    void DisposeValue(Token value) const override { --alive[value.id]; }
+    Token GetDefaultValue() const override { return Made(100); }
+
+    static bool NothingIsHeld()
+    {
+        for (auto const& [id, count] : alive)
+            if (count != 0) return false;
+        return !alive.empty();
+    }
+
+    static inline std::map<int, int> alive;
+    mutable int failAt = 0;
+
+private:
+    static KFS_ValueDesc Desc()
+    {
+        KFS_ValueDesc desc;
+        desc.dataType = KFS_Type_Double;
+        return desc;
+    }
+    void Step() const
+    {
+        if (failAt > 0 && --failAt == 0) throw int{77};
+    }
+    Token Made(int id) const
+    {
+        while (alive.contains(id)) ++id;
+        alive[id] = 1;
+        return {id};
+    }
+};
+
+TEST_F(TypedStream, GivesEachValueBackOnceWhateverFails)
+{
+    T_Time const a{3, 600}, b{9, 600};
+    struct Row {
+        char const* what;
+        void (*run)(Tokens& stream, Tokens& other, T_Time const& a, T_Time const& b);
+    } const rows[] = {
+        {"is modified",
+         [](Tokens& s, Tokens&, T_Time const&, T_Time const&) { EXPECT_TRUE(s.IsStaticValueModified()); }},
+        {"default key", [](Tokens& s, Tokens&, T_Time const& t, T_Time const&) { s.InsertDefaultKey(t); }},
+        {"copied default", [](Tokens& s, Tokens& o, T_Time const& t, T_Time const&) { o.CopyDefaultKey(t, &s); }},
+        {"forced", [](Tokens& s, Tokens&, T_Time const& t, T_Time const&) { s.ForceInterpolateAtTime(t); }},
+        {"same",
+         [](Tokens& s, Tokens&, T_Time const& t, T_Time const& u) {
+             Tokens keyed(false);
+             keyed.failAt = s.failAt;
+             double const zero = 0.0;
+             for (T_Time const& key : {t, u}) EXPECT_EQ(0, KFS_InsertKeyF(&keyed, &key, 1, &zero, 1, 1));
+             EXPECT_TRUE(keyed.SameValueAtTimes(t, u, nullptr));
+         }},
+        {"key forced", [](Tokens& s, Tokens&, T_Time const& t, T_Time const&) { s.ForceKeyAtTime(t); }},
+    };
+    for (Row const& row : rows) {
+        SCOPED_TRACE(row.what);
+        for (int failAt : {0, 1, 2}) {
+            Tokens::alive.clear();
+            Tokens stream, other;
+            stream.failAt = other.failAt = failAt;
+            try {
+                row.run(stream, other, a, b);
+            } catch (int code) {
+                EXPECT_EQ(77, code);
+            }
+            EXPECT_TRUE(Tokens::NothingIsHeld() || (failAt == 1 && Tokens::alive.empty())) << "failing at " << failAt;
+        }
+    }
+    Tokens::alive.clear();
+    Tokens stream;
+    Described unrelated;
+    stream.CopyDefaultKey(a, nullptr);
+    stream.CopyDefaultKey(a, &unrelated);
+    EXPECT_TRUE(Tokens::alive.empty());
+}
+
+// ---- separated dimensions
+
+// A position: a leader of three dimensions whose default is 1, 2, 3.
+class Position : public TestLeaf {
+public:
+    using TestLeaf::TestLeaf;
+    bool IsSeparationLeader() const override { return true; }
+    M_Vector4T<double> GetDefaultVector4() const override { return {{1.0, 2.0, 3.0, 0.0}}; }
+    KFS_StreamBase* CloneStream(KFS_CloneStreamParams const& params) const override
+    {
+        return new Position(*this, params);
+    }
+    void FillInParamDef() const override { FillInParamDefDetails(18, 0, 0, 0, 0, 0, 0, 0, 0, 0); }
+};
+
+class Separation : public TypedStream {
+protected:
+    Separation()
+    {
+        auto const position = [](short dimension) {
+            return [dimension](KFS_MatchName const& kind, KFS_StreamFactory* factory, bool constant, unsigned int scale,
+                               bool canonical) {
+                return new Position(kind, factory, constant, scale, canonical, dimension, 5.0);
+            };
+        };
+        kinds.Leaf("a", 1, 0.0);
+        kinds.Leaf("b", 1, 0.0);
+        batch.Register(Name("P"), position(3), false);
+        batch.Register(Name("Q"), position(2), false);
+        kinds.Named("G", {Name("a"), Name("P"), Name("Q"), Name("b")});
+        root = std::make_unique<TestNamedGroup>(Name("G"), Get_VX_StreamFactory(), false, std::vector<KFS_MatchName>{});
+    }
+    ~Separation() override
+    {
+        root.reset();
+        batch.UnregisterAll();
+    }
+    KFS_Stream* Leaf(char const* name) const { return root->GetEditableLeafStream(Name(name)); }
+
+    KFS_ScRegisterStreams batch{Get_VX_StreamFactory()};
+    TestKinds kinds;
+    std::unique_ptr<TestNamedGroup> root;
+};
+
+TEST_F(Separation, FollowersStandBehindTheirLeader)
+{
+    std::string order;
+    for (unsigned int i = 0; i < root->GetNumStreams(); ++i)
+        order += NameOf(static_cast<KFS_StreamGroup const&>(*root).GetStream(i)) + " ";
+    EXPECT_EQ("a P P_0 P_1 P_2 Q Q_0 Q_1 b ", order);
+
+    KFS_Stream const* const canonical = Get_VX_StreamFactory()->GetCanonicalStream(Name("P_1"))->GetAsLeaf();
+    EXPECT_TRUE(canonical->IsHidden() && canonical->IsActive() && canonical->IsSeparationFollower());
+    EXPECT_EQ(nullptr, canonical->GetSeparationLeader());
+    EXPECT_EQ(u"Y P", std::u16string(canonical->GetDisplayName().begin(), canonical->GetDisplayName().end()));
+
+    KFS_Stream* const leader = Leaf("P");
+    for (int d = 0; d < 3; ++d) {
+        KFS_Stream* const follower = leader->GetSeparationFollower(d);
+        ASSERT_EQ("P_" + std::to_string(d), NameOf(follower));
+        EXPECT_FALSE(follower->IsCanonical());
+        EXPECT_EQ(leader, follower->GetSeparationLeader());
+        EXPECT_EQ(d, follower->GetSeparationDimension());
+        EXPECT_EQ(d + 1.0, follower->GetDefaultVector4()[0]);
+        EXPECT_EQ(leader->GetUnitsName(), follower->GetUnitsName());
+        KFS_StreamIDPath path;
+        path.AddTail(Name("P"));
+        KFS_StreamIDPath const found = root->GetLeafSeparationPath(path, d);
+        EXPECT_EQ(follower, root->FindStream(found));
+        EXPECT_FALSE(root->AreLeafDimensionsSeparated(path));
+    }
+    std::vector<KFS_Stream*> followers;
+    Leaf("Q")->GetSeparationFollowers(followers);
+    ASSERT_EQ(2u, followers.size());
+    EXPECT_EQ("Q_1", NameOf(followers[1]));
+
+    auto* const follower = dynamic_cast<KFS_SeparationFollowerStream*>(followers[0]);
+    ASSERT_TRUE(follower);
+    follower->SetExplicitSeparationLeader(leader);
+    EXPECT_EQ(leader, follower->GetSeparationLeader());
+    std::unique_ptr<KFS_StreamBase> const clone(follower->Clone(true));
+    EXPECT_EQ(nullptr, clone->GetAsLeaf()->GetSeparationLeader());
+}
+
+TEST_F(Separation, ALeaderThatIsSeparatedAnswersFromItsFollowers)
+{
+    KFS_Stream* const leader = Leaf("P");
+    ASSERT_EQ(0, leader->SetConstant(false, false));
+    for (int time : {0, 600}) {
+        T_Time const at{time, 600};
+        double const own[] = {time + 0.5, 0.0, 0.0};
+        ASSERT_EQ(0, KFS_InsertKeyF(leader, &at, 1, own, KFS_Interp_Linear, KFS_Interp_Linear));
+        for (int d = 0; d < 3; ++d) {
+            double const value = 10.0 * d + time / 600.0;
+            KFS_Stream* const follower = leader->GetSeparationFollower(d);
+            ASSERT_EQ(0, time == 0 ? follower->SetConstant(false, false) : 0);
+            ASSERT_EQ(0, KFS_InsertKeyF(follower, &at, 1, &value, KFS_Interp_Linear, KFS_Interp_Linear));
+        }
+    }
+    T_Time const half{300, 600};
+    double value[3] = {};
+    ASSERT_EQ(0, KFS_GetValueFPlus(leader, &half, 0, value, nullptr, nullptr));
+    EXPECT_EQ(300.5, value[0]);
+    leader->SetDimensionsSeparated(true);
+    ASSERT_EQ(0, KFS_GetValueFPlus(leader, &half, 0, value, nullptr, nullptr));
+    EXPECT_EQ((std::vector<double>{0.5, 10.5, 20.5}), std::vector<double>(value, value + 3));
+    char** many = nullptr;
+    T_Time const step{300, 600};
+    T_Time const start{0, 600};
+    ASSERT_EQ(0, KFS_GetValuesFPlus(leader, &start, &step, 3, 0, &many));
+    EXPECT_EQ(21.0, reinterpret_cast<double*>(*many)[8]);
+    Q_FreeHandle(many);
+}
+
+// A kind that is registered again finds its followers' names free.
+TEST_F(Separation, FollowersGoWithTheirLeadersKind)
+{
+    root.reset();
+    batch.UnregisterAll();
+    EXPECT_EQ(nullptr, Get_VX_StreamFactory()->GetCanonicalInstance(Name("P_0")));
+}
+
+}  // namespace
