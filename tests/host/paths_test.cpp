@@ -91,16 +91,11 @@ TEST_F(Paths, AgreeWithThePlainReadingAtKeysAndBeyond)
             for (Rational const& time :
                  {Rational(-5, 1), Rational(0, 1), Rational(1, 2), Rational(1, 1), Rational(7, 1)})
                 EXPECT_EQ(At(*item.stream, time), At(*path, time)) << time.ToString();
+            for (int const units : {1, 59999, 60001, 119999})
+                if (interpolation[0] == 'S')
+                    EXPECT_EQ(At(*path, Rational(units / 60000, 2)), At(*path, Rational(units, 120000))) << units;
         }
     }
-}
-
-TEST_F(Paths, StepsStayAtTheEarlierKey)
-{
-    Scene const scene = Import("STEP", {1, 2, 3, 4, 5, 6, 7, 8, 9});
-    auto const path = kfshost::MakePath(scene.streams.front());
-    EXPECT_EQ((Place{1, 2, 3}), At(*path, Rational(59999, 120000)));
-    EXPECT_EQ((Place{4, 5, 6}), At(*path, Rational(60001, 120000)));
 }
 
 // A straight segment is gone through in equal steps, as the file's linear interpolation does.
@@ -150,19 +145,6 @@ TEST_F(Paths, CurvedSegmentsLeaveKeysWithTheFilesVelocity)
     ASSERT_EQ(0, KFS_GetKeySpaceTangentsF(path.get(), 1, -1, in, out));
     EXPECT_NEAR(-1.0 / 6, in[0], 1e-15);  // the in tangent (1, 0, 0) times a sixth of a second, backwards
     EXPECT_NEAR(2.0 / 6, out[1], 1e-15);
-}
-
-// Legs of 1 and 3 units: roving puts the middle key after a quarter of the time, and all steps become equal.
-TEST_F(Paths, FloatKeysEvenOutTheSpeed)
-{
-    Scene const scene = Import("LINEAR", {0, 0, 0, 1, 0, 0, 1, 3, 0});
-    auto const path = kfshost::MakePath(scene.streams.front());
-    kfshost::LetInnerKeysFloat(*path);
-    EXPECT_EQ(1U, kfshost::FloatKeyCount(*path));
-    EXPECT_FALSE(kfshost::IsFloatKey(*path, 0));
-    EXPECT_NEAR(0.25, kfshost::KeyTime(*path, 1).ToDouble(), 1e-4);
-    for (int i = 0; i < 8; ++i)
-        EXPECT_NEAR(0.5, Distance(At(*path, Rational(i, 8)), At(*path, Rational(i + 1, 8))), 2e-3) << i;
 }
 
 TEST_F(Paths, WhatNeverMovesStaysThere)
