@@ -62,10 +62,14 @@ void KFSp_CopyUndo::TakeBack(Step const& step)
     bool found = index != KFS_INVALID_INDEX;
     if (!found && KFSp_SearchKeys(data_, step.time, &found, &index) != 0) return;
     if (!found) return;  // the copy never got in
-    if (step.overwrites)
+    if (step.overwrites) {
         PutBack(index);
-    else
-        static_cast<void>(KFSp_RemoveKeyItem(data_, index, nullptr));
+        return;
+    }
+    // A listener that read in the middle may have had the key's arc measured.
+    KFS_KeyScalar* key = nullptr;
+    if (KFSp_GetKey(data_, index, &key) == 0) static_cast<void>(KFSp_DisposeRemapTable(key));
+    static_cast<void>(KFSp_RemoveKeyItem(data_, index, nullptr));
 }
 
 // The kept key moves into the place of the one that stands there now, whose arc table it takes over. Needs no memory.
