@@ -42,7 +42,8 @@ void FindFollowers(KFS_Stream const* leader, std::vector<Stream*>& followers)
 // The name of a leader's follower.
 KFS_MatchName FollowerName(KFS_Stream const& leader, int dimension)
 {
-    u16str const text = leader.GetMatchName16Str() + Q_AsciiToUTF16String(("_" + std::to_string(dimension)).c_str());
+    u16str const number = Q_AsciiToUTF16String(std::to_string(dimension).c_str());
+    u16str const text = leader.GetMatchName16Str() + Q_AsciiToUTF16String("_") + number;
     return {Q_UTF16ToMBString(text).c_str(), true};
 }
 
