@@ -67,7 +67,7 @@ protected:
     }
 
     // All that can be asked about a key and the segment that it begins.
-    static void SampleKey(KFS_Stream const* stream, int index, std::vector<double>& samples)
+    void SampleKey(KFS_Stream const* stream, int index, std::vector<double>& samples) const
     {
         double n[30] = {};
         EXPECT_EQ(0, KFS_GetKeyTangentsF(stream, index, n, n + 3, n + 6, n + 9));
@@ -90,8 +90,8 @@ protected:
             samples.insert(samples.end(), {1.0 * count, 1.0 * times[0].value, 1.0 * times[1].value});
         }
         samples.push_back(codes);
-        // All in `All` but this one have no path.
-        if (stream->GetDimension() != 3) return;
+        // The others have no path. What a stream is made of is the main thread's to look at.
+        if (stream != spatial.get()) return;
         double tangents[6] = {};
         EXPECT_EQ(0, KFS_GetKeySpaceTangentsF(stream, index, -1, tangents, tangents + 3));
         samples.insert(samples.end(), std::begin(tangents), std::end(tangents));
