@@ -26,6 +26,8 @@ struct KFS_ParamDetails {
 };
 template <class Traits>
 inline constexpr std::optional<KFS_ParamDetails> KFS_ParamDetailsOf = std::nullopt;
+// The slider range of kinds that have no slider.
+inline constexpr double KFS_NoSlider = -9999.0;
 
 // The default that a parameter record holds, as a number; 0.0 for kinds that have none.
 inline double KFS_DefaultNumber(FX_ParamDef const& def)
@@ -142,7 +144,8 @@ public:
         return GetValueEx({time, flags, bag});
     }
     virtual T GetValueEx(KFS_EvalData const& eval) const = 0;
-    // A value on the heap that an override gives in place of the stream's; the pointer stays as it was without one.
+    // A value on the heap that an override gives in place of the stream's; the pointer stays as it was without one. A bag's
+    // overrides aren't looked up yet, so that is what happens in all classes of this header.
     virtual void ExtractCapsuleOverrideValue(T*&, KFS_EvalData const&) const {}
     virtual void DisposeCapsuleOverrideValue(T*& value) const
     {

@@ -314,7 +314,8 @@ void KFS_StreamBase::SetDisplayName(u16str const& name)
 
 void KFS_StreamBase::pSetDisplayName(u16str const& name) const
 {
-    displayName_ = name;
+    // A name that stays empty is filled in again by each reader, beside others who look at it.
+    if (displayName_ != name) displayName_ = name;
     // In the word itself, since a name that is filled in on demand is no news to listeners; and only where the bit is
     // set, since readers fill names in beside other readers of the word.
     if (NamesSameInitted())

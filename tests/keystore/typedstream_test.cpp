@@ -1,3 +1,4 @@
+#include "keystore/paramstreams.h"
 #include "keystore/separation.h"
 #include "tests/support/groups.h"
 
@@ -225,6 +226,120 @@ TEST_F(TypedStream, GivesEachValueBackOnceWhateverFails)
     stream.CopyDefaultKey(a, nullptr);
     stream.CopyDefaultKey(a, &unrelated);
     EXPECT_TRUE(Tokens::alive.empty());
+}
+
+// ---- values in the parameter record
+
+// An application with layers at even addresses, whose flat numbers are odd, and with paths of which 7 is the default.
+class Parameters : public TypedStream {
+protected:
+    Parameters()
+    {
+        asked = 0;
+        KFS_AppCallbacks callbacks{};
+        callbacks.layerDefaultValueFunc = [](KFS_ParamLayerStream const*) { return Layer(2); };
+        callbacks.layerIndependentFunc = [](KFS_ParamLayerStream const* stream, bool independent) {
+            long const number = static_cast<long>(reinterpret_cast<std::intptr_t>(stream->GetValue({5, 1}, 0)));
+            return ++asked, independent ? number + 1 : number - 1;
+        };
+        callbacks.layerRenderGuidFunc = [](KFS_ParamLayerStream const* stream, KFS_RenderOptionsBase const&,
+                                           GetRenderGuidFilter* filter) { return GuidOf(stream, filter); };
+        callbacks.pathIndependentFunc = [](KFS_ParamPathStream const* stream, bool independent) {
+            unsigned int const number = stream->GetValue({5, 1}, 0);
+            return ++asked, static_cast<int>(independent ? number + 1 : number - 1);
+        };
+        callbacks.pathRenderGuidFunc = [](KFS_ParamPathStream const* stream, KFS_RenderOptionsBase const&,
+                                          GetRenderGuidFilter* filter) { return GuidOf(stream, filter); };
+        KFS_SetCallbacks(callbacks);
+    }
+    ~Parameters() override { KFS_ClearCallbacks(); }
+
+    static void* Layer(std::intptr_t number) { return reinterpret_cast<void*>(number); }
+    static hearth::utility::Guid GuidOf(KFS_Stream const* stream, GetRenderGuidFilter* filter)
+    {
+        std::array<unsigned char, 16> bytes{};
+        std::memcpy(bytes.data(), &stream, sizeof stream);
+        std::memcpy(bytes.data() + 8, &filter, sizeof filter);
+        return hearth::utility::Guid(bytes);
+    }
+
+    // A kind made by the factory, through all that its values go through.
+    template <class Stream, class T>
+    void Check(int kind, T standard, T other, T otherFlat)
+    {
+        KFS_ScRegisterStreams batch(Get_VX_StreamFactory());
+        batch.Register(
+            Name("parameter"),
+            [](KFS_MatchName const& name, KFS_StreamFactory* factory, bool constant, unsigned int scale,
+               bool canonical) { return new Stream(scale, constant, &name, factory, canonical); },
+            false);
+        {
+            Q_ScAutoPtr<KFS_StreamBase> const made = TestKinds::Make("parameter");
+            auto& stream = dynamic_cast<Stream&>(*made);
+            EXPECT_EQ(kind, stream.GetParamDef().paramType);
+            EXPECT_EQ(KFS_BaseFlag_Active, stream.GetStreamBaseFlags());
+            EXPECT_FALSE(stream.CanBeAnimated());
+            EXPECT_EQ(standard, stream.GetValue({0, 1}, 0));
+            EXPECT_FALSE(stream.IsModified());
+            stream.SetValue({3, 1}, other);
+            EXPECT_EQ(other, stream.GetValue({-9, 1}, 0));
+            EXPECT_EQ(other, stream.GetValueEx({{70, 1}, 0, nullptr}));
+            EXPECT_TRUE(stream.IsModified());
+            T* override = &other;
+            stream.ExtractCapsuleOverrideValue(override, {{0, 1}, 0, nullptr});
+            EXPECT_EQ(&other, override);
+
+            EXPECT_EQ(stream.GetDisplayName(), stream.GetEnglishDisplayName());
+            stream.SetEnglishDisplayName(Q_AsciiToUTF16String("English"));
+            std::unique_ptr<KFS_StreamBase> const clone(stream.Clone(true));
+            EXPECT_EQ(Q_AsciiToUTF16String("English"), clone->GetEnglishDisplayName());
+            EXPECT_EQ(other, dynamic_cast<Stream&>(*clone).GetValue({0, 1}, 0));
+            stream.CopyDefaultKey({0, 1}, clone->GetAsLeaf());
+            EXPECT_EQ(standard, stream.GetValue({0, 1}, 0));
+
+            clone->MakeIndependent(true);
+            EXPECT_TRUE(clone->IsIndependent());
+            EXPECT_EQ(otherFlat, dynamic_cast<Stream&>(*clone).GetValue({0, 1}, 0));
+            clone->MakeIndependent(false);
+            EXPECT_FALSE(clone->IsIndependent());
+            EXPECT_EQ(other, dynamic_cast<Stream&>(*clone).GetValue({0, 1}, 0));
+            EXPECT_EQ(2, asked);
+
+            alignas(16) int place = 0;  // stands for the host's options and filter, which the library hands on
+            auto* const filter = reinterpret_cast<GetRenderGuidFilter*>(&place);
+            EXPECT_EQ(GuidOf(&stream, filter),
+                      stream.GetRenderGuid(reinterpret_cast<KFS_RenderOptionsBase const&>(place), filter));
+        }
+        batch.UnregisterAll();
+    }
+
+    static inline int asked = 0;  // how often for an exchange
+};
+
+TEST_F(Parameters, HoldOneValueForAllTimes)
+{
+    Check<KFS_ParamLayerStream>(FX_Param_LAYER, Layer(2), Layer(8), Layer(9));
+    asked = 0;
+    Check<KFS_ParamPathStream>(FX_Param_PATH, 0u, 8u, 9u);
+}
+
+TEST_F(Parameters, FlatFormsOfLayers)
+{
+    KFS_ParamLayerStream stream(600, 1, nullptr, nullptr, false), canonical(600, 1, nullptr, nullptr, true);
+    for (KFS_ParamLayerStream* const s : {&stream, &canonical}) s->SetValue({0, 1}, Layer(4));
+    EXPECT_EQ(Layer(5), stream.GetFlattenedReserved0());
+    EXPECT_EQ(Layer(4), stream.GetValue({0, 1}, 0)) << "it stays as it is";
+    stream.MakeIndependent(true);
+    EXPECT_EQ(Layer(5), stream.GetFlattenedReserved0());
+    EXPECT_EQ(2, asked);
+    EXPECT_EQ(nullptr, canonical.GetFlattenedReserved0());
+    EXPECT_EQ(2, asked);
+    KFS_ParamPathStream path(600, 1, nullptr, nullptr, false);
+    path.GetParamDef().value.path.defaultPathIdentifier = 7;
+    path.InsertDefaultKey({0, 1});
+    EXPECT_EQ(7u, path.GetValue({0, 1}, 0));
+    stream.CopyDefaultKey({0, 1}, &path);
+    EXPECT_EQ(Layer(5), stream.GetValue({0, 1}, 0)) << "of another kind";
 }
 
 // ---- separated dimensions
