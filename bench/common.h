@@ -4,6 +4,8 @@
 
 #include "host/session.h"
 
+#include <stdexcept>
+#include <string>
 #include <vector>
 
 // Never ended: streams and what is current on a thread go in an order of their own at exit.
@@ -11,6 +13,12 @@ inline kfshost::Session& Library()
 {
     static kfshost::Session* const session = new kfshost::Session;
     return *session;
+}
+
+// For what isn't measured. What is measured ignores its code, so that the time is that of the call alone.
+inline void Must(int code)
+{
+    if (code != 0) throw std::runtime_error("error " + std::to_string(code));
 }
 
 // The number of times before `time`. Branchless, over times packed side by side.

@@ -44,7 +44,7 @@ std::unique_ptr<KFS_Stream> MakeStream(std::vector<int> const& times, char inter
     for (int const time : times) {
         T_Time const at{time, Scale};
         double const value = time * 0.25;
-        KFS_InsertKey(stream.get(), &at, 1, &value, interp, interp);
+        Must(KFS_InsertKey(stream.get(), &at, 1, &value, interp, interp));
     }
     return stream;
 }
@@ -110,10 +110,10 @@ void EditAndRead(benchmark::State& state, int keys)
     int const middle = keys / 2;
     double value = 0.0;
     T_Time const beside{middle * 10 + 3, Scale};
-    KFS_GetValueFPlus(stream.get(), &beside, 0, &value, nullptr, nullptr);
+    Must(KFS_GetValueFPlus(stream.get(), &beside, 0, &value, nullptr, nullptr));
     for (auto _ : state) {
         value += 1.0;
-        KFS_SetKey(stream.get(), middle, &value, 0, 0);
+        static_cast<void>(KFS_SetKey(stream.get(), middle, &value, 0, 0));
         double read = 0.0;
         benchmark::DoNotOptimize(KFS_GetValueFPlus(stream.get(), &beside, 0, &read, nullptr, nullptr));
     }

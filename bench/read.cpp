@@ -47,9 +47,9 @@ struct Fixture {
                 v[c] = value(random), in[c] = speed(random), out[c] = speed(random);
                 inInf[c] = influence(random), outInf[c] = influence(random);
             }
-            KFS_InsertKeyF(stream.get(), &at, 1, v.data(), interp, interp);
-            KFS_SetKeyVelocityF(stream.get(), i, in.data(), out.data());
-            KFS_SetKeyInfluence(stream.get(), i, inInf.data(), outInf.data());
+            Must(KFS_InsertKeyF(stream.get(), &at, 1, v.data(), interp, interp));
+            Must(KFS_SetKeyVelocityF(stream.get(), i, in.data(), out.data()));
+            Must(KFS_SetKeyInfluence(stream.get(), i, inInf.data(), outInf.data()));
             values.push_back(v), outSpeeds.push_back(out), inSpeeds.push_back(in);
             outInfluences.push_back(outInf), inInfluences.push_back(inInf);
             times.push_back(at.value);
@@ -123,7 +123,7 @@ void SolveCurve(Fixture const& fixture, int segment, double x, double* y)
 {
     Fixture::Segment& s = const_cast<Fixture::Segment&>(fixture.segments[static_cast<std::size_t>(segment)]);
     CRV_Curve const curve{2, s.p0, s.p1, s.p2, s.p3};
-    CRV_EvaluateYFromX(&curve, y, x);
+    static_cast<void>(CRV_EvaluateYFromX(&curve, y, x));
 }
 
 void SolveLine(Fixture const& fixture, int segment, double x, double* y)
@@ -212,7 +212,7 @@ void ConstantOurs(benchmark::State& state)
     KFS_Stream stream(1, Scale, 1, 0, KFS_InterpMask_All, 0, desc, nullptr, nullptr, false);
     T_Time const zero{0, Scale};
     double value = 3.0;
-    KFS_InsertKeyF(&stream, &zero, 1, &value, 0, 0);
+    Must(KFS_InsertKeyF(&stream, &zero, 1, &value, 0, 0));
     int time = 0;
     for (auto _ : state) {
         T_Time const at{++time, Scale};

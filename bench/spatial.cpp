@@ -35,7 +35,7 @@ std::unique_ptr<KFS_Stream> MakePath(int keys, unsigned int seed)
     for (int i = 0; i < keys; ++i) {
         for (double& coordinate : point) coordinate += step(random);
         T_Time const at{i * Gap, Scale};
-        KFS_InsertKey(stream.get(), &at, 1, point, KFS_Interp_Spline, KFS_Interp_Spline);
+        Must(KFS_InsertKey(stream.get(), &at, 1, point, KFS_Interp_Spline, KFS_Interp_Spline));
     }
     return stream;
 }
@@ -53,11 +53,11 @@ struct Fixture {
     {
         double value[Dimension];
         T_Time const at{Gap / 2, Scale};
-        KFS_GetValueFPlus(stream.get(), &at, 0, value, nullptr, nullptr);
+        Must(KFS_GetValueFPlus(stream.get(), &at, 0, value, nullptr, nullptr));
         SEQ_Head** const list = stream->GetKeys();
         for (int i = 0; i < keys; ++i) {
             void const* item = nullptr;
-            SEQ_GetConstAddress(list, i, &item);
+            Must(SEQ_GetConstAddress(list, i, &item));
             records.push_back(static_cast<KFS_KeyScalar const*>(item));
             times.push_back(records.back()->time);
         }
@@ -66,7 +66,7 @@ struct Fixture {
     }
     ~Fixture()
     {
-        for (Segment const& segment : segments) SEQ_Dispose(segment.table, 0);
+        for (Segment const& segment : segments) static_cast<void>(SEQ_Dispose(segment.table, 0));
     }
     Fixture(Fixture const&) = delete;
     Fixture& operator=(Fixture const&) = delete;
@@ -86,7 +86,7 @@ struct Fixture {
             made.path[3][d] = Numbers(b)[d];
         }
         CRV_Curve const path{Dimension, made.path[0], made.path[1], made.path[2], made.path[3]};
-        CRV_BuildArcSpline(&path, &made.table, &made.length, 0.0001);
+        Must(CRV_BuildArcSpline(&path, &made.table, &made.length, 0.0001));
         double const dt = static_cast<double>(Gap) / Scale;
         double const points[4][2] = {{0.0, 0.0},
                                      {a.outInfluence * dt, a.outInfluence * dt * a.outSpeed},
@@ -94,7 +94,7 @@ struct Fixture {
                                      {dt, made.length}};
         std::copy(&points[0][0], &points[0][0] + 8, &made.speed[0][0]);
         CRV_Curve speed{2, made.speed[0], made.speed[1], made.speed[2], made.speed[3]};
-        CRV_CurveSetNonDecreasing(&speed, nullptr);
+        Must(CRV_CurveSetNonDecreasing(&speed, nullptr));
         return made;
     }
 
@@ -147,11 +147,12 @@ void ReadYardstick(benchmark::State& state)
         Fixture::Segment& segment = fixture.segments[index];
         CRV_Curve const speed{2, segment.speed[0], segment.speed[1], segment.speed[2], segment.speed[3]};
         double distance = 0.0;
-        CRV_EvaluateYFromX(&speed, &distance, static_cast<double>(time - fixture.times[index]) / Scale);
+        static_cast<void>(
+            CRV_EvaluateYFromX(&speed, &distance, static_cast<double>(time - fixture.times[index]) / Scale));
         CRV_Curve const path{Dimension, segment.path[0], segment.path[1], segment.path[2], segment.path[3]};
         double t = 0.0;
-        CRV_TFromSSpline(&path, &segment.table, &t, distance, 1.0);
-        CRV_EvaluatePoint(&path, point, t);
+        static_cast<void>(CRV_TFromSSpline(&path, &segment.table, &t, distance, 1.0));
+        static_cast<void>(CRV_EvaluatePoint(&path, point, t));
         benchmark::DoNotOptimize(point);
     }
 }
@@ -165,10 +166,10 @@ void EditAndRead(benchmark::State& state, int keys)
     std::unique_ptr<KFS_Stream> const stream = MakePath(keys, 3);
     T_Time const beside{keys / 2 * Gap + Gap / 2, Scale};
     double point[Dimension] = {};
-    KFS_GetValueFPlus(stream.get(), &beside, 0, point, nullptr, nullptr);
+    static_cast<void>(KFS_GetValueFPlus(stream.get(), &beside, 0, point, nullptr, nullptr));
     for (auto _ : state) {
         point[0] += 0.25;
-        KFS_SetKey(stream.get(), keys / 2, point, 0, 0);
+        static_cast<void>(KFS_SetKey(stream.get(), keys / 2, point, 0, 0));
         double read[Dimension];
         benchmark::DoNotOptimize(KFS_GetValueFPlus(stream.get(), &beside, 0, read, nullptr, nullptr));
     }
@@ -195,11 +196,11 @@ void Drag(benchmark::State& state)
     double step = 0.125;
     double point[Dimension];
     T_Time const start{0, Scale};
-    KFS_GetValueFPlus(stream.get(), &start, 0, point, nullptr, nullptr);  // the tangents that are left alone
+    Must(KFS_GetValueFPlus(stream.get(), &start, 0, point, nullptr, nullptr));  // the tangents that are left alone
     for (auto _ : state) {
         tangent[1] += step;
         if (tangent[1] < -50.0 || tangent[1] > 50.0) step = -step;
-        KFS_SetKeySpaceTangents(stream.get(), 10, -1, nullptr, tangent);
+        static_cast<void>(KFS_SetKeySpaceTangents(stream.get(), 10, -1, nullptr, tangent));
         for (int i = 0; i < reads; ++i) {
             T_Time const at{9 * Gap + 1 + 2 * i, Scale};  // no key
             benchmark::DoNotOptimize(KFS_GetValueFPlus(stream.get(), &at, 0, point, nullptr, nullptr));

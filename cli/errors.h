@@ -30,4 +30,4 @@ void TellChanges(std::string const& fileName, kfshost::LoadNotes const& notes);
 void ListenToReports();
 
 // Runs the work and answers its exit code. What it throws becomes one line on the standard error, and ExitFailed.
-int RunTold(std::function<int()> const& work);
+[[nodiscard]] int RunTold(std::function<int()> const& work);

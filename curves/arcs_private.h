@@ -5,7 +5,7 @@
 
 // The length of the path from key `first` to key `last` of the list, summed in the order of the keys. When a key can't
 // be read its code is the result, and `length` the sum so far.
-inline int KFSp_SumArcs(KFS_StreamKeyData const* data, int first, int last, double* length)
+[[nodiscard]] inline int KFSp_SumArcs(KFS_StreamKeyData const* data, int first, int last, double* length)
 {
     *length = 0.0;
     for (int i = first; i < last; ++i) {
@@ -22,13 +22,13 @@ inline bool KFSp_HasPathDimension(KFS_Stream const* stream)
     return stream->GetDimension() == 2 || stream->GetDimension() == 3;
 }
 
-inline int KFSp_RefusePathDimension()
+[[nodiscard]] inline int KFSp_RefusePathDimension()
 {
     return KFSp_ReportErr(KFSp_Op_InterpolateSpatial, KFS_Err_Only2D3D, 0);
 }
 
 // Arc lengths exist in two and three dimensions only. Operation 45.
-inline int KFSp_CheckPathDimension(KFS_Stream const* stream)
+[[nodiscard]] inline int KFSp_CheckPathDimension(KFS_Stream const* stream)
 {
     if (KFSp_HasPathDimension(stream) || !stream->IsSpatial() || !stream->IsSParametrized()) return 0;
     return KFSp_RefusePathDimension();

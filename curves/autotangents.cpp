@@ -167,9 +167,9 @@ int SetPathTangents(KFS_Stream const* stream, int time, KFS_KeyScalar* key)
     if (straight && !(key->spFlags & KFS_KeySpFlag_Modifiable)) {
         std::fill_n(runs.inTangent, std::max<int>(dimension, 0), 0.0);
         std::fill_n(runs.outTangent, std::max<int>(dimension, 0), 0.0);
-    } else {
-        KFSp_ComputeDefaultSpTangents(dimension, valueOf(around.prev), valueOf(around.at), valueOf(around.next),
-                                      runs.inTangent, runs.outTangent);
+    } else if (int const code = KFSp_ComputeDefaultSpTangents(dimension, valueOf(around.prev), valueOf(around.at),
+                                                              valueOf(around.next), runs.inTangent, runs.outTangent)) {
+        return code;
     }
     key->spFlags |= KFS_KeySpFlag_Continuous;
     key->flags |= KFS_KeyFlag_TangentsSet;

@@ -166,7 +166,8 @@ int TangentBetweenKeys(Question const& asked, KFS_StreamKeyData const* data, int
     {
         KFSp_ScConstPin const pin(data->keys, error);
         if (!error.None()) return error.Code();
-        if (!stream->GetInterpFunc()) KFSp_ReportRow(KFSp_Op_GetTangent, 0, KFSp_Row_NoInterpFunc);
+        if (!stream->GetInterpFunc())  // told, and no failure
+            static_cast<void>(KFSp_ReportRow(KFSp_Op_GetTangent, 0, KFSp_Row_NoInterpFunc));
         static_cast<void>(ClearedNumbers(asked, data));
         error.Keep(KFSp_InterpTangentSpatial(stream, 0, asked.time, next - 1));
         if (error.None()) error.Keep(TakeFromCache(asked, data, value));

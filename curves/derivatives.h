@@ -39,16 +39,17 @@ inline constexpr char KFS_Deriv_SpaceTangent =
 //   keyOnly  only the rate at a key is wanted: between keys `value` stays untouched.
 //
 // The filters act on rates of expressions only. Operation 57.
-KFS_API int KFS_GetDeriv(KFS_Stream const* stream, T_Time const* time, char tangentMode, unsigned char keyOnly,
-                         int flags, double* value, unsigned char* atKey, KFS_ParamBag const* bag,
-                         KFS_DerivSampleFilter sampleFilter, KFS_DerivFilter filter);
+[[nodiscard]] KFS_API int KFS_GetDeriv(KFS_Stream const* stream, T_Time const* time, char tangentMode,
+                                       unsigned char keyOnly, int flags, double* value, unsigned char* atKey,
+                                       KFS_ParamBag const* bag, KFS_DerivSampleFilter sampleFilter,
+                                       KFS_DerivFilter filter);
 
 // One velocity at `start`, whatever the step. Goes to the caller's `value`; with a null one `values` receives a handle of one
 // sample, which the caller frees with Q_FreeHandle, and which stays unset on an error. Code 3, reported, if both are null; 4
 // when out of memory. `step` isn't null. Operation 58.
-KFS_API int KFS_GetDerivs(KFS_Stream const* stream, T_Time const* start, T_Time const* step, char unused, int flags,
-                          double* value, char*** values, KFS_ParamBag const* bag, KFS_DerivSampleFilter sampleFilter,
-                          KFS_DerivFilter filter);
+[[nodiscard]] KFS_API int KFS_GetDerivs(KFS_Stream const* stream, T_Time const* start, T_Time const* step, char unused,
+                                        int flags, double* value, char*** values, KFS_ParamBag const* bag,
+                                        KFS_DerivSampleFilter sampleFilter, KFS_DerivFilter filter);
 
 // The direction of motion of a spatial stream, `dimension` doubles; also where the curve stands still: it then looks up to 29
 // time units ahead (behind the last key, back) for the first value that differs, and answers the way there. Zeros with result
@@ -56,5 +57,5 @@ KFS_API int KFS_GetDerivs(KFS_Stream const* stream, T_Time const* start, T_Time 
 // doubles there. Its length means nothing.
 //
 // Operation 97. KFS_Err_NotSpatial, reported.
-KFS_API int KFS_GetSpaceTangent(KFS_Stream const* stream, T_Time const* time, unsigned char keyOnly, int flags,
-                                double* value, unsigned char* atKey, KFS_ParamBag const* bag);
+[[nodiscard]] KFS_API int KFS_GetSpaceTangent(KFS_Stream const* stream, T_Time const* time, unsigned char keyOnly,
+                                              int flags, double* value, unsigned char* atKey, KFS_ParamBag const* bag);

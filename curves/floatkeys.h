@@ -12,7 +12,7 @@
 // depend on how often that has happened.
 
 // KFS_SetKeyFlags for KFS_KeyFlag_Float, and its results. On the first or the last key turning it on changes nothing.
-KFS_API int KFS_SetKeyFloat(KFS_Stream* stream, unsigned char on, int index);
+[[nodiscard]] KFS_API int KFS_SetKeyFloat(KFS_Stream* stream, unsigned char on, int index);
 
 // Moves a key in time. A key that stands at the new time is replaced, but for a float key, which makes way where it can.
 // Times stay sorted, and no two keys share one.
@@ -38,5 +38,5 @@ KFS_API int KFS_SetKeyFloat(KFS_Stream* stream, unsigned char on, int index);
 //   7430 KFS_Err_TimeNotRepresentable  KFS_INVALID_INDEX as the new time, which says that there is no key
 //   the time service's, the list service's, a listener's. A failure while the key is moved leaves it removed.
 // Threads: main thread. Cost: a search, a removal and an insertion, and the float keys around.
-KFS_API int KFS_SetKeyTime(KFS_Stream* stream, int index, T_Time const* newTime, int newTimeValue, int* newIndex,
-                           T_Time* oldTime);
+[[nodiscard]] KFS_API int KFS_SetKeyTime(KFS_Stream* stream, int index, T_Time const* newTime, int newTimeValue,
+                                         int* newIndex, T_Time* oldTime);

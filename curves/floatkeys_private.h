@@ -12,4 +12,4 @@
 //
 // Ends at the first error: KFS_Err_Only2D3D (operation 45) on a stream parametrised by arc length of another dimension;
 // the list's, the kernel's and the last lookup's codes come through.
-int KFSp_ComputeFloatTimes(KFS_Stream const* stream, int first, int last);
+[[nodiscard]] int KFSp_ComputeFloatTimes(KFS_Stream const* stream, int first, int last);

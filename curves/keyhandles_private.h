@@ -55,7 +55,8 @@ struct KFSp_Refusal {
 };
 
 // Refuses a damaged stream, then one without a value or a key. Throws what making a render's copy throws.
-inline int KFSp_CheckHandleAccess(KFS_Stream const* stream, KFSp_Refusal const& damaged, KFSp_Refusal const& noKeys)
+[[nodiscard]] inline int KFSp_CheckHandleAccess(KFS_Stream const* stream, KFSp_Refusal const& damaged,
+                                                KFSp_Refusal const& noKeys)
 {
     if (int const code = KFSp_CheckStream(damaged.operation, stream, damaged.action)) return code;
     KFS_StreamKeyData const* const data = stream->GetKeyData();
@@ -64,7 +65,8 @@ inline int KFSp_CheckHandleAccess(KFS_Stream const* stream, KFSp_Refusal const& 
 
 // The key at an index, or a constant's record whatever the index. -1 isn't the last key here: its neighbours would not
 // be.
-inline int KFSp_GetHandleKey(KFS_Stream const* stream, KFS_StreamKeyData const* data, int index, KFS_KeyScalar** key)
+[[nodiscard]] inline int KFSp_GetHandleKey(KFS_Stream const* stream, KFS_StreamKeyData const* data, int index,
+                                           KFS_KeyScalar** key)
 {
     if (stream->HasNoKeys()) {
         *key = data->cache;
@@ -83,7 +85,7 @@ inline KFS_KeyScalar* KFSp_BorrowCache(KFS_StreamKeyData const* data, KFS_KeySca
 
 // The end of every setter: the cached value may be of the curve as it was, and whoever listens is told once nothing
 // failed.
-inline int KFSp_FinishHandleEdit(KFS_Stream* stream, KFSp_FirstError& error)
+[[nodiscard]] inline int KFSp_FinishHandleEdit(KFS_Stream* stream, KFSp_FirstError& error)
 {
     if (stream->HasKeys()) error.Keep(KFSp_ClearCache(stream));
     if (error.None()) error.Keep(KFSp_Boundary([stream] { stream->NotifyValueChanged(); }));

@@ -24,12 +24,14 @@
 //
 // Operation 85. Errors: KFS_Err_NoKeys, reported, on a constant or an empty list; the list service's, with the answers
 // as far as they got.
-int KFSp_GetNeighborsFromTime(KFS_Stream const* stream, int time, unsigned char allKeys, KFS_KeyScalar** at,
-                              KFS_KeyScalar** prev, KFS_KeyScalar** next, int* prevIndex, int* nextIndex, int* atIndex);
+[[nodiscard]] int KFSp_GetNeighborsFromTime(KFS_Stream const* stream, int time, unsigned char allKeys,
+                                            KFS_KeyScalar** at, KFS_KeyScalar** prev, KFS_KeyScalar** next,
+                                            int* prevIndex, int* nextIndex, int* atIndex);
 
 // The same around the key at `index`. Operation 84.
-int KFSp_GetNeighborsFromIndex(KFS_Stream const* stream, int index, unsigned char allKeys, KFS_KeyScalar** prev,
-                               KFS_KeyScalar** next, int* prevIndex, int* nextIndex);
+[[nodiscard]] int KFSp_GetNeighborsFromIndex(KFS_Stream const* stream, int index, unsigned char allKeys,
+                                             KFS_KeyScalar** prev, KFS_KeyScalar** next, int* prevIndex,
+                                             int* nextIndex);
 
 // The answers of the two as one value: missing keys are null, and their indices mean nothing.
 struct KFSp_Neighbours {
@@ -43,13 +45,15 @@ struct KFSp_Neighbours {
     bool Both() const { return prev && next; }
 };
 
-inline int KFSp_FindAround(KFS_Stream const* stream, int time, unsigned char allKeys, KFSp_Neighbours* around)
+[[nodiscard]] inline int KFSp_FindAround(KFS_Stream const* stream, int time, unsigned char allKeys,
+                                         KFSp_Neighbours* around)
 {
     return KFSp_GetNeighborsFromTime(stream, time, allKeys, &around->at, &around->prev, &around->next,
                                      &around->prevIndex, &around->nextIndex, &around->atIndex);
 }
 
-inline int KFSp_FindAroundKey(KFS_Stream const* stream, int index, unsigned char allKeys, KFSp_Neighbours* around)
+[[nodiscard]] inline int KFSp_FindAroundKey(KFS_Stream const* stream, int index, unsigned char allKeys,
+                                            KFSp_Neighbours* around)
 {
     return KFSp_GetNeighborsFromIndex(stream, index, allKeys, &around->prev, &around->next, &around->prevIndex,
                                       &around->nextIndex);
@@ -69,5 +73,6 @@ inline int KFSp_FindAroundKey(KFS_Stream const* stream, int index, unsigned char
 //
 // Pins the list. Operation 100. Errors: KFS_Err_TimeOutsideKeys, reported, where there is no key on one side; the list
 // service's; the kernel's.
-int KFSp_ConstructCurve(KFS_Stream const* stream, int keyIndex, int time, int dimensionIndex,
-                        unsigned char relativeTime, unsigned char spatial, unsigned char* isHold, CRV_Curve* curve);
+[[nodiscard]] int KFSp_ConstructCurve(KFS_Stream const* stream, int keyIndex, int time, int dimensionIndex,
+                                      unsigned char relativeTime, unsigned char spatial, unsigned char* isHold,
+                                      CRV_Curve* curve);

@@ -28,28 +28,28 @@
 //
 // Operation 31. Tangents and arcs around the key become stale; notifies. When copying a tangent fails the key counts as
 // edited all the same.
-KFS_API int KFS_SetKeySpaceTangents(KFS_Stream* stream, int index, int unused, void const* inTangent,
-                                    void const* outTangent);
+[[nodiscard]] KFS_API int KFS_SetKeySpaceTangents(KFS_Stream* stream, int index, int unused, void const* inTangent,
+                                                  void const* outTangent);
 // The same with doubles, which are taken as they are. Operation 90. The stream's description is another one meanwhile.
-KFS_API int KFS_SetKeySpaceTangentsF(KFS_Stream* stream, int index, int unused, double const* inTangent,
-                                     double const* outTangent);
+[[nodiscard]] KFS_API int KFS_SetKeySpaceTangentsF(KFS_Stream* stream, int index, int unused, double const* inTangent,
+                                                   double const* outTangent);
 // A key's tangents, `dimension` doubles each; either may be null. Brings the stream up to date first, so it writes
 // derived data of a const stream; while updates are disabled it answers what is stored. Operation 32.
-KFS_API int KFS_GetKeySpaceTangentsF(KFS_Stream const* stream, int index, int unused, double* inTangent,
-                                     double* outTangent);
+[[nodiscard]] KFS_API int KFS_GetKeySpaceTangentsF(KFS_Stream const* stream, int index, int unused, double* inTangent,
+                                                   double* outTangent);
 
 // Lets the update pass recompute the key's tangents, beginning with the next update, or stops it from doing so. Turned
 // on, it makes the arcs around the key stale, with the spatial tangents of the keys there; temporal handles and float
 // times around aren't marked, though a changed arc may change them: they follow with the next edit or forced update.
 // Turned off, it leaves everything derived as it is. Operation 74 or 75.
-KFS_API int KFS_SetKeySpModifiable(KFS_Stream* stream, unsigned char on, int index);
+[[nodiscard]] KFS_API int KFS_SetKeySpModifiable(KFS_Stream* stream, unsigned char on, int index);
 // Operation 74 or 75. Nothing becomes stale.
-KFS_API int KFS_SetKeySpContinuous(KFS_Stream* stream, unsigned char on, int index);
+[[nodiscard]] KFS_API int KFS_SetKeySpContinuous(KFS_Stream* stream, unsigned char on, int index);
 
 // The key's spatial flags. `flags` is not null. The trap: a stream without keys answers the record's key flags
 // (KFS_KeyFlag) instead.
 // Operation 75, without keys 72.
-KFS_API int KFS_GetKeySpFlags(KFS_Stream const* stream, int index, unsigned int* flags);
+[[nodiscard]] KFS_API int KFS_GetKeySpFlags(KFS_Stream const* stream, int index, unsigned int* flags);
 // Replaces the bits of `mask` by those of `values`. A mask with one of the two flags makes the arcs around the key
 // stale, and only these, as KFS_SetKeySpModifiable does; the code of that mark is then the result. Operation 76.
-KFS_API int KFS_SetKeySpFlags(KFS_Stream* stream, int index, unsigned int mask, unsigned int values);
+[[nodiscard]] KFS_API int KFS_SetKeySpFlags(KFS_Stream* stream, int index, unsigned int mask, unsigned int values);

@@ -19,5 +19,5 @@
 // The stream isn't checked, and nothing is reported. Result: 0; 7431 KFS_Err_InterpNotAllowed for interpolation codes
 // other than linear, spline and hold; the list service's for an index outside the list; the curve kernel's.
 // Threads: as any read of derived data; repairs stale keys first. Cost: one curve solve.
-KFS_API int KFS_CalculateTFromStream(KFS_Stream const* stream, long refCon, int time, int keyIndex,
-                                     KFS_KeyScalar** first, KFS_KeyScalar** second, double* t);
+[[nodiscard]] KFS_API int KFS_CalculateTFromStream(KFS_Stream const* stream, long refCon, int time, int keyIndex,
+                                                   KFS_KeyScalar** first, KFS_KeyScalar** second, double* t);

@@ -22,13 +22,13 @@ struct KFSp_PathPoint {
     KFS_KeyScalar const* second = nullptr;
     double t = 0.0;
 };
-int KFSp_FindOnPath(KFS_Stream const* stream, int time, KFSp_PathPoint* point);
+[[nodiscard]] int KFSp_FindOnPath(KFS_Stream const* stream, int time, KFSp_PathPoint* point);
 
 // The speed along the path, distance a second, as number 0. Writes nothing on a segment that is linear on both sides or
 // held. This and the next are for a stream's derivatives (curves/derivatives.h).
-int KFSp_InterpDerivSpatial(KFS_Stream const* stream, long refCon, int time, int keyIndex);
+[[nodiscard]] int KFSp_InterpDerivSpatial(KFS_Stream const* stream, long refCon, int time, int keyIndex);
 
 // The path's direction: a third of the derivative by the path's parameter, so that it is the size of a key's tangent.
 // Streams that aren't parametrised by arc length answer the position on the straight line instead, unless they have
 // automatic tangents and dimension 2.
-int KFSp_InterpTangentSpatial(KFS_Stream const* stream, long refCon, int time, int keyIndex);
+[[nodiscard]] int KFSp_InterpTangentSpatial(KFS_Stream const* stream, long refCon, int time, int keyIndex);

@@ -13,5 +13,6 @@
 //
 // From arcLength on, the numbers of a spatial block have that form too, with dimension 1: the speed graph is split by
 // the same function.
-int KFSp_ComputeTempSubdivision(short dimension, double x, double dt, unsigned char nonDecreasing, bool prevLinear,
-                                bool nextLinear, double* prev, double* next, double* out);
+[[nodiscard]] int KFSp_ComputeTempSubdivision(short dimension, double x, double dt, unsigned char nonDecreasing,
+                                              bool prevLinear, bool nextLinear, double* prev, double* next,
+                                              double* out);

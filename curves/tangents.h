@@ -38,24 +38,26 @@
 // unit `yScale` times as tall as a second is wide. Negative speeds become 0 on a spatial stream with
 // KFS_StreamFlag_NonDecreasing. The key's flags stay: automatic tangents stay automatic.
 // Operations 29 (damaged) and 30 (no keys).
-KFS_API int KFS_SetKeyTangentsF(KFS_Stream* stream, int index, double const* inX, double const* inY, double const* outX,
-                                double const* outY, double yScale);
+[[nodiscard]] KFS_API int KFS_SetKeyTangentsF(KFS_Stream* stream, int index, double const* inX, double const* inY,
+                                              double const* outX, double const* outY, double yScale);
 
 // Graph tangents. Operation 30.
-KFS_API int KFS_GetKeyTangentsF(KFS_Stream const* stream, int index, double* inX, double* inY, double* outX,
-                                double* outY);
+[[nodiscard]] KFS_API int KFS_GetKeyTangentsF(KFS_Stream const* stream, int index, double* inX, double* inY,
+                                              double* outX, double* outY);
 
 // Sets speeds, which makes the key's handles the user's (KFS_KeyFlag_Modifiable goes out). The values are in the
 // stream's external type, on a spatial stream one double. On a continuous key of which one side is given, the other
 // side takes the speed and keeps its influence. Negative speeds become 0 on a spatial stream with
 // KFS_StreamFlag_NonDecreasing. A constant only notifies.
 // Operation 51. Errors: also the copy function's or the conversion's.
-KFS_API int KFS_SetKeyVelocity(KFS_Stream* stream, int index, void const* inVelocity, void const* outVelocity);
+[[nodiscard]] KFS_API int KFS_SetKeyVelocity(KFS_Stream* stream, int index, void const* inVelocity,
+                                             void const* outVelocity);
 
 // The same with doubles on any stream. The stream's description and copy function are exchanged for the length of the
 // call.
 // Operation 55 (damaged) and 51.
-KFS_API int KFS_SetKeyVelocityF(KFS_Stream* stream, int index, double const* inVelocity, double const* outVelocity);
+[[nodiscard]] KFS_API int KFS_SetKeyVelocityF(KFS_Stream* stream, int index, double const* inVelocity,
+                                              double const* outVelocity);
 
 // Speeds. A side that holds, or whose neighbour's facing side holds, has speed 0; a linear side has that of its
 // straight segment. On spatial streams a spline side without influence has speed 0, `zeroAtEnds` asks for 0 at the
@@ -63,17 +65,19 @@ KFS_API int KFS_SetKeyVelocityF(KFS_Stream* stream, int index, double const* inV
 // written. On other streams these two are always 0. A first element below 1e-10 in magnitude is answered as 0.
 // Operation 52. Errors: also KFS_Err_LegacyMismatch (3), unreported, where a straight run on a spatial stream takes no
 // time.
-KFS_API int KFS_GetKeyVelocityF(KFS_Stream const* stream, int index, unsigned char zeroAtEnds, double* inVelocity,
-                                double* outVelocity);
+[[nodiscard]] KFS_API int KFS_GetKeyVelocityF(KFS_Stream const* stream, int index, unsigned char zeroAtEnds,
+                                              double* inVelocity, double* outVelocity);
 
 // Sets influences, kept in 0 to 1, which makes the key's handles the user's. A constant only notifies; so does a custom
 // stream that isn't spatial. Operation 53.
-KFS_API int KFS_SetKeyInfluence(KFS_Stream* stream, int index, double const* inInfluence, double const* outInfluence);
+[[nodiscard]] KFS_API int KFS_SetKeyInfluence(KFS_Stream* stream, int index, double const* inInfluence,
+                                              double const* outInfluence);
 
 // Influences; 0.16666666667 for a side that isn't spline, whatever is stored.
 // Operation 54. Errors: also KFS_Err_CustomNotAllowed, reported, on a custom stream that isn't spatial, unless its
 // items have 8 bytes: such a stream answers 0.16666666667 in the first element.
-KFS_API int KFS_GetKeyInfluence(KFS_Stream const* stream, int index, double* inInfluence, double* outInfluence);
+[[nodiscard]] KFS_API int KFS_GetKeyInfluence(KFS_Stream const* stream, int index, double* inInfluence,
+                                              double* outInfluence);
 
 // How proposed handles would have to change so that they don't reach beyond the neighbouring key's value. Changes
 // nothing in the stream. Answers streams that aren't spatial.
@@ -84,9 +88,9 @@ KFS_API int KFS_GetKeyInfluence(KFS_Stream const* stream, int index, double* inI
 //   clamped                  set to 1 if anything was clamped, else left alone.
 //
 // Operation 101.
-KFS_API int KFS_GetClampedVelInflF(KFS_Stream const* stream, int index, short unused, double* inVelocity,
-                                   double* inInfluence, double* outVelocity, double* outInfluence,
-                                   unsigned char* clamped);
+[[nodiscard]] KFS_API int KFS_GetClampedVelInflF(KFS_Stream const* stream, int index, short unused, double* inVelocity,
+                                                 double* inInfluence, double* outVelocity, double* outInfluence,
+                                                 unsigned char* clamped);
 
 // The times at which a component has slope zero between the key at `index` and the next one.
 //
@@ -95,5 +99,5 @@ KFS_API int KFS_GetClampedVelInflF(KFS_Stream const* stream, int index, short un
 //   secondDerivatives  out or null, room for 2; positive at a minimum, negative at a maximum.
 //
 // Operation 103. Errors: also KFS_Err_TimeOutsideKeys, reported with operation 100, for the last key; the kernel's.
-KFS_API int KFS_GetZeroVelocityPoints(KFS_Stream const* stream, int index, int dimensionIndex, int* count,
-                                      T_Time* times, double* secondDerivatives);
+[[nodiscard]] KFS_API int KFS_GetZeroVelocityPoints(KFS_Stream const* stream, int index, int dimensionIndex, int* count,
+                                                    T_Time* times, double* secondDerivatives);

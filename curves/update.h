@@ -14,7 +14,7 @@
 // Operation 59. Result: 0; 2 for a damaged stream; the list service's, the curve kernel's or the tangents' first error.
 // Threads: writes derived data of the calling thread's key data. Cost: linear in the keys, some microseconds a curved
 // arc.
-KFS_API int KFS_ForceUpdateStream(KFS_Stream const* stream);
+[[nodiscard]] KFS_API int KFS_ForceUpdateStream(KFS_Stream const* stream);
 
 // Tells how far in time an edit at `time` would change the stream's curve.
 //
@@ -40,5 +40,5 @@ KFS_API int KFS_ForceUpdateStream(KFS_Stream const* stream);
 //   7439 KFS_Err_NoControlPoint action 3 to 6 without a key at the time; `from` and `to` stay as they are
 //   the list service's
 // Threads: as any read of derived data; may repair stale keys of a spatial stream. Cost: one search.
-KFS_API int KFS_PredictInvalid(KFS_Stream const* stream, unsigned short action, T_Time const* time, T_Time* from,
-                               T_Time* to);
+[[nodiscard]] KFS_API int KFS_PredictInvalid(KFS_Stream const* stream, unsigned short action, T_Time const* time,
+                                             T_Time* from, T_Time* to);

@@ -9,7 +9,7 @@
 // The one door between throw and code. Runs the callable; an `int` that it throws is the result, a std::exception goes
 // to Q_TranslateAndReportException, anything else propagates. A callable without a result answers 0.
 template <class Body>
-[[gnu::always_inline]] inline int KFSp_Boundary(Body&& body)
+[[nodiscard]] [[gnu::always_inline]] inline int KFSp_Boundary(Body&& body)
 {
     try {
         if constexpr (std::is_void_v<std::invoke_result_t<Body>>) {
@@ -33,7 +33,7 @@ public:
         if (code_ == 0) code_ = code;
     }
     bool None() const noexcept { return code_ == 0; }
-    int Code() const noexcept { return code_; }
+    [[nodiscard]] int Code() const noexcept { return code_; }
 
 private:
     int code_ = 0;

@@ -34,8 +34,8 @@ struct KFS_AppCallbacks {
 // Libkfs reaches into its own services where a read can't afford a call. Loaded with others, Birth reports that and answers
 // KFS_Err_ForeignServices; built with KFS_FOREIGN_SERVICES it uses their operations only, and takes any.
 inline constexpr int KFS_Err_ForeignServices = 7447;
-KFS_API int KFS_Birth();
-KFS_API int KFS_Death();
+[[nodiscard]] KFS_API int KFS_Birth();
+[[nodiscard]] KFS_API int KFS_Death();
 
 // After KFS_Birth and before KFS_Death. The six entries are copied.
 KFS_API void KFS_SetCallbacks(KFS_AppCallbacks& callbacks);

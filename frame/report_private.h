@@ -99,16 +99,16 @@ constexpr int KFSp_ReportId(int operation)
 
 // Reports `error` and returns it; 0 reports nothing. `argument` is the row that fills the sentence's `%s`, or for
 // KFS_Err_InterpNotAllowed the refused code itself.
-int KFSp_ReportErr(int operation, int error, short argument);
+[[nodiscard]] int KFSp_ReportErr(int operation, int error, short argument);
 
 // Reports a row whose `%d` takes `number`, and returns `error`.
-int KFSp_ReportNumber(int operation, int error, short row, int number);
+[[nodiscard]] int KFSp_ReportNumber(int operation, int error, short row, int number);
 
 // Reports a row that stands for itself, without formatting, and returns `error`.
-int KFSp_ReportRow(int operation, int error, short row);
+[[nodiscard]] int KFSp_ReportRow(int operation, int error, short row);
 
 // Reports "can't %s custom value" and returns KFS_Err_CustomValue. `what` is one of the rows 65, 66, 70 and 75.
-int KFSp_RefuseCustomValue(int operation, short what);
+[[nodiscard]] int KFSp_RefuseCustomValue(int operation, short what);
 
 // The same with "stream uses custom interpolation function: %s."; `what` is row 63.
-int KFSp_RefuseCustomInterpolation(int operation, short what);
+[[nodiscard]] int KFSp_RefuseCustomInterpolation(int operation, short what);

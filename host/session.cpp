@@ -92,7 +92,7 @@ boost::shared_ptr<Q_RenderContext> MakeRenderContext(bool tempClone)
 Session::Library::Library()
 {
     if (int const code = KFS_Birth()) {
-        KFS_Death();
+        static_cast<void>(KFS_Death());  // why it didn't start is what counts
         throw std::runtime_error("the library didn't start: error " + std::to_string(code));
     }
     KFS_AppCallbacks callbacks = HarmlessCallbacks();
@@ -102,7 +102,7 @@ Session::Library::Library()
 Session::Library::~Library()
 {
     KFS_ClearCallbacks();
-    KFS_Death();
+    static_cast<void>(KFS_Death());  // a destructor has nobody to tell
 }
 
 // The project owns its render context, so that reference shares the project's.

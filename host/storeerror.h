@@ -10,7 +10,7 @@ class StoreError : public std::runtime_error {
 public:
     explicit StoreError(int code) : std::runtime_error("the library answers error " + std::to_string(code)), code_(code)
     {}
-    int Code() const noexcept { return code_; }
+    [[nodiscard]] int Code() const noexcept { return code_; }
 
 private:
     int code_;

@@ -44,7 +44,7 @@ int InterpolateToCache(KFS_Stream const* stream, KFS_StreamKeyData const* data, 
 {
     KFS_InterpFunc const func = interpFunc ? *interpFunc : stream->GetInterpFunc();
     if (!func) {  // a file can say that a stream is a client's, and has none of the client's functions
-        KFSp_ReportRow(KFSp_Op_UpdateCache, 0, KFSp_Row_NoInterpFunc);
+        static_cast<void>(KFSp_ReportRow(KFSp_Op_UpdateCache, 0, KFSp_Row_NoInterpFunc));  // the code comes below
         data->cache->time = KFS_INVALID_INDEX;
         return KFS_Err_InterpNotAllowed;
     }

@@ -7,15 +7,15 @@
 
 // Empties the cache record: disposes its value and sets its time to KFS_INVALID_INDEX, whatever the disposal returned,
 // which is the result.
-int KFSp_ClearCache(KFS_Stream const* stream);
+[[nodiscard]] int KFSp_ClearCache(KFS_Stream const* stream);
 // The same on a record at hand.
-int KFSp_ClearCacheRecord(KFS_Stream const* stream, KFS_KeyScalar* cache);
+[[nodiscard]] int KFSp_ClearCacheRecord(KFS_Stream const* stream, KFS_KeyScalar* cache);
 
 // Fills the cache record as a key. `kind` KFS_Item_KeyValue: `value` is a value alone; KFS_Item_KeyWhole: a record's
 // whole value data, whose tangents then count as set. `convert`: `value` is in external form. A null `value` leaves the
 // value data as it is.
-int KFSp_SetupCache(KFS_Stream const* stream, int time, void const* value, char inInterp, char outInterp, short kind,
-                    unsigned char convert);
+[[nodiscard]] int KFSp_SetupCache(KFS_Stream const* stream, int time, void const* value, char inInterp, char outInterp,
+                                  short kind, unsigned char convert);
 
 // What is asked of the cache record.
 struct KFSp_CacheRequest {

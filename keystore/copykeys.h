@@ -23,12 +23,12 @@
 //
 // A destination that can only hold takes hold codes. A constant that is copied onto itself moves to the time asked for.
 // Operation 19.
-KFS_API int KFS_CopyKey(KFS_Stream* source, int index, unsigned char replace, T_Time const* time,
-                        KFS_Stream* destination, int* newIndex);
+[[nodiscard]] KFS_API int KFS_CopyKey(KFS_Stream* source, int index, unsigned char replace, T_Time const* time,
+                                      KFS_Stream* destination, int* newIndex);
 
 // Copies keys at their own times, replacing what stands there. All or none are copied.
 //
 //   keys  a list of 32-bit indices of the source's keys, or null for all. An empty list is fine.
 //
 // A constant's value arrives at time 0. Operation 21. Cost: a search and an insertion a key.
-KFS_API int KFS_CopyKeys(KFS_Stream const* source, SEQ_Head** keys, KFS_Stream* destination);
+[[nodiscard]] KFS_API int KFS_CopyKeys(KFS_Stream const* source, SEQ_Head** keys, KFS_Stream* destination);

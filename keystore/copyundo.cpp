@@ -14,7 +14,7 @@ KFSp_CopyUndo::KFSp_CopyUndo(KFS_Stream* stream, KFS_StreamKeyData* data, int co
 
 KFSp_CopyUndo::~KFSp_CopyUndo()
 {
-    if (kept_) SEQ_Dispose(kept_, 0);
+    if (kept_) static_cast<void>(SEQ_Dispose(kept_, 0));  // gone in any case, and a destructor has nobody to tell
 }
 
 int KFSp_CopyUndo::Code() const noexcept

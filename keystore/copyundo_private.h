@@ -13,9 +13,9 @@ public:
     KFSp_CopyUndo(KFSp_CopyUndo const&) = delete;
     KFSp_CopyUndo& operator=(KFSp_CopyUndo const&) = delete;
 
-    int Code() const noexcept;
+    [[nodiscard]] int Code() const noexcept;
     // Keeps a copy of the key at that time, if there is one.
-    int Note(int time);
+    [[nodiscard]] int Note(int time);
     // KFS_INVALID_INDEX: the copying failed before anybody heard of the key.
     void Put(int index) noexcept;
     // The keys are what they were, in value and handles; their arcs are to be measured anew.
@@ -28,7 +28,7 @@ private:
         bool overwrites;  // the last key of `kept_` stood there
     };
 
-    int Keep(int index);
+    [[nodiscard]] int Keep(int index);
     void TakeBack(Step const& step);
     void PutBack(int index);
 

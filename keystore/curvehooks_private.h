@@ -16,18 +16,18 @@
 //
 // Errors: of the neighbour search; the kernel's, with the components before the failing one written.
 // Cost: two item look-ups with a right hint, and one solve a component; nothing is allocated.
-int KFSp_Interpolate(KFS_Stream const* stream, long refcon, int time, int keyIndex);
+[[nodiscard]] int KFSp_Interpolate(KFS_Stream const* stream, long refcon, int time, int keyIndex);
 
 // The same between two keys at hand, into `result`: what a read calls that has found the keys already. On a segment
 // that holds, or whose codes have no shape, `a`'s value: a read never answers what the record held before.
-int KFSp_InterpolateBetween(KFS_Stream const* stream, KFS_KeyScalar const* a, KFS_KeyScalar const* b, int time,
-                            double* result);
+[[nodiscard]] int KFSp_InterpolateBetween(KFS_Stream const* stream, KFS_KeyScalar const* a, KFS_KeyScalar const* b,
+                                          int time, double* result);
 
 // The interpolation function of spatial streams: the position on the path, see curves/spatial_private.h.
 // KFS_Err_Only2D3D (operation 45) where arc-length parametrisation or automatic tangents meet another dimension;
 // KFS_Err_InterpNotAllowed, unreported, for codes other than linear, spline and hold.
 // A spatial stream that isn't parametrised by arc length has no arc tables, and runs a forced update each time.
-int KFSp_InterpolateSpatial(KFS_Stream const* stream, long refCon, int time, int keyIndex);
+[[nodiscard]] int KFSp_InterpolateSpatial(KFS_Stream const* stream, long refCon, int time, int keyIndex);
 
 // What `mode` of the two below asks for.
 inline constexpr char KFSp_Tangents_Temporal = 1;
@@ -45,7 +45,7 @@ inline constexpr char KFSp_Tangents_Spatial = 2;
 //
 // Pins the list. Operation 86. Errors: 2; KFS_Err_NoKeys on a constant or an empty list; both reported; the list
 // service's.
-int KFSp_SetDefaultKeyframeTangents(KFS_Stream const* stream, int time, char mode, KFS_KeyScalar* key);
+[[nodiscard]] int KFSp_SetDefaultKeyframeTangents(KFS_Stream const* stream, int time, char mode, KFS_KeyScalar* key);
 
 // Puts a key on a curve without changing the curve: splits the segment at `time` and gives `key` the split point and
 // the inner handles, and the two neighbours the outer ones.
@@ -68,8 +68,8 @@ int KFSp_SetDefaultKeyframeTangents(KFS_Stream const* stream, int time, char mod
 //
 // Operation 87. Result: 0; 2; 7427 KFS_Err_NoKeys; the codes of the update, the list, the interpolation and the curve
 // kernel. When the kernel can't split the path the neighbours' tangents stay as absolute positions.
-int KFSp_SubdivideSpline(KFS_Stream* stream, int time, char mode, KFS_KeyScalar* key);
+[[nodiscard]] int KFSp_SubdivideSpline(KFS_Stream* stream, int time, char mode, KFS_KeyScalar* key);
 
 // The speed of a key's in side becomes that of its out side. The stream's results of reading and setting velocities come
 // through.
-int KFSp_EqualizeSides(KFS_Stream* stream, int index);
+[[nodiscard]] int KFSp_EqualizeSides(KFS_Stream* stream, int index);

@@ -32,7 +32,7 @@ KFSp_ScDoubleValues::KFSp_ScDoubleValues(KFS_Stream* stream, KFS_CopyItemFunc co
 
 KFSp_ScDoubleValues::~KFSp_ScDoubleValues()
 {
-    Restore();
+    static_cast<void>(Restore());  // whoever wants the code has restored before
 }
 
 int KFSp_ScDoubleValues::Restore()

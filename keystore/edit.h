@@ -35,22 +35,23 @@
 // what KFS_ChooseInterps says and, where that has nothing to go by, linear: also on a stream that may only hold, whose
 // mask is asked about given codes alone.
 // Operation 17. Cost: one search, and moving the records behind the key.
-KFS_API int KFS_InsertKey(KFS_Stream* stream, T_Time const* time, unsigned char replace, void const* value,
-                          char inInterp, char outInterp);
+[[nodiscard]] KFS_API int KFS_InsertKey(KFS_Stream* stream, T_Time const* time, unsigned char replace,
+                                        void const* value, char inInterp, char outInterp);
 // Operation 94 for the damaged stream, else KFS_InsertKey's.
-KFS_API int KFS_InsertKeyF(KFS_Stream* stream, T_Time const* time, unsigned char replace, double const* value,
-                           char inInterp, char outInterp);
+[[nodiscard]] KFS_API int KFS_InsertKeyF(KFS_Stream* stream, T_Time const* time, unsigned char replace,
+                                         double const* value, char inInterp, char outInterp);
 
 // Changes a key's value, unless `value` is null, and codes. A key without a spline side is no longer continuous.
 // Operation 27. A bad index answers the list service's code.
-KFS_API int KFS_SetKey(KFS_Stream* stream, int index, void const* value, char inInterp, char outInterp);
+[[nodiscard]] KFS_API int KFS_SetKey(KFS_Stream* stream, int index, void const* value, char inInterp, char outInterp);
 // Operation 92 for the damaged stream, else KFS_SetKey's.
-KFS_API int KFS_SetKeyF(KFS_Stream* stream, int index, double const* value, char inInterp, char outInterp);
+[[nodiscard]] KFS_API int KFS_SetKeyF(KFS_Stream* stream, int index, double const* value, char inInterp,
+                                      char outInterp);
 
 // Removes a key. `value`, out or null, receives its value in external form, which belongs to the caller
 // (KFS_DisposeValue); a failing conversion isn't told. On a stream without a list the value is gone, and reads answer
 // KFS_Err_NoKeys until it gets a new one. Operation 18.
-KFS_API int KFS_RemoveKey(KFS_Stream* stream, int index, void* value);
+[[nodiscard]] KFS_API int KFS_RemoveKey(KFS_Stream* stream, int index, void* value);
 
 // The codes that a key inserted at a time ought to take, after its neighbours; 0 where there is nothing to go by. Any
 // result may be null.
@@ -61,4 +62,4 @@ KFS_API int KFS_RemoveKey(KFS_Stream* stream, int index, void* value);
 //                          hold out
 //
 // Operation 44.
-KFS_API int KFS_ChooseInterps(KFS_Stream* stream, T_Time const* time, char* inInterp, char* outInterp);
+[[nodiscard]] KFS_API int KFS_ChooseInterps(KFS_Stream* stream, T_Time const* time, char* inInterp, char* outInterp);

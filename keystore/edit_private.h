@@ -14,8 +14,9 @@
 //   index          out or null: where the key stands; KFS_INVALID_INDEX on failure
 //
 // Operation 38.
-int KFSp_InsertKeyFromCache(unsigned char overwrite, unsigned char valueGiven, unsigned char tangentsGiven,
-                            unsigned char clearCache, KFS_Stream* stream, int* index);
+[[nodiscard]] int KFSp_InsertKeyFromCache(unsigned char overwrite, unsigned char valueGiven,
+                                          unsigned char tangentsGiven, unsigned char clearCache, KFS_Stream* stream,
+                                          int* index);
 
 // The same without the notification, for whoever isn't done yet.
 struct KFSp_PutKey {
@@ -24,24 +25,24 @@ struct KFSp_PutKey {
     bool tangentsGiven = false;
     bool clearCache = false;
 };
-int KFSp_PutKeyFromCache(KFS_Stream* stream, KFSp_PutKey const& how, int* index);
+[[nodiscard]] int KFSp_PutKeyFromCache(KFS_Stream* stream, KFSp_PutKey const& how, int* index);
 
 // Takes a key out of the list, into the cache record with `keepInCache`. This is KFS_Stream::RemoveKey without the
 // notification.
-int KFSp_TakeKeyOut(KFS_Stream* stream, int index, bool keepInCache);
+[[nodiscard]] int KFSp_TakeKeyOut(KFS_Stream* stream, int index, bool keepInCache);
 
 // KFS_ChooseInterps, with the key flags and the spatial flags that the new key ought to take. `spFlags` is left alone
 // where no key with a spatial block was looked at.
-int KFSp_ChooseInterpsAndFlags(KFS_Stream* stream, T_Time const* time, char* inInterp, char* outInterp,
-                               unsigned short* flags, unsigned int* spFlags);
+[[nodiscard]] int KFSp_ChooseInterpsAndFlags(KFS_Stream* stream, T_Time const* time, char* inInterp, char* outInterp,
+                                             unsigned short* flags, unsigned int* spFlags);
 
 // 0 if the stream's mask permits the code; else reports KFS_Err_InterpNotAllowed with operation 13 and answers it.
-int KFSp_CanDoInterp(KFS_Stream const* stream, char code);
+[[nodiscard]] int KFSp_CanDoInterp(KFS_Stream const* stream, char code);
 
 // For SEQ_ForEach on a key list: makes each key's KFS_KeyFlag_SpatialBlock say `on`.
-int KFSp_SetKeySpatialState(SEQ_Head** list, long on, int index, void* key);
+[[nodiscard]] int KFSp_SetKeySpatialState(SEQ_Head** list, long on, int index, void* key);
 // For SEQ_ForEach on a key list: makes each key forget its arc table, without disposing it.
-int KFSp_KeyClearRemap(SEQ_Head** list, long, int index, void* key);
+[[nodiscard]] int KFSp_KeyClearRemap(SEQ_Head** list, long, int index, void* key);
 
 // Gives a stream the description of plain doubles, and a copy function that suits it, for a while: the functions that
 // take values in external form then take doubles. The key list calls the copy function too, whoever made the list, and
@@ -54,8 +55,8 @@ public:
     KFSp_ScDoubleValues& operator=(KFSp_ScDoubleValues const&) = delete;
 
     // The code of taking on the description.
-    int Code() const { return code_; }
-    int Restore();
+    [[nodiscard]] int Code() const { return code_; }
+    [[nodiscard]] int Restore();
 
 private:
     KFS_Stream* stream_;

@@ -33,18 +33,19 @@
 inline constexpr int KFS_EvalFlag_NoExpression = 0x1;
 
 // KFS_GetValuePlus with flags 0; the third argument is ignored.
-KFS_API int KFS_GetValue(KFS_Stream const* stream, T_Time const* time, unsigned char, void* value, unsigned char* atKey,
-                         KFS_ParamBag const* bag);
+[[nodiscard]] KFS_API int KFS_GetValue(KFS_Stream const* stream, T_Time const* time, unsigned char, void* value,
+                                       unsigned char* atKey, KFS_ParamBag const* bag);
 // Operation 113. The render context is the project's current one. `interpFunc`: null, or the address of a function to
 // interpolate with in place of the stream's, which gets `refcon`.
-KFS_API int KFS_GetValuePlus(KFS_Stream const* stream, T_Time const* time, int flags, void* value, unsigned char* atKey,
-                             KFS_ParamBag const* bag, KFS_InterpFunc* interpFunc, long refcon);
+[[nodiscard]] KFS_API int KFS_GetValuePlus(KFS_Stream const* stream, T_Time const* time, int flags, void* value,
+                                           unsigned char* atKey, KFS_ParamBag const* bag, KFS_InterpFunc* interpFunc,
+                                           long refcon);
 // KFS_GetValueFPlus with flags 0; the third argument is ignored.
-KFS_API int KFS_GetValueF(KFS_Stream const* stream, T_Time const* time, unsigned char, double* value,
-                          unsigned char* atKey, KFS_ParamBag const* bag);
+[[nodiscard]] KFS_API int KFS_GetValueF(KFS_Stream const* stream, T_Time const* time, unsigned char, double* value,
+                                        unsigned char* atKey, KFS_ParamBag const* bag);
 // Operation 113. The thread must have a current render context.
-KFS_API int KFS_GetValueFPlus(KFS_Stream const* stream, T_Time const* time, int flags, double* value,
-                              unsigned char* atKey, KFS_ParamBag const* bag);
+[[nodiscard]] KFS_API int KFS_GetValueFPlus(KFS_Stream const* stream, T_Time const* time, int flags, double* value,
+                                            unsigned char* atKey, KFS_ParamBag const* bag);
 
 // The end of every read, for the host's KFS_ExpState: the keys alone. `time` is in the stream's scale. Throws an int.
 //   keyOnly  only a key at that time is wanted; between keys `value` stays untouched.
@@ -60,11 +61,11 @@ KFS_API void KFS_GetValueFNoExpr(KFS_Stream const* stream, int time, unsigned ch
 // `count` values at `start`, `start` + `step`, ...: `values` receives a handle of `count` x `dimension` doubles, which
 // the caller frees with Q_FreeHandle; it stays unset on an error. Code 3 for a null `values`, 4 when out of memory.
 // Operation 115.
-KFS_API int KFS_GetValuesFPlus(KFS_Stream const* stream, T_Time const* start, T_Time const* step, int count, int flags,
-                               char*** values);
+[[nodiscard]] KFS_API int KFS_GetValuesFPlus(KFS_Stream const* stream, T_Time const* start, T_Time const* step,
+                                             int count, int flags, char*** values);
 
 // Frees what a value owns, through the stream's dispose function. Operation 105.
-KFS_API int KFS_DisposeValue(KFS_Stream const* stream, void* value);
+[[nodiscard]] KFS_API int KFS_DisposeValue(KFS_Stream const* stream, void* value);
 
 // Puts a vector that was produced for a stream into a caller's value buffer; a non-null `pointerValue` is stored as the
 // value itself. The second argument isn't used. Throws an int.

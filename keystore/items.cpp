@@ -54,7 +54,7 @@ int KFSp_NewKeyList(KFS_Stream* stream, SEQ_Head*** list)
     SEQ_Funcs const funcs{stream->GetCopyItemFunc() ? KFSp_CopyKeyItemFunc : nullptr,
                           stream->GetDisposeItemFunc() ? KFSp_DisposeKeyItemFunc : nullptr, KFSp_SortKeyItemFunc};
     if (int const code = SEQ_SetFuncs(made, 3, &funcs)) {
-        SEQ_Dispose(made, 0);
+        static_cast<void>(SEQ_Dispose(made, 0));  // the first error wins
         return code;
     }
     *list = made;

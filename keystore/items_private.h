@@ -6,12 +6,12 @@
 // The key list's item functions, and the item functions that stand in where a stream has none of its own.
 
 // Makes the stream's key list, unless it has one. Answers the list service's code.
-int KFSp_CreateKeyList(KFS_Stream* stream);
+[[nodiscard]] int KFSp_CreateKeyList(KFS_Stream* stream);
 // Makes an empty list of the kind that the stream's keys live in, for keeping keys aside. The caller disposes it.
-int KFSp_NewKeyList(KFS_Stream* stream, SEQ_Head*** list);
+[[nodiscard]] int KFSp_NewKeyList(KFS_Stream* stream, SEQ_Head*** list);
 // Tells the list which item functions to call, after the stream's have changed, and which stream it belongs to. 0
 // without a list.
-int KFSp_SetKeyFuncs(KFS_Stream* stream);
+[[nodiscard]] int KFSp_SetKeyFuncs(KFS_Stream* stream);
 
 // Order by time: a minus b, as signed 32-bit numbers with wrap-around.
 int KFSp_SortKeyItemFunc(void* refcon, SEQ_Head const* const* list, void const* a, void const* b);
@@ -19,23 +19,27 @@ int KFSp_SortKeyItemFunc(void* refcon, SEQ_Head const* const* list, void const* 
 int KFSp_SortKeyItemDiskFunc(void* refcon, SEQ_Head const* const* list, void const* a, void const* b);
 // Makes a copy of a key that shares nothing: an arc table stays with its key. For lists of streams with a copy
 // function.
-int KFSp_CopyKeyItemFunc(void* refcon, SEQ_Head const* const* list, void const* source, void* destination);
+[[nodiscard]] int KFSp_CopyKeyItemFunc(void* refcon, SEQ_Head const* const* list, void const* source,
+                                       void* destination);
 // Gives back what a key's value owns; not its arc table. For lists of streams with a dispose function.
-int KFSp_DisposeKeyItemFunc(void* refcon, SEQ_Head** list, void* item);
+[[nodiscard]] int KFSp_DisposeKeyItemFunc(void* refcon, SEQ_Head** list, void* item);
 
 // Item functions (KFS_CopyItemFunc). `kind` is a KFS_Item and says how many elements there are; the word is not looked
 // at.
 //
 // External elements to doubles, without legalising. Operation 81, KFS_Err_CustomValue on a custom stream.
-int KFSp_ConvertItemToFloat(KFS_Stream const* stream, long refcon, short kind, void const* source, void* destination);
+[[nodiscard]] int KFSp_ConvertItemToFloat(KFS_Stream const* stream, long refcon, short kind, void const* source,
+                                          void* destination);
 // Doubles to external elements. Operation 80, KFS_Err_CustomValue on a custom stream.
-int KFSp_ConvertItemFromFloat(KFS_Stream const* stream, long refcon, short kind, void const* source, void* destination);
+[[nodiscard]] int KFSp_ConvertItemFromFloat(KFS_Stream const* stream, long refcon, short kind, void const* source,
+                                            void* destination);
 // The bytes as they are, which may overlap; then, unless it is a single component, a float-based stream forces the
 // value into its limits and may fail.
-int KFSp_FakeCopyItemFunc(KFS_Stream const* stream, long refcon, short kind, void const* source, void* destination);
+[[nodiscard]] int KFSp_FakeCopyItemFunc(KFS_Stream const* stream, long refcon, short kind, void const* source,
+                                        void* destination);
 // The bytes as they are.
-int KFSp_FakeCopyItemFuncNoLimits(KFS_Stream const* stream, long refcon, short kind, void const* source,
-                                  void* destination);
+[[nodiscard]] int KFSp_FakeCopyItemFuncNoLimits(KFS_Stream const* stream, long refcon, short kind, void const* source,
+                                                void* destination);
 
 // What a copy function of a stream's is handed: ours the stream as this thread sees it, a client's the one that the
 // client knows.

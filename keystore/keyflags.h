@@ -13,9 +13,9 @@
 //
 // Operation 73 (no value: 72). Result: 0; 2; KFS_Err_NoKeys; the list service's for a bad index; what computing the
 // handles answers, and then the key is as it was. Ends as every edit (keystore/edit.h).
-KFS_API int KFS_SetKeyFlags(KFS_Stream* stream, int index, unsigned short mask, unsigned short value);
+[[nodiscard]] KFS_API int KFS_SetKeyFlags(KFS_Stream* stream, int index, unsigned short mask, unsigned short value);
 // KFS_SetKeyFlags for KFS_KeyFlag_Continuous.
-KFS_API int KFS_SetKeyContinuous(KFS_Stream* stream, unsigned char on, int index);
+[[nodiscard]] KFS_API int KFS_SetKeyContinuous(KFS_Stream* stream, unsigned char on, int index);
 // KFS_SetKeyFlags for KFS_KeyFlag_Modifiable. Turned off, it leaves the handles as they are stored, which KFS_GetKeyTangentsF
 // would have brought up to date: what has been given stands.
-KFS_API int KFS_SetKeyModifiable(KFS_Stream* stream, unsigned char on, int index);
+[[nodiscard]] KFS_API int KFS_SetKeyModifiable(KFS_Stream* stream, unsigned char on, int index);

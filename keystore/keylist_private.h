@@ -28,7 +28,7 @@ inline bool KFSp_KeyItemFits(KFS_ValueDesc const& desc, bool spatial, short dime
 }
 
 // A caller's time as a value in the stream's scale; a null `time` is value 0.
-inline int KFSp_TimeInStream(KFS_Stream const* stream, T_Time const* time, int* value)
+[[nodiscard]] inline int KFSp_TimeInStream(KFS_Stream const* stream, T_Time const* time, int* value)
 {
     if (!time) {
         *value = 0;
@@ -86,8 +86,8 @@ inline void KFSp_MarkAllKeys(int (&range)[2], int count)
 
 // The key at exactly `time`: `found` and its index; or not found, and the index of the first key after it (the count
 // past the end). A missing list is an empty one. Answers the list service's code.
-int KFSp_SearchKeyList(KFS_StreamKeyData const* data, int time, bool* found, int* index);
-inline int KFSp_SearchKeys(KFS_StreamKeyData const* data, int time, bool* found, int* index)
+[[nodiscard]] int KFSp_SearchKeyList(KFS_StreamKeyData const* data, int time, bool* found, int* index);
+[[nodiscard]] inline int KFSp_SearchKeys(KFS_StreamKeyData const* data, int time, bool* found, int* index)
 {
     if (!data->keys || !data->times.Mirrors((*data->keys)->count)) [[unlikely]] {
         bool foundInList = false;  // not the caller's own, which stay in registers that way
@@ -104,7 +104,7 @@ inline int KFSp_SearchKeys(KFS_StreamKeyData const* data, int time, bool* found,
 }
 
 // A key of the list, read-only; -1 names the last one.
-inline int KFSp_GetConstKey(KFS_StreamKeyData const* data, int index, KFS_KeyScalar const** key)
+[[nodiscard]] inline int KFSp_GetConstKey(KFS_StreamKeyData const* data, int index, KFS_KeyScalar const** key)
 {
     void const* item = nullptr;
     int const code = SEQ_GetConstAddress(data->keys, index, &item);
@@ -113,7 +113,7 @@ inline int KFSp_GetConstKey(KFS_StreamKeyData const* data, int index, KFS_KeySca
 }
 
 // The same for writing what is derived, or under an edit's pin.
-inline int KFSp_GetKey(KFS_StreamKeyData const* data, int index, KFS_KeyScalar** key)
+[[nodiscard]] inline int KFSp_GetKey(KFS_StreamKeyData const* data, int index, KFS_KeyScalar** key)
 {
     KFS_KeyScalar const* item = nullptr;
     int const code = KFSp_GetConstKey(data, index, &item);
@@ -152,18 +152,18 @@ struct KFSp_KeyPair {
 }
 
 // Inserts a copy of `record` so that it stands at `index`; the list exists.
-int KFSp_InsertKeyItem(KFS_StreamKeyData* data, KFS_KeyScalar const* record, int index);
+[[nodiscard]] int KFSp_InsertKeyItem(KFS_StreamKeyData* data, KFS_KeyScalar const* record, int index);
 // Removes a key; `record`, if not null, takes it over without disposal.
-int KFSp_RemoveKeyItem(KFS_StreamKeyData* data, int index, KFS_KeyScalar* record);
+[[nodiscard]] int KFSp_RemoveKeyItem(KFS_StreamKeyData* data, int index, KFS_KeyScalar* record);
 // Replaces the key by a copy of `record`, disposing the old one.
-int KFSp_ReplaceKeyItem(KFS_StreamKeyData* data, KFS_KeyScalar const* record, int index);
+[[nodiscard]] int KFSp_ReplaceKeyItem(KFS_StreamKeyData* data, KFS_KeyScalar const* record, int index);
 // Writes the time of the key at `index`, which `key` points to. The caller keeps the list sorted.
 void KFSp_RetimeKey(KFS_StreamKeyData* data, int index, KFS_KeyScalar* key, int time);
 
 // Disposes the arc table that a key owns, if it has one.
-int KFSp_DisposeRemapTable(KFS_KeyScalar* key);
+[[nodiscard]] int KFSp_DisposeRemapTable(KFS_KeyScalar* key);
 // The same for all keys of a list.
-int KFSp_DisposeRemapTables(SEQ_Head** keys);
+[[nodiscard]] int KFSp_DisposeRemapTables(SEQ_Head** keys);
 
 // Disposes a list of keys with the arc tables that they own; null is fine. There is nobody to tell of a failure.
 void KFSp_DisposeKeyList(SEQ_Head** keys);

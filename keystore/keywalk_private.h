@@ -12,4 +12,4 @@ struct KFSp_KeyWalk {
 
 // For SEQ_ForRange, with the address of a KFSp_KeyWalk as the word: hands one key to the walk's function, whose result
 // it answers.
-int KFSp_InvokeItemFunc(SEQ_Head** list, long walk, int index, void* item);
+[[nodiscard]] int KFSp_InvokeItemFunc(SEQ_Head** list, long walk, int index, void* item);

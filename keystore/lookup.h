@@ -27,8 +27,8 @@ inline constexpr short KFS_Find_AtTime = 0x1000;    // a key exactly at the time
 //   backward 25 ..|.........|<---|....|
 //
 // Operation 22. KFS_Err_Constant: a constant stream; reported, nothing found.
-KFS_API int KFS_FindKeyTime(KFS_Stream const* stream, T_Time const* time, short direction, unsigned char* found,
-                            int* index, T_Time* keyTime);
+[[nodiscard]] KFS_API int KFS_FindKeyTime(KFS_Stream const* stream, T_Time const* time, short direction,
+                                          unsigned char* found, int* index, T_Time* keyTime);
 
 // The key nearest to a time. A tie goes to the earlier key.
 //
@@ -37,7 +37,8 @@ KFS_API int KFS_FindKeyTime(KFS_Stream const* stream, T_Time const* time, short 
 // answers no index, which isn't an error, and a key time without a value but in the stream's scale.
 //
 // Operation 23. KFS_Err_NoKeys: a constant stream without a value; reported, unanswered.
-KFS_API int KFS_FindNearestKeyTime(KFS_Stream const* stream, T_Time const* time, int* index, T_Time* keyTime);
+[[nodiscard]] KFS_API int KFS_FindNearestKeyTime(KFS_Stream const* stream, T_Time const* time, int* index,
+                                                 T_Time* keyTime);
 
 // The index of the key exactly at a time, once the stream is up to date: an update can move a float key to or from that
 // time. No key there is an answer. A float key that stands there already is taken as it is, without an update. Inside
@@ -45,26 +46,27 @@ KFS_API int KFS_FindNearestKeyTime(KFS_Stream const* stream, T_Time const* time,
 //
 // Operation 24. KFS_Err_Constant: a constant stream. KFS_Err_NoKeys: no key. Both reported. An error of the update is
 // returned if no key stood at the time before it; otherwise that key is the answer.
-KFS_API int KFS_TimeToIndex(KFS_Stream const* stream, T_Time const* time, int* index);
+[[nodiscard]] KFS_API int KFS_TimeToIndex(KFS_Stream const* stream, T_Time const* time, int* index);
 
 // The key at or before a time. `found` tells whether it stands exactly there. No index where the time lies before the
 // first key. A constant stream answers index 0, found, and its value moves to that time. No update.
 //
 // Operation 26. KFS_Err_NoKeys: no key, or a constant without a value; reported, unanswered.
-KFS_API int KFS_GetKeyIndex(KFS_Stream const* stream, T_Time const* time, int* index, unsigned char* found);
+[[nodiscard]] KFS_API int KFS_GetKeyIndex(KFS_Stream const* stream, T_Time const* time, int* index,
+                                          unsigned char* found);
 
 // The time of a key; `time` mustn't be null. Index -1 names the last key. An index outside the list, or no list, leaves
 // the time unanswered and is no error. A float key whose time is stale is brought up to date first. A constant stream
 // answers where its value stands, whatever the index.
 //
 // Operation 25. KFS_Err_Constant: a constant without a value; reported. An error of the update is returned.
-KFS_API int KFS_IndexToTime(KFS_Stream const* stream, int index, T_Time* time);
+[[nodiscard]] KFS_API int KFS_IndexToTime(KFS_Stream const* stream, int index, T_Time* time);
 
 // The KFS_KeyFlag_ word of a key, or of a constant's value (any index). `flags` mustn't be null; it is untouched after
 // a failure.
 //
 // Operation 72. KFS_Err_NoKeys: no key, or a constant without a value; reported.
-KFS_API int KFS_GetKeyFlags(KFS_Stream const* stream, int index, unsigned short* flags);
+[[nodiscard]] KFS_API int KFS_GetKeyFlags(KFS_Stream const* stream, int index, unsigned short* flags);
 
 // The value of a key in the stream's external form, and its two interpolation codes, as they stand: no update. A
 // constant answers its value, whatever the index; -1 names the last key. `value` takes `dimension` elements of the
@@ -72,11 +74,12 @@ KFS_API int KFS_GetKeyFlags(KFS_Stream const* stream, int index, unsigned short*
 // codes are KFS_Interp_None, an unanswered value is untouched.
 //
 // Operation 28. KFS_Err_NoKeys as above. The copy function's code passes through, with the codes answered.
-KFS_API int KFS_GetKey(KFS_Stream const* stream, int index, void* value, char* inInterp, char* outInterp);
+[[nodiscard]] KFS_API int KFS_GetKey(KFS_Stream const* stream, int index, void* value, char* inInterp, char* outInterp);
 
 // The same with the value as `dimension` doubles, not limited and not converted. KFS_Err_CustomValue, reported under
 // operation 115: a value is asked of a custom stream. That comes before all else but the check of the stream itself.
-KFS_API int KFS_GetKeyF(KFS_Stream const* stream, int index, double* value, char* inInterp, char* outInterp);
+[[nodiscard]] KFS_API int KFS_GetKeyF(KFS_Stream const* stream, int index, double* value, char* inInterp,
+                                      char* outInterp);
 
 // Called with the stream, the caller's word, the key's index and its record, which stays where it is until the list
 // changes. A result other than 0 ends the walk and is its result. It mustn't insert, remove or retime keys.
@@ -89,12 +92,13 @@ using KFS_KeyFunc = int (*)(KFS_Stream* stream, long refcon, int index, KFS_KeyS
 // scale, if there was none.
 //
 // Operation 34. KFS_Err_NoKeys: no key, or a constant without a value; reported. Main thread only.
-KFS_API int KFS_ForRange(KFS_Stream* stream, T_Time const* first, T_Time const* last, long refcon, KFS_KeyFunc func,
-                         T_Time* lastTime);
+[[nodiscard]] KFS_API int KFS_ForRange(KFS_Stream* stream, T_Time const* first, T_Time const* last, long refcon,
+                                       KFS_KeyFunc func, T_Time* lastTime);
 
 // Walks the keys from one index to another, both included, stepping down if `first` is above `last`, after an update.
 // Both must be in the list, else the list service's code. `lastIndex` is that of the last key handed out. A constant
 // stream calls once, with index KFS_INVALID_INDEX, and answers `lastIndex` 0.
 //
 // Operation 35. KFS_Err_NoKeys as above. Main thread only.
-KFS_API int KFS_ForIndexRange(KFS_Stream* stream, int first, int last, long refcon, KFS_KeyFunc func, int* lastIndex);
+[[nodiscard]] KFS_API int KFS_ForIndexRange(KFS_Stream* stream, int first, int last, long refcon, KFS_KeyFunc func,
+                                            int* lastIndex);

@@ -32,7 +32,7 @@ public:
     explicit KFSp_SavedCache(KFS_Stream const* stream) noexcept;
 
     // 0, or 4: nothing was saved.
-    int Code() const noexcept { return bytes_.get() ? 0 : KFS_Err_OutOfMemory; }
+    [[nodiscard]] int Code() const noexcept { return bytes_.get() ? 0 : KFS_Err_OutOfMemory; }
     KFS_KeyScalar* get() const noexcept { return static_cast<KFS_KeyScalar*>(bytes_.get()); }
     void Restore() const noexcept;
 
@@ -49,7 +49,7 @@ public:
     KFSp_SavedKeys(KFS_Stream const* stream, KFS_StreamKeyData const* data, int first, int last) noexcept;
 
     // 0, 4 or the list service's: nothing was saved.
-    int Code() const noexcept { return code_; }
+    [[nodiscard]] int Code() const noexcept { return code_; }
     void Restore() const noexcept;
 
 private:

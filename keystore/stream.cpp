@@ -167,7 +167,7 @@ KFS_Stream::KFS_Stream(KFS_Stream const& source, KFS_CloneStreamParams const& pa
         if (params.cloneExpression && seen.HasExpression()) CopyExpressionFrom(seen);
     });
     if (code != 0) {
-        if (keyData_.cache) KFSp_ClearCacheRecord(this, keyData_.cache);
+        if (keyData_.cache) static_cast<void>(KFSp_ClearCacheRecord(this, keyData_.cache));  // the first error wins
         SetCanonical(true);  // silent: listeners who hear the source have never seen this one, nor do they its end
         throw int{code};
     }

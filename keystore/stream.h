@@ -181,8 +181,8 @@ public:
     virtual KFS_Stream const* GetSeparationFollower(int dimension) const;
     virtual bool IsCustomValuePointer() const;
     // Runs the expression at the tree's root. 1 means that there is no value.
-    virtual int EvaluateExpression(T_Time const* time, double* values, void** customValue,
-                                   KFS_ParamBag const* bag) const;
+    [[nodiscard]] virtual int EvaluateExpression(T_Time const* time, double* values, void** customValue,
+                                                 KFS_ParamBag const* bag) const;
 
     // Describes the stream in its parameter record: what FillInParamDef of a typed stream calls. `paramType` is one of
     // FX_ParamKind; the numbers go where records of that kind have a place for them, 16.16 numbers rounded, others cut off
@@ -297,19 +297,19 @@ public:
 
     // Mark the keys from `index` - `count` to `index` as stale; `index` -1 counts from the end. Key data. They answer
     // the list service's code.
-    int SetInvalid(int index, short count) const;
-    int SetArcInvalid(int index, short count) const;
+    [[nodiscard]] int SetInvalid(int index, short count) const;
+    [[nodiscard]] int SetArcInvalid(int index, short count) const;
 
     // Repairs what is stale: spatial tangents and arcs, temporal tangents, float times, in this order. Const, because
     // it writes derived data only. Key data. The marks are consumed whether or not the repair finished.
-    int UpdateStream() const;
-    int UpdateStreamIfStaleTangents(int index) const;
-    int UpdateStreamIfFloatItem(KFS_KeyScalar const* key, int index) const;
+    [[nodiscard]] int UpdateStream() const;
+    [[nodiscard]] int UpdateStreamIfStaleTangents(int index) const;
+    [[nodiscard]] int UpdateStreamIfFloatItem(KFS_KeyScalar const* key, int index) const;
 
     // The list side of removing a key. With `keepInCache` the key moves into the cache record.
-    int RemoveKey(int index, unsigned char keepInCache);
+    [[nodiscard]] int RemoveKey(int index, unsigned char keepInCache);
     // Moves the stream between one value and keys. With `keepValue` a constant's value becomes the first key.
-    int SetConstant(unsigned char constant, unsigned char keepValue);
+    [[nodiscard]] int SetConstant(unsigned char constant, unsigned char keepValue);
     // Makes a stream with keys that can't be animated a constant, with its value at time 0. Throws an int.
     void SetConstantIfNotAnimatable();
 
@@ -354,4 +354,5 @@ private:
 // back. The cache record and the key list keep their sizes: whoever makes the values of a live stream larger calls
 // AllocateCache after it and gives the stream a new list. Doesn't notify. Operation 9. Errors: 2; 7433 for a data type
 // above 9, not reported.
-KFS_API int KFS_SetValueDescription(KFS_Stream* stream, KFS_ValueDesc const* newDesc, KFS_ValueDesc* oldDesc);
+[[nodiscard]] KFS_API int KFS_SetValueDescription(KFS_Stream* stream, KFS_ValueDesc const* newDesc,
+                                                  KFS_ValueDesc* oldDesc);

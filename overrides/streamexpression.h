@@ -14,5 +14,5 @@ KFS_API u16str KFS_GetStreamExpression(KFS_Stream const* stream);
 
 // Takes the bits of `mask` from `value`. If KFS_ExprFlag_Disabled is among them the error is forgotten, so that
 // switching an expression on or off gives it a fresh try. 0, or the code of an exception on the way.
-KFS_API int KFS_SetStreamExprFlags(KFS_Stream* stream, unsigned int mask, unsigned int value);
+[[nodiscard]] KFS_API int KFS_SetStreamExprFlags(KFS_Stream* stream, unsigned int mask, unsigned int value);
 KFS_API unsigned int KFS_GetStreamExprFlags(KFS_Stream const* stream);

@@ -100,7 +100,7 @@ void FromDiskRecord(Layout const& layout, void const* record, int recordSize, vo
     std::memcpy(static_cast<char*>(key) + layout.memoryHead, static_cast<char const*>(record) + layout.diskHead,
                 static_cast<std::size_t>(dataSize));
     // The layout is the stream's, whatever a file's flag says: were it believed, numbers would pass for an arc table.
-    KFSp_SetKeySpatialState(nullptr, layout.spatial ? 1 : 0, 0, key);
+    KFSp_ThrowIf(KFSp_SetKeySpatialState(nullptr, layout.spatial ? 1 : 0, 0, key));
 }
 
 // A new key list of the stream, with `count` zeroed items, in the place of the one that it may have had.

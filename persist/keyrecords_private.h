@@ -36,7 +36,7 @@ static_assert(sizeof(KFS_KeyScalarDisk) == KFSp_DiskSpatialHeadSize);
 
 // Makes an empty list of the stream's disk records. The caller disposes it. Answers the list service's code, and `list`
 // is null then.
-int KFSp_CreateKeyDiskList(KFS_Stream* stream, SEQ_Head**& list);
+[[nodiscard]] int KFSp_CreateKeyDiskList(KFS_Stream* stream, SEQ_Head**& list);
 
 // Fills the list from the stream's keys, in their order; a stream without a key list leaves it empty. Throws the list
 // service's code.
@@ -52,7 +52,7 @@ void KFSp_DropKeyList(KFS_Stream* stream);
 
 // Swaps a record in memory in place, in either direction: its value data, which is that of a spatial record where the
 // stream is spatial. A client's bytes stay as they are. Always 0.
-int KFSp_KeyScalarDataSwap(KFS_Stream const* stream, KFS_KeyScalar* record);
+[[nodiscard]] int KFSp_KeyScalarDataSwap(KFS_Stream const* stream, KFS_KeyScalar* record);
 
 // A list that is disposed at the end of the scope.
 class KFSp_ScList {

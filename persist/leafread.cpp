@@ -179,7 +179,7 @@ void LeafReader::ReadValue()
     KFSp_ThrowIf(CKF_ReadAtom(file_, KFSp_ValueId, list_, size, value.data()));
     KFSp_ThrowIf(KFSp_ClearCache(stream_));
     std::copy(value.begin(), value.end(), static_cast<unsigned char*>(KFSp_ValueData(stream_->GetCache())));
-    KFSp_KeyScalarDataSwap(stream_, stream_->GetCache());
+    KFSp_ThrowIf(KFSp_KeyScalarDataSwap(stream_, stream_->GetCache()));
 }
 
 void LeafReader::ReadConstant()

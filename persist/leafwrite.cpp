@@ -63,9 +63,10 @@ class ScSwappedValue {
 public:
     explicit ScSwappedValue(KFS_Stream const* stream) : stream_(stream)
     {
-        KFSp_KeyScalarDataSwap(stream_, stream_->GetCache());
+        KFSp_ThrowIf(KFSp_KeyScalarDataSwap(stream_, stream_->GetCache()));
     }
-    ~ScSwappedValue() { KFSp_KeyScalarDataSwap(stream_, stream_->GetCache()); }
+    // What could be swapped can be swapped back.
+    ~ScSwappedValue() { static_cast<void>(KFSp_KeyScalarDataSwap(stream_, stream_->GetCache())); }
     ScSwappedValue(ScSwappedValue const&) = delete;
     ScSwappedValue& operator=(ScSwappedValue const&) = delete;
 

@@ -13,5 +13,5 @@ struct KFS_OldStreamID {
 
 // An atom "kfsi" of eight bytes, the next one inside `parent`. What a shorter atom lacks is zero, and on failure `id`
 // is untouched. They answer the chunk service's code.
-KFS_API int KFS_WriteOldStreamID(KFS_OldStreamID const* id, CKF_File* file);
-KFS_API int KFS_ReadOldStreamID(CKF_File* file, CKF_ChunkInfo* parent, KFS_OldStreamID* id);
+[[nodiscard]] KFS_API int KFS_WriteOldStreamID(KFS_OldStreamID const* id, CKF_File* file);
+[[nodiscard]] KFS_API int KFS_ReadOldStreamID(CKF_File* file, CKF_ChunkInfo* parent, KFS_OldStreamID* id);

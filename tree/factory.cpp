@@ -25,7 +25,8 @@ KFS_StreamBase* RefuseUnknownKind(KFS_MatchName const& name, bool report)
 {
     if (report) {
         char text[256];
-        Q_SubString(text, sizeof text, KFSp_MessageText(KFSp_Row_UnknownStream), name.GetName());
+        // The only failure is a destination that isn't there.
+        static_cast<void>(Q_SubString(text, sizeof text, KFSp_MessageText(KFSp_Row_UnknownStream), name.GetName()));
         KFSp_ThrowIf(Qp_ReportLegacyErrString(KFSp_ModuleId, KFSp_Severity, KFS_Err_UnknownStream, text));
     }
     return nullptr;

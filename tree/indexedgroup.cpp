@@ -1,5 +1,6 @@
 #include "tree/indexedgroup.h"
 
+#include "frame/boundary_private.h"
 #include "tree/groupsupport_private.h"
 
 #include <algorithm>
@@ -22,11 +23,11 @@ constexpr char const* CorruptGroupText =
 // Silences this thread's notifications for a scope.
 class PausedListeners {
 public:
-    PausedListeners() { KFS_PauseMainListener(true, wasPaused_); }
+    PausedListeners() { KFSp_ThrowIf(KFS_PauseMainListener(true, wasPaused_)); }
     ~PausedListeners()
     {
         bool ignored = false;
-        KFS_PauseMainListener(wasPaused_, ignored);
+        static_cast<void>(KFS_PauseMainListener(wasPaused_, ignored));  // what could be paused can go on
     }
     PausedListeners(PausedListeners const&) = delete;
     PausedListeners& operator=(PausedListeners const&) = delete;

@@ -69,10 +69,10 @@ private:
 
 // Between KFS_Birth and KFS_Death. Registering one listener twice leaves one entry; an unknown one is passed over. They
 // return 0.
-KFS_API int KFS_RegisterMainListener(KFS_StreamListener* listener);
-KFS_API int KFS_UnregisterMainListener(KFS_StreamListener* listener);
+[[nodiscard]] KFS_API int KFS_RegisterMainListener(KFS_StreamListener* listener);
+[[nodiscard]] KFS_API int KFS_UnregisterMainListener(KFS_StreamListener* listener);
 // Silences the calling thread, or not; `wasPaused` gets what was before, for the caller to restore. Returns 0.
-KFS_API int KFS_PauseMainListener(bool pause, bool& wasPaused);
+[[nodiscard]] KFS_API int KFS_PauseMainListener(bool pause, bool& wasPaused);
 
 // Tells all listeners, if anybody hears this stream.
 KFS_API void KFS_NotifyListeners(KFS_StreamBase* stream, KFS_Notification const& call);

@@ -140,8 +140,8 @@ public:
     virtual void FillInDisplayName() const;
 
     // Called by KFS_Birth and KFS_Death.
-    static int Birth();
-    static int Death();
+    [[nodiscard]] static int Birth();
+    [[nodiscard]] static int Death();
 
     KFS_MatchName const& GetMatchName() const { return matchName_; }
     void SetMatchName(KFS_MatchName const& name);

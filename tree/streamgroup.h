@@ -81,8 +81,8 @@ public:
     virtual unsigned int GetPreferredTimeScale() const;
     // Runs a leaf's expression at the root. 1 means that there is no value, which is the answer here; the host's root
     // overrides it.
-    virtual int EvaluateExpression(KFS_Stream const* stream, T_Time const* time, double* values, void** customValue,
-                                   KFS_ParamBag const* bag);
+    [[nodiscard]] virtual int EvaluateExpression(KFS_Stream const* stream, T_Time const* time, double* values,
+                                                 void** customValue, KFS_ParamBag const* bag);
 
     // The display position of a kind of child.
     unsigned int GetIndexInUILayout(KFS_MatchName const& name) const;

@@ -100,18 +100,18 @@ struct KFS_SERVICE_API CKF_File {
     //
     // Opens a file for reading. The path is read into memory at once, so the file may change or vanish afterwards; only
     // a regular file is taken. The bytes are borrowed: they must stay until the file is closed, and are not copied.
-    int Open(char const* path);
-    int Open(std::span<unsigned char const> bytes);
+    [[nodiscard]] int Open(char const* path);
+    [[nodiscard]] int Open(std::span<unsigned char const> bytes);
     // Begins a file. With a path it is written as frame/services/filewriter.h tells, so that the target, if there is
     // one, stays what it is until Commit. The hook may be null, and must outlive the file.
-    int Create(char const* path, CKF_IoHook* hook = nullptr);
-    int CreateInMemory(CKF_IoHook* hook = nullptr);
+    [[nodiscard]] int Create(char const* path, CKF_IoHook* hook = nullptr);
+    [[nodiscard]] int CreateInMemory(CKF_IoHook* hook = nullptr);
 
     // Ends writing: all chunks must be closed. Puts version and lengths right, flushes the temporary file to disk,
     // checks its size, renames it over the target and flushes the folder. Returns the first failure since Create, if
     // there was one; the target is then untouched and the temporary file gone. The one exception is a folder that can't
     // be flushed: the new file is in place, but may not survive a power cut.
-    int Commit();
+    [[nodiscard]] int Commit();
     // Closes the file. One that was being written and not committed leaves nothing behind.
     void Close() noexcept;
 
@@ -129,7 +129,7 @@ struct KFS_SERVICE_API CKF_File {
 
     // The first failure since the file was opened or created: 0 if there was none; a sentence for the user, "" if there
     // was none, valid until the file is opened or created again; and the place in the file.
-    int LastError() const noexcept;
+    [[nodiscard]] int LastError() const noexcept;
     char const* LastErrorText() const noexcept;
     std::uint64_t LastErrorOffset() const noexcept;
 
@@ -145,12 +145,13 @@ private:
 // ---- writing
 
 // Writes one atom with `size` bytes of data into the innermost open list. An odd size is padded, which no reader sees.
-KFS_SERVICE_API int CKF_WriteAtom(CKF_File* file, int id, int size, void const* data);
+[[nodiscard]] KFS_SERVICE_API int CKF_WriteAtom(CKF_File* file, int id, int size, void const* data);
 
 // Opens a list; `id` is CKF_ListId. `chunk` is filled in. The size hint is ignored: the length is what was written.
-KFS_SERVICE_API int CKF_BeginChunkWrite(CKF_File* file, int id, int sizeHint, int listType, CKF_ChunkInfo* chunk);
+[[nodiscard]] KFS_SERVICE_API int CKF_BeginChunkWrite(CKF_File* file, int id, int sizeHint, int listType,
+                                                      CKF_ChunkInfo* chunk);
 // Closes it. It must be the innermost open one; CKF_Err_Unbalanced otherwise. `chunk` receives the size.
-KFS_SERVICE_API int CKF_EndChunkWrite(CKF_File* file, CKF_ChunkInfo* chunk);
+[[nodiscard]] KFS_SERVICE_API int CKF_EndChunkWrite(CKF_File* file, CKF_ChunkInfo* chunk);
 
 // A list that is open for a scope. The constructor throws; what the destructor can't do fails the file.
 class KFS_SERVICE_API CKF_ScWriteList {
@@ -166,7 +167,7 @@ private:
 };
 
 // Writes a handle's bytes as an atom.
-KFS_SERVICE_API int CKF_WriteHandle(CKF_File* file, int id, char** handle);
+[[nodiscard]] KFS_SERVICE_API int CKF_WriteHandle(CKF_File* file, int id, char** handle);
 
 // Text goes into atoms as UTF-8 without a terminator. A surrogate that has no partner is written as the three bytes
 // that it would have as a code point, so every text comes back unit for unit.
@@ -175,7 +176,7 @@ KFS_SERVICE_API int CKF_WriteHandle(CKF_File* file, int id, char** handle);
 KFS_SERVICE_API int CKF_WriteUTF16(CKF_File* file, u16str const& text);
 // Writes a text as an atom of this id, and doesn't throw. A limit other than 0 cuts the text to that many units, and
 // never a pair of surrogates in two.
-KFS_SERVICE_API int CKF_WriteString(CKF_File* file, int id, u16str const& text, unsigned long maxLength);
+[[nodiscard]] KFS_SERVICE_API int CKF_WriteString(CKF_File* file, int id, u16str const& text, unsigned long maxLength);
 
 // A new handle with a text in the form of older files; null when out of memory. To be freed with Q_FreeHandle. It holds
 // UTF-8; with `marked` a text that isn't ASCII has the three bytes EF BB BF in front, which tell a reader that the
@@ -190,7 +191,8 @@ KFS_SERVICE_API char** CKF_NewHandleFromString(u16str const& text, bool marked);
 
 // Finds the next atom with this id and copies its data: all of it, or the first `size` bytes. What is behind the data
 // of a shorter atom in the buffer stays untouched. The position is then behind the atom.
-KFS_SERVICE_API int CKF_ReadAtom(CKF_File* file, int id, CKF_ChunkInfo const* parent, int size, void* buffer);
+[[nodiscard]] KFS_SERVICE_API int CKF_ReadAtom(CKF_File* file, int id, CKF_ChunkInfo const* parent, int size,
+                                               void* buffer);
 
 // A chunk that is entered for a scope. Descents nest like a stack.
 class KFS_SERVICE_API CKF_ScDescend {
@@ -222,11 +224,11 @@ public:
 };
 
 // Reads the next `*size` bytes of the atom that was entered last. CKF_Err_PastEnd if it has fewer left.
-KFS_SERVICE_API int CKF_ReadChunkData(CKF_File* file, int* size, void* buffer);
+[[nodiscard]] KFS_SERVICE_API int CKF_ReadChunkData(CKF_File* file, int* size, void* buffer);
 
 // As CKF_ReadAtom, into a new handle of the atom's size, which is freed with Q_FreeHandle. On failure `handle` is
 // untouched.
-KFS_SERVICE_API int CKF_ReadHandle(CKF_File* file, CKF_ChunkInfo const* parent, int id, char*** handle);
+[[nodiscard]] KFS_SERVICE_API int CKF_ReadHandle(CKF_File* file, CKF_ChunkInfo const* parent, int id, char*** handle);
 
 // The text of a handle in the form of older files: UTF-8 where the mark says so, else in this encoding (null is UTF-8).
 // Disposes the handle and sets it to null. A null handle is an empty text. What is ill-formed becomes U+FFFD.
@@ -242,7 +244,7 @@ KFS_SERVICE_API bool CKF_ReadString(CKF_File* file, CKF_ChunkInfo const* parent,
 // ---- versions and ids
 
 // The form of an id that CKF_ChunkInfo::id has. This container has one form only, so it is the id itself.
-KFS_SERVICE_API int CKF_ConvertChunkIDToXMLFormat(int id, int* out);
+[[nodiscard]] KFS_SERVICE_API int CKF_ConvertChunkIDToXMLFormat(int id, int* out);
 
 // Replaces a file's version pair by the pair that version gates are to see. A pair up to the current one is its own; a
 // newer file is read as a current one, since that is all this build knows, and a negative number counts as 0.

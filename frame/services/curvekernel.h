@@ -57,39 +57,40 @@ struct CRV_Curve {
 // The curve's y at abscissa x. Never leaves the range of the four y. The residual in x is within 1e-13 of the segment's
 // length; where x is linear in t (both influences one third) t is computed directly.
 // x may be infinite (an end), not NaN.
-KFS_SERVICE_API int CRV_EvaluateYFromX(CRV_Curve const* curve, double* y, double x);
+[[nodiscard]] KFS_SERVICE_API int CRV_EvaluateYFromX(CRV_Curve const* curve, double* y, double x);
 
 // dy/dx at x; x outside the segment gives the slope at that end.
 // Where dx/dt and dy/dt vanish together (a handle of length zero, a cusp) the answer is the slope's limit on the curve:
 // the quotient of the second derivatives, else of the third, else 0. Where only dx/dt vanishes the tangent is vertical;
 // it is answered as if dx/dt were 1e-12 of the segment, a large finite number of the right sign.
 // A segment without extent in x has slope 0. A result too large for a double is the largest double.
-KFS_SERVICE_API int CRV_Evaluate1dDerivFromX(CRV_Curve const* curve, double* dydx, double x);
+[[nodiscard]] KFS_SERVICE_API int CRV_Evaluate1dDerivFromX(CRV_Curve const* curve, double* dydx, double x);
 
 // The second derivative of y by x at x, limited at vertical tangents like the first; 0 where the curve has no
 // direction (dx/dt and dy/dt vanish together) and on a segment without extent in x.
-KFS_SERVICE_API int CRV_Evaluate1dDeriv2FromX(CRV_Curve const* curve, double* d2ydx2, double x);
+[[nodiscard]] KFS_SERVICE_API int CRV_Evaluate1dDeriv2FromX(CRV_Curve const* curve, double* d2ydx2, double x);
 
 // The smallest x at which y is reached. The curve must be non-decreasing (see CRV_CurveSetNonDecreasing).
 // y at or below p0's answers p0.x, also when all y are equal; y at or above p3's answers p3.x.
-KFS_SERVICE_API int CRV_EvaluateXFromY(CRV_Curve const* curve, double* x, double y);
+[[nodiscard]] KFS_SERVICE_API int CRV_EvaluateXFromY(CRV_Curve const* curve, double* x, double y);
 
 // Every x where dy/dx equals yPrime: `count` of them, 0 to 2, in ascending order in `xs`, which has room for two.
 // The ends count: an eased key has slope 0 there. A stretch whose slope is yPrime everywhere (a straight segment) has
 // no distinct point and answers 0 points, as does a curve that never has that slope; both are success.
 // Points at which the curve has no slope (vertical tangents) and points on a part that turns back in x don't count.
 // On failure `count` is 0 where it isn't null.
-KFS_SERVICE_API int CRV_EvaluateXFromYPrime(CRV_Curve const* curve, int* count, double* xs, double yPrime);
+[[nodiscard]] KFS_SERVICE_API int CRV_EvaluateXFromYPrime(CRV_Curve const* curve, int* count, double* xs,
+                                                          double yPrime);
 
 // The parameter, 0 to 1, at which the curve's x coordinate is x. Only x is looked at; dimension 1 and up.
-KFS_SERVICE_API int CRV_TFromX(CRV_Curve const* curve, double* t, double x);
+[[nodiscard]] KFS_SERVICE_API int CRV_TFromX(CRV_Curve const* curve, double* t, double x);
 
 // The position at t: `dimension` doubles. t is limited to 0 to 1; at the two the result is p0 and p3 to the bit.
 // Each coordinate stays in the range of its four control coordinates. Dimension 1 to 4.
-KFS_SERVICE_API int CRV_EvaluatePoint(CRV_Curve const* curve, double* point, double t);
+[[nodiscard]] KFS_SERVICE_API int CRV_EvaluatePoint(CRV_Curve const* curve, double* point, double t);
 
 // The derivative by t at full size: at t = 0 it is 3 (p1 - p0). `dimension` doubles; t is limited to 0 to 1.
-KFS_SERVICE_API int CRV_EvaluateDeriv(CRV_Curve const* curve, double* vector, double t);
+[[nodiscard]] KFS_SERVICE_API int CRV_EvaluateDeriv(CRV_Curve const* curve, double* vector, double t);
 
 // Splits the curve at t, which is limited to 0 to 1. Dimension 1 to 4. `rows` receives five points of `dimension`
 // doubles:
@@ -99,7 +100,7 @@ KFS_SERVICE_API int CRV_EvaluateDeriv(CRV_Curve const* curve, double* vector, do
 //   row 2   the split
 //   row 3   right p1      `rows` may not overlap the curve's points.
 //   row 4   right p2
-KFS_SERVICE_API int CRV_SubdivideCurve(CRV_Curve const* curve, double* rows, double t);
+[[nodiscard]] KFS_SERVICE_API int CRV_SubdivideCurve(CRV_Curve const* curve, double* rows, double t);
 
 // Moves p1 and p2 so that y doesn't decrease from p0 to p3. `changed`, which may be null, is set to 1 if a handle was
 // moved and left alone otherwise.
@@ -113,7 +114,7 @@ KFS_SERVICE_API int CRV_SubdivideCurve(CRV_Curve const* curve, double* rows, dou
 // No curve from a high p0 to a low p3 can be non-decreasing: it is treated upside down, so that it falls steadily and
 // doesn't swing out. Coordinates are looked at only where a handle has to move: that is when CRV_Err_NotFinite is
 // found.
-KFS_SERVICE_API int CRV_CurveSetNonDecreasing(CRV_Curve* curve, unsigned char* changed);
+[[nodiscard]] KFS_SERVICE_API int CRV_CurveSetNonDecreasing(CRV_Curve* curve, unsigned char* changed);
 
 // Measures a spatial curve and makes its table from distance to parameter.
 //
@@ -133,8 +134,8 @@ KFS_SERVICE_API int CRV_CurveSetNonDecreasing(CRV_Curve* curve, unsigned char* c
 // Cost: 0.5 to 2 microseconds and 400 to 900 bytes, one allocation; 32 bytes for each place at which the path is cut.
 // At an accuracy of 1e-6 of the path's size a gentle segment needs some 13 of them, the median of a hundred thousand
 // segments of all kinds 22 and the worst 100; the finest accuracy needs three times as many.
-KFS_SERVICE_API int CRV_BuildArcSpline(CRV_Curve const* curve, SEQ_Head*** remapTable, double* arcLength,
-                                       double accuracy);
+[[nodiscard]] KFS_SERVICE_API int CRV_BuildArcSpline(CRV_Curve const* curve, SEQ_Head*** remapTable, double* arcLength,
+                                                     double accuracy);
 
 // The parameter at distance s from p0, by the table of CRV_BuildArcSpline.
 //
@@ -145,4 +146,5 @@ KFS_SERVICE_API int CRV_BuildArcSpline(CRV_Curve const* curve, SEQ_Head*** remap
 //   one          the parameter at p3: the answer runs from 0 to this. Callers pass 1.0.
 //
 // SEQ_Err_BadList for a list that isn't such a table.
-KFS_SERVICE_API int CRV_TFromSSpline(CRV_Curve const* curve, SEQ_Head*** remapTable, double* t, double s, double one);
+[[nodiscard]] KFS_SERVICE_API int CRV_TFromSSpline(CRV_Curve const* curve, SEQ_Head*** remapTable, double* t, double s,
+                                                   double one);

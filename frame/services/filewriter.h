@@ -44,7 +44,7 @@ enum class CKF_IoCall {
 class CKF_IoHook {
 public:
     virtual ~CKF_IoHook() = default;
-    virtual int Before(CKF_IoCall call, std::size_t bytes) noexcept = 0;
+    [[nodiscard]] virtual int Before(CKF_IoCall call, std::size_t bytes) noexcept = 0;
 };
 
 // What may stand at the target's place.
@@ -54,7 +54,7 @@ enum class CKF_Target {
 };
 
 // Answers are 0 or an errno value. The first failure stays, removes the temporary file, and is the answer of all that
-// follows until the next Create. Nothing throws; ENOMEM is out of memory.
+// follows until the next Create: only Commit's must be looked at. Nothing throws; ENOMEM is out of memory.
 class KFS_SERVICE_API CKF_FileWriter {
 public:
     // A hook that isn't null must outlive the writer.
@@ -88,7 +88,7 @@ private:
         char text[512] = "";
     };
     template <class Work>
-    int Run(Work work) noexcept;
+    [[nodiscard]] int Run(Work work) noexcept;
 
     std::unique_ptr<Impl> impl_;  // while a file is being written
     CKF_IoHook* hook_;

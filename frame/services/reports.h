@@ -55,13 +55,13 @@ KFS_SERVICE_API void Qp_ReportError(int id, int severity) noexcept;
 // Reports a text.
 KFS_SERVICE_API void Qp_ReportErrString(int id, int severity, char const* text) noexcept;
 // Reports a code with a text, or with a null text the code alone, and returns the code.
-KFS_SERVICE_API int Qp_ReportLegacyErrString(int id, int severity, int code, char const* text) noexcept;
+[[nodiscard]] KFS_SERVICE_API int Qp_ReportLegacyErrString(int id, int severity, int code, char const* text) noexcept;
 // Reports a text.
 KFS_SERVICE_API void Q_ReportError(int id, int severity, u16str const& text) noexcept;
 // Reports a broken invariant with severity 8, and returns: the caller goes on. `code` is 0.
 KFS_SERVICE_API void Q_ReportFailedVerification(int id, int line, int code, char const* text) noexcept;
 // Reports what() with severity 8 and returns the code for the exception: 4 for std::bad_alloc, else Q_Err_Exception.
-KFS_SERVICE_API int Q_TranslateAndReportException(std::exception const& exception) noexcept;
+[[nodiscard]] KFS_SERVICE_API int Q_TranslateAndReportException(std::exception const& exception) noexcept;
 
 // ---- log
 

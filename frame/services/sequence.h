@@ -79,29 +79,29 @@ inline constexpr SEQ_RemoveFuncValue SEQ_RemoveFunc{};
 //   itemSize  1 to 32767 bytes; SEQ_Err_BadArgument otherwise
 //   list      out; untouched on failure. To be freed with SEQ_Dispose.
 // The other three arguments have no meaning here; callers pass 0, 4 and 1.
-KFS_SERVICE_API int SEQ_New(int reserved, short itemSize, int reserved4, int reserved1, SEQ_Head*** list);
+[[nodiscard]] KFS_SERVICE_API int SEQ_New(int reserved, short itemSize, int reserved4, int reserved1, SEQ_Head*** list);
 
 // Disposes every item, first to last, and frees the list. The handle is dead whatever the result is, pinned or not.
 // The result is the first code of a dispose function; the later items are disposed all the same.
-KFS_SERVICE_API int SEQ_Dispose(SEQ_Head** list, long reserved);
+[[nodiscard]] KFS_SERVICE_API int SEQ_Dispose(SEQ_Head** list, long reserved);
 
 // Makes a list with a copy of each item, with the source's item functions and refcon, unpinned. If a copy fails, what
 // was made is disposed, and `out` is untouched.
-KFS_SERVICE_API int SEQ_Duplicate(SEQ_Head const* const* list, long reserved, SEQ_Head*** out);
+[[nodiscard]] KFS_SERVICE_API int SEQ_Duplicate(SEQ_Head const* const* list, long reserved, SEQ_Head*** out);
 
 // Sets item functions. `count` is 3, the number of entries of SEQ_Funcs.
-KFS_SERVICE_API int SEQ_SetFuncs(SEQ_Head** list, int count, SEQ_Funcs const* funcs);
+[[nodiscard]] KFS_SERVICE_API int SEQ_SetFuncs(SEQ_Head** list, int count, SEQ_Funcs const* funcs);
 
 // Writes the list's refcon.
-KFS_SERVICE_API int SEQ_SetRefcon(void* refcon, SEQ_Head** list);
+[[nodiscard]] KFS_SERVICE_API int SEQ_SetRefcon(void* refcon, SEQ_Head** list);
 
 // ---- pins
 
 // Add a pin and take one away. They nest. The int has no meaning; callers pass 1.
-KFS_SERVICE_API int SEQ_Lock(int reserved, SEQ_Head** list);
-KFS_SERVICE_API int SEQ_LockConst(int reserved, SEQ_Head const* const* list);
-KFS_SERVICE_API int SEQ_Unlock(SEQ_Head** list);
-KFS_SERVICE_API int SEQ_UnlockConst(SEQ_Head const* const* list);
+[[nodiscard]] KFS_SERVICE_API int SEQ_Lock(int reserved, SEQ_Head** list);
+[[nodiscard]] KFS_SERVICE_API int SEQ_LockConst(int reserved, SEQ_Head const* const* list);
+[[nodiscard]] KFS_SERVICE_API int SEQ_Unlock(SEQ_Head** list);
+[[nodiscard]] KFS_SERVICE_API int SEQ_UnlockConst(SEQ_Head const* const* list);
 
 // The item size that a list was made with; 0 for a null handle.
 KFS_SERVICE_API int SEQ_GetItemSize(SEQ_Head const* const* list);
@@ -113,73 +113,77 @@ KFS_SERVICE_API int SEQ_GetPinCount(SEQ_Head const* const* list);
 
 // The address of an item. With `lock` 1 the list is pinned on success and the caller owes an SEQ_Unlock; with 0 the
 // caller holds a pin already. On failure nothing is pinned and `item` is untouched.
-KFS_SERVICE_API int SEQ_GetAddress(SEQ_Head** list, int index, int lock, void** item);
+[[nodiscard]] KFS_SERVICE_API int SEQ_GetAddress(SEQ_Head** list, int index, int lock, void** item);
 
 // The address of an item for reading; -1 names the last one. Takes no pin. On failure `item` is untouched.
 // Cost: a bounds check, a multiplication and an addition.
-KFS_SERVICE_API int SEQ_GetConstAddress(SEQ_Head const* const* list, int index, void const** item);
+[[nodiscard]] KFS_SERVICE_API int SEQ_GetConstAddress(SEQ_Head const* const* list, int index, void const** item);
 
 // Copies an item to `destination` (itemSize bytes, not zeroed here) through the copy function.
-KFS_SERVICE_API int SEQ_GetItemCopy(SEQ_Head const* const* list, long reserved, int index, void* destination);
+[[nodiscard]] KFS_SERVICE_API int SEQ_GetItemCopy(SEQ_Head const* const* list, long reserved, int index,
+                                                  void* destination);
 
 // Puts a copy of `source` in the place of an item, which is disposed. If the copy can't be made, or the old item can't
 // be disposed, the old item stays as it was. The items don't move. `source` may be an item of this list.
-KFS_SERVICE_API int SEQ_SetItemCopy(void const* source, int index, SEQ_Head** list, long reserved, long reserved2);
+[[nodiscard]] KFS_SERVICE_API int SEQ_SetItemCopy(void const* source, int index, SEQ_Head** list, long reserved,
+                                                  long reserved2);
 
 // Inserts a copy of `source`, made by the copy function, so that it stands at `index`; the count, or -1, appends.
 // `source` may be an item of this list. Amortised cost: the bytes behind `index`.
-KFS_SERVICE_API int SEQ_InsertCopy(void const* source, int index, SEQ_Head** list, long reserved);
+[[nodiscard]] KFS_SERVICE_API int SEQ_InsertCopy(void const* source, int index, SEQ_Head** list, long reserved);
 
 // The same without the copy function: the list takes over the bytes of `source` and what they own.
-KFS_SERVICE_API int SEQ_Insert(void const* source, int index, SEQ_Head** list);
+[[nodiscard]] KFS_SERVICE_API int SEQ_Insert(void const* source, int index, SEQ_Head** list);
 
 // Removes an item. With `out` (itemSize bytes) the item is moved there and not disposed; with null it is disposed, and
 // it stays where it is if that fails. The capacity stays.
-KFS_SERVICE_API int SEQ_Remove(int index, SEQ_Head** list, long reserved, void* out);
+[[nodiscard]] KFS_SERVICE_API int SEQ_Remove(int index, SEQ_Head** list, long reserved, void* out);
 
 // Binary search with the sort function, the probe being its first operand. The list must be in ascending order.
 //   found  out: 1 if an item compares equal, else 0
 //   index  out: the first item that compares equal; if there is none, the index of the first item after the probe,
 //          which is the count if the probe comes after all items
 // On failure both are untouched.
-KFS_SERVICE_API int SEQ_GetSortedItem(SEQ_Head** list, long reserved, long reserved2, void const* probe,
-                                      unsigned char* found, long reserved3, int* index);
-KFS_SERVICE_API int SEQ_GetSortedConstItem(SEQ_Head const* const* list, long reserved, long reserved2,
-                                           void const* probe, unsigned char* found, long reserved3, int* index);
+[[nodiscard]] KFS_SERVICE_API int SEQ_GetSortedItem(SEQ_Head** list, long reserved, long reserved2, void const* probe,
+                                                    unsigned char* found, long reserved3, int* index);
+[[nodiscard]] KFS_SERVICE_API int SEQ_GetSortedConstItem(SEQ_Head const* const* list, long reserved, long reserved2,
+                                                         void const* probe, unsigned char* found, long reserved3,
+                                                         int* index);
 
 // ---- all items
 
 // Calls the function for each item in the order of the indices. The function may change items, and may insert or
 // remove: the walk goes by index and ends at the count of that moment.
-KFS_SERVICE_API int SEQ_ForEach(SEQ_Head** list, long refcon, SEQ_IterFunc func, long reserved);
-KFS_SERVICE_API int SEQ_ForEachConst(SEQ_Head const* const* list, long refcon, SEQ_ConstIterFunc func, long reserved);
+[[nodiscard]] KFS_SERVICE_API int SEQ_ForEach(SEQ_Head** list, long refcon, SEQ_IterFunc func, long reserved);
+[[nodiscard]] KFS_SERVICE_API int SEQ_ForEachConst(SEQ_Head const* const* list, long refcon, SEQ_ConstIterFunc func,
+                                                   long reserved);
 
 // The same for the indices `first` to `last`, both included, stepping down if `first` is above `last`. Both must be in
 // the list, or nothing is called. `lastVisited`, which may be null, receives the index of the last call.
-KFS_SERVICE_API int SEQ_ForRange(SEQ_Head** list, int first, int last, long refcon, SEQ_IterFunc func,
-                                 int* lastVisited);
+[[nodiscard]] KFS_SERVICE_API int SEQ_ForRange(SEQ_Head** list, int first, int last, long refcon, SEQ_IterFunc func,
+                                               int* lastVisited);
 
 // ---- size
 
 // Makes room for `count` items in all; a count that has room already is fine. Later insertions up to that count need no
 // memory and move no block.
-KFS_SERVICE_API int SEQ_ReserveSpace(int count, SEQ_Head** list);
+[[nodiscard]] KFS_SERVICE_API int SEQ_ReserveSpace(int count, SEQ_Head** list);
 
 // Gives spare capacity back. A pinned list is left as it is, and so is a small duplicate that hasn't grown, whose items
 // lie in one block with it: neither is an error.
-KFS_SERVICE_API int SEQ_Compact(SEQ_Head** list);
+[[nodiscard]] KFS_SERVICE_API int SEQ_Compact(SEQ_Head** list);
 
 // Sets the count. New items are zero; items beyond the count are disposed, last first, down to one that refuses.
-KFS_SERVICE_API int SEQ_SetNumItems(int count, SEQ_Head** list, long reserved);
+[[nodiscard]] KFS_SERVICE_API int SEQ_SetNumItems(int count, SEQ_Head** list, long reserved);
 
 // ---- files
 
 // Writes the list into a chunk file at its present place, as one atom "seql": item size, count, and the items' bytes as
 // they are, one behind the other. Swapping is the caller's. Result: 0 or the chunk file's code.
-KFS_SERVICE_API int SEQ_Write(SEQ_Head const* const* list, CKF_File* file);
+[[nodiscard]] KFS_SERVICE_API int SEQ_Write(SEQ_Head const* const* list, CKF_File* file);
 
 // Reads the next "seql" of the innermost open list into a new list without item functions. The chunk must hold exactly
 // the items that it claims, which is checked before anything is allocated; SEQ_Err_BadChunk, and the file has then
 // failed with that code. On failure `list` is untouched.
 inline constexpr int SEQ_Err_BadChunk = 0x1507;
-KFS_SERVICE_API int SEQ_Read(CKF_File* file, SEQ_Head*** list);
+[[nodiscard]] KFS_SERVICE_API int SEQ_Read(CKF_File* file, SEQ_Head*** list);

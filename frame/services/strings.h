@@ -42,8 +42,8 @@ KFS_SERVICE_API u16str Q_AsciiToUTF16String(char const* text);
 // Copies a text into `destination`, which has room for `size` bytes: as many bytes as fit before the terminator, which
 // is always written. Cutting a text short is not an error; it may cut a multibyte character in two.
 // Source and destination may overlap. Result: 0, or Q_Err_BadDestination.
-KFS_SERVICE_API int Q_CopyString(char const* source, long size, char* destination) noexcept;
-inline int Q_CopyString(unsigned char const* source, long size, char* destination) noexcept
+[[nodiscard]] KFS_SERVICE_API int Q_CopyString(char const* source, long size, char* destination) noexcept;
+[[nodiscard]] inline int Q_CopyString(unsigned char const* source, long size, char* destination) noexcept
 {
     return Q_CopyString(reinterpret_cast<char const*>(source), size, destination);
 }
@@ -101,8 +101,8 @@ private:
     bool isNumber_ = false;
 };
 
-KFS_SERVICE_API int Q_SubStringList(char* destination, long size, char const* format,
-                                    std::span<Q_SubArgument const> arguments);
+[[nodiscard]] KFS_SERVICE_API int Q_SubStringList(char* destination, long size, char const* format,
+                                                  std::span<Q_SubArgument const> arguments);
 KFS_SERVICE_API void Q_SubStringList(u16str* destination, u16str const& format,
                                      std::span<Q_SubArgument const> arguments);
 
@@ -110,7 +110,7 @@ KFS_SERVICE_API void Q_SubStringList(u16str* destination, u16str const& format,
 // "^^L9", where a number is expected. A placeholder without an argument stays as it is, and what was put in is not
 // looked through again. The result is cut to `size` bytes with the terminator. Result: 0, or Q_Err_BadDestination.
 template <class... Arguments>
-int Q_SubString(char* destination, long size, char const* format, Arguments const&... arguments)
+[[nodiscard]] int Q_SubString(char* destination, long size, char const* format, Arguments const&... arguments)
 {
     const std::array<Q_SubArgument, sizeof...(Arguments)> list{Q_SubArgument(arguments)...};
     return Q_SubStringList(destination, size, format, list);

@@ -33,11 +33,12 @@ struct M_Ratio {
 };
 
 // The general case of T_ShortConvTime, which is what to call.
-KFS_SERVICE_API int T_ShortConvTimeGeneral(int value, unsigned int scale, unsigned int newScale, int* out) noexcept;
+[[nodiscard]] KFS_SERVICE_API int T_ShortConvTimeGeneral(int value, unsigned int scale, unsigned int newScale,
+                                                         int* out) noexcept;
 
 // Expresses `value` units of `scale` in units of `newScale`, rounded to the nearest, halves away from zero.
 // `out` may be the variable that `value` was read from.
-inline int T_ShortConvTime(int value, unsigned int scale, unsigned int newScale, int* out) noexcept
+[[nodiscard]] inline int T_ShortConvTime(int value, unsigned int scale, unsigned int newScale, int* out) noexcept
 {
     if (scale == newScale && scale != 0) {
         *out = value;
@@ -47,25 +48,26 @@ inline int T_ShortConvTime(int value, unsigned int scale, unsigned int newScale,
 }
 
 // The same for a whole time, scale included. The last argument has no meaning; callers pass 0.
-KFS_SERVICE_API int T_ConvTime(T_Time const* source, unsigned int newScale, T_Time* destination, int reserved) noexcept;
+[[nodiscard]] KFS_SERVICE_API int T_ConvTime(T_Time const* source, unsigned int newScale, T_Time* destination,
+                                             int reserved) noexcept;
 
 // The exact sum: in the common scale, else in the least common multiple of the scales, else in lowest terms.
-KFS_SERVICE_API int T_AddTime(T_Time const* a, T_Time const* b, T_Time* sum) noexcept;
+[[nodiscard]] KFS_SERVICE_API int T_AddTime(T_Time const* a, T_Time const* b, T_Time* sum) noexcept;
 
 // The exact product: in the scale of `time`, else in that scale times the denominator, else in lowest terms.
-KFS_SERVICE_API int T_MulTime(T_Time const* time, M_Ratio const* ratio, T_Time* product) noexcept;
+[[nodiscard]] KFS_SERVICE_API int T_MulTime(T_Time const* time, M_Ratio const* ratio, T_Time* product) noexcept;
 
 // `result` becomes -1, 0 or 1 as `a` is earlier than, equal to or later than `b`. Two times with the same two fields
 // are equal even if their scale is 0.
-KFS_SERVICE_API int T_CompareTime(T_Time const* a, T_Time const* b, int* result) noexcept;
+[[nodiscard]] KFS_SERVICE_API int T_CompareTime(T_Time const* a, T_Time const* b, int* result) noexcept;
 
 // The same instant in lowest terms; no time at all of any scale, 0 units, becomes 0 units of scale 1.
 //   changed  out or null: 1 if the fields differ from the source's, else 0
-KFS_SERVICE_API int T_ReduceTime(T_Time const* source, T_Time* reduced, unsigned char* changed) noexcept;
+[[nodiscard]] KFS_SERVICE_API int T_ReduceTime(T_Time const* source, T_Time* reduced, unsigned char* changed) noexcept;
 
 // Seconds as a count of units, rounded to the nearest, halves away from zero. This one can't fail: what is out of range
 // saturates at the greatest or least 32-bit value, and a NaN gives 0.
-KFS_SERVICE_API int T_FpLong2TimeValue(unsigned int scale, double seconds) noexcept;
+[[nodiscard]] KFS_SERVICE_API int T_FpLong2TimeValue(unsigned int scale, double seconds) noexcept;
 
 // The same span with start and duration in one scale: the common one, else the least common multiple of the two scales,
 // else of the two scales in lowest terms. Throws T_Err_Scale or T_Err_Overflow as an int.

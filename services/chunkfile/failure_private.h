@@ -9,17 +9,18 @@ void CKFp_DescribeIo(char* text, std::size_t size, int error, char const* what, 
 // The first failure of a file, kept without memory of its own.
 class CKFp_Failure {
 public:
-    int Code() const noexcept { return code_; }
+    [[nodiscard]] int Code() const noexcept { return code_; }
     char const* Text() const noexcept { return text_; }
     std::uint64_t Offset() const noexcept { return offset_; }
 
     // Takes a failure unless there is one already, and returns the one that counts.
-    [[gnu::format(printf, 4, 5)]] int Set(int code, std::uint64_t offset, char const* format, ...) noexcept;
+    [[nodiscard]] [[gnu::format(printf, 4, 5)]] int Set(int code, std::uint64_t offset, char const* format,
+                                                        ...) noexcept;
     // The same for an errno value.
-    int SetIo(int error, std::uint64_t offset, char const* what, char const* path) noexcept;
-    int SetOutOfMemory(std::uint64_t offset) noexcept;
+    [[nodiscard]] int SetIo(int error, std::uint64_t offset, char const* what, char const* path) noexcept;
+    [[nodiscard]] int SetOutOfMemory(std::uint64_t offset) noexcept;
     // For what was asked for under an id that only lists have, or none.
-    int SetBadAtomId(int id, std::uint64_t offset) noexcept;
+    [[nodiscard]] int SetBadAtomId(int id, std::uint64_t offset) noexcept;
 
 private:
     int code_ = 0;

@@ -13,7 +13,7 @@ struct CKFp_FreePtr {
 using CKFp_Block = std::unique_ptr<unsigned char, CKFp_FreePtr>;
 
 // Reads a whole regular file into one block. 0 or a recorded failure.
-int CKFp_LoadFile(char const* path, CKFp_Failure& failure, CKFp_Block* block, std::size_t* size);
+[[nodiscard]] int CKFp_LoadFile(char const* path, CKFp_Failure& failure, CKFp_Block* block, std::size_t* size);
 
 struct CKF_File::Impl : Q_MemTrackedObject {
     CKFp_Failure failure;
@@ -29,7 +29,8 @@ struct CKFp_Access {
 
 // Runs `work` on the file's reader or writer, unless the file has failed. Out of memory is a failure like any other.
 template <class Worker, class Work>
-int CKFp_WithWorker(CKF_File* file, std::unique_ptr<Worker> CKF_File::Impl::*worker, char const* direction, Work work)
+[[nodiscard]] int CKFp_WithWorker(CKF_File* file, std::unique_ptr<Worker> CKF_File::Impl::*worker,
+                                  char const* direction, Work work)
 {
     if (!file) return CKF_Err_BadArgument;
     CKF_File::Impl& impl = CKFp_Access::ImplOf(*file);
@@ -43,13 +44,13 @@ int CKFp_WithWorker(CKF_File* file, std::unique_ptr<Worker> CKF_File::Impl::*wor
 }
 
 template <class Work>
-int CKFp_WithReader(CKF_File* file, Work work)
+[[nodiscard]] int CKFp_WithReader(CKF_File* file, Work work)
 {
     return CKFp_WithWorker(file, &CKF_File::Impl::reader, "reading", work);
 }
 
 template <class Work>
-int CKFp_WithWriter(CKF_File* file, Work work)
+[[nodiscard]] int CKFp_WithWriter(CKF_File* file, Work work)
 {
     return CKFp_WithWorker(file, &CKF_File::Impl::writer, "writing", work);
 }

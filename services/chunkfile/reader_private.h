@@ -12,19 +12,19 @@ public:
     CKFp_Reader(CKFp_Bytes bytes, CKFp_Failure& failure) noexcept : bytes_(bytes), failure_(failure) {}
 
     // Checks the outer form and takes the version record; the position is then behind it.
-    int Start(CKFp_Version* version) noexcept;
+    [[nodiscard]] int Start(CKFp_Version* version) noexcept;
 
     // Looks for the next chunk inside the innermost open list; 0 stands for any id, any list type. The position doesn't
     // move. CKF_Err_NoSuchChunk isn't recorded.
-    int Find(int id, int listType, CKF_ChunkInfo const* parent, CKFp_Chunk* found) noexcept;
+    [[nodiscard]] int Find(int id, int listType, CKF_ChunkInfo const* parent, CKFp_Chunk* found) noexcept;
     // The data of a chunk that was found; the position goes behind it.
     CKFp_Bytes Take(CKFp_Chunk const& chunk) noexcept;
 
-    int Enter(CKFp_Chunk const& chunk, CKF_ChunkInfo* info) noexcept;
+    [[nodiscard]] int Enter(CKFp_Chunk const& chunk, CKF_ChunkInfo* info) noexcept;
     // Leaves that chunk, and what was entered inside it. Nothing happens where it isn't open any more.
     void Leave(CKF_ChunkInfo const& info) noexcept;
     // The next bytes of the atom that was entered last.
-    int Read(std::size_t size, void* buffer) noexcept;
+    [[nodiscard]] int Read(std::size_t size, void* buffer) noexcept;
 
     CKFp_Bytes Bytes() const noexcept { return bytes_; }
     std::uint64_t Position() const noexcept { return position_; }
@@ -45,7 +45,7 @@ private:
 
     Level& Top() noexcept { return levels_[static_cast<std::size_t>(open_)]; }
     bool IsTop(CKF_ChunkInfo const& info) noexcept;
-    int CheckLevel(CKF_ChunkInfo const* parent) noexcept;
+    [[nodiscard]] int CheckLevel(CKF_ChunkInfo const* parent) noexcept;
 
     CKFp_Bytes bytes_;
     CKFp_Failure& failure_;

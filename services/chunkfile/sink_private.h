@@ -20,16 +20,16 @@ public:
     CKFp_Sink& operator=(CKFp_Sink const&) = delete;
 
     // Puts bytes at the end. Bytes of one call can later be replaced together.
-    int Append(void const* bytes, std::size_t size);
+    [[nodiscard]] int Append(void const* bytes, std::size_t size);
     // Replaces bytes, all of which came with one call of Append.
-    virtual int Patch(std::uint64_t offset, void const* bytes, std::size_t size) = 0;
+    [[nodiscard]] virtual int Patch(std::uint64_t offset, void const* bytes, std::size_t size) = 0;
     // Makes the file what it is to be.
-    virtual int Commit() = 0;
+    [[nodiscard]] virtual int Commit() = 0;
 
     std::uint64_t Size() const noexcept { return size_; }
 
 protected:
-    virtual int DoAppend(void const* bytes, std::size_t size) = 0;
+    [[nodiscard]] virtual int DoAppend(void const* bytes, std::size_t size) = 0;
     CKFp_Failure& Failure() noexcept { return failure_; }
 
 private:
@@ -62,7 +62,7 @@ class CKFp_DiskSink : public CKFp_Sink {
 public:
     CKFp_DiskSink(CKF_IoHook* hook, CKFp_Failure& failure) noexcept : CKFp_Sink(failure), file_(hook) {}
 
-    int Create(char const* path) { return Told(file_.Create(path)); }
+    [[nodiscard]] int Create(char const* path) { return Told(file_.Create(path)); }
     int Patch(std::uint64_t offset, void const* bytes, std::size_t size) override
     {
         return Told(file_.Patch(offset, bytes, size));
@@ -71,7 +71,7 @@ public:
 
 private:
     int DoAppend(void const* bytes, std::size_t size) override { return Told(file_.Append(bytes, size)); }
-    int Told(int error) noexcept;
+    [[nodiscard]] int Told(int error) noexcept;
 
     CKF_FileWriter file_;
 };

@@ -6,7 +6,7 @@
 #include <sys/types.h>
 
 // Where a path leads when all symbolic links at its end are followed, also to what isn't there. 0 or an errno value.
-int CKFp_FollowLinks(std::string* path);
+[[nodiscard]] int CKFp_FollowLinks(std::string* path);
 // The folder of a path.
 std::string CKFp_FolderOf(std::string const& path);
 
@@ -20,14 +20,14 @@ public:
     CKFp_TemporaryFile& operator=(CKFp_TemporaryFile const&) = delete;
 
     // Makes an empty file of a name that no other has. Removes first what dead processes left of this target.
-    int Create(std::string const& target, mode_t mode);
+    [[nodiscard]] int Create(std::string const& target, mode_t mode);
     int Descriptor() const noexcept { return descriptor_; }
     // Tells what the system had to say at last. The lock stays.
-    int Close() noexcept;
-    int Rename(std::string const& target) noexcept;
+    [[nodiscard]] int Close() noexcept;
+    [[nodiscard]] int Rename(std::string const& target) noexcept;
 
 private:
-    int TryName(std::string const& name, mode_t mode);
+    [[nodiscard]] int TryName(std::string const& name, mode_t mode);
     void DropName() noexcept;
 
     char* name_ = nullptr;     // allocated; null where there is nothing to remove

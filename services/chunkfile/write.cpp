@@ -64,7 +64,7 @@ CKF_ScWriteList::CKF_ScWriteList(CKF_File* file, int listType, int sizeHint) : f
 
 CKF_ScWriteList::~CKF_ScWriteList()
 {
-    CKF_EndChunkWrite(file_, &chunk_);
+    static_cast<void>(CKF_EndChunkWrite(file_, &chunk_));  // the file keeps what fails
 }
 
 int CKF_WriteHandle(CKF_File* file, int id, char** handle)

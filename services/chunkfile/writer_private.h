@@ -17,21 +17,21 @@ public:
     {}
 
     // The outer form and an empty version record.
-    int Start();
+    [[nodiscard]] int Start();
     // Length of the form, version record, and the sink's commit.
-    int Commit(CKFp_Version const& version);
+    [[nodiscard]] int Commit(CKFp_Version const& version);
 
     // An atom whose data comes in pieces: begin, pieces of `size` bytes together, end.
-    int BeginAtom(int id, std::uint64_t size);
-    int Append(void const* bytes, std::size_t size) { return size == 0 ? 0 : sink_->Append(bytes, size); }
-    int EndAtom(std::uint64_t size);
+    [[nodiscard]] int BeginAtom(int id, std::uint64_t size);
+    [[nodiscard]] int Append(void const* bytes, std::size_t size) { return size == 0 ? 0 : sink_->Append(bytes, size); }
+    [[nodiscard]] int EndAtom(std::uint64_t size);
 
-    int BeginList(int listType, CKF_ChunkInfo* chunk);
-    int EndList(CKF_ChunkInfo* chunk);
+    [[nodiscard]] int BeginList(int listType, CKF_ChunkInfo* chunk);
+    [[nodiscard]] int EndList(CKF_ChunkInfo* chunk);
 
 private:
-    int CheckRoom(std::uint64_t size);
-    int PatchLength(std::uint64_t data);
+    [[nodiscard]] int CheckRoom(std::uint64_t size);
+    [[nodiscard]] int PatchLength(std::uint64_t data);
 
     std::unique_ptr<CKFp_Sink> sink_;
     std::uint32_t maxSize_;

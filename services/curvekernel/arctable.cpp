@@ -37,14 +37,14 @@ int PutIntoList(CRVp_ArcTable const& table, SEQ_Head**& list)
         fits ? SEQ_SetNumItems(table.items, list, 0) : SEQp_NewInOneBlock(sizeof(CRVp_ArcItem), table.items, &into);
     if (code != 0) return code;
     std::memcpy((*into)->items, table.words, static_cast<std::size_t>(table.items) * sizeof(CRVp_ArcItem));
-    if (list && into != list) SEQ_Dispose(list, 0);
+    if (list && into != list) static_cast<void>(SEQ_Dispose(list, 0));  // plain bytes, which refuse nothing
     list = into;
     return 0;
 }
 
 void GiveUp(SEQ_Head**& list)
 {
-    if (list) SEQ_Dispose(list, 0);
+    if (list) static_cast<void>(SEQ_Dispose(list, 0));  // what made it give up wins
     list = nullptr;
 }
 

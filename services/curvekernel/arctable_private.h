@@ -156,7 +156,7 @@ struct CRVp_ArcMeasured {
 };
 
 // 0, or what CRVp_CheckPath or the coordinates object to.
-int CRVp_PrepareArc(CRV_Curve const* curve, double accuracy, CRVp_ArcMeasured& measured);
+[[nodiscard]] int CRVp_PrepareArc(CRV_Curve const* curve, double accuracy, CRVp_ArcMeasured& measured);
 
 // Makes the table. 0, or CRV_Err_NotFinite where the length doesn't fit a double.
-int CRVp_MeasureArc(CRVp_ArcMeasured const& measured, CRVp_ArcTable& table);
+[[nodiscard]] int CRVp_MeasureArc(CRVp_ArcMeasured const& measured, CRVp_ArcTable& table);

@@ -15,14 +15,14 @@ inline bool CRVp_HasPoints(CRV_Curve const* curve)
 }
 
 // 0, or why the curve can't be read as y over x.
-inline int CRVp_CheckGraph(CRV_Curve const* curve)
+[[nodiscard]] inline int CRVp_CheckGraph(CRV_Curve const* curve)
 {
     if (!CRVp_HasPoints(curve)) return CRV_Err_NullArgument;
     return curve->dimension == 2 ? 0 : CRV_Err_Dimension;
 }
 
 // 0, or why the curve can't be read as a path.
-inline int CRVp_CheckPath(CRV_Curve const* curve)
+[[nodiscard]] inline int CRVp_CheckPath(CRV_Curve const* curve)
 {
     if (!CRVp_HasPoints(curve)) return CRV_Err_NullArgument;
     return curve->dimension >= 1 && curve->dimension <= CRVp_MostCurveDimensions ? 0 : CRV_Err_Dimension;

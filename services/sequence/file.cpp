@@ -23,7 +23,7 @@ int MakeList(CKFp_Bytes items, short itemSize, int count, SEQ_Head*** list)
     SEQ_Head** made = nullptr;
     if (int const code = SEQ_New(0, itemSize, 4, 1, &made)) return code;
     if (int const code = SEQ_SetNumItems(count, made, 0)) {
-        SEQ_Dispose(made, 0);
+        static_cast<void>(SEQ_Dispose(made, 0));  // the first error wins
         return code;
     }
     std::size_t const size = static_cast<std::size_t>(itemSize);

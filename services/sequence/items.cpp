@@ -126,7 +126,7 @@ int SEQ_SetItemCopy(void const* source, int index, SEQ_Head** list, long, long)
     if (!scratch.get()) return Q_Err_OutOfMemory;
     if (int const code = CopyItem(list, source, scratch.get())) return code;
     if (int const code = SEQp_DisposeItem(list, SEQp_Item(head, index))) {
-        SEQp_DisposeItem(list, scratch.get());
+        static_cast<void>(SEQp_DisposeItem(list, scratch.get()));  // the first error wins
         return code;
     }
     std::memcpy(SEQp_Item(head, index), scratch.get(), static_cast<std::size_t>(head.itemSize));

@@ -14,7 +14,7 @@ constexpr char const* ItemsLabel = "sorted item list items";
 constexpr int FirstCapacity = 4;
 
 struct DisposeList {
-    void operator()(SEQ_Head** list) const { SEQ_Dispose(list, 0); }
+    void operator()(SEQ_Head** list) const { static_cast<void>(SEQ_Dispose(list, 0)); }  // after a failure, which wins
 };
 using ListOwner = std::unique_ptr<SEQ_Head*, DisposeList>;
 
@@ -75,7 +75,7 @@ int DuplicateBytes(SEQ_Head const& from, SEQ_Head*** out)
     } else {
         if (int const code = SEQ_New(0, static_cast<short>(from.itemSize), 4, 1, &made)) return code;
         if (int const code = SEQp_SetCapacity(**made, from.count)) {
-            SEQ_Dispose(made, 0);
+            static_cast<void>(SEQ_Dispose(made, 0));  // the first error wins
             return code;
         }
         (*made)->count = from.count;

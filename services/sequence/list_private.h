@@ -37,17 +37,17 @@ inline unsigned char* SEQp_Item(SEQ_Head const& head, int index) noexcept
 // Makes an unpinned list without item functions whose `count` items, not set here, lie in one block with the head: half
 // the allocations, and an item is next to what leads to it. Such a list can grow like any other; it then leaves that
 // room unused. `itemSize` and `count` are good ones. 0 or 4.
-int SEQp_NewInOneBlock(int itemSize, int count, SEQ_Head*** list) noexcept;
+[[nodiscard]] int SEQp_NewInOneBlock(int itemSize, int count, SEQ_Head*** list) noexcept;
 
 // Makes room for `count` items in all, with the room that keeps repeated appending cheap. 0 or a code; the items may
 // move.
-int SEQp_Grow(SEQ_Head& head, int count) noexcept;
+[[nodiscard]] int SEQp_Grow(SEQ_Head& head, int count) noexcept;
 
 // Moves the items into a block of exactly `capacity` items, at least the count. 0 or 4, and then nothing has changed.
-int SEQp_SetCapacity(SEQ_Head& head, int capacity) noexcept;
+[[nodiscard]] int SEQp_SetCapacity(SEQ_Head& head, int capacity) noexcept;
 
 // Gives back what the item owns, through the list's dispose function if it has one.
-inline int SEQp_DisposeItem(SEQ_Head** list, void* item)
+[[nodiscard]] inline int SEQp_DisposeItem(SEQ_Head** list, void* item)
 {
     SEQ_Head& head = **list;
     return head.dispose ? head.dispose(head.refcon, list, item) : 0;

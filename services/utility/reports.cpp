@@ -135,7 +135,7 @@ void Qp_ReportError(int id, int severity) noexcept
 
 void Qp_ReportErrString(int id, int severity, char const* text) noexcept
 {
-    Qp_ReportLegacyErrString(id, severity, 0, text);
+    static_cast<void>(Qp_ReportLegacyErrString(id, severity, 0, text));  // its answer is the code, which is 0
 }
 
 int Qp_ReportLegacyErrString(int id, int severity, int code, char const* text) noexcept

@@ -184,7 +184,7 @@ struct Fixture {
             for (int i = 0; i < 6; ++i) each->Key(i * 300, {i * i * 1.0, i % 3 * 10.0}, KFS_Interp_Spline);
         EXPECT_EQ(0, KFS_SetKeyModifiable(stream, 1, 2));
         EXPECT_EQ(0, stream->UpdateStream());
-        SEQ_Compact(stream->GetKeys());
+        EXPECT_EQ(0, SEQ_Compact(stream->GetKeys()));
         root.Store(stream);
         before = stream.Bytes();
         other = second;

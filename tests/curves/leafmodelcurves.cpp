@@ -100,8 +100,8 @@ double Leaf::Length(int index) const
     Path(path, At(index), At(index + 1), set.multiplier);
     SEQ_Head** table = nullptr;
     double length = 0.0;
-    CRV_BuildArcSpline(&path.head, &table, &length, set.accuracy);
-    SEQ_Dispose(table, 0);
+    EXPECT_EQ(0, CRV_BuildArcSpline(&path.head, &table, &length, set.accuracy));
+    EXPECT_EQ(0, SEQ_Dispose(table, 0));
     return length;
 }
 
@@ -220,9 +220,9 @@ void Leaf::ComputeFloatTime(int index)
     } else if (next.in != KFS_Interp_Hold) {
         Curve graph(2);
         Graph(graph, Seconds(next.time, prev.time), 0.0, total, OutOf(prev, 0), InTo(next, 0));
-        CRV_CurveSetNonDecreasing(&graph.head, nullptr);
+        EXPECT_EQ(0, CRV_CurveSetNonDecreasing(&graph.head, nullptr));
         double x = 0.0;
-        CRV_EvaluateXFromY(&graph.head, &x, s);
+        EXPECT_EQ(0, CRV_EvaluateXFromY(&graph.head, &x, s));
         time = prev.time + T_FpLong2TimeValue(set.scale, x);
     }
     time = std::clamp(time, prev.time + (index - around.prev), next.time - (around.next - index));
@@ -287,7 +287,7 @@ void Leaf::SplitHandles(Around const& around, Key& key, double x, double dt)
     for (std::size_t i = 0; i < key.value.size(); ++i) {
         Curve curve(2);
         SplitGraph(curve, dt, a.value[i], b.value[i], OutOf(a, i), InTo(b, i));
-        if (set.nonDecreasing) CRV_CurveSetNonDecreasing(&curve.head, &changed);
+        EXPECT_EQ(0, set.nonDecreasing ? CRV_CurveSetNonDecreasing(&curve.head, &changed) : 0);
         Split(curve, dt, x, a, b, key, i, &key.value[i], changed != 0);
     }
 }
@@ -299,7 +299,7 @@ void Leaf::SplitSpeeds(Around const& around, Key& key, double x, double dt)
     Curve curve(2);
     SplitGraph(curve, dt, 0.0, ArcsFrom(around.prev, around.next), OutOf(a, 0), InTo(b, 0));
     unsigned char changed = 0;
-    if (set.nonDecreasing) CRV_CurveSetNonDecreasing(&curve.head, &changed);
+    EXPECT_EQ(0, set.nonDecreasing ? CRV_CurveSetNonDecreasing(&curve.head, &changed) : 0);
     double distance = 0.0;
     Split(curve, dt, x, a, b, key, 0, &distance, changed != 0);
 }
@@ -325,7 +325,7 @@ void Leaf::SplitPath(Around const& beside, Key& key, double t)
     Curve path(key.value.size());
     Path(path, a, b, Unscaled);
     Numbers rows(5 * key.value.size());
-    CRV_SubdivideCurve(&path.head, rows.data(), t);
+    EXPECT_EQ(0, CRV_SubdivideCurve(&path.head, rows.data(), t));
     for (std::size_t i = 0; i < key.value.size(); ++i) {
         auto const row = [&](std::size_t r) { return rows[r * key.value.size() + i]; };
         a.outTangent[i] = row(0) - a.value[i];
@@ -402,9 +402,9 @@ Numbers Leaf::Interpolate(int time)
     for (std::size_t i = 0; i < a.value.size(); ++i) {
         Curve curve(2);
         Graph(curve, Seconds(b.time, a.time), a.value[i], b.value[i], OutOf(a, i), InTo(b, i));
-        if (set.nonDecreasing) CRV_CurveSetNonDecreasing(&curve.head, nullptr);
+        EXPECT_EQ(0, set.nonDecreasing ? CRV_CurveSetNonDecreasing(&curve.head, nullptr) : 0);
         double answer = 0.0;
-        CRV_EvaluateYFromX(&curve.head, &answer, Seconds(time, a.time));
+        EXPECT_EQ(0, CRV_EvaluateYFromX(&curve.head, &answer, Seconds(time, a.time)));
         value.push_back(answer);
     }
     return value;
@@ -414,9 +414,9 @@ double Leaf::SpeedGraph(Key const& a, Key const& b, double total, int time) cons
 {
     Curve graph(2);
     Graph(graph, Seconds(b.time, a.time), 0.0, total, OutOf(a, 0), InTo(b, 0));
-    CRV_CurveSetNonDecreasing(&graph.head, nullptr);
+    EXPECT_EQ(0, CRV_CurveSetNonDecreasing(&graph.head, nullptr));
     double answer = 0.0;
-    CRV_EvaluateYFromX(&graph.head, &answer, Seconds(time, a.time));
+    EXPECT_EQ(0, CRV_EvaluateYFromX(&graph.head, &answer, Seconds(time, a.time)));
     return answer;
 }
 
@@ -441,9 +441,9 @@ Leaf::PathPlace Leaf::FindOnPath(int time)
         Path(scaled, At(place.segment), At(place.segment + 1), set.multiplier);
         SEQ_Head** table = nullptr;
         double length = 0.0;
-        CRV_BuildArcSpline(&scaled.head, &table, &length, set.accuracy);
-        CRV_TFromSSpline(&path.head, &table, &place.t, s, 1.0);
-        SEQ_Dispose(table, 0);
+        EXPECT_EQ(0, CRV_BuildArcSpline(&scaled.head, &table, &length, set.accuracy));
+        EXPECT_EQ(0, CRV_TFromSSpline(&path.head, &table, &place.t, s, 1.0));
+        EXPECT_EQ(0, SEQ_Dispose(table, 0));
     } else {
         ForceUpdate();  // no key has a table, which is taken for a stream that was never repaired
         place.t = total != 0.0 ? s / total : 0.0;
@@ -458,7 +458,7 @@ Numbers Leaf::InterpolatePath(int time)
     Curve path(place.curve[0].size());
     for (std::size_t i = 0; i < 4; ++i) std::copy(place.curve[i].begin(), place.curve[i].end(), path.points[i].begin());
     Numbers point(place.curve[0].size());
-    CRV_EvaluatePoint(&path.head, point.data(), place.t);
+    EXPECT_EQ(0, CRV_EvaluatePoint(&path.head, point.data(), place.t));
     return point;
 }
 

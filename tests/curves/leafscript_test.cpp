@@ -224,7 +224,7 @@ struct Pair {
     {
         if (row.nonDecreasing) *stream->GetKFSFlagsForModify() |= KFS_StreamFlag_NonDecreasing;
         if (row.plainPath) {
-            KFS_SetStreamSParametrize(stream, 0);
+            EXPECT_EQ(0, KFS_SetStreamSParametrize(stream, 0));
             leaf.set.sParametrize = false;
         }
         root.Store(stream);

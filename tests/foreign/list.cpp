@@ -109,11 +109,12 @@ int SEQ_Dispose(SEQ_Head** handle, long reserved)
 int SEQ_Duplicate(SEQ_Head const* const* handle, long, SEQ_Head*** out)
 {
     List& source = Of(handle);
-    SEQ_New(0, static_cast<short>(source.itemSize), 4, 1, out);
+    if (int const code = SEQ_New(0, static_cast<short>(source.itemSize), 4, 1, out)) return code;
     List& made = Of(*out);
     made.refcon = source.refcon;
     made.funcs = source.funcs;
-    for (Item const& item : source.items) SEQ_InsertCopy(item.data(), -1, *out, 0);
+    for (Item const& item : source.items)
+        if (int const code = SEQ_InsertCopy(item.data(), -1, *out, 0)) return code;
     return 0;
 }
 
@@ -278,7 +279,7 @@ int SEQ_Compact(SEQ_Head**)
 
 int SEQ_SetNumItems(int count, SEQ_Head** handle, long)
 {
-    while (Of(handle).count > count) SEQ_Remove(Of(handle).count - 1, handle, 0, nullptr);
+    while (Of(handle).count > count) static_cast<void>(SEQ_Remove(Of(handle).count - 1, handle, 0, nullptr));
     while (Of(handle).count < count) Place(Of(handle), NewItem(Of(handle)), -1);
     return 0;
 }

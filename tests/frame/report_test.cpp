@@ -49,9 +49,9 @@ TEST_F(Reports, EveryCodeHasItsSentence)
 TEST_F(Reports, LastErrorAndIdFollowTheKindOfSentence)
 {
     Qp_SetThreadLastError(77);
-    KFSp_ReportErr(45, KFS_Err_Only2D3D, 0);
+    EXPECT_EQ(KFS_Err_Only2D3D, KFSp_ReportErr(45, KFS_Err_Only2D3D, 0));
     EXPECT_EQ(77, Qp_GetThreadLastError());
-    KFSp_ReportErr(0x70024, KFS_Err_NoKeys, 4);
+    EXPECT_EQ(KFS_Err_NoKeys, KFSp_ReportErr(0x70024, KFS_Err_NoKeys, 4));
     EXPECT_EQ(0, Qp_GetThreadLastError());
     std::vector<Reported> const seen = reports.Take();
     ASSERT_EQ(2u, seen.size());

@@ -6,6 +6,8 @@
 #include "keystore/edit.h"
 #include "overrides/streamexpression.h"
 
+#include <gtest/gtest.h>
+
 #include <functional>
 
 using kfshost::Scene;
@@ -67,7 +69,7 @@ StreamItem Path(int keys, bool floats)
 std::string Constant()
 {
     StreamItem item = Item("ball", StreamKind::Scale, 3, 1, KFS_Interp_Hold);
-    item.stream->SetConstant(1, 0);
+    EXPECT_EQ(0, item.stream->SetConstant(1, 0));
     return SavedOne(std::move(item));
 }
 

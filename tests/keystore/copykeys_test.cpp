@@ -18,7 +18,7 @@ public:
         EXPECT_EQ(0, SEQ_New(0, sizeof(int), 4, 1, &list_));
         for (int const index : indices) EXPECT_EQ(0, SEQ_Insert(&index, -1, list_));
     }
-    ~IndexList() { SEQ_Dispose(list_, 0); }
+    ~IndexList() { EXPECT_EQ(0, SEQ_Dispose(list_, 0)); }
     IndexList(IndexList const&) = delete;
     IndexList& operator=(IndexList const&) = delete;
     operator SEQ_Head**() const { return list_; }

@@ -17,7 +17,7 @@ namespace {
 class KeyTimesTest : public StreamTest {
 protected:
     KeyTimesTest() { EXPECT_EQ(SEQ_New(0, sizeof(KFS_KeyScalar), 0, 0, &list_), 0); }
-    ~KeyTimesTest() override { SEQ_Dispose(list_, 0); }
+    ~KeyTimesTest() override { EXPECT_EQ(0, SEQ_Dispose(list_, 0)); }
 
     void Insert(int time)
     {

@@ -27,7 +27,7 @@ int ReadAsATree(CKF_File* file, CKF_ChunkInfo const* parent)
             char** handle = nullptr;
             if (CKF_ReadHandle(file, leaf.GetChunkInfo(), CKF_Id("kfb4"), &handle) == 0) Q_FreeHandle(handle);
             SEQ_Head** list = nullptr;
-            if (SEQ_Read(file, &list) == 0) SEQ_Dispose(list, 0);
+            if (SEQ_Read(file, &list) == 0) EXPECT_EQ(0, SEQ_Dispose(list, 0));
             CKF_ReadUTF16(file, &text, leaf.GetChunkInfo());
         }
     });

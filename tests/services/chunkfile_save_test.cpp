@@ -31,13 +31,13 @@ int WriteEverything(CKF_File* file)
 {
     int const thrown = Thrown([&] {
         const CKF_ScWriteList outer(file, CKF_Id("kfgp"), 0);
-        CKF_WriteString(file, CKF_Id("kfsn"), Text("name"), 0);
+        static_cast<void>(CKF_WriteString(file, CKF_Id("kfsn"), Text("name"), 0));
         CKF_ChunkInfo leaf{};
-        CKF_BeginChunkWrite(file, CKF_ListId, 0, CKF_Id("kfbs"), &leaf);
-        CKF_WriteAtom(file, CKF_Id("cdat"), 3, "abc");
+        static_cast<void>(CKF_BeginChunkWrite(file, CKF_ListId, 0, CKF_Id("kfbs"), &leaf));
+        static_cast<void>(CKF_WriteAtom(file, CKF_Id("cdat"), 3, "abc"));
         CKF_WriteUTF16(file, Text("expression"));
         if (char** const handle = CKF_NewHandleFromString(Text("old"), true)) {
-            CKF_WriteHandle(file, CKF_Id("expr"), handle);
+            static_cast<void>(CKF_WriteHandle(file, CKF_Id("expr"), handle));
             Q_FreeHandle(handle);
         } else {
             throw Q_Err_OutOfMemory;
@@ -47,12 +47,12 @@ int WriteEverything(CKF_File* file)
         int inserted = 0;
         for (char const* item : {"abc", "def"})
             if (inserted == 0) inserted = SEQ_Insert(item, -1, list);
-        SEQ_Write(list, file);
-        SEQ_Dispose(list, 0);
+        static_cast<void>(SEQ_Write(list, file));
+        static_cast<void>(SEQ_Dispose(list, 0));
         if (inserted != 0) throw inserted;
-        CKF_EndChunkWrite(file, &leaf);
+        static_cast<void>(CKF_EndChunkWrite(file, &leaf));
         std::string const big(200000, 'B');  // more than is buffered
-        CKF_WriteAtom(file, CKF_Id("big_"), static_cast<int>(big.size()), big.data());
+        static_cast<void>(CKF_WriteAtom(file, CKF_Id("big_"), static_cast<int>(big.size()), big.data()));
     });
     int const committed = file->Commit();
     return thrown != 0 ? thrown : committed;
@@ -152,7 +152,7 @@ TEST(ChunkFileSave, WhatIsNotCommittedLeavesNothing)
     EXPECT_EQ(CKF_Err_NotAChunkFile, file.Open(folder.Path(Project).c_str()));
     EXPECT_EQ(Names{Project}, folder.Names()) << "opened for something else";
     begin(file);
-    CKF_WriteAtom(&file, 0, 0, nullptr);
+    static_cast<void>(CKF_WriteAtom(&file, 0, 0, nullptr));
     EXPECT_EQ(CKF_Err_BadArgument, file.Commit());
     EXPECT_EQ(Names{Project}, folder.Names()) << "failed";
     EXPECT_EQ("the old file", FileContent(folder.Path(Project)));

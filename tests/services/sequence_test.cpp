@@ -95,7 +95,7 @@ public:
     }
     List(List const&) = delete;
     List& operator=(List const&) = delete;
-    ~List() { SEQ_Dispose(list_, 0); }
+    ~List() { EXPECT_EQ(0, SEQ_Dispose(list_, 0)); }
     operator SEQ_Head**() const { return list_; }
     void const* At(int index) const
     {
@@ -248,9 +248,9 @@ private:
         SEQ_Head** made = nullptr;
         Arm();
         tokens_.failDisposeIn = 0;
-        SEQ_Lock(1, list_);
+        EXPECT_EQ(0, SEQ_Lock(1, list_));
         Expect(true, SEQ_Duplicate(list_, 0, &made));
-        SEQ_Unlock(list_);
+        EXPECT_EQ(0, SEQ_Unlock(list_));
         Q_FailAllocation(0);
         EXPECT_EQ(code_ == 0, made != nullptr);
         if (!made) return;
@@ -361,10 +361,10 @@ TEST(Sequence, DisposeDisposesAllAndAnswersTheFirstFailure)
     Tokens tokens;
     SEQ_Head** list = nullptr;
     ASSERT_EQ(0, SEQ_New(0, 4, 4, 1, &list));
-    for (int i = 1; i <= 5; ++i) SEQ_Insert(Item(4, tokens.Make(i), i).data(), -1, list);
+    for (int i = 1; i <= 5; ++i) EXPECT_EQ(0, SEQ_Insert(Item(4, tokens.Make(i), i).data(), -1, list));
     SEQ_Funcs const funcs{nullptr, Dispose, nullptr};
-    SEQ_SetFuncs(list, 3, &funcs);
-    SEQ_SetRefcon(&tokens, list);
+    EXPECT_EQ(0, SEQ_SetFuncs(list, 3, &funcs));
+    EXPECT_EQ(0, SEQ_SetRefcon(&tokens, list));
     tokens.failDisposeIn = 2;
     EXPECT_EQ(DisposeFailed, SEQ_Dispose(list, 0));
     EXPECT_EQ(1, tokens.Alive()) << "only the item that refused is left";
@@ -513,7 +513,7 @@ TEST(SequenceFile, OnlyTheItemsGoIntoTheChunkAndComeBackOrNothingDoes)
                 std::string item(static_cast<std::size_t>(itemSize), '#'), all;
                 for (int i = 0; i < count && SEQ_GetItemCopy(back, 0, i, item.data()) == 0; ++i) all += item;
                 EXPECT_EQ(items, all);
-                SEQ_Dispose(back, 0);
+                EXPECT_EQ(0, SEQ_Dispose(back, 0));
                 SEQ_Head** none = nullptr;
                 EXPECT_EQ(CKF_Err_NoSuchChunk, SEQ_Read(&read, &none)) << "it stays in its list";
                 EXPECT_EQ(nullptr, none);

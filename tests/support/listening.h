@@ -4,6 +4,8 @@
 #include "tests/support/baregroup.h"
 #include "tree/listener.h"
 
+#include <gtest/gtest.h>
+
 #include <functional>
 #include <utility>
 
@@ -27,9 +29,9 @@ class ValueListener : public KFS_StreamListener {
 public:
     explicit ValueListener(std::function<void()> reaction = {}) : reaction_(std::move(reaction))
     {
-        KFS_RegisterMainListener(this);
+        EXPECT_EQ(0, KFS_RegisterMainListener(this));
     }
-    ~ValueListener() override { KFS_UnregisterMainListener(this); }
+    ~ValueListener() override { EXPECT_EQ(0, KFS_UnregisterMainListener(this)); }
     // Since the last call.
     int Take() { return std::exchange(count_, 0); }
 

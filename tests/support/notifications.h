@@ -3,6 +3,8 @@
 #include "tests/support/groups.h"
 #include "tree/listener.h"
 
+#include <gtest/gtest.h>
+
 #include <functional>
 #include <map>
 #include <string>
@@ -12,8 +14,8 @@
 // go by the label that the test gave them, else by their match name.
 class NotificationRecorder : public KFS_StreamListener {
 public:
-    NotificationRecorder() { KFS_RegisterMainListener(this); }
-    ~NotificationRecorder() override { KFS_UnregisterMainListener(this); }
+    NotificationRecorder() { EXPECT_EQ(0, KFS_RegisterMainListener(this)); }
+    ~NotificationRecorder() override { EXPECT_EQ(0, KFS_UnregisterMainListener(this)); }
 
     void Label(KFS_StreamBase const* stream, std::string const& label) { labels_[stream] = label; }
     // All since the last call, in order.

@@ -54,7 +54,7 @@ public:
         return found != tickets_.end() ? found->second : -12345.0;
     }
 
-    static int Copy(KFS_Stream const*, long, short, void const* source, void* destination)
+    [[nodiscard]] static int Copy(KFS_Stream const*, long, short, void const* source, void* destination)
     {
         if (copyCode != 0) return copyCode;
         Ticket ticket{};
@@ -63,7 +63,7 @@ public:
         std::memcpy(destination, &made, sizeof made);
         return 0;
     }
-    static int Dispose(KFS_Stream const* stream, long, short, void* block)
+    [[nodiscard]] static int Dispose(KFS_Stream const* stream, long, short, void* block)
     {
         EXPECT_EQ(KFS_StreamValidStamp, stream->GetStamp())
             << "a dying stream is whole until its values are given back";
@@ -74,7 +74,7 @@ public:
         return 0;
     }
     // The earlier key's value.
-    static int Interpolate(KFS_Stream const* stream, long refcon, int, int keyIndex)
+    [[nodiscard]] static int Interpolate(KFS_Stream const* stream, long refcon, int, int keyIndex)
     {
         void const* item = nullptr;
         if (int const code = SEQ_GetConstAddress(stream->GetKeys(), keyIndex, &item)) return code;

@@ -115,7 +115,7 @@ TEST(Longs, AreSignedAndBigEndian)
     int const values[] = {0, 1, -1, 0x01020304, INT_MIN, INT_MAX};
     MemoryFile const file([&](CKF_File* out) {
         for (int const value : values) KFSp_WriteLong(out, Id, value);
-        CKF_WriteAtom(out, Id, 2, "\x7f\x01");
+        EXPECT_EQ(0, CKF_WriteAtom(out, Id, 2, "\x7f\x01"));
     });
     EXPECT_EQ((std::vector<std::string>{"long 00000000", "long 00000001", "long ffffffff", "long 01020304",
                                         "long 80000000", "long 7fffffff", "long 7f01"}),
@@ -132,10 +132,10 @@ TEST(MatchNameAtoms, ANameThatFillsItsAtomEndsThere)
     std::string unknown = "known to no code";
     unknown.resize(40, '\0');
     MemoryFile const file([&](CKF_File* out) {
-        CKF_WriteAtom(out, CKF_Id("kfmn"), 40, std::string(40, 'q').data());
-        CKF_WriteAtom(out, CKF_Id("kfmn"), 3, "abc");
-        CKF_WriteAtom(out, CKF_Id("kfmn"), 8, "ab\0stale");
-        CKF_WriteAtom(out, CKF_Id("kfmn"), 40, unknown.data());
+        EXPECT_EQ(0, CKF_WriteAtom(out, CKF_Id("kfmn"), 40, std::string(40, 'q').data()));
+        EXPECT_EQ(0, CKF_WriteAtom(out, CKF_Id("kfmn"), 3, "abc"));
+        EXPECT_EQ(0, CKF_WriteAtom(out, CKF_Id("kfmn"), 8, "ab\0stale"));
+        EXPECT_EQ(0, CKF_WriteAtom(out, CKF_Id("kfmn"), 40, unknown.data()));
         KFS_MatchName::WriteEndOfGroupMarker(out);
     });
     EXPECT_EQ("kfmn " + AtomHex("ZQVM Group End"), file.Lines().back());

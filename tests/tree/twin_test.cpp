@@ -345,7 +345,7 @@ void Same(Lines const& expected, Lines const& seen)
 void CompareFiles(TwinTree& twin, RealTree& real, ReportRecorder& reports)
 {
     bool wasPaused = false;
-    KFS_PauseMainListener(true, wasPaused);
+    EXPECT_EQ(0, KFS_PauseMainListener(true, wasPaused));
     TwinTree loaded;
     loaded.Load(twin.root, loaded.root);
     Lines lines;
@@ -358,7 +358,7 @@ void CompareFiles(TwinTree& twin, RealTree& real, ReportRecorder& reports)
     lines.clear();
     loaded.Save(loaded.root, "", &lines, false);
     Same(lines, Outline(MemoryFile([&](CKF_File* out) { other.root.Write(out); })));
-    KFS_PauseMainListener(wasPaused, wasPaused);
+    EXPECT_EQ(0, KFS_PauseMainListener(wasPaused, wasPaused));
 }
 
 void Compare(std::vector<Step> const& script, ReportRecorder& reports)
