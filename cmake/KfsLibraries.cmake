@@ -35,7 +35,7 @@ target_link_libraries(kfs_services
     PUBLIC Boost::headers
     PRIVATE PkgConfig::KFS_XXHASH nlohmann_json::nlohmann_json Threads::Threads)
 
-set(KFS_LIBRARY_FOLDERS frame tree keystore curves persist overrides)
+set(KFS_LIBRARY_FOLDERS frame tree keystore curves persist overrides identity)
 kfs_sources(librarySources ${KFS_LIBRARY_FOLDERS})
 add_library(kfs_objects OBJECT ${librarySources})
 kfs_library_code(kfs_objects)

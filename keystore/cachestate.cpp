@@ -51,10 +51,17 @@ void KFS_StreamCacheState::Forget(KFS_Stream const* stream)
     auto const ending = keyData_.extract(stream);
 }
 
+void KFS_StreamCacheState::ForgetExpressionCache(KFS_ExprInfo const* info)
+{
+    auto const ending = expressionCaches_.extract(info);
+}
+
 void KFS_StreamCacheState::FreeCacheData()
 {
     lastStream_ = nullptr;
     lastKeyData_ = nullptr;
-    decltype(keyData_) ending;
-    ending.swap(keyData_);
+    decltype(keyData_) endingData;
+    endingData.swap(keyData_);
+    decltype(expressionCaches_) endingCaches;
+    endingCaches.swap(expressionCaches_);
 }

@@ -4,6 +4,7 @@
 #include "frame/services/context.h"
 #include "keystore/stream.h"
 
+#include <boost/any.hpp>
 #include <boost/shared_ptr.hpp>
 
 #include <map>
@@ -27,7 +28,10 @@ public:
 
     // The copy for `stream`, made from `source` at the first call. Throws an int; nothing is kept then.
     KFS_StreamKeyData* GetOverrideKeyData(KFS_Stream const* stream, KFS_StreamKeyData const& source);
-    // Frees all copies.
+    // This render's expression cache for a record, empty at the first call.
+    boost::any* GetOverrideExpressionCache(KFS_ExprInfo const* info) { return &expressionCaches_[info]; }
+    void ForgetExpressionCache(KFS_ExprInfo const* info);
+    // Frees all copies and expression caches.
     void FreeCacheData();
 
 private:
@@ -39,6 +43,7 @@ private:
 
     // Each belongs to a stand-in for the stream, of which it is the key data.
     std::map<KFS_Stream const*, boost::shared_ptr<KFS_StreamKeyData>> keyData_;
+    std::map<KFS_ExprInfo const*, boost::any> expressionCaches_;
     // The last answer: one read asks several times.
     KFS_Stream const* lastStream_ = nullptr;
     KFS_StreamKeyData* lastKeyData_ = nullptr;

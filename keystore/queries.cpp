@@ -165,7 +165,7 @@ bool KFS_Stream::CanHaveExpression() const
 // The numbers of the streams that an expression has read aren't recorded yet.
 void KFS_Stream::GetExpressionDependencyIds(std::set<int>& ids) const
 {
-    ids.clear();
+    ids = exprInfo_.GetDependencyIds();
 }
 
 u16str KFS_Stream::GetExprPreEvalString() const
@@ -178,21 +178,4 @@ int KFS_Stream::EvaluateExpression(T_Time const* time, double* values, void** cu
 {
     auto* const root = const_cast<KFS_StreamGroup*>(GetRoot());
     return root ? root->EvaluateExpression(this, time, values, customValue, bag) : 1;
-}
-
-// Render identity isn't computed yet: nothing is mixed in, and the Guid is the unset one.
-
-void KFS_Stream::MixInValueAtTime(hearth::utility::MixHashGuidT<hearth::utility::Murmur3MixerState>& hash,
-                                  T_Time const& time) const
-{
-    MixInValueAtTime(hash, time, nullptr);
-}
-
-void KFS_Stream::MixInValueAtTime(hearth::utility::MixHashGuidT<hearth::utility::Murmur3MixerState>&, T_Time const&,
-                                  KFS_ParamBag const*) const
-{}
-
-hearth::utility::Guid KFS_Stream::GetRenderGuid(KFS_RenderOptionsBase const&, GetRenderGuidFilter*) const
-{
-    return {};
 }

@@ -309,7 +309,7 @@ void KFS_Stream::SetKeys(SEQ_Head** keys)
 
 bool KFS_Stream::HasActiveExpression() const
 {
-    return exprInfo_.HasExpression() && !exprInfo_.GetFlag(KFS_ExprFlag_Disabled) && !exprInfo_.HasExpressionError();
+    return HasEnabledExpression() && !exprInfo_.HasExpressionError();
 }
 
 int KFS_Stream::GetKeyCount() const

@@ -110,7 +110,8 @@ public:
     bool AreDimensionsSeparated() const override;
     void SetDimensionsSeparated(bool separated) override;
     bool AffectsRendering(KFS_RenderOptionsBase const& options) const override;
-    // Identities aren't computed yet: the unset Guid, and MixInValueAtTime mixes nothing.
+    // What identifies the leaf's values over the span of the options: as few of its keys as shape them, or samples of its
+    // expression. Throws an int. A negative cacheCompareSamplesPerSecond in the expression's text becomes its error.
     hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const& options,
                                         GetRenderGuidFilter* filter) const override;
     void GetExpressionDependencyIds(std::set<int>& ids) const override;
@@ -139,6 +140,8 @@ public:
     virtual void ForceInterpolateAtTime(T_Time const& time);
     // Whether both times give the same value, as far as can be told without evaluating. Throws an int.
     virtual bool SameValueAtTimes(T_Time const& a, T_Time const& b, KFS_ParamBag const* bag) const;
+    // Feeds the value at a time to an identity: the components of GetVector4Ex, none for kinds without a value. A class
+    // whose value isn't in there overrides the second form. Throws an int.
     virtual void MixInValueAtTime(hearth::utility::MixHashGuidT<hearth::utility::Murmur3MixerState>& hash,
                                   T_Time const& time) const;
     virtual void MixInValueAtTime(hearth::utility::MixHashGuidT<hearth::utility::Murmur3MixerState>& hash,
@@ -254,6 +257,11 @@ public:
     KFS_ExprInfo& GetExprInfoForModify() { return exprInfo_; }
     unsigned int GetExpressionFlags() const { return exprInfo_.GetFlags(); }
     bool HasExpression() const { return exprInfo_.HasExpression(); }
+    u16str GetExpression() const { return exprInfo_.GetExpression(); }
+    // With text, and not switched off.
+    bool HasEnabledExpression() const { return HasExpression() && !exprInfo_.GetFlag(KFS_ExprFlag_Disabled); }
+    // An error counts only beside a text.
+    bool HasExpressionError() const { return HasExpression() && exprInfo_.HasExpressionError(); }
     // With text, not switched off, without an error.
     bool HasActiveExpression() const;
 

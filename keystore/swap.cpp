@@ -8,9 +8,6 @@
 
 void KFS_Stream::swap(KFS_Stream& other)
 {
-    // Memory can run out for these copies only, and then nothing has been exchanged yet.
-    KFS_ExprInfo mine(exprInfo_);
-    KFS_ExprInfo others(other.exprInfo_);
     unsigned int const oldFlags = GetStreamBaseFlags();
 
     SwapBase(other);
@@ -33,8 +30,7 @@ void KFS_Stream::swap(KFS_Stream& other)
     std::swap(keyData_.times, other.keyData_.times);
     std::swap(keyData_.invalidKeyIndex, other.keyData_.invalidKeyIndex);
     std::swap(keyData_.arcInvalidKeyIndex, other.keyData_.arcInvalidKeyIndex);
-    exprInfo_ = std::move(others);
-    other.exprInfo_ = std::move(mine);
+    exprInfo_.swap(other.exprInfo_);
     std::swap(keyData_.cache, other.keyData_.cache);
 
     ShowChangeInCopy();

@@ -1,10 +1,135 @@
-// What of parameter bags is too long for their header.
-
 #include "overrides/parambag.h"
+
+#include "tree/streambase.h"
+
+#include <algorithm>
+#include <utility>
+
+using hearth::utility::Guid;
+
+KFS_ParamBag::KFS_ParamBag(KFS_ParamBag const& source) : overrides_(source.overrides_)
+{
+    boost::mutex::scoped_lock const hold(source.lock_);
+    guid_ = source.guid_;
+    dirty_ = source.dirty_.load();
+}
 
 KFS_ParamBag::KFS_ParamBag(KFS_ParamBag const& a, KFS_ParamBag const& b) : overrides_(a.overrides_)
 {
     overrides_.insert(b.overrides_.begin(), b.overrides_.end());
 }
 
+KFS_ParamBag& KFS_ParamBag::operator=(KFS_ParamBag const& source)
+{
+    if (this == &source) return *this;
+    overrides_ = source.overrides_;
+    boost::mutex::scoped_lock const hold(source.lock_);
+    guid_ = source.guid_;
+    dirty_ = source.dirty_.load();
+    return *this;
+}
+
 KFS_ParamBag::~KFS_ParamBag() = default;
+
+void KFS_ParamBag::SetDirty() const
+{
+    boost::mutex::scoped_lock const hold(lock_);
+    dirty_ = true;
+    guid_ = Guid();
+}
+
+Guid KFS_ParamBag::GetGUID() const
+{
+    if (dirty_) ComputeGuid();
+    return guid_;
+}
+
+// Of several threads that come here at once one computes; the others find it done, and nobody writes what another reads.
+void KFS_ParamBag::ComputeGuid() const
+{
+    boost::mutex::scoped_lock const hold(lock_);
+    if (!dirty_) return;
+    KFS_OverrideHash hash;
+    hash.Mix("KFS_ParamBag", 12);
+    for (auto const& [id, streamOverride] : overrides_) {
+        hash.Mix(id.data(), id.size() * sizeof(unsigned short));
+        streamOverride->MixIn(hash);
+    }
+    guid_ = hash.GetGuid();
+    dirty_ = false;
+}
+
+void KFS_ParamBag::AddOverride(KFS_StreamBase const* stream, boost::shared_ptr<KFS_StreamOverride> streamOverride)
+{
+    overrides_[stream->GetStreamCapsuleData().id] = std::move(streamOverride);
+    SetDirty();
+}
+
+void KFS_ParamBag::Clear()
+{
+    overrides_.clear();
+    SetDirty();
+}
+
+KFS_StreamOverride const* KFS_ParamBag::Find(KFS_StreamBase const* stream) const
+{
+    if (overrides_.empty()) return nullptr;
+    auto const place = overrides_.find(stream->GetStreamCapsuleData().id);
+    return place == overrides_.end() ? nullptr : place->second.get();
+}
+
+bool KFS_ParamBag::StreamOverridden(KFS_StreamBase const* stream, T_Time const& time, KFS_OverrideValue* value) const
+{
+    KFS_StreamOverride const* const found = Find(stream);
+    if (!found) return false;
+    *value = found->GetValAtTime(time);
+    return true;
+}
+
+bool KFS_ParamBag::GetStreamOverride(KFS_StreamBase const* stream, KFS_StreamOverride const** streamOverride) const
+{
+    KFS_StreamOverride const* const found = Find(stream);
+    if (!found) return false;
+    *streamOverride = found;
+    return true;
+}
+
+bool KFS_ParamBag::IsTimeInvariant() const
+{
+    return std::all_of(
+        overrides_.begin(), overrides_.end(), [](auto const& entry) { return entry.second->IsTimeInvariant(); });
+}
+
+int KFS_ParamBag::GetSortOrder(KFS_ParamBag const& other) const
+{
+    Guid const mine = GetGUID();
+    Guid const others = other.GetGUID();
+    if (mine == others) return 0;
+    return mine < others ? -1 : 1;
+}
+
+std::vector<boost::shared_ptr<KFS_StreamOverride>>
+KFS_ParamBag::FindRightySymmetricDifference(KFS_ParamBag const& other, bool effectsOnly) const
+{
+    std::vector<boost::shared_ptr<KFS_StreamOverride>> different;
+    for (auto const& [id, theirs] : other.overrides_) {
+        auto const place = overrides_.find(id);
+        if (place == overrides_.end() || *place->second == *theirs) continue;
+        if (!effectsOnly || theirs->GetIsForEffectStream()) different.push_back(theirs);
+    }
+    return different;
+}
+
+KFS_MergedParamBagHelper::KFS_MergedParamBagHelper(KFS_ParamBag const* a, KFS_ParamBag const* b)
+{
+    bool const hasA = a && !a->IsEmpty();
+    bool const hasB = b && !b->IsEmpty();
+    if (hasA && hasB) {
+        merged_ = std::make_shared<KFS_ParamBag>(*a, *b);
+        bag_ = merged_.get();
+    } else if (hasA || (a && !hasB)) {
+        bag_ = a;
+    } else {
+        bag_ = b;
+    }
+}

@@ -1,31 +1,86 @@
 #pragma once
 
 #include "frame/export.h"
+#include "frame/services/identifiers.h"
 #include "frame/services/strings.h"
+#include "frame/services/time.h"
+#include "overrides/streamoverride.h"
 
 #include <boost/shared_ptr.hpp>
+#include <boost/thread/mutex.hpp>
 
-#include <cstddef>
+#include <atomic>
 #include <map>
+#include <memory>
+#include <vector>
 
-class KFS_StreamOverride;
-
-// A set of overrides handed to an evaluation, at most one a stream, by the stream's capsule identifier. Copies share
-// the overrides. There is no operation yet that adds one. Threads: one thread at a time.
+// A set of overrides handed to an evaluation, at most one a stream. Streams are told apart by their capsule identifier
+// (KFS_StreamBase::GetStreamCapsuleData), so an override also finds the same stream in a clone of its tree. Copies share
+// the overrides.
+//
+// A bag's GUID stands for its content: two bags with one GUID are the same bag. It is computed when first asked for and
+// kept until the bag changes. It covers addresses, so it means nothing in another process and must not be saved.
+//
+// Threads: any number of readers, GetGUID included, while nobody changes the bag; a shared bag isn't changed.
 class KFS_API KFS_ParamBag {
 public:
+    // Throws boost::thread_resource_error where there is no mutex to be had; so do the other constructors.
     KFS_ParamBag() = default;
-    KFS_ParamBag(KFS_ParamBag const&) = default;
-    KFS_ParamBag(KFS_ParamBag&&) = default;
+    KFS_ParamBag(KFS_ParamBag const& source);
     // The union of both; where both hold an override for one stream, `a` wins.
     KFS_ParamBag(KFS_ParamBag const& a, KFS_ParamBag const& b);
-    KFS_ParamBag& operator=(KFS_ParamBag const&) = default;
-    KFS_ParamBag& operator=(KFS_ParamBag&&) = default;
+    KFS_ParamBag& operator=(KFS_ParamBag const& source);
     virtual ~KFS_ParamBag();
 
-    std::size_t GetOverrideCount() const { return overrides_.size(); }
+    // Forgets the GUID. For those who have changed an override in place before sharing it.
+    void SetDirty() const;
+    hearth::utility::Guid GetGUID() const;
 
-protected:
-    using Overrides = std::map<u16str, boost::shared_ptr<KFS_StreamOverride>>;
-    Overrides overrides_;
+    // Takes the place of an earlier override for the same stream. Neither pointer may be null.
+    void AddOverride(KFS_StreamBase const* stream, boost::shared_ptr<KFS_StreamOverride> streamOverride);
+    void Clear();
+
+    bool StreamOverridden(KFS_StreamBase const* stream) const { return Find(stream) != nullptr; }
+    // The override's value at a time; false, and `value` is left alone, where there is none. `value` must not be null.
+    // Lets through what a value function throws.
+    bool StreamOverridden(KFS_StreamBase const* stream, T_Time const& time, KFS_OverrideValue* value) const;
+    // The override itself, owned by the bag; false, and `streamOverride` is left alone, where there is none.
+    bool GetStreamOverride(KFS_StreamBase const* stream, KFS_StreamOverride const** streamOverride) const;
+
+    bool IsEmpty() const { return overrides_.empty(); }
+    unsigned int GetOverrideCount() const { return static_cast<unsigned int>(overrides_.size()); }
+    // Whether no override has a value function.
+    bool IsTimeInvariant() const;
+
+    bool operator==(KFS_ParamBag const& other) const { return GetGUID() == other.GetGUID(); }
+    bool operator!=(KFS_ParamBag const& other) const { return !(*this == other); }
+    // -1, 0 or 1, by GUID.
+    int GetSortOrder(KFS_ParamBag const& other) const;
+    // Those overrides of `other` whose stream has a different one here; with `effectsOnly` only those for effect
+    // streams. A stream that only one of the two bags overrides makes no difference. In the order of the identifiers.
+    std::vector<boost::shared_ptr<KFS_StreamOverride>> FindRightySymmetricDifference(KFS_ParamBag const& other,
+                                                                                     bool effectsOnly) const;
+
+private:
+    KFS_StreamOverride const* Find(KFS_StreamBase const* stream) const;
+    void ComputeGuid() const;
+
+    std::map<u16str, boost::shared_ptr<KFS_StreamOverride>> overrides_;
+    mutable hearth::utility::Guid guid_;
+    mutable boost::mutex lock_;  // guards guid_ and the way of dirty_ to false
+    mutable std::atomic<bool> dirty_{true};
+};
+
+// Two bags as one, for a scope: the union only where both have something to say, else whichever has, without a copy.
+// Both must outlive the helper.
+class KFS_API KFS_MergedParamBagHelper {
+public:
+    // Either may be null. `a` wins.
+    KFS_MergedParamBagHelper(KFS_ParamBag const* a, KFS_ParamBag const* b);
+    // Null only if both were.
+    KFS_ParamBag const* Get() const { return bag_; }
+
+private:
+    KFS_ParamBag const* bag_;
+    std::shared_ptr<KFS_ParamBag> merged_;
 };

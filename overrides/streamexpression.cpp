@@ -43,3 +43,24 @@ unsigned int KFS_GetStreamExprFlags(KFS_Stream const* stream)
 {
     return stream->GetExpressionFlags();
 }
+
+void KFS_SetStreamExprErrorMessage(KFS_Stream* stream, u16str const& text, int line, u16str const& shortText)
+{
+    stream->GetExprInfoForModify().SetExpressionError(text, line, shortText);
+    stream->ShowChangeInCopy();
+}
+
+u16str KFS_GetStreamExprErrorMessage(KFS_Stream const* stream)
+{
+    return stream->GetExprInfo().GetExpressionError();
+}
+
+int KFS_GetStreamExprErrorLineNum(KFS_Stream const* stream)
+{
+    return stream->GetExprInfo().GetExpressionErrorLine();
+}
+
+u16str KFS_GetStreamShortExprErrorMessage(KFS_Stream const* stream)
+{
+    return stream->GetExprInfo().GetExpressionErrorShort();
+}

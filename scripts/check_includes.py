@@ -18,8 +18,9 @@ BELOW = {
     "overrides": ["frame", "tree", "keystore"],
     "keystore": ["frame", "tree", "overrides"],
     "curves": ["keystore"],
+    "identity": ["curves"],
     "persist": ["curves"],
-    "host": ["persist"],
+    "host": ["identity", "persist"],
     "cli": ["host"],
 }
 

@@ -24,6 +24,9 @@ public:
     bool IsIndexedGroup() const override;
     KFS_IndexedStreamGroup const* GetAsIndexedGroup() const override;
     KFS_IndexedStreamGroup* GetAsIndexedGroup() override;
+    // As KFS_NamedStreamGroup's, with the children in their order.
+    hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const& options,
+                                        GetRenderGuidFilter* filter) const override;
 
     unsigned int GetNumStreams() const override;
     // These four give the entry as it is: there is no upgrade here, and a bad index is a broken invariant in all of

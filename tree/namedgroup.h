@@ -29,6 +29,10 @@ public:
     bool IsNamedGroup() const override;
     KFS_NamedStreamGroup const* GetAsNamedGroup() const override;
     KFS_NamedStreamGroup* GetAsNamedGroup() override;
+    // What identifies everything below that can change what the options' span renders; equal ones render alike. Real
+    // copies are made of the canonical children on the way, without a lock. Throws an int.
+    hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const& options,
+                                        GetRenderGuidFilter* filter) const override;
     void SetupCanonicalLayout() override;
 
     // A canonical group that nobody has looked into has none yet.

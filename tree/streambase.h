@@ -166,6 +166,9 @@ public:
     bool IsChildOf(KFS_StreamGroup const* group, unsigned int* depth) const;
     bool AreAllParentsActive() const;
     bool IsHiddenByAncestor() const;
+    // Whether the stream takes part in a render's identity: it isn't hidden (or counts all the same), is active or
+    // overridden, and AffectsRendering.
+    bool IncludeInGuidComputation(KFS_RenderOptionsBase const& options) const;
     bool IsNotAnimated(bool evenIfDisabled) const { return !IsAnimated(evenIfDisabled); }
 
     // The path to this node, and in `root` its topmost ancestor, the node itself if it has no parent; null if that is a

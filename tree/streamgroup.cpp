@@ -89,9 +89,15 @@ bool KFS_StreamGroup::AffectsRendering(KFS_RenderOptionsBase const&) const
     return true;
 }
 
-hearth::utility::Guid KFS_StreamGroup::GetRenderGuid(KFS_RenderOptionsBase const&, GetRenderGuidFilter*) const
+void KFS_StreamGroup::GetExpressionDependencyIds(std::set<int>& ids) const
 {
-    return {};
+    for (unsigned int i = 0; i < GetNumStreams(); ++i) {
+        KFS_StreamBase const* const child = GetStream(i);
+        if (!child) continue;
+        std::set<int> childs;
+        child->GetExpressionDependencyIds(childs);
+        ids.insert(childs.begin(), childs.end());
+    }
 }
 
 void KFS_StreamGroup::MakeIndependent(bool independent)

@@ -41,9 +41,8 @@ public:
     KFS_StreamGroup* GetAsGroup() override;
     KFS_StreamGroup const* GetAsGroup() const override;
     bool AffectsRendering(KFS_RenderOptionsBase const& options) const override;
-    // Identities aren't computed yet: the unset Guid.
-    hearth::utility::Guid GetRenderGuid(KFS_RenderOptionsBase const& options,
-                                        GetRenderGuidFilter* filter) const override;
+    // Adds those of all children to what the set holds.
+    void GetExpressionDependencyIds(std::set<int>& ids) const override;
     void Read(CKF_File* file, CKF_ChunkInfo const* parent) override;
     void Write(CKF_File* file) const override;
     // Passes the wish on to the real children, and then takes it itself. A group that is already so does nothing.
