@@ -3,11 +3,13 @@
 #include "frame/frame.h"
 #include "keystore/cachestate.h"
 #include "keystore/evaluate.h"
+#include "overrides/parambag.h"
 
 #include <boost/make_shared.hpp>
 
 #include <stdexcept>
 #include <string>
+#include <vector>
 
 namespace kfshost {
 
@@ -36,6 +38,25 @@ KFS_AppCallbacks HarmlessCallbacks()
     return callbacks;
 }
 
+// What a bag says in place of a plain stream's keys, as the numbers of a record.
+class Overridden {
+public:
+    Overridden(KFS_Stream const* stream, int time, KFS_ParamBag const* bag)
+    {
+        KFS_StreamOverride const* found = nullptr;
+        if (!bag || !bag->GetStreamOverride(stream, &found) || stream->IsCustom()) return;
+        KFS_OverrideValue value = found->GetValAtTime({time, stream->GetTimeScale()});
+        auto* const numbers = boost::get<std::vector<double>>(&value);
+        if (!numbers) return;  // a text or another source, which isn't a plain stream's value
+        numbers_.swap(*numbers);
+        numbers_.resize(static_cast<std::size_t>(stream->GetDimension()), 0.0);
+    }
+    void const* Source() const { return numbers_.empty() ? nullptr : numbers_.data(); }
+
+private:
+    std::vector<double> numbers_;
+};
+
 void AddStates(Q_RenderContext& context)
 {
     context.SetState(boost::make_shared<ExpState>());
@@ -57,15 +78,17 @@ void ExpState::EvalExprValueF(KFS_Stream const*, int, int, double*, KFS_ParamBag
 }
 
 void ExpState::EvalNoExprValue(KFS_Stream const* stream, int time, int, void* value, unsigned char* atKey,
-                               KFS_ParamBag const*, KFS_InterpFunc* interpFunc, long refcon)
+                               KFS_ParamBag const* bag, KFS_InterpFunc* interpFunc, long refcon)
 {
-    KFS_GetValueNoExpr(stream, time, false, value, atKey, nullptr, interpFunc, refcon);
+    Overridden const overridden(stream, time, bag);
+    KFS_GetValueNoExpr(stream, time, false, value, atKey, overridden.Source(), interpFunc, refcon);
 }
 
 void ExpState::EvalNoExprValueF(KFS_Stream const* stream, int time, int, double* value, unsigned char* atKey,
-                                KFS_ParamBag const*)
+                                KFS_ParamBag const* bag)
 {
-    KFS_GetValueFNoExpr(stream, time, false, value, atKey, nullptr);
+    Overridden const overridden(stream, time, bag);
+    KFS_GetValueFNoExpr(stream, time, false, value, atKey, overridden.Source());
 }
 
 void ExpState::ResolveExprTarget(KFS_Stream const**, int*, KFS_ParamBag const*, KFS_ParamBag*) {}
