@@ -290,31 +290,4 @@ TEST_F(Swapping, TellsOfTheFirstStreamOnly)
     EXPECT_EQ((Notifications{"value first", "flags first 33 1"}), recorder.Take());
 }
 
-TEST_F(Swapping, WithoutMemoryExchangesNothingOrAll)
-{
-    struct Pair {
-        TestStream a, b;
-    };
-    u16str const longText = Text(std::string(300, 'x'));
-    auto const make = [&] {
-        auto pair = std::make_unique<Pair>();
-        pair->a.Key(0, {1.0});
-        pair->b.Key(0, {2.0});
-        pair->a->GetExprInfoForModify().SetExpression(longText);
-        pair->b->GetExprInfoForModify().SetExpression(longText + longText);
-        return pair;
-    };
-    auto const check = [&](Pair& pair, int code, Q_MemoryCount) {
-        EXPECT_NE(0, code);
-        EXPECT_EQ(1.0, KFSp_Numbers(pair.a.Record(0))[0]);
-        EXPECT_EQ(longText, pair.a->GetExprInfo().GetExpression());
-        EXPECT_EQ(2.0, KFSp_Numbers(pair.b.Record(0))[0]);
-        EXPECT_EQ(longText + longText, pair.b->GetExprInfo().GetExpression());
-    };
-    int const failures = FailEveryAllocation(
-        make, [](Pair& pair) { return pair.a->swap(*pair.b), 0; }, check);
-    EXPECT_GE(failures, 2);
-    reports.Take();  // std::bad_alloc is reported where it is translated
-}
-
 }  // namespace
