@@ -2,6 +2,7 @@
 
 // What a host of the animation store includes. Reports, chunk files and the other services have headers of their own in frame/services/.
 
+#include "curves/adaptivesamples.h"
 #include "curves/derivatives.h"
 #include "curves/floatkeys.h"
 #include "curves/spacetangents.h"

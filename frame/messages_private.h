@@ -60,6 +60,7 @@ enum KFSp_Row : short {
     KFSp_Row_TimeOutsideKeys = 74,
     KFSp_Row_ComputeDerivative = 75,
     KFSp_Row_SetMultiplier = 76,
+    KFSp_Row_AdaptiveSamples = 78,
     KFSp_Row_Only2D3D = 79,
     KFSp_Row_CustomNotAllowed = 81,
     KFSp_Row_StreamValueCache = 83,

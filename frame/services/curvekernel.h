@@ -148,3 +148,32 @@ struct CRV_Curve {
 // SEQ_Err_BadList for a list that isn't such a table.
 [[nodiscard]] KFS_SERVICE_API int CRV_TFromSSpline(CRV_Curve const* curve, SEQ_Head*** remapTable, double* t, double s,
                                                    double one);
+
+// ---- polylines
+//
+// Both append points (x, y), two doubles each, to a caller's list of 16-byte items, in the order of x; a point that the
+// list already ends in isn't repeated. `minValue` and `maxValue` follow the y of the points once `haveRange` isn't 0,
+// which the first point makes it. What was appended before a failure stays. Errors: the three codes above; SEQ_Insert's.
+
+// Whether a stretch of a curve is to be halved, which the caller decides: `divide` comes in as 0.
+//
+//   depth       how often it has been halved so far; at CRV_MostHalvings nobody asks any more
+//   t0, t1      the parameters of its ends
+//   start, end  its ends (x, y)
+//
+// Another result than 0 ends the work and is its result.
+using CRV_SampleFunc = int(void* refCon, unsigned int depth, double t0, double t1, double* start, double* end,
+                           CRV_Curve const* curve, unsigned char* divide);
+inline constexpr unsigned int CRV_MostHalvings = 40;
+
+// One point of the line from `a` to `b`, which isn't right of it: `point`, one of the two, or where it lies beyond the
+// bound the line's point there. `bound` limits `a` from the left and `b` from the right.
+[[nodiscard]] KFS_SERVICE_API int CRV_LinearlyInterpolateLine(double const* a, double const* b, double const* point,
+                                                              unsigned char* haveRange, SEQ_Head** list,
+                                                              double* minValue, double bound, double* maxValue);
+
+// The part of a graph from `*startX` to `*endX`, its ends included; nothing where the two don't meet.
+[[nodiscard]] KFS_SERVICE_API int CRV_EvaluateAdaptively(CRV_SampleFunc* sampleFunc, void* refCon, double const* startX,
+                                                         double const* endX, CRV_Curve const* curve,
+                                                         unsigned char* haveRange, double* minValue, double* maxValue,
+                                                         SEQ_Head** list);
