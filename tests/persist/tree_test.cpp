@@ -45,17 +45,7 @@ TEST_F(Tree, ParametersThatDifferAreWritten)
     }
 }
 
-TEST_F(Tree, WhatOldFilesDontKnowIsLeftOut)
-{
-    auto const layers = MakeLayers();
-    FX_ParamDef def{};
-    def.paramType = FX_Param_POINT_3D;
-    Append(layers.get(), "opacity")->SetParamDef(def);
-    EXPECT_EQ((Lines{"opacity"}), NamesIn(WrittenGroup(layers.get(), 77)));
-    EXPECT_EQ((Lines{}), NamesIn(WrittenGroup(layers.get(), 76)));
-}
-
-// A layer is in the file whatever it is, and a child may be saved under another name.
+// A layer is in the file whatever it is, and a child may be saved under another name. What old files don't know is left out.
 class Matte : public KFS_ParamLayerStream {
 public:
     using KFS_ParamLayerStream::KFS_ParamLayerStream;
@@ -66,8 +56,14 @@ public:
     }
 };
 
-TEST_F(Tree, LayersAreAlwaysWritten)
+TEST_F(Tree, WhatIsWrittenGoesByKindAndVersion)
 {
+    auto const layers = MakeLayers();
+    FX_ParamDef def{};
+    def.paramType = FX_Param_POINT_3D;
+    Append(layers.get(), "opacity")->SetParamDef(def);
+    EXPECT_EQ((Lines{"opacity"}), NamesIn(WrittenGroup(layers.get(), 77)));
+    EXPECT_EQ((Lines{}), NamesIn(WrittenGroup(layers.get(), 76)));
     KFS_AppCallbacks callbacks{};
     callbacks.layerDefaultValueFunc = [](KFS_ParamLayerStream const*) -> void* { return nullptr; };
     callbacks.layerIndependentFunc = [](KFS_ParamLayerStream const*, bool) { return 0L; };
@@ -100,59 +96,37 @@ public:
     bool CouldGoMissing() const override { return true; }
 };
 
-// The name in the file of a child called `given`, in each kind of place.
-TEST_F(Tree, NamesThatAreWritten)
+// What the file says of a child's name in each kind of place, and which name a child has that the file calls "Fade".
+TEST_F(Tree, Names)
 {
     auto const nameIn = [](KFS_StreamBase const* child) { return DataOf("kfsn", Written(child->GetAsLeaf())); };
-    auto const node = MakeNode();
-    KFS_StreamBase* child = node->GetEditableStream(Name("opacity"));
-    child->SetDisplayName(Text("Fade"));
-    EXPECT_EQ(Marker, nameIn(child));
-
-    OpenGroup open(Name("node"), Get_VX_StreamFactory(), false, {});
-    child = open.GetEditableStream(Name("opacity"));
-    EXPECT_EQ("opacity", nameIn(child));
-    child->SetDisplayName(Text("Fade"));
-    EXPECT_EQ("Fade", nameIn(child));
-
     auto const layers = MakeLayers();
-    child = Append(layers.get(), "opacity");
-    EXPECT_EQ(Marker, nameIn(child)) << "the canonical one's";
-    child->SetDisplayName(Text("Fade"));
-    EXPECT_EQ("Fade", nameIn(child));
-    child->SetMatchName(Name("unheard of"));
-    EXPECT_EQ(Marker, nameIn(child)) << "without a canonical one";
+    auto const node = MakeNode();
+    OpenGroup open(Name("node"), Get_VX_StreamFactory(), false, {});
     // A host may put a stream into a list that it has made without a factory.
     Q_ScAutoPtr<KFS_StreamBase> stray(new TestLeaf(Name("opacity"), nullptr, true, 600U, false, short{1}, 0.0));
-    stray->SetDisplayName(Text("mine"));
-    child = stray.get();
-    layers->AppendStream(&stray);
-    EXPECT_EQ(Marker, nameIn(child));
-    EXPECT_EQ((Lines{"unheard of", "opacity"}), NamesIn(WrittenGroup(layers.get())));
-
     Q_ScAutoPtr<KFS_StreamBase> const root = TestKinds::Make("opacity");
-    EXPECT_EQ("opacity", nameIn(root.get()));
-    root->SetMatchName(Name("unheard of"));
-    EXPECT_EQ("opacity", nameIn(root.get()));
-}
+    KFS_StreamBase* const inStray = stray.get();
+    KFS_StreamBase* const unheard = Append(layers.get(), "opacity");
+    layers->AppendStream(&stray);
+    struct {
+        KFS_StreamBase* child;
+        std::string untouched, renamed, ofNoKind;  // without a canonical one
+    } const rows[] = {{node->GetEditableStream(Name("opacity")), Marker, Marker, Marker},
+                      {open.GetEditableStream(Name("opacity")), "opacity", "Fade", "Fade"},
+                      {unheard, Marker, "Fade", Marker},
+                      {inStray, Marker, Marker, Marker},
+                      {root.get(), "opacity", "Fade", "Fade"}};
+    for (auto const& row : rows) {
+        SCOPED_TRACE(&row - rows);
+        EXPECT_EQ(row.untouched, nameIn(row.child));
+        row.child->SetDisplayName(Text("Fade"));
+        EXPECT_EQ(row.renamed, nameIn(row.child));
+        row.child->SetMatchName(Name("unheard of"));
+        EXPECT_EQ(row.ofNoKind, nameIn(row.child));
+        row.child->SetMatchName(Name("opacity"));
+    }
 
-TEST_F(Tree, NamesThatAreTaken)
-{
-    std::string const leaf = MatchName("opacity") + OneLeaf("Fade", 1.0);
-    auto const nameAfter = [](KFS_StreamGroup* group, std::string const& children) {
-        EXPECT_EQ(0, ReadGroup(group, Form(Group("Top", children))));
-        KFS_StreamBase const* const child = group->GetStream(0);
-        EXPECT_EQ(1.0, ValueOf(child));
-        return Q_UTF16ToMBString(child->GetDisplayName());
-    };
-    EXPECT_EQ("opacity", nameAfter(MakeNode().get(), leaf));
-    OpenGroup open(Name("node"), Get_VX_StreamFactory(), false, {});
-    EXPECT_EQ("opacity", nameAfter(&open, leaf)) << "it has one already";
-}
-
-// A leaf whose name only its file knows.
-TEST_F(Tree, NamesThatNobodyElseKnows)
-{
     KFS_ScRegisterStreams batch(Get_VX_StreamFactory());
     batch.Register(
         Name("foreign"),
@@ -164,13 +138,18 @@ TEST_F(Tree, NamesThatNobodyElseKnows)
         false);
     {
         TestKinds more;
-        more.Named("plug-in", {Name("foreign")});
-        for (bool const couldGoMissing : {false, true}) {
-            OpenGroup open(Name("plug-in"), Get_VX_StreamFactory(), false, {});
-            Q_ScAutoPtr<KFS_StreamBase> const closed = TestKinds::Make("plug-in");
-            KFS_StreamGroup* const group = couldGoMissing ? &open : closed->GetAsGroup();
-            ASSERT_EQ(0, ReadGroup(group, Form(Group("", MatchName("foreign") + OneLeaf("Fade", 1.0)))));
-            EXPECT_EQ(Text(couldGoMissing ? "Fade" : ""), group->GetStream(0)->GetDisplayName());
+        more.Named("plug-in", {Name("opacity"), Name("foreign")});
+        for (char const* const kind : {"opacity", "foreign"}) {
+            for (bool const couldGoMissing : {false, true}) {
+                OpenGroup missing(Name("plug-in"), Get_VX_StreamFactory(), false, {});
+                Q_ScAutoPtr<KFS_StreamBase> const closed = TestKinds::Make("plug-in");
+                KFS_StreamGroup* const group = couldGoMissing ? &missing : closed->GetAsGroup();
+                ASSERT_EQ(0, ReadGroup(group, Form(Group("Top", MatchName(kind) + OneLeaf("Fade", 1.0)))));
+                KFS_StreamBase const* const child = group->GetAsNamedGroup()->GetStream(Name(kind), true);
+                EXPECT_EQ(1.0, ValueOf(child));
+                bool const hasName = child->GetMatchName() == Name("opacity");
+                EXPECT_EQ(Text(hasName ? "opacity" : couldGoMissing ? "Fade" : ""), child->GetDisplayName());
+            }
         }
     }
     batch.UnregisterAll();
@@ -221,14 +200,18 @@ TEST_F(Tree, WithoutAGroupNothingChanges)
 {
     auto const layers = MakeLayers();
     Append(layers.get(), "opacity");
-    EXPECT_EQ(0, ReadGroup(layers.get(), Form(OneLeaf("", 1.0))));
-    EXPECT_EQ(1u, layers->GetNumStreams());
-    EXPECT_EQ(CKF_Err_NoSuchChunk, ReadGroup(layers.get(), Form(List("kfgp", BaseNamed(Marker))))) << "no end";
-    EXPECT_EQ(CKF_Err_NoSuchChunk, ReadGroup(layers.get(), Form(List("kfgp", End)))) << "no flags";
-    EXPECT_EQ(0, ReadGroup(layers.get(), Form(List("kfgp", Atom("kfsb", Long(1)) + End)))) << "the name may be missing";
-    EXPECT_EQ(Text("layers"), layers->GetDisplayName());
-    EXPECT_EQ(0, ReadGroup(layers.get(), Form(Group("a", "")))) << "a group with nothing in it";
-    EXPECT_EQ(1u, layers->GetNumStreams());
+    std::pair<std::string, int> const rows[] = {
+        {OneLeaf("", 1.0), 0},
+        {List("kfgp", BaseNamed(Marker)), CKF_Err_NoSuchChunk},  // no end
+        {List("kfgp", End), CKF_Err_NoSuchChunk},                // no flags
+        {List("kfgp", Atom("kfsb", Long(1)) + End), 0},          // the name may be missing
+        {Group(Marker, ""), 0},
+    };
+    for (auto const& [file, code] : rows) {
+        EXPECT_EQ(code, ReadGroup(layers.get(), Form(file)));
+        EXPECT_EQ(Text("layers"), layers->GetDisplayName());
+        EXPECT_EQ(1u, layers->GetNumStreams());
+    }
 }
 
 // Bits that say nothing about the project stay what they were.

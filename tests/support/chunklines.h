@@ -25,10 +25,11 @@ public:
 
     // One line a chunk, below the outer form and its version record: depth by blanks, the id, and a list's type or an
     // atom's bytes in hexadecimal.
-    std::vector<std::string> Lines() const
+    std::vector<std::string> Lines() const { return LinesOf(bytes_); }
+    static std::vector<std::string> LinesOf(std::span<unsigned char const> bytes)
     {
         std::vector<std::string> lines;
-        CKF_ChunkWalk walk(bytes_);
+        CKF_ChunkWalk walk(bytes);
         CKF_RawChunk chunk;
         for (int i = 0; walk.Next(&chunk); ++i) {
             EXPECT_EQ(nullptr, chunk.problem);

@@ -47,7 +47,7 @@ public:
         std::vector<double> const value(static_cast<std::size_t>(GetDimension()), defaultValue_);
         KFSp_ThrowIf(KFS_InsertKeyF(this, &time, 1, value.data(), 0, 0));
     }
-    bool IsStaticValueModified() const override { return ValueAt(0) != defaultValue_; }
+    bool IsStaticValueModified() const override { return HasNoValue() || ValueAt(0) != defaultValue_; }
     bool NeedsResetAfterStored() const override { return needsReset; }
     // The first component at a time in the stream's scale.
     double ValueAt(int time) const

@@ -31,60 +31,66 @@ KFS_FactoryFunc LeafFunc(double value, int* calls = nullptr)
 
 TEST_F(Factory, TheFirstRegistrationOfANameStands)
 {
-    int first = 0, second = 0;
+    int calls = 0;
     Q_MemoryCount const empty = Q_MemoryLive(nullptr);
-    EXPECT_TRUE(factory.RegisterFactoryFunc(Name("blur"), LeafFunc(1.0, &first), false));
-    KFS_StreamBase* const canonical = factory.GetCanonicalStream(Name("blur"));
-    EXPECT_FALSE(factory.RegisterFactoryFunc(Name("blur"), LeafFunc(2.0, &second), false));
-    EXPECT_EQ(0, second);
+    EXPECT_TRUE(factory.RegisterFactoryFunc(Name("blur"), LeafFunc(1.0), false));
+    auto* const canonical = dynamic_cast<TestLeaf*>(factory.GetCanonicalStream(Name("blur")));
+    EXPECT_TRUE(canonical->IsCanonical() && !canonical->GetParent());
+    EXPECT_EQ(600u, canonical->GetTimeScale());
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
+    EXPECT_FALSE(factory.RegisterFactoryFunc(Name("blur"), LeafFunc(2.0, &calls), false));
+    for (KFS_StreamBase* const late : {new TestLeaf(Name("blur"), &factory, true, 600, false, 1, 3.0), canonical})
+        EXPECT_EQ(canonical, factory.RegisterCanonicalInstance(late)) << "another is deleted, the registered one isn't";
+    EXPECT_EQ(before, Q_MemoryLive(nullptr));
     EXPECT_EQ(canonical, factory.GetCanonicalStream(Name("blur")));
     EXPECT_EQ(canonical, factory.GetCanonicalInstance(Name("blur")));
-    EXPECT_TRUE(canonical->IsCanonical());
-    EXPECT_EQ(nullptr, canonical->GetParent());
-    EXPECT_EQ(600u, canonical->GetAsLeaf()->GetTimeScale());
-    EXPECT_EQ(1.0, static_cast<TestLeaf*>(canonical)->ValueAt(0));
-    Q_MemoryCount const before = Q_MemoryLive(nullptr);
-    auto* const late = new TestLeaf(Name("blur"), &factory, true, 600, false, 1, 3.0);
-    EXPECT_EQ(canonical, factory.RegisterCanonicalInstance(late));
-    EXPECT_EQ(before, Q_MemoryLive(nullptr)) << "the late one is deleted";
-    EXPECT_EQ(canonical, factory.RegisterCanonicalInstance(canonical)) << "the registered one itself isn't";
-    EXPECT_EQ(1.0, static_cast<TestLeaf*>(canonical)->ValueAt(0));
+    EXPECT_EQ(1.0, canonical->ValueAt(0));
+    EXPECT_EQ(0, calls);
     EXPECT_TRUE(factory.UnregisterFactoryFunc_NullOK(Name("blur"), false));
     EXPECT_EQ(empty, Q_MemoryLive(nullptr));
     EXPECT_EQ(nullptr, factory.GetCanonicalStream(Name("blur")));
 }
 
+// Also one whose function gives nothing, which doesn't register.
 TEST_F(Factory, AnUnknownKindIsNothing)
 {
     Names log;
     auto const previous = Q_SetLogSink([&](int level, char const* tag, char const* topic, char const* text) {
         log.push_back(std::to_string(level) + " " + tag + " " + topic + ": " + text);
     });
-    EXPECT_EQ(nullptr, factory.GetCanonicalInstance(Name("no such")));
-    EXPECT_EQ(nullptr, factory.GetCanonicalStream(Name("no such")));
-    EXPECT_EQ(nullptr, factory.CreateStream(Name("no such"), true, 600, false, false));
-    EXPECT_EQ(KFS_Err_UnknownStream,
-              KFSp_Boundary([&] { factory.CreateStream(Name("no such"), true, 600, true, false); }));
-    EXPECT_EQ((std::vector<Reported>{{0x1D0000, 8, "asked to create unknown property of type #{ldquo}no such#{rdquo}",
-                                      KFS_Err_UnknownStream}}),
-              reports.Take());
-    EXPECT_FALSE(factory.UnregisterFactoryFunc_NullOK(Name("no such"), true));
+    KFS_FactoryFunc const nothing = [](auto...) { return nullptr; };
+    KFS_MatchName const name = Name("no such");
+    EXPECT_EQ(nullptr, factory.GetCanonicalInstance(name));
+    EXPECT_EQ(nullptr, factory.GetCanonicalStream(name));
+    EXPECT_EQ(nullptr, factory.CreateStream(name, true, 600, false, false));
+    EXPECT_EQ(KFS_Err_UnknownStream, KFSp_Boundary([&] { factory.CreateStream(name, true, 600, true, false); }));
+    EXPECT_EQ(KFS_Err_UnknownStream, KFSp_Boundary([&] { factory.RegisterFactoryFunc(name, nothing, false); }));
+    Reported const unknown{0x1D0000, 8, "asked to create unknown property of type #{ldquo}no such#{rdquo}",
+                           KFS_Err_UnknownStream};
+    EXPECT_EQ((std::vector<Reported>{unknown, unknown}), reports.Take());
+    EXPECT_FALSE(factory.UnregisterFactoryFunc_NullOK(name, true));
     EXPECT_EQ(Names{}, log);
-    EXPECT_FALSE(factory.UnregisterFactoryFunc(Name("no such")));
+    EXPECT_FALSE(factory.UnregisterFactoryFunc(name));
     EXPECT_EQ(Names{"0 KFS UnregisterFactoryFunc: no such"}, log);
+    EXPECT_TRUE(factory.RegisterFactoryFunc(name, LeafFunc(0.0), false)) << "the name is free";
+    EXPECT_TRUE(factory.UnregisterFactoryFunc(name));
     Q_SetLogSink(previous);
 }
 
-TEST_F(Factory, AKindWhoseFunctionGivesNothingIsUnknownAndDoesntRegister)
+// A node asks its own factory.
+TEST_F(Factory, KindsOfAnotherOneStandThereAlone)
 {
-    KFS_FactoryFunc const nothing = [](KFS_MatchName const&, KFS_StreamFactory*, bool, unsigned int, bool) {
-        return nullptr;
-    };
-    EXPECT_EQ(KFS_Err_UnknownStream, KFSp_Boundary([&] { factory.RegisterFactoryFunc(Name("void"), nothing, false); }));
-    EXPECT_EQ(1u, reports.Take().size());
-    EXPECT_EQ(nullptr, factory.GetCanonicalInstance(Name("void")));
-    EXPECT_TRUE(factory.RegisterFactoryFunc(Name("void"), LeafFunc(0.0), false)) << "the name is free again";
-    EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("void")));
+    KFS_StreamFactory other;
+    TestKinds kindsThere(&other);
+    kindsThere.Leaf("only there", 1, 3.0);
+    const std::unique_ptr<KFS_StreamBase> stream(other.CreateStream(Name("only there"), true, 600, true, false));
+    EXPECT_EQ(other.GetCanonicalStream(Name("only there")), stream->GetCanonicalStream(Name("only there")));
+    kinds.Leaf("only here", 1, 3.0);
+    EXPECT_EQ(nullptr, stream->GetCanonicalStream(Name("only here")));
+    EXPECT_EQ(nullptr, stream->CreateStream(Name("only here"), true, 600, false, false));
+    const std::unique_ptr<KFS_StreamBase> keyed(stream->CreateStream(Name("only there"), false, 30, true, false));
+    EXPECT_EQ(1, keyed->GetAsLeaf()->GetKeyCount());
+    EXPECT_EQ(30u, keyed->GetAsLeaf()->GetTimeScale());
 }
 
 TEST_F(Factory, AKindRegisteredAsAnObjectIsClonedFromIt)
@@ -186,9 +192,7 @@ TEST_F(Factory, DataFileGroupsGoWithTheirChildren)
 
 TEST_F(Factory, DataFileTextStreamsAreASet)
 {
-    EXPECT_FALSE(factory.IsDataFileTextStream(Name("caption")));
-    factory.RegisterDataFileTextStream(Name("caption"));
-    factory.RegisterDataFileTextStream(Name("caption"));
+    for (int i = 0; i < 2; ++i) factory.RegisterDataFileTextStream(Name("caption"));
     EXPECT_TRUE(factory.IsDataFileTextStream(Name("caption")));
     EXPECT_FALSE(factory.IsDataFileTextStream(Name("title")));
     factory.UnRegisterDataFileTextStreams();
@@ -216,63 +220,57 @@ TEST_F(Factory, AnObsoleteStreamIsReplacedByItsGroupsNewChildren)
     factory.GetCanonicalStream(Name("part"))->GetAsNamedGroup()->EnsureUILayoutComplete();
     Q_MemoryCount const before = Q_MemoryLive(nullptr);
     {
-        TestLeaf old(Name("amount"), &factory, true, 600, false, 1, 42.0);
+        TestLeaf old(Name("amount"), &factory, true, 600, false, 1, 42.0),
+            red(Name("red"), &factory, true, 600, false, 1, 0.0);
         old.InsertDefaultKey(T_Time{0, 1});
-        KFS_Stream* const untouched = &old;
-        std::vector<KFS_Stream*> result{untouched};
+        std::vector<KFS_Stream*> result{&red};
         EXPECT_FALSE(old.GatherObsoleteReplacementStreams(result));
-        EXPECT_EQ(std::vector<KFS_Stream*>{untouched}, result);
+        EXPECT_EQ(std::vector<KFS_Stream*>{&red}, result);
         old.RegisterObsoleteStreamParent(Name("amount"), Name("tint"));
         factory.RegisterObsoleteStreamParent(Name("amount"), Name("part"));  // the first stands
+        factory.RegisterObsoleteStreamParent(Name("red"), Name("blue"));
         EXPECT_TRUE(old.GatherObsoleteReplacementStreams(result));
-        ASSERT_EQ(2u, result.size()) << "those that the conversion made real, in display order";
-        EXPECT_EQ("red", NameOf(result[0]));
-        EXPECT_EQ("blue", NameOf(result[1]));
+        Names names;  // of those that the conversion made real, in display order
         for (KFS_Stream* const stream : result) {
+            names.push_back(NameOf(stream));
             EXPECT_EQ(nullptr, stream->GetParent());
             EXPECT_EQ(42.0, static_cast<TestLeaf*>(stream)->ValueAt(0));
             delete stream;
         }
-        factory.RegisterObsoleteStreamParent(Name("red"), Name("blue"));
-        TestLeaf red(Name("red"), &factory, true, 600, false, 1, 0.0);
+        EXPECT_EQ((Names{"red", "blue"}), names);
         EXPECT_TRUE(factory.GatherObsoleteReplacementStreams(&red, result));
         EXPECT_TRUE(result.empty()) << "a leaf replaces nothing";
     }
     EXPECT_EQ(before, Q_MemoryLive(nullptr));
 }
 
+int CountRealLeaves(KFS_StreamGroup& group)
+{
+    int real = 0;
+    auto count = [&real](KFS_Stream*) { ++real; };
+    group.ForEachNonCanonicalLeafStream(count, nullptr);
+    return real;
+}
+
 TEST_F(Factory, DecanonicalizingMakesTheWholeTreeReal)
 {
     SceneKinds const scene;
     KFS_DecanonicalizeAllChildStreamsDeep(nullptr);
-    auto const countReal = [](KFS_StreamGroup& group) {
-        int real = 0;
-        auto count = [&real](KFS_Stream*) { ++real; };
-        group.ForEachNonCanonicalLeafStream(count, nullptr);
-        return real;
-    };
-    class Owned : public TestRoot<TestNamedGroup> {
-    public:
+    struct Owned : TestRoot<TestNamedGroup> {
         explicit Owned(KFS_Project* project) : TestRoot("node"), project_(project) {}
         KFS_Project* GetProject() const override { return project_; }
-
-    private:
         KFS_Project* project_;
-    };
-    Owned root(&session.GetProject());
+    } root(&session.GetProject());
     Q_RenderContext* const context = session.GetProject().GetRenderContext(false);
     auto* const state = dynamic_cast<KFS_RenderState*>(context->PeekState(KFS_RenderState::S_StateName));
-    ASSERT_NE(nullptr, state);
     {
         auto const outer = state->SuspendAutoDecanonicalize();
-        {
-            auto const inner = state->SuspendAutoDecanonicalize();
-        }
+        static_cast<void>(state->SuspendAutoDecanonicalize());
         KFS_DecanonicalizeAllChildStreamsDeep(&root);
-        EXPECT_EQ(0, countReal(root)) << "while the project suspends it";
+        EXPECT_EQ(0, CountRealLeaves(root)) << "while the project suspends it";
     }
     KFS_DecanonicalizeAllChildStreamsDeep(&root);
-    EXPECT_EQ(5, countReal(root));
+    EXPECT_EQ(5, CountRealLeaves(root));
     EXPECT_EQ(&root, root.GetStream(0)->GetParent());
     EXPECT_FALSE(KFS_ShouldAlwaysDecanonicalize()) << "off unless somebody switched it on";
 }
@@ -285,9 +283,7 @@ int CountWithTheSwitchOn()
     SceneKinds const scene;
     auto const made = TestKinds::Make("node");
     auto* const node = made->GetAsNamedGroup();
-    int answer = 0;
-    auto count = [&answer](KFS_Stream*) { answer += 10; };
-    node->ForEachNonCanonicalLeafStream(count, nullptr);
+    int const answer = 10 * CountRealLeaves(*node);
     Q_ScAutoPtr<KFS_StreamBase> const left(node->SwapCanonicalForStream(Name("opacity")));
     KFS_StreamBase const* const now = node->GetEditableStreamNullOK(Name("opacity"));
     return answer + (left && now && now != left.get() ? 1 : 0);

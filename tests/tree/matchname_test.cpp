@@ -3,85 +3,66 @@
 #include <gtest/gtest.h>
 
 #include <atomic>
-#include <cstring>
+#include <set>
 #include <thread>
 #include <vector>
 
 namespace {
+
+using hearth::utility::Guid;
 
 char const* Text(KFS_MatchName const& name)
 {
     return reinterpret_cast<char const*>(name.GetName());
 }
 
-TEST(MatchName, TextGoesInAndComesBackOut)
-{
-    const KFS_MatchName position("position", true);
-    EXPECT_TRUE(position.IsValid());
-    EXPECT_STREQ("position", Text(position));
-    EXPECT_EQ(position, KFS_MatchName("position", false));
-    EXPECT_EQ(position.GetName(), KFS_MatchName("position", false).GetName()) << "one entry for a text";
-    EXPECT_NE(position, KFS_MatchName("Position", true));
-    KFS_MatchName other;
-    other = "position";
-    EXPECT_EQ(position, other);
-}
-
 // The hash of a text is the same in every process: MurmurHash3 x64 128 of all its bytes, also of those that the pool
 // doesn't keep.
-TEST(MatchName, HashIsOfTheWholeText)
+TEST(MatchName, TextsComeBackAndTheirHashIsOfAllOfThem)
 {
-    const KFS_MatchName empty("", true);
-    EXPECT_FALSE(empty.IsValid()) << "the hash of no bytes is all zero, like a name that was never set";
-    EXPECT_EQ(empty, KFS_MatchName(static_cast<char const*>(nullptr), true));
-    // h1 and h2 of a well-known vector
-    hearth::utility::Guid const published(
-        {0x6c, 0x1b, 0x07, 0xbc, 0x7b, 0xbc, 0x4b, 0xe3, 0x47, 0x93, 0x9a, 0xc4, 0xa9, 0x3c, 0x43, 0x7a});
-    EXPECT_TRUE(published == KFS_MatchName("The quick brown fox jumps over the lazy dog", true).GetGuid());
+    std::set<KFS_MatchName> names;
     std::string const common(45, 'x');
-    EXPECT_NE(KFS_MatchName((common + "1").c_str(), true), KFS_MatchName((common + "2").c_str(), true));
-}
-
-TEST(MatchName, LongTextsKeepWhatFitsTheirPlace)
-{
-    for (std::size_t const length : {39u, 60u})
-        EXPECT_EQ(std::string(39, 'k'), Text(KFS_MatchName(std::string(length, 'k').c_str(), true)));
-}
-
-TEST(MatchName, UnsetAndForeignHashesAndTheEndOfAGroup)
-{
+    std::string const texts[] = {"position", "Position", std::string(39, 'k'), common, common + "1", common + "2"};
+    for (std::string const& text : texts) {
+        KFS_MatchName const name(text.c_str(), true);
+        EXPECT_TRUE(name.IsValid() && names.insert(name).second);
+        EXPECT_EQ(text.substr(0, 39), Text(name));
+        KFS_MatchName other;
+        other = text.c_str();
+        EXPECT_EQ(name, other);
+        EXPECT_EQ(name.GetName(), other.GetName()) << "one entry for a text";
+    }
+    // h1 and h2 of a well-known vector
+    EXPECT_TRUE(Guid({0x6c, 0x1b, 0x07, 0xbc, 0x7b, 0xbc, 0x4b, 0xe3, 0x47, 0x93, 0x9a, 0xc4, 0xa9, 0x3c, 0x43,
+                      0x7a}) == KFS_MatchName("The quick brown fox jumps over the lazy dog", true).GetGuid());
+    EXPECT_EQ(KFS_MatchName(), KFS_MatchName("", true)) << "the hash of no bytes is all zero, like a name never set";
+    EXPECT_EQ(KFS_MatchName(), KFS_MatchName(static_cast<char const*>(nullptr), true));
     EXPECT_FALSE(KFS_MatchName().IsValid());
-    EXPECT_EQ(KFS_MatchName(), KFS_MatchName());
     KFS_MatchName foreign;
-    foreign.SetGuid(hearth::utility::Guid({1, 2, 3}));
-    EXPECT_TRUE(foreign.IsValid());
-    EXPECT_EQ(nullptr, foreign.GetName());
-    EXPECT_TRUE(KFS_MatchName("ZQVM Group End", true).IsEndOfGroupMarker());
+    foreign.SetGuid(Guid({1, 2, 3}));
+    EXPECT_TRUE(foreign.IsValid() && !foreign.GetName());
     EXPECT_FALSE(KFS_MatchName("ZQVM Group End ", true).IsEndOfGroupMarker());
-    EXPECT_FALSE(KFS_MatchName().IsEndOfGroupMarker());
 }
 
-TEST(MatchNameThreads, ManyThreadsInternOneEntryAText)
+TEST(MatchName, ManyThreadsInternOneEntryAText)
 {
-    constexpr int Texts = 200;
-    std::vector<unsigned char const*> first(Texts);
-    std::atomic<int> differing{0};
+    std::vector<std::set<char const*>> entries(200);
+    std::atomic<std::size_t> turn{0};
     std::vector<std::thread> threads;
-    for (int t = 0; t < 4; ++t) {
+    for (std::size_t t = 0; t < 4; ++t) {
         threads.emplace_back([&, t] {
-            for (int i = 0; i < Texts; ++i) {
-                const std::string text = "interned at once " + std::to_string(i);
-                KFS_MatchName const name(text.c_str(), true);
-                differing += text != Text(name);
-                if (t == 0) first[static_cast<std::size_t>(i)] = name.GetName();
-            }
+            std::vector<char const*> mine;
+            for (std::size_t i = 0; i < entries.size(); ++i)
+                mine.push_back(Text(KFS_MatchName(("interned at once " + std::to_string(i)).c_str(), true)));
+            while (turn != t) std::this_thread::yield();
+            for (std::size_t i = 0; i < entries.size(); ++i) entries[i].insert(mine[i]);
+            ++turn;
         });
     }
     for (std::thread& thread : threads) thread.join();
-    EXPECT_EQ(0, differing);
-    for (int i = 0; i < Texts; ++i) {
-        EXPECT_EQ(first[static_cast<std::size_t>(i)],
-                  KFS_MatchName(("interned at once " + std::to_string(i)).c_str(), true).GetName());
+    for (std::size_t i = 0; i < entries.size(); ++i) {
+        ASSERT_EQ(1u, entries[i].size());
+        EXPECT_EQ("interned at once " + std::to_string(i), *entries[i].begin());
     }
 }
 

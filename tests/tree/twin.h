@@ -4,7 +4,7 @@
 
 #include <functional>
 #include <memory>
-#include <set>
+#include <optional>
 
 // A tree of streams as plainly as it can be told: each group is a vector, each edit is its list of steps, and each
 // notification is a line of text. It holds no stream and shares no code with the library.
@@ -30,47 +30,167 @@ inline TwinKind const& KindOf(std::string const& name)
         TwinKinds.begin(), TwinKinds.end(), [&](TwinKind const& k) { return k.name == name; });
 }
 
-struct Broken {
-    std::string text;
-};
-
 // Edits, as a script says them. Each number is taken modulo what there is.
-enum class Op {
-    Insert,
-    Append,
-    Swap,
-    Remove,
-    RemoveChild,
-    Move,
-    Duplicate,
-    Upgrade,
-    SwapNamed,
-    Canonical,
-    Reset,
-    Copy,
-    Flags,
-    Name,
-    Independent,
-    Value,
-    Throw,
-    End
-};
-inline char const* const OpNames[] = {"Insert",    "Append",  "Swap",        "Remove",    "RemoveChild", "Move",
-                                      "Duplicate", "Upgrade", "SwapNamed",   "Canonical", "Reset",       "Copy",
-                                      "Flags",     "Name",    "Independent", "Value",     "Throw"};
+inline std::vector<std::string> const Ops{"Insert",  "Append",    "Swap",      "Remove", "RemoveChild", "Move",
+                                          "Upgrade", "SwapNamed", "Canonical", "Reset",  "Copy",        "Duplicate",
+                                          "Flags",   "Name",      "Value",     "Throw",  "Independent"};
 struct Edit {
-    Op op = Op::End;
+    std::string op;
     unsigned int group = 0, at = 0, to = 0;
 };
-inline char const* const Moments[] = {"never",       "before-insert", "after-insert",   "before-remove", "after-remove",
-                                      "before-swap", "after-swap",    "before-reorder", "after-reorder"};
+inline std::vector<std::string> const Moments{"before-insert", "after-insert", "before-remove",  "after-remove",
+                                              "before-swap",   "after-swap",   "before-reorder", "after-reorder"};
 struct Step {
     Edit edit;
-    unsigned int moment = 0;  // the first such notification of the edit makes a listener do `nested`
+    std::string moment;  // the first such notification of the edit makes a listener do `nested`
     Edit nested;
 };
 
 constexpr unsigned int TwinFlags[] = {0x1, 0x2, 0x8, 0x10, 0x20, 0x200, 0x1000, 0x2000, 0x20000, 0x40000, 0x80000};
+
+// What is the same for a twin and a tree of streams: which node an edit of a script means, what a listener does, and how a
+// tree is shown. `Tree` has the edits themselves.
+template <class Tree, class Node>
+class Scripted {
+public:
+    void Do(Step const& step)
+    {
+        moment_ = step.moment;
+        nested_ = step.nested;
+        if (int const code = Self().Try([&] { Do(step.edit, false); })) log.push_back("code " + std::to_string(code));
+        moment_.clear();
+        for (Node* const gone : std::exchange(limbo_, {})) Self().Delete(gone);
+    }
+
+    // The tree at a moment: names and identities; * for who isn't its parent's, ~ for what is canonical.
+    std::string Show(Node* node, Node const* parent, bool whole)
+    {
+        std::string text = Self().Label(node) + (Self().Parent(node) == parent ? "" : "*");
+        if (whole) text += Self().Facts(node);
+        if (Shape(node) == 'l') return text;
+        text += "[";
+        for (std::size_t i = 0; i < Count(node); ++i) {
+            std::optional<Node*> const child = Self().Child(node, i);
+            text += !child ? "-" : *child ? Show(*child, node, whole) : Layout(node)[i] + "~";
+            text += ' ';
+        }
+        return text + "]";
+    }
+
+    // The real nodes of such shapes, depth first.
+    std::vector<Node*> Of(std::string const& shapes, Node* from)
+    {
+        std::vector<Node*> nodes;
+        if (shapes.find(Shape(from)) != std::string::npos) nodes.push_back(from);
+        for (std::size_t i = 0; i < Count(from); ++i)
+            if (Node* const child = Self().Child(from, i).value_or(nullptr))
+                for (Node* const node : Of(shapes, child)) nodes.push_back(node);
+        return nodes;
+    }
+
+    std::vector<std::string> log;
+
+protected:
+    char Shape(Node const* node) { return KindOf(Self().Kind(node)).shape; }
+    std::vector<std::string> const& Layout(Node const* group) { return KindOf(Self().Kind(group)).layout; }
+    std::size_t Count(Node const* node)
+    {
+        return Shape(node) == 'i' ? Self().Length(node) : Shape(node) == 'n' ? Layout(node).size() : 0;
+    }
+
+    void Heard(std::string const& line)
+    {
+        log.push_back(line);
+        std::string const what = line.substr(0, line.find(' '));
+        if (std::find(Moments.begin(), Moments.end(), what) == Moments.end()) return;
+        log.back() += " in " + Show(Self().Root(), nullptr, false);
+        if (what != moment_) return;
+        moment_.clear();
+        if (nested_.op == "Throw") throw int{77};
+        if (int const code = Self().Try([&] { Do(nested_, true); }))
+            log.push_back("nested code " + std::to_string(code));
+    }
+
+private:
+    Tree& Self() { return static_cast<Tree&>(*this); }
+    void Own(Node* node)
+    {
+        if (node) limbo_.push_back(node);
+    }
+
+    void Do(Edit const& e, bool isNested)
+    {
+        std::string const& op = e.op;
+        auto const pick = [&](char const* shapes, unsigned int number) -> Node* {
+            std::vector<Node*> const nodes = Of(shapes, Self().Root());
+            return nodes.empty() ? nullptr : nodes[number % nodes.size()];
+        };
+        Node* const list = pick("i", e.group);
+        Node* const group = pick("n", e.group);
+        Node* const node = pick("lni", e.group);
+        std::size_t const count = Count(list), at = e.at % (count + 2), slot = group ? e.at % Count(group) : 0;
+        bool const isOn = e.to % 2 == 1;
+        if (op == "Insert" || op == "Append" || op == "Swap") {
+            auto made = Self().Make(TwinKinds[e.to % TwinKinds.size()].name, e.to % 5 == 1);
+            if (e.to % 7 == 2) Self().SetIndependent(&*made, true);
+            if (op == "Swap")
+                Own(Self().Swap(list, at, made));
+            else if (op == "Insert")
+                Self().Insert(list, at, made);
+            else
+                Self().Append(list, made);
+        } else if (op == "Remove") {
+            Own(Self().Remove(list, at));
+        } else if (op == "RemoveChild") {
+            bool const isNamed = group && !isNested && isOn;
+            Node* const from = isNamed ? group : list;
+            if (Count(from) == 0) return;
+            Node* const child = Self().Child(from, e.at % Count(from)).value_or(nullptr);
+            if (!child || !Self().RemoveChild(from, child)) return;
+            Own(child);
+            if (!isNamed) return;
+            moment_.clear();
+            Self().Reset(group);
+        } else if (op == "Move") {
+            Self().Move(list, e.at % (count + 1), isNested && count > 0 ? e.to % count : e.to % (count + 1));
+        } else if (op == "Duplicate") {
+            Self().Duplicate(list, at);
+        } else if (op == "Flags") {
+            unsigned int const bit = TwinFlags[e.at % std::size(TwinFlags)];
+            Self().SetFlags(node, isOn ? bit : 0, bit);
+        } else if (op == "Name") {
+            Self().SetName(node, e.to % 3 == 0 ? Self().Kind(node) : "name " + std::to_string(e.to % 4));
+        } else if (op == "Independent") {
+            Self().SetIndependent(node, isOn);
+        } else if (op == "Value") {
+            if (Node* const leaf = pick("l", e.group)) Self().SetValue(leaf, e.to % 6);
+        } else if (!group) {
+            return;
+        } else if (op == "Upgrade") {
+            Self().Upgrade(group, slot, e.to % 8);
+        } else if (op == "SwapNamed") {
+            auto made = Self().Make(e.to % 5 == 4 ? "list" : Layout(group)[slot], isOn);
+            if (e.to % 3 == 2) Self().SetIndependent(&*made, true);
+            Own(Self().SwapNamed(group, made));
+        } else if (op == "Canonical") {
+            Own(Self().SwapCanonical(group, slot));
+        } else if (op == "Reset" && !isNested) {
+            moment_.clear();
+            Self().Reset(group);
+        } else if (op == "Copy" && !isNested) {
+            moment_.clear();
+            Node* const other = pick("n", e.at);
+            // Not from below the group itself, which may go with what is replaced.
+            for (Node const* up = other; up; up = Self().Parent(up))
+                if (up == group) return;
+            Self().CopyFrom(group, other);
+        }
+    }
+
+    std::string moment_;
+    Edit nested_;
+    std::vector<Node*> limbo_;  // what the script's user owns
+};
 
 struct Twin {
     std::string kind, name;
@@ -86,55 +206,16 @@ struct Twin {
     std::vector<std::string> const& Layout() const { return KindOf(kind).layout; }
 };
 
-class TwinTree {
+struct Broken {
+    std::string text;
+};
+
+class TwinTree : public Scripted<TwinTree, Twin> {
 public:
     TwinTree() : root(Make("list", false)) { root->scale = RootScale; }
     ~TwinTree() { Free(root); }
     TwinTree(TwinTree const&) = delete;
     TwinTree& operator=(TwinTree const&) = delete;
-
-    // Every node below the root, the root first, depth first.
-    std::vector<Twin*> Nodes(Twin* from) const
-    {
-        std::vector<Twin*> nodes{from};
-        for (Twin* const child : from->children)
-            if (child && child != &Hole)
-                for (Twin* const node : Nodes(child)) nodes.push_back(node);
-        return nodes;
-    }
-    std::vector<Twin*> Of(std::string const& shapes) const
-    {
-        std::vector<Twin*> nodes = Nodes(root);
-        std::erase_if(nodes, [&](Twin* node) { return shapes.find(node->Shape()) == std::string::npos; });
-        return nodes;
-    }
-
-    // The tree at a moment: names and identities; * for who isn't its parent's, ~ for what is canonical.
-    std::string Show(Twin* node, Twin const* parent, bool whole, std::string const& path = {})
-    {
-        std::string text = Label(node) + (node->parent == parent ? "" : "*");
-        if (whole) text += Facts(node) + " @" + path;
-        if (node->Shape() == 'l') return text;
-        text += "[";
-        for (std::size_t i = 0; i < node->children.size(); ++i) {
-            Twin* const child = node->children[i];
-            std::string const kind = node->Shape() == 'n' ? node->Layout()[i] : child->kind;
-            std::string const step = path + "/" + (node->Shape() == 'i' ? std::to_string(i) : "") + kind;
-            text += child == &Hole ? "-" : child ? Show(child, node, whole, step) : kind + "~";
-            text += ' ';
-        }
-        return text + "]";
-    }
-
-    void Do(Step const& step)
-    {
-        moment = Moments[step.moment];
-        nested = step.nested;
-        int const code = Try([&] { Do(step.edit, false); });
-        if (code != 0) log.push_back("code " + std::to_string(code));
-        moment = Moments[0];
-        for (Twin* const gone : std::exchange(limbo, {})) Delete(gone);
-    }
 
     // What a file says of a node: its kinds, flags and names.
     void Save(Twin const* node, std::string const& indent, std::vector<std::string>* lines, bool marked) const
@@ -195,6 +276,43 @@ public:
         delete node;
     }
 
+    static constexpr unsigned int RootScale = 30, Unsaved = 0x1D0EC;
+    Twin* root;
+
+private:
+    friend Scripted<TwinTree, Twin>;
+
+    // What the script asks of a tree.
+    Twin* Root() const { return root; }
+    static std::string const& Kind(Twin const* node) { return node->kind; }
+    static Twin const* Parent(Twin const* node) { return node->parent; }
+    static std::size_t Length(Twin const* list) { return list->children.size(); }
+    static std::optional<Twin*> Child(Twin const* group, std::size_t i)
+    {
+        return group->children[i] == &Hole ? std::nullopt : std::optional(group->children[i]);
+    }
+    std::string Label(Twin* node)
+    {
+        if (node->id == 0) node->id = ++lastId_;
+        return node->kind + "#" + std::to_string(node->id);
+    }
+    static std::string Facts(Twin const* node)
+    {
+        bool active = true, hidden = (node->flags & 2) != 0;
+        int depth = 0;
+        std::string path;
+        for (Twin const* at = node; at->parent; at = at->parent, ++depth) {
+            bool const isInList = at->parent->Shape() == 'i';
+            path = "/" + (isInList ? std::to_string(PlaceOf(at->parent, at)) : "") + at->kind + path;
+            active = active && (at->parent->flags & 1) != 0;
+            hidden = hidden || (at->parent->flags & 2) != 0;
+        }
+        std::string text = "{" + std::to_string(node->flags) + " " + node->name + (active ? "" : " off") +
+                           (hidden ? " hidden" : "") + (IsModified(node) ? " modified" : "") +
+                           (IsAnimated(node) ? " animated" : "") + " " + std::to_string(depth) + " " + path;
+        if (node->Shape() == 'l') text += " " + std::to_string(node->value) + " at " + std::to_string(node->scale);
+        return text + "}";
+    }
     static bool IsModified(Twin const* node)
     {
         if (node->Shape() == 'l') return node->keyed || node->value != KindOf(node->kind).value;
@@ -208,25 +326,20 @@ public:
                std::any_of(
                    node->children.begin(), node->children.end(), [](Twin const* c) { return c && IsAnimated(c); });
     }
-
-    static inline Twin Hole;
-    static constexpr unsigned int RootScale = 30, Unsaved = 0x1D0EC;
-    Twin* root;
-    std::vector<Twin*> limbo;  // what the script's user owns
-    std::vector<std::string> log;
-    std::string moment = Moments[0];
-    Edit nested;
+    static bool IsWritten(Twin const* group, Twin const* child)
+    {
+        return group->Shape() == 'i' || child->Shape() == 'n' || IsModified(child) || child->flags != 1 ||
+               child->name != child->kind;
+    }
 
     // A node as the factory makes it: subgroups are its own, and empty of real streams.
-    Twin* Make(std::string const& kind, bool keyed) const
+    static Twin* Make(std::string const& kind, bool keyed)
     {
         Twin* const made = MakeEmpty(kind);
         made->keyed = keyed && made->Shape() == 'l';
         if (made->Shape() == 'n') FillIn(made);
         return made;
     }
-
-private:
     static Twin* MakeEmpty(std::string const& kind)
     {
         auto* const made = new Twin;
@@ -244,32 +357,6 @@ private:
         }
     }
 
-    std::string Label(Twin* node)
-    {
-        if (node->id == 0) node->id = ++lastId_;
-        return node->kind + "#" + std::to_string(node->id);
-    }
-    static std::string Facts(Twin const* node)
-    {
-        bool active = true, hidden = (node->flags & 2) != 0;
-        int depth = 0;
-        for (Twin const* up = node->parent; up; up = up->parent, ++depth) {
-            active = active && (up->flags & 1) != 0;
-            hidden = hidden || (up->flags & 2) != 0;
-        }
-        std::string text = "{" + std::to_string(node->flags) + " " + node->name + (active ? "" : " off") +
-                           (hidden ? " hidden" : "") + (IsModified(node) ? " modified" : "") +
-                           (IsAnimated(node) ? " animated" : "") + " " + std::to_string(depth);
-        if (node->Shape() == 'l') text += " " + std::to_string(node->value) + " at " + std::to_string(node->scale);
-        return text + "}";
-    }
-
-    static bool IsWritten(Twin const* group, Twin const* child)
-    {
-        return group->Shape() == 'i' || child->Shape() == 'n' || IsModified(child) || child->flags != 1 ||
-               child->name != child->kind;
-    }
-
     int Probe(Twin* node) const
     {
         if (node == root) return 1;
@@ -278,27 +365,21 @@ private:
         while (top->parent) top = top->parent;
         return node->heard = Probe(top);
     }
-    // The first line of its kind makes the listener act, if the script says so.
-    template <class Who>
-    void Tell(Twin* gate, std::string const& what, Who const& who)
+    // `line` is asked for where somebody hears it: speaking of a node gives it its number.
+    template <class Line>
+    void Tell(Twin* gate, Line const& line)
     {
-        if (paused_ || Probe(gate) != 1) return;
-        log.push_back(what + " " + who());
-        if (what == "destroyed" || what == "flags" || what == "name" || what == "value") return;
-        log.back() += " in " + Show(root, nullptr, false);
-        if (what != moment) return;
-        moment = Moments[0];
-        if (nested.op == Op::Throw) throw int{77};
-        int const code = Try([&] { Do(nested, true); });
-        if (code != 0) log.push_back("nested code " + std::to_string(code));
+        if (!paused_ && Probe(gate) == 1) Heard(line());
     }
-    void Tell(Twin* group, std::string const& what, Twin* child, std::string const& kind, std::size_t index)
+    void Tell(Twin* group, char const* what, Twin* child, std::size_t index)
     {
         Tell(
-            group, what,
+            group,
             [&] {
-                std::string who = Label(group) + " ";  // the group before the child: both may be new
-                return (who += child ? Label(child) : kind + "~") + " " + std::to_string(index);
+                std::string line =
+                    std::string(what) + " " + Label(group) + " ";  // the group before the child: both may be new
+                line += child ? Label(child) : group->Layout()[index] + "~";
+                return line + " " + std::to_string(index);
             });
     }
     template <class F>
@@ -314,29 +395,54 @@ private:
         }
         return 0;
     }
-
-    static unsigned int ScaleAt(Twin const* group)
+    // What came, if it arrived, or what leaves, if all went well; else it goes with what the edit threw.
+    template <class F>
+    void OrDelete(Twin* node, F const& f)
     {
-        while (group->parent) group = group->parent;
-        return group->scale;
+        try {
+            f();
+        } catch (...) {
+            if (node && !node->parent) Delete(node);
+            throw;
+        }
     }
-    void SetParent(Twin* node, Twin* group) const
+
+    void SetParent(Twin* node, Twin* group)
     {
         node->parent = group;
-        unsigned int const scale = ScaleAt(group);
-        for (Twin* const each : Nodes(node))
-            if (each->Shape() == 'l') each->scale = scale;
+        while (group->parent) group = group->parent;
+        for (Twin* const leaf : Of("l", node)) leaf->scale = group->scale;
     }
     static std::size_t PlaceOf(Twin const* group, Twin const* child)
     {
         return static_cast<std::size_t>(std::find(group->children.begin(), group->children.end(), child) -
                                         group->children.begin());
     }
-    static std::ptrdiff_t Sorted(Twin const* group, std::string const& kind)
+    static bool IsIn(Twin const* group, Twin const* child) { return PlaceOf(group, child) < group->children.size(); }
+    static bool CanStore(Twin const* group, Twin const* child)
     {
-        std::ptrdiff_t rank = 0;
+        return std::find(group->Layout().begin(), group->Layout().end(), child->kind) != group->Layout().end();
+    }
+    // The slots of a named group in the order of their names.
+    static std::vector<std::size_t> Sorted(Twin const* group)
+    {
+        std::vector<std::pair<KFS_MatchName, std::size_t>> order;
         for (std::size_t i = 0; i < group->children.size(); ++i)
-            rank += group->children[i] != &Hole && ::Name(group->Layout()[i].c_str()) < ::Name(kind.c_str());
+            order.emplace_back(::Name(group->Layout()[i].c_str()), i);
+        std::sort(order.begin(), order.end());
+        std::vector<std::size_t> slots;
+        for (auto const& [name, i] : order) slots.push_back(i);
+        return slots;
+    }
+    // Where a child stands in the eyes of those who hear of its removal.
+    static std::size_t Rank(Twin const* group, Twin const* child)
+    {
+        std::size_t rank = 0;
+        if (group->Shape() == 'i') return PlaceOf(group, child);
+        for (std::size_t const i : Sorted(group)) {
+            if (group->children[i] == child) break;
+            rank += group->children[i] != &Hole;
+        }
         return rank;
     }
 
@@ -344,42 +450,48 @@ private:
     {
         if (!node) return;
         if (node->Shape() == 'n') Empty(node);
-        while (node->Shape() == 'i' && !node->children.empty()) {
-            Twin* const child = node->children.back();
-            Tell(node, "before-remove", child, "", node->children.size() - 1);
-            node->children.pop_back();
-            child->parent = nullptr;
-            Tell(node, "after-remove", child, "", node->children.size());
-            Delete(child);
-        }
-        Tell(node, "destroyed", [&] { return Label(node); });
+        while (node->Shape() == 'i' && !node->children.empty()) Delete(Remove(node, node->children.size() - 1));
+        Tell(node, [&] { return "destroyed " + Label(node); });
         delete node;
     }
-    // The real children of a named group go in the order of their names.
     void Empty(Twin* group)
     {
-        std::vector<std::pair<KFS_MatchName, std::size_t>> order;
-        for (std::size_t i = 0; i < group->children.size(); ++i)
-            order.emplace_back(::Name(group->Layout()[i].c_str()), i);
-        std::sort(order.begin(), order.end());
-        for (auto const& [name, i] : order) {
+        for (std::size_t const i : Sorted(group)) {
             Twin* const child = group->children[i];
             if (!child || child == &Hole) continue;
-            auto const rank = static_cast<std::size_t>(Sorted(group, child->kind));
-            Tell(group, "before-remove", child, "", rank);
+            std::size_t const rank = Rank(group, child);
+            Tell(group, "before-remove", child, rank);
             child->parent = nullptr;
-            Tell(group, "after-remove", child, "", rank);
+            Tell(group, "after-remove", child, rank);
             group->children[i] = nullptr;
             Delete(child);
         }
     }
+    void Reset(Twin* group)
+    {
+        Empty(group);
+        FillIn(group);
+    }
+
     void SetFlags(Twin* node, unsigned int value, unsigned int mask)
     {
         unsigned int const old = node->flags;
         node->flags = (value & mask) | (old & ~mask);
         if (node->flags != old)
-            Tell(node, "flags",
-                 [&] { return Label(node) + " " + std::to_string(old) + " " + std::to_string(node->flags); });
+            Tell(node, [&] {
+                return "flags " + Label(node) + " " + std::to_string(old) + " " + std::to_string(node->flags);
+            });
+    }
+    void SetName(Twin* node, std::string const& name)
+    {
+        node->name = name;
+        SetFlags(node, 0, 0x40000);
+        Tell(node, [&] { return "name " + Label(node); });
+    }
+    void SetValue(Twin* leaf, double value)
+    {
+        leaf->value = value;
+        Tell(leaf, [&] { return "value " + Label(leaf); });
     }
     void SetIndependent(Twin* node, bool on)
     {
@@ -391,61 +503,86 @@ private:
 
     void Insert(Twin* list, std::size_t at, Twin* made)
     {
-        if (std::find(list->Layout().begin(), list->Layout().end(), made->kind) == list->Layout().end())
-            throw Broken{"There was an error reading the " + list->name +
-                         " parameter group. The project file is corrupt. Skipping the layer."};
-        if (at > list->children.size()) throw Broken{"invalid index for insert in indexed group"};
-        Twin const* const next = at < list->children.size() ? list->children[at] : nullptr;
-        Tell(list, "before-insert", made, "", at);
-        std::size_t place = next ? PlaceOf(list, next) : list->children.size();
-        if (next && place == list->children.size()) place = std::min(at, place);
-        list->children.insert(list->children.begin() + static_cast<std::ptrdiff_t>(place), made);
-        SetParent(made, list);
-        Tell(list, "after-insert", made, "", place);
+        OrDelete(
+            made,
+            [&] {
+                if (!CanStore(list, made))
+                    throw Broken{"There was an error reading the " + list->name +
+                                 " parameter group. The project file is corrupt. Skipping the layer."};
+                if (at > list->children.size()) throw Broken{"invalid index for insert in indexed group"};
+                Twin const* const next = at < list->children.size() ? list->children[at] : nullptr;
+                Tell(list, "before-insert", made, at);
+                std::size_t place = next ? PlaceOf(list, next) : list->children.size();
+                if (next && place == list->children.size()) place = std::min(at, place);
+                list->children.insert(list->children.begin() + static_cast<std::ptrdiff_t>(place), made);
+                SetParent(made, list);
+                Tell(list, "after-insert", made, place);
+            });
     }
-    // What came, if it arrived; else it goes with what the edit threw.
-    template <class F>
-    void Bring(Twin* made, F const& f)
+    void Append(Twin* list, Twin* made) { Insert(list, list->children.size(), made); }
+    void Duplicate(Twin* list, std::size_t at)
     {
-        try {
-            f();
-        } catch (...) {
-            if (!made->parent) Delete(made);
-            throw;
-        }
+        if (at >= list->children.size()) throw Broken{"invalid index in indexed group"};
+        Insert(list, at + 1, Clone(list->children[at]));
     }
-    Twin* Remove(Twin* list, std::size_t at, char const* text = "invalid index for remove in indexed group")
+    Twin* Remove(Twin* list, std::size_t at)
     {
-        if (at >= list->children.size()) throw Broken{text};
+        if (at >= list->children.size()) throw Broken{"invalid index for remove in indexed group"};
         Twin* const child = list->children[at];
-        Tell(list, "before-remove", child, "", at);
+        Tell(list, "before-remove", child, at);
+        if (!IsIn(list, child)) return nullptr;
         std::size_t const place = PlaceOf(list, child);
-        if (place == list->children.size()) return nullptr;
         list->children.erase(list->children.begin() + static_cast<std::ptrdiff_t>(place));
         child->parent = nullptr;
-        OrDelete(child, [&] { Tell(list, "after-remove", child, "", place); });
+        OrDelete(child, [&] { Tell(list, "after-remove", child, place); });
         return child;
     }
-    template <class F>
-    void OrDelete(Twin* leaving, F const& f)
+    bool RemoveChild(Twin* from, Twin* child)
     {
-        try {
-            f();
-        } catch (...) {
-            Delete(leaving);
-            throw;
-        }
+        Tell(from, "before-remove", child, Rank(from, child));
+        if (!IsIn(from, child)) return false;
+        child->parent = nullptr;
+        Tell(from, "after-remove", child, Rank(from, child));
+        if (!IsIn(from, child)) return false;
+        auto const place = from->children.begin() + static_cast<std::ptrdiff_t>(PlaceOf(from, child));
+        if (from->Shape() == 'n')
+            *place = &Hole;
+        else
+            from->children.erase(place);
+        return true;
     }
-    void TellOfSwap(Twin* group, Twin* made, Twin* child, std::string const& kind, std::size_t index)
+    void Move(Twin* list, std::size_t from, std::size_t to)
+    {
+        if (from == list->children.size()) throw Broken{"invalid index in indexed group"};
+        Twin* const child = list->children[from];
+        auto const told = [&](char const* what) {
+            Tell(list, [&] {
+                std::string line = what + (" " + Label(list)) + " ";
+                return (line += Label(child)) + " " + std::to_string(from) + " " + std::to_string(to);
+            });
+        };
+        bool const isPlace = to < list->children.size();
+        told("before-reorder");
+        bool const was = std::exchange(paused_, true);
+        int const code = Try([&] {
+            Remove(list, PlaceOf(list, child));
+            if (isPlace) to = std::min(to, list->children.size());
+            Insert(list, to, child);
+        });
+        paused_ = was;
+        if (code != 0) throw int{code};
+        told("after-reorder");
+    }
+
+    void TellOfSwap(Twin* group, Twin* made, Twin* child, std::size_t index)
     {
         bool const tied = made && (made->flags & 0x40) != 0;
         if (tied) SetIndependent(made, false);
         auto const restore = [&] {
-            if (tied && PlaceOf(group, made) < group->children.size() && (made->flags & 0x40) == 0)
-                SetIndependent(made, true);
+            if (tied && IsIn(group, made) && (made->flags & 0x40) == 0) SetIndependent(made, true);
         };
         try {
-            Tell(group, "after-swap", child, kind, index);
+            Tell(group, "after-swap", child, index);
         } catch (...) {
             restore();
             throw;
@@ -454,198 +591,62 @@ private:
     }
     Twin* Swap(Twin* list, std::size_t at, Twin* made)
     {
-        if (at >= list->children.size()) throw Broken{"invalid index for swap in indexed group"};
-        if (std::find(list->Layout().begin(), list->Layout().end(), made->kind) == list->Layout().end())
-            throw Broken{"invalid name for storing in this named group"};
-        Twin* const old = list->children[at];
-        Tell(list, "before-swap", made, "", at);
-        std::size_t const place = PlaceOf(list, old);
-        SetParent(made, list);
-        if (place == list->children.size()) {
-            made->parent = nullptr;
-            throw Broken{"invalid index for swap in indexed group"};
-        }
-        list->children[place] = made;
-        old->parent = nullptr;
-        OrDelete(old, [&] { TellOfSwap(list, made, made, "", place); });
+        Twin* old = nullptr;
+        OrDelete(made, [&] {
+            if (at >= list->children.size()) throw Broken{"invalid index for swap in indexed group"};
+            if (!CanStore(list, made)) throw Broken{"invalid name for storing in this named group"};
+            old = list->children[at];
+            Tell(list, "before-swap", made, at);
+            if (!IsIn(list, old)) throw Broken{"invalid index for swap in indexed group"};
+            std::size_t const place = PlaceOf(list, old);
+            SetParent(made, list);
+            list->children[place] = made;
+            old->parent = nullptr;
+            OrDelete(old, [&] { TellOfSwap(list, made, made, place); });
+        });
         return old;
     }
     // A null `made` is the canonical one.
-    Twin* SwapNamed(Twin* group, std::size_t slot, Twin* made)
+    Twin* SwapSlot(Twin* group, std::size_t slot, Twin* made)
     {
-        std::string const& kind = group->Layout()[slot];
-        Tell(group, "before-swap", made, kind, slot);
+        Tell(group, "before-swap", made, slot);
         Twin* const old = std::exchange(group->children[slot], made);
         if (made) SetParent(made, group);
         if (old) old->parent = nullptr;
-        OrDelete(old, [&] { TellOfSwap(group, made, old, kind, slot); });
+        OrDelete(old, [&] { TellOfSwap(group, made, old, slot); });
         return old;
     }
-    void Upgrade(Twin* group, std::size_t slot)
+    Twin* SwapNamed(Twin* group, Twin* made)
     {
+        Twin* old = nullptr;
+        OrDelete(made, [&] {
+            auto const found = std::find(group->Layout().begin(), group->Layout().end(), made->kind);
+            if (!CanStore(group, made)) throw Broken{"invalid name for storing in this named group"};
+            old = SwapSlot(group, static_cast<std::size_t>(found - group->Layout().begin()), made);
+        });
+        return old;
+    }
+    Twin* SwapCanonical(Twin* group, std::size_t slot)
+    {
+        return group->children[slot] ? SwapSlot(group, slot, nullptr) : nullptr;
+    }
+    void Upgrade(Twin* group, std::size_t slot, unsigned int form)
+    {
+        if (form == 7) throw Broken{"stream at index has wrong matchname"};
         if (group->children[slot]) return;
-        Twin* const made = Make(group->Layout()[slot], false);
-        Twin* replaced = nullptr;
-        Bring(made, [&] { replaced = SwapNamed(group, slot, made); });
+        Twin* const replaced = SwapNamed(group, Make(group->Layout()[slot], false));
         bool const isReal = group->children[slot] != nullptr;
         Delete(replaced);
         if (!isReal) throw Broken{"unexpected match name searched for in group"};
     }
-    void Own(Twin* node)
+    void CopyFrom(Twin* group, Twin* other)
     {
-        if (node) limbo.push_back(node);
+        for (std::size_t const i : Sorted(other))
+            if (Twin* const source = other->children[i]; source && CanStore(group, source))
+                Delete(SwapNamed(group, Clone(source)));
     }
 
-    void Do(Edit const& e, bool isNested);
-
+    static inline Twin Hole;
     int lastId_ = 0;
     bool paused_ = false;
 };
-
-inline void TwinTree::Do(Edit const& e, bool isNested)
-{
-    std::vector<Twin*> const lists = Of("i"), named = Of("n"), nodes = Of("lni"), leaves = Of("l");
-    Twin* const list = lists[e.group % lists.size()];
-    Twin* const node = nodes[e.group % nodes.size()];
-    Twin* const group = named.empty() ? nullptr : named[e.group % named.size()];
-    std::size_t const count = list->children.size(), at = e.at % (count + 2);
-    std::size_t const slot = group ? e.at % group->children.size() : 0;
-    std::string const kind = TwinKinds[e.to % TwinKinds.size()].name;
-    switch (e.op) {
-    case Op::Insert:
-    case Op::Append:
-    case Op::Swap: {
-        Twin* const made = Make(kind, e.to % 5 == 1);
-        if (e.to % 7 == 2) SetIndependent(made, true);
-        if (e.op == Op::Swap)
-            Bring(made, [&] { Own(Swap(list, at, made)); });
-        else
-            Bring(made, [&] { Insert(list, e.op == Op::Append ? count : at, made); });
-        break;
-    }
-    case Op::Remove: Own(Remove(list, at)); break;
-    case Op::RemoveChild: {
-        bool const isNamed = group && !isNested && e.to % 2 == 1;
-        Twin* const from = isNamed ? group : list;
-        if (from->children.empty()) break;
-        std::size_t const place = e.at % from->children.size();
-        Twin* const child = from->children[place];
-        if (!child) break;
-        auto const index = [&] {
-            return isNamed ? static_cast<std::size_t>(Sorted(from, child->kind)) : PlaceOf(from, child);
-        };
-        Tell(from, "before-remove", child, "", index());
-        if (PlaceOf(from, child) == from->children.size()) break;
-        child->parent = nullptr;
-        Tell(from, "after-remove", child, "", index());
-        std::size_t const now = PlaceOf(from, child);
-        if (now == from->children.size()) break;
-        Own(child);
-        if (isNamed) {
-            moment = Moments[0];
-            from->children[now] = &Hole;
-            Empty(from);
-            FillIn(from);
-        } else {
-            from->children.erase(from->children.begin() + static_cast<std::ptrdiff_t>(now));
-        }
-        break;
-    }
-    case Op::Move: {
-        if (e.at % (count + 1) == count) throw Broken{"invalid index in indexed group"};
-        Twin* const child = list->children[e.at % (count + 1)];
-        std::size_t to = isNested ? e.to % count : e.to % (count + 1);
-        auto const told = [&](char const* what) {
-            Tell(list, what, [&] {
-                std::string who = Label(list) + " ";
-                return (who += Label(child)) + " " + std::to_string(e.at % (count + 1)) + " " + std::to_string(to);
-            });
-        };
-        bool const isPlace = to < count;
-        told("before-reorder");
-        bool const was = std::exchange(paused_, true);
-        bool lost = false;
-        int const code = Try([&] {
-            Remove(list, PlaceOf(list, child));
-            if (isPlace) to = std::min(to, list->children.size());
-            lost = to > list->children.size();
-            if (lost) Delete(child);
-            if (lost) throw Broken{"invalid index for insert in indexed group"};
-            Insert(list, to, child);
-        });
-        paused_ = was;
-        if (code != 0) throw int{code};
-        told("after-reorder");
-        break;
-    }
-    case Op::Duplicate: {
-        if (at >= count) throw Broken{"invalid index in indexed group"};
-        Twin* const copy = Clone(list->children[at]);
-        Bring(copy, [&] { Insert(list, at + 1, copy); });
-        break;
-    }
-    case Op::Upgrade:
-        if (group && e.to % 8 == 7) throw Broken{"stream at index has wrong matchname"};
-        if (group) Upgrade(group, slot);
-        break;
-    case Op::SwapNamed: {
-        if (!group) break;
-        Twin* const made = Make(e.to % 5 == 4 ? "list" : group->Layout()[slot], e.to % 2 == 1);
-        if (e.to % 3 == 2) SetIndependent(made, true);
-        auto const found = std::find(group->Layout().begin(), group->Layout().end(), made->kind);
-        auto const where = static_cast<std::size_t>(found - group->Layout().begin());
-        Bring(made, [&] {
-            if (found == group->Layout().end()) throw Broken{"invalid name for storing in this named group"};
-            Own(SwapNamed(group, where, made));
-        });
-        break;
-    }
-    case Op::Canonical:
-        if (group && group->children[slot]) Own(SwapNamed(group, slot, nullptr));
-        break;
-    case Op::Reset:
-        if (!group || isNested) break;
-        moment = Moments[0];
-        Empty(group);
-        FillIn(group);
-        break;
-    case Op::Copy: {
-        if (!group || isNested) break;
-        moment = Moments[0];
-        // Not from below the group itself, which may go with what is replaced.
-        Twin* const other = named[e.at % named.size()];
-        std::vector<Twin*> const below = Nodes(group);
-        if (std::find(below.begin(), below.end(), other) != below.end()) break;
-        std::vector<std::pair<KFS_MatchName, Twin*>> sources;
-        for (Twin* const child : other->children)
-            if (child) sources.emplace_back(::Name(child->kind.c_str()), child);
-        std::sort(sources.begin(), sources.end());
-        for (auto const& [name, source] : sources) {
-            auto const found = std::find(group->Layout().begin(), group->Layout().end(), source->kind);
-            if (found == group->Layout().end()) continue;
-            Delete(SwapNamed(group, static_cast<std::size_t>(found - group->Layout().begin()), Clone(source)));
-        }
-        break;
-    }
-    case Op::Flags: {
-        unsigned int const bit = TwinFlags[e.at % std::size(TwinFlags)];
-        SetFlags(node, e.to % 2 == 1 ? bit : 0, bit);
-        break;
-    }
-    case Op::Name:
-        node->name = e.to % 3 == 0 ? node->kind : "name " + std::to_string(e.to % 4);
-        SetFlags(node, 0, 0x40000);
-        Tell(node, "name", [&] { return Label(node); });
-        break;
-    case Op::Independent: SetIndependent(node, e.to % 2 == 1); break;
-    case Op::Value: {
-        Twin* const leaf = leaves.empty() ? nullptr : leaves[e.group % leaves.size()];
-        if (!leaf) break;
-        leaf->value = e.to % 6;
-        Tell(leaf, "value", [&] { return Label(leaf); });
-        break;
-    }
-    case Op::Throw:
-    case Op::End: break;
-    }
-}

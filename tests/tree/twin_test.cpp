@@ -11,12 +11,11 @@
 
 std::ostream& operator<<(std::ostream& out, Edit const& e)
 {
-    if (e.op == Op::End) return out << "{}";
-    return out << "{Op::" << OpNames[static_cast<int>(e.op)] << ", " << e.group << ", " << e.at << ", " << e.to << "}";
+    return out << "{\"" << e.op << "\", " << e.group << ", " << e.at << ", " << e.to << "}";
 }
 std::ostream& operator<<(std::ostream& out, Step const& s)
 {
-    return out << "{" << s.edit << ", " << s.moment << ", " << s.nested << "},  // " << Moments[s.moment];
+    return out << "{" << s.edit << ", \"" << s.moment << "\", " << s.nested << "},";
 }
 
 namespace rc {
@@ -25,20 +24,17 @@ struct Arbitrary<Edit> {
     static Gen<Edit> arbitrary()
     {
         auto const number = gen::inRange(0U, 60U);
-        return gen::build<Edit>(gen::set(&Edit::op, gen::map(gen::inRange(0, static_cast<int>(Op::End)),
-                                                             [](int op) { return static_cast<Op>(op); })),
-                                gen::set(&Edit::group, number), gen::set(&Edit::at, number),
-                                gen::set(&Edit::to, number));
+        return gen::build<Edit>(gen::set(&Edit::op, gen::elementOf(Ops)), gen::set(&Edit::group, number),
+                                gen::set(&Edit::at, number), gen::set(&Edit::to, number));
     }
 };
 template <>
 struct Arbitrary<Step> {
     static Gen<Step> arbitrary()
     {
-        return gen::build<Step>(
-            gen::set(&Step::edit),
-            gen::set(&Step::moment, gen::weightedOneOf<unsigned int>({{2, gen::just(0U)}, {1, gen::inRange(0U, 9U)}})),
-            gen::set(&Step::nested));
+        auto const moment =
+            gen::weightedOneOf<std::string>({{2, gen::just(std::string())}, {1, gen::elementOf(Moments)}});
+        return gen::build<Step>(gen::set(&Step::edit), gen::set(&Step::moment, moment), gen::set(&Step::nested));
     }
 };
 }  // namespace rc
@@ -48,8 +44,18 @@ namespace {
 using Lines = std::vector<std::string>;
 using Made = Q_ScAutoPtr<KFS_StreamBase>;
 
+std::string Text(KFS_StreamIDPath const& path)
+{
+    std::string text;
+    for (KFS_StreamID const& id : path.GetPathConst()) {
+        text += "/" + (id.GetIndex() == KFS_StreamID::NoIndex ? "" : std::to_string(id.GetIndex()));
+        text += reinterpret_cast<char const*>(id.GetMatchName().GetName());
+    }
+    return text;
+}
+
 // The same scripts on streams.
-class RealTree {
+class RealTree : public Scripted<RealTree, KFS_StreamBase> {
 public:
     explicit RealTree(ReportRecorder& reports) : reports_(reports)
     {
@@ -59,77 +65,63 @@ public:
         listener_.called = [this](KFS_StreamBase const* stream) { return Label(stream); };
     }
 
-    std::string Label(KFS_StreamBase const* stream)
+    TestRoot<TestIndexedGroup> root{"list", TwinTree::RootScale};
+
+private:
+    using Node = KFS_StreamBase;
+    friend Scripted<RealTree, Node>;
+
+    Node* Root() { return &root; }
+    static std::string Kind(Node const* node) { return NameOf(node); }
+    static Node const* Parent(Node const* node) { return node->GetParent(); }
+    static std::size_t Length(Node const* list) { return list->GetAsGroup()->GetNumStreams(); }
+    std::optional<Node*> Child(Node* group, std::size_t i)
+    {
+        if (!group->IsNamedGroup()) return group->GetAsGroup()->GetEditableStreamNullOK(Int(i));
+        KFS_NamedStreamGroup* const named = group->GetAsNamedGroup();
+        KFS_MatchName const name = NameIn(group, i);
+        return named->GetStream(name, false) ? std::optional(named->GetEditableStreamNullOK(name)) : std::nullopt;
+    }
+    std::string Label(Node const* stream)
     {
         if (stream->IsCanonical()) return NameOf(stream) + "~";
         if (!stream->GetRefCon()) stream->SetRefCon(reinterpret_cast<KFS_ClientRefCon*>(++lastId_));
         return NameOf(stream) + "#" + std::to_string(reinterpret_cast<std::uintptr_t>(stream->GetRefCon()));
     }
-
-    std::string Show(KFS_StreamBase const* node, KFS_StreamGroup const* parent, bool whole,
-                     KFS_StreamIDPath const& path = {})
+    std::string Facts(Node* node)
     {
-        std::string text = Label(node) + (node->GetParent() == parent ? "" : "*");
-        if (whole) text += Facts(node) + " @" + Text(path);
-        KFS_StreamGroup const* const group = node->GetAsGroup();
-        if (!group) return text;
-        text += "[";
-        auto const layout = group->GetCanonicalLayout(group->GetMatchName());
-        auto const count = group->IsNamedGroup() ? static_cast<unsigned int>(layout->size()) : group->GetNumStreams();
-        for (unsigned int i = 0; i < count; ++i) {
-            KFS_NamedStreamGroup const* const named = group->GetAsNamedGroup();
-            KFS_StreamBase const* const child =
-                named ? named->GetStream((*layout)[i]->GetMatchName(), false) : group->GetStream(i);
-            if (!child) {
-                text += "- ";
-                continue;
-            }
-            if (whole) Check(group, child, i);
-            KFS_StreamID const id =
-                named ? KFS_StreamID(child->GetMatchName()) : KFS_StreamID(i, child->GetMatchName());
-            text += child->IsCanonical() ? Label(child) : Show(child, group, whole, KFS_StreamIDPath(path, id));
-            text += ' ';
-        }
-        return text + "]";
+        KFS_StreamGroup const* const top = node->GetRoot();
+        unsigned int depth = 0;
+        RC_ASSERT(node->IsChildOf(top, &depth) == (top != nullptr));
+        KFS_StreamGroup* pathRoot = nullptr;
+        KFS_StreamIDPath path;
+        node->SlowGetPathFromRootToMe(&pathRoot, &path);
+        std::string text = "{" + std::to_string(node->GetStreamBaseFlags()) + " " +
+                           Q_UTF16ToMBString(node->GetDisplayName()) + (node->AreAllParentsActive() ? "" : " off") +
+                           (node->IsHiddenByAncestor() ? " hidden" : "") + (node->IsModified() ? " modified" : "") +
+                           (node->IsAnimated(false) ? " animated" : "") + " " + std::to_string(depth) + " " +
+                           Text(path);
+        if (auto const* const leaf = dynamic_cast<TestLeaf const*>(node))
+            text += " " + std::to_string(leaf->ValueAt(0)) + " at " + std::to_string(leaf->GetTimeScale());
+        for (unsigned int i = 0; i < Count(node); ++i) Check(node->GetAsGroup(), i);
+        if (pathRoot == &root) CheckPath(node, path);
+        if (node == &root) CheckWalk();
+        return text + "}";
     }
-
-    void Do(Step const& step)
-    {
-        moment = Moments[step.moment];
-        nested_ = step.nested;
-        int const code = Try([&] { Do(step.edit, false); });
-        if (code != 0) log.push_back("code " + std::to_string(code));
-        moment = Moments[0];
-        for (KFS_StreamBase* const gone : std::exchange(limbo_, {})) delete gone;
-    }
-
-    Lines log;
-    TestRoot<TestIndexedGroup> root{"list", TwinTree::RootScale};
-    std::string moment = Moments[0];
-
-private:
-    static std::string Text(KFS_StreamIDPath const& path)
-    {
-        std::string text;
-        for (KFS_StreamID const& id : path.GetPathConst()) {
-            text += "/" + (id.GetIndex() == KFS_StreamID::NoIndex ? "" : std::to_string(id.GetIndex()));
-            text += reinterpret_cast<char const*>(id.GetMatchName().GetName());
-        }
-        return text;
-    }
-
     // What a group says of a child in many ways, one way against the other.
-    void Check(KFS_StreamGroup const* group, KFS_StreamBase const* child, unsigned int index)
+    void Check(KFS_StreamGroup* group, unsigned int index)
     {
-        auto* const editable = const_cast<KFS_StreamGroup*>(group);
-        KFS_StreamBase const* const real = child->IsCanonical() ? nullptr : child;
+        Node const* const child = group->GetStream(index);
+        Node const* const real = child->IsCanonical() ? nullptr : child;
         KFS_MatchName const& name = child->GetMatchName();
-        RC_ASSERT(group->GetStream(index) == child);
         RC_ASSERT(group->GetStream(KFS_StreamID(index, name)) == child);
-        RC_ASSERT(editable->GetEditableStreamNullOK(index) == real);
+        RC_ASSERT(group->GetEditableStreamNullOK(index) == real);
         RC_ASSERT(std::as_const(*group).GetEditableStreamNullOK(index) == real);
         RC_ASSERT(group->CanStore(name));
         if (KFS_NamedStreamGroup const* const named = group->GetAsNamedGroup()) {
+            RC_ASSERT(named->GetNumStreams() == Layout(group).size());
+            RC_ASSERT(named->GetStream(name, true) == child);
+            RC_ASSERT(named->GetStream(KFS_StreamID(name)) == child);
             RC_ASSERT(named->GetIndexInUILayout(name) == index);
             RC_ASSERT(named->GetEditableStreamNullOK(name) == real);
             RC_ASSERT(named->GetLeafStream(name) == child->GetAsLeaf());
@@ -137,43 +129,34 @@ private:
         } else {
             RC_ASSERT(group->GetAsIndexedGroup()->GetLeafStream(index) == child->GetAsLeaf());
         }
-        KFS_StreamGroup const* top = nullptr;
-        KFS_StreamIDPath path;
-        child->SlowGetPathFromRootToMe(&top, &path);
-        if (top != &root || !real) return;
-        RC_ASSERT(top == child->GetRoot());
-        RC_ASSERT(root.FindStream(path) == child);
-        RC_ASSERT(root.FindEditableStream(path) == child);
+    }
+    void CheckPath(Node* node, KFS_StreamIDPath const& path)
+    {
+        RC_ASSERT(root.FindStream(path) == node);
+        RC_ASSERT(root.FindEditableStream(path) == node);
         KFS_StreamIDPath read;
         read.SetFrom_JSON(path.GetAs_JSON());
-        RC_ASSERT(root.FindEditableLeafStreamNullOK(read) == child->GetAsLeaf());
+        RC_ASSERT(root.FindEditableLeafStreamNullOK(read) == node->GetAsLeaf());
     }
-    std::string Facts(KFS_StreamBase const* node) const
+    // The walk over the real leaves gives each its path, behind what was there.
+    void CheckWalk()
     {
-        KFS_StreamGroup const* const top = node->GetRoot();
-        unsigned int depth = 0;
-        RC_ASSERT(node->IsChildOf(top, &depth) == (top != nullptr));
-        std::string text = "{" + std::to_string(node->GetStreamBaseFlags()) + " " +
-                           Q_UTF16ToMBString(node->GetDisplayName()) + (node->AreAllParentsActive() ? "" : " off") +
-                           (node->IsHiddenByAncestor() ? " hidden" : "") + (node->IsModified() ? " modified" : "") +
-                           (node->IsAnimated(false) ? " animated" : "") + " " + std::to_string(depth);
-        if (auto const* const leaf = dynamic_cast<TestLeaf const*>(node))
-            text += " " + std::to_string(leaf->ValueAt(0)) + " at " + std::to_string(leaf->GetTimeScale());
-        return text + "}";
+        std::vector<Node*> walked;
+        KFS_StreamIDPath path(7);
+        auto note = [&](KFS_Stream* leaf) {
+            KFS_StreamIDPath below = path;
+            below.RemoveHead();
+            RC_ASSERT(root.FindStream(below) == leaf);
+            walked.push_back(leaf);
+        };
+        root.ForEachNonCanonicalLeafStream(note, &path);
+        RC_ASSERT(walked == Of("l", &root));
+        RC_ASSERT(path.GetLength() == 1U);
+        auto forget = [&](KFS_Stream*) { walked.pop_back(); };
+        root.ForEachNonCanonicalLeafStream(forget, nullptr);
+        RC_ASSERT(walked.empty());
     }
 
-    void Heard(std::string const& line)
-    {
-        log.push_back(line);
-        std::string const what = line.substr(0, line.find(' '));
-        if (what == "destroyed" || what == "flags" || what == "name" || what == "value") return;
-        log.back() += " in " + Show(&root, nullptr, false);
-        if (what != moment) return;
-        moment = Moments[0];
-        if (nested_.op == Op::Throw) throw int{77};
-        int const code = Try([&] { Do(nested_, true); });
-        if (code != 0) log.push_back("nested code " + std::to_string(code));
-    }
     template <class F>
     int Try(F const& f)
     {
@@ -182,135 +165,63 @@ private:
         return code;
     }
 
-    std::vector<KFS_StreamBase*> Of(KFS_StreamBase* node, std::string const& shapes) const
+    static unsigned int Int(std::size_t number) { return static_cast<unsigned int>(number); }
+    static KFS_IndexedStreamGroup* List(Node* node) { return node->GetAsIndexedGroup(); }
+    static KFS_NamedStreamGroup* Named(Node* node) { return node->GetAsNamedGroup(); }
+    KFS_MatchName NameIn(Node const* group, std::size_t slot) { return Name(Layout(group)[slot].c_str()); }
+
+    static Made Make(std::string const& kind, bool keyed)
     {
-        std::vector<KFS_StreamBase*> found;
-        if (shapes.find(node->IsNamedGroup() ? 'n' : node->IsLeaf() ? 'l' : 'i') != std::string::npos)
-            found.push_back(node);
-        KFS_StreamGroup* const group = node->GetAsGroup();
-        for (unsigned int i = 0; group && i < group->GetNumStreams(); ++i)
-            if (KFS_StreamBase* const child = group->GetEditableStreamNullOK(i))
-                for (KFS_StreamBase* const each : Of(child, shapes)) found.push_back(each);
-        return found;
+        return Made(Get_VX_StreamFactory()->CreateStream(Name(kind.c_str()), !keyed, 600, true, false));
     }
-    void Own(KFS_StreamBase* stream)
+    static void Delete(Node* node) { delete node; }
+    static void Insert(Node* list, std::size_t at, Made& made) { List(list)->InsertStream(Int(at), &made); }
+    static void Append(Node* list, Made& made)
     {
-        if (stream) limbo_.push_back(stream);
+        Node const* const stream = made.get();
+        unsigned int const place = List(list)->AppendStream(&made);
+        RC_ASSERT((place == Length(list) || List(list)->GetStream(place) == stream));
     }
-    void Do(Edit const& e, bool isNested);
+    static Node* Swap(Node* list, std::size_t at, Made& made) { return List(list)->SwapStream(Int(at), &made); }
+    static Node* Remove(Node* list, std::size_t at) { return List(list)->RemoveStream(Int(at)); }
+    static bool RemoveChild(Node* from, Node* child) { return from->GetAsGroup()->RemoveChild(child); }
+    static void Move(Node* list, std::size_t from, std::size_t to) { List(list)->ReorderStreams(Int(from), Int(to)); }
+    static void Duplicate(Node* list, std::size_t at)
+    {
+        Node const* const copy = List(list)->DuplicateStream(Int(at));
+        RC_ASSERT((!copy || copy->GetParent() == list));
+    }
+    void Upgrade(Node* group, std::size_t slot, unsigned int form)
+    {
+        unsigned int const index = Int(slot);
+        KFS_MatchName const name = NameIn(group, slot);
+        KFS_StreamID const ids[] = {{index}, {name}, {index, name}, {index, Name("other")}};
+        Node const* const real = form < 3    ? Named(group)->GetEditableStream(ids[form])
+                                 : form == 7 ? Named(group)->GetEditableStream(ids[3])
+                                 : form < 5  ? Named(group)->GetEditableStream(index)
+                                             : Named(group)->GetEditableStream(name);
+        RC_ASSERT(real == Named(group)->GetStream(index));
+    }
+    static Node* SwapNamed(Node* group, Made& made) { return Named(group)->SwapStream(&made); }
+    Node* SwapCanonical(Node* group, std::size_t slot)
+    {
+        return Named(group)->SwapCanonicalForStream(NameIn(group, slot));
+    }
+    static void Reset(Node* group) { Named(group)->ResetAllStreamsToCanonical(false); }
+    static void CopyFrom(Node* group, Node* other) { Named(group)->CopyAcceptableStreams(*Named(other)); }
+    static void SetFlags(Node* node, unsigned int value, unsigned int mask) { node->SetStreamBaseFlags(value, mask); }
+    static void SetName(Node* node, std::string const& name) { node->SetDisplayName(Q_MBToUTF16String(name)); }
+    static void SetIndependent(Node* node, bool on) { node->MakeIndependent(on); }
+    static void SetValue(Node* leaf, double value)
+    {
+        T_Time const zero{0, leaf->GetAsLeaf()->GetTimeScale()};
+        RC_ASSERT(KFS_InsertKeyF(leaf->GetAsLeaf(), &zero, 1, &value, 0, 0) == 0);
+    }
 
     ReportRecorder& reports_;
     NotificationRecorder listener_;
-    std::vector<KFS_StreamBase*> limbo_;
-    Edit nested_;
     std::uintptr_t lastId_ = 0;
 };
-
-void RealTree::Do(Edit const& e, bool isNested)
-{
-    auto const lists = Of(&root, "i"), named = Of(&root, "n"), nodes = Of(&root, "lni"), leaves = Of(&root, "l");
-    KFS_IndexedStreamGroup* const list = lists[e.group % lists.size()]->GetAsIndexedGroup();
-    KFS_StreamBase* const node = nodes[e.group % nodes.size()];
-    KFS_NamedStreamGroup* const group = named.empty() ? nullptr : named[e.group % named.size()]->GetAsNamedGroup();
-    unsigned int const count = list->GetNumStreams(), at = e.at % (count + 2);
-    unsigned int const slot = group ? e.at % group->GetNumStreams() : 0;
-    KFS_MatchName const slotName = group ? group->GetStream(slot)->GetMatchName() : KFS_MatchName();
-    auto const make = [](KFS_MatchName const& kind, bool keyed) {
-        return Made(Get_VX_StreamFactory()->CreateStream(kind, !keyed, 600, true, false));
-    };
-    switch (e.op) {
-    case Op::Insert:
-    case Op::Append:
-    case Op::Swap: {
-        Made made = make(Name(TwinKinds[e.to % TwinKinds.size()].name), e.to % 5 == 1);
-        KFS_StreamBase const* const stream = made.get();
-        if (e.to % 7 == 2) made->MakeIndependent(true);
-        if (e.op == Op::Swap) {
-            Own(list->SwapStream(at, &made));
-        } else if (e.op == Op::Insert) {
-            list->InsertStream(at, &made);
-        } else {
-            unsigned int const place = list->AppendStream(&made);
-            RC_ASSERT((place == list->GetNumStreams() || list->GetStream(place) == stream));
-        }
-        break;
-    }
-    case Op::Remove: Own(list->RemoveStream(at)); break;
-    case Op::RemoveChild: {
-        bool const isNamed = group && !isNested && e.to % 2 == 1;
-        KFS_StreamGroup* const from = isNamed ? static_cast<KFS_StreamGroup*>(group) : list;
-        if (from->GetNumStreams() == 0) break;
-        KFS_StreamBase* const child = from->GetEditableStreamNullOK(e.at % from->GetNumStreams());
-        if (!child || !from->RemoveChild(child)) break;
-        Own(child);
-        if (!isNamed) break;
-        moment = Moments[0];
-        group->ResetAllStreamsToCanonical(false);
-        break;
-    }
-    case Op::Move: {
-        unsigned int const from = e.at % (count + 1);
-        list->ReorderStreams(from, isNested && count > 0 ? e.to % count : e.to % (count + 1));
-        break;
-    }
-    case Op::Duplicate: {
-        KFS_StreamBase* const copy = list->DuplicateStream(at);
-        RC_ASSERT((!copy || copy->GetParent() == list));
-        break;
-    }
-    case Op::Upgrade: {
-        if (!group) break;
-        KFS_StreamID const ids[] = {{slot}, {slotName}, {slot, slotName}};
-        if (e.to % 8 == 7) group->GetEditableStream(KFS_StreamID(slot, Name("other")));
-        KFS_StreamBase* const real = e.to % 8 < 3   ? group->GetEditableStream(ids[e.to % 8])
-                                     : e.to % 8 < 5 ? group->GetEditableStream(slot)
-                                                    : group->GetEditableStream(slotName);
-        RC_ASSERT(real == group->GetStream(slot));
-        break;
-    }
-    case Op::SwapNamed: {
-        if (!group) break;
-        Made made = make(e.to % 5 == 4 ? Name("list") : slotName, e.to % 2 == 1);
-        if (e.to % 3 == 2) made->MakeIndependent(true);
-        Own(group->SwapStream(&made));
-        break;
-    }
-    case Op::Canonical:
-        if (group) Own(group->SwapCanonicalForStream(slotName));
-        break;
-    case Op::Reset:
-    case Op::Copy: {
-        if (!group || isNested) break;
-        moment = Moments[0];
-        KFS_NamedStreamGroup* const other = named[e.at % named.size()]->GetAsNamedGroup();
-        if (e.op == Op::Reset)
-            group->ResetAllStreamsToCanonical(false);
-        else if (group != other && !other->IsChildOf(group, nullptr))
-            group->CopyAcceptableStreams(*other);
-        break;
-    }
-    case Op::Flags: {
-        unsigned int const bit = TwinFlags[e.at % std::size(TwinFlags)];
-        node->SetStreamBaseFlags(e.to % 2 == 1 ? bit : 0, bit);
-        break;
-    }
-    case Op::Name:
-        node->SetDisplayName(e.to % 3 == 0 ? node->GetMatchName16Str()
-                                           : Q_MBToUTF16String("name " + std::to_string(e.to % 4)));
-        break;
-    case Op::Independent: node->MakeIndependent(e.to % 2 == 1); break;
-    case Op::Value: {
-        if (leaves.empty()) break;
-        KFS_Stream* const leaf = leaves[e.group % leaves.size()]->GetAsLeaf();
-        T_Time const zero{0, leaf->GetTimeScale()};
-        double const value = e.to % 6;
-        RC_ASSERT(KFS_InsertKeyF(leaf, &zero, 1, &value, 0, 0) == 0);
-        break;
-    }
-    case Op::Throw:
-    case Op::End: break;
-    }
-}
 
 // The lines of a file that a twin can know.
 Lines Outline(MemoryFile const& file)
@@ -405,7 +316,7 @@ protected:
                     ->GetCanonicalStream(Name(kind.name))
                     ->GetAsNamedGroup()
                     ->EnsureUILayoutComplete();
-        Run({{{Op::Append, 0, 0, 4}, 0, {}}, {{Op::Append, 0, 0, 5}, 0, {}}});  // fills in what is filled in once
+        Run({{{"Append", 0, 0, 4}, "", {}}, {{"Append", 0, 0, 5}, "", {}}});  // fills in what is filled in once
     }
     // Outside of random checks.
     void Run(std::vector<Step> const& script)
@@ -428,18 +339,17 @@ TEST_F(TwinTest, RandomScriptsGiveTheSameTreesNotificationsAndFiles)
 // A listener that edits the place of the edit that it is told of, in scripts as a failure prints them.
 TEST_F(TwinTest, EditsInsideOfEdits)
 {
+    Step const leaf{{"Append", 0, 0, 0}, "", {}}, node{{"Append", 0, 0, 4}, "", {}};
     std::vector<Step> const scripts[] = {
         // the list becomes shorter, or loses the stream, before it is changed
-        {{{Op::Append, 0, 0, 0}, 0, {}}, {{Op::Insert, 0, 1, 0}, 1, {Op::Remove, 0, 0, 0}}},
-        {{{Op::Append, 0, 0, 0}, 0, {}},
-         {{Op::Append, 0, 0, 0}, 0, {}},
-         {{Op::Insert, 0, 0, 0}, 1, {Op::Remove, 0, 0, 0}}},
-        {{{Op::Append, 0, 0, 0}, 0, {}}, {{Op::Remove, 0, 0, 0}, 3, {Op::Remove, 0, 0, 0}}},
-        {{{Op::Append, 0, 0, 0}, 0, {}}, {{Op::Swap, 0, 0, 0}, 5, {Op::Remove, 0, 0, 0}}},
+        {leaf, {{"Insert", 0, 1, 0}, "before-insert", {"Remove", 0, 0, 0}}},
+        {leaf, leaf, {{"Insert", 0, 0, 0}, "before-insert", {"Remove", 0, 0, 0}}},
+        {leaf, {{"Remove", 0, 0, 0}, "before-remove", {"Remove", 0, 0, 0}}},
+        {leaf, {{"Swap", 0, 0, 0}, "before-swap", {"Remove", 0, 0, 0}}},
         // the slot is made real, or canonical again, by somebody else
-        {{{Op::Append, 0, 0, 4}, 0, {}}, {{Op::Upgrade, 0, 0, 0}, 5, {Op::Upgrade, 0, 0, 0}}},
-        {{{Op::Append, 0, 0, 4}, 0, {}}, {{Op::Upgrade, 0, 0, 0}, 6, {Op::Canonical, 0, 0, 0}}},
-        {{{Op::Append, 0, 0, 4}, 0, {}}, {{Op::RemoveChild, 0, 1, 1}, 4, {Op::SwapNamed, 0, 1, 0}}},
+        {node, {{"Upgrade", 0, 0, 0}, "before-swap", {"Upgrade", 0, 0, 0}}},
+        {node, {{"Upgrade", 0, 0, 0}, "after-swap", {"Canonical", 0, 0, 0}}},
+        {node, {{"RemoveChild", 0, 1, 1}, "after-remove", {"SwapNamed", 0, 1, 0}}},
     };
     for (std::vector<Step> const& script : scripts) Run(script);
 }
