@@ -5,6 +5,7 @@
 #include "curves/adaptivesamples.h"
 #include "curves/derivatives.h"
 #include "curves/floatkeys.h"
+#include "curves/manipulate.h"
 #include "curves/spacetangents.h"
 #include "curves/spatial.h"
 #include "curves/tangents.h"

@@ -79,6 +79,7 @@ enum KFSp_Op : short {
     KFSp_Op_SetMultiplier = 102,
     KFSp_Op_GetZeroVelocityPoints = 103,
     KFSp_Op_DisposeValue = 105,
+    KFSp_Op_ConvertStreamDim = 106,
     KFSp_Op_GetValue = 113,
     KFSp_Op_GetValuesFHandle = 114,
     KFSp_Op_GetFloat = 115,

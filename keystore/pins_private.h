@@ -38,6 +38,8 @@ public:
     {
         if (list_) error_.Keep(SEQ_Unlock(list_));
     }
+    // The pin outlives the scope.
+    void Leave() noexcept { list_ = nullptr; }
     KFSp_ScPin(KFSp_ScPin const&) = delete;
     KFSp_ScPin& operator=(KFSp_ScPin const&) = delete;
 

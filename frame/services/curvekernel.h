@@ -43,6 +43,7 @@ struct SEQ_Head;
 inline constexpr int CRV_Err_NullArgument = 0x1801;  // a pointer that must not be null is null
 inline constexpr int CRV_Err_Dimension = 0x1802;     // the operation doesn't take a curve of this dimension
 inline constexpr int CRV_Err_NotFinite = 0x1803;     // NaN or infinity came in, or the answer doesn't fit a double
+inline constexpr int CRV_Err_OutOfReach = 0x1804;    // no handles carry the curve through the point
 
 // One segment. The points are arrays of `dimension` doubles that the curve doesn't own; p1 and p2 are the handle ends
 // as absolute positions. A const curve's points are only read.
@@ -153,7 +154,7 @@ struct CRV_Curve {
 //
 // Both append points (x, y), two doubles each, to a caller's list of 16-byte items, in the order of x; a point that the
 // list already ends in isn't repeated. `minValue` and `maxValue` follow the y of the points once `haveRange` isn't 0,
-// which the first point makes it. What was appended before a failure stays. Errors: the three codes above; SEQ_Insert's.
+// which the first point makes it. What was appended before a failure stays. Errors: the first three codes above; SEQ_Insert's.
 
 // Whether a stretch of a curve is to be halved, which the caller decides: `divide` comes in as 0.
 //
@@ -177,3 +178,41 @@ inline constexpr unsigned int CRV_MostHalvings = 40;
                                                          double const* endX, CRV_Curve const* curve,
                                                          unsigned char* haveRange, double* minValue, double* maxValue,
                                                          SEQ_Head** list);
+
+// ---- drags
+
+// What is dragged by one of its points.
+enum CRV_Drag : unsigned char {
+    CRV_Drag_Path,        // a spatial curve, dimension 1 to 4
+    CRV_Drag_Graph,       // a temporal curve
+    CRV_Drag_RisingGraph  // a temporal curve that may not turn back in y, see CRV_CurveSetNonDecreasing
+};
+
+// A drag. The caller provides it and says in `kind` what is dragged, before the setup.
+struct CRV_DirectManipState {
+    CRV_Drag kind;
+    double t;  // of the point that is held
+};
+
+// Prepares a drag by the point at t, which is limited to 0 to 1. The state serves any number of curves and targets.
+[[nodiscard]] KFS_SERVICE_API int CRV_DirectManipSetup(CRV_DirectManipState* state, double t);
+
+// Moves the handles, together as little as possible, so that the curve passes through a point. p0 and p3 stay.
+//
+//   target   of a path: the point, `dimension` doubles. The path has it at t.
+//            Of a graph: how far in x and in y the point at t goes. The graph has it at its new x, at another t than
+//            before if it went in x or if a handle changed its length.
+//   p1, p2   out: the handles as whoever stores them wants them, no curve any more:
+//              a path     p2 is the first handle seen from p0, p1 the second one seen from p3
+//              a graph    p1 is the first handle seen from p0; p2.y is the second one's height over p3, and p2.x stays a
+//                         place on the x axis
+//
+// A graph's handles keep their x, but for two cases. They come to end between 1e-4 of the segment from their own end point
+// and the opposite one, so that x grows with t and a handle can be stored as a slope and a length. And where the graph
+// all but stands upright at the point they become shorter, since no x is exact enough to find a point there.
+//
+// On failure the curve stays as it was. CRV_Err_OutOfReach: the point is at an end of the curve and isn't to stay there, or
+// leaves the segment in x, or a rising graph would have to turn back. CRV_Err_NotFinite: also where a handle or its slope
+// wouldn't be finite.
+[[nodiscard]] KFS_SERVICE_API int CRV_DirectManipCurve(CRV_Curve* curve, double const* target,
+                                                       CRV_DirectManipState const* state);

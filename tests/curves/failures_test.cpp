@@ -3,6 +3,7 @@
 // and in a render, and with a listener that throws.
 
 #include "curves/floatkeys.h"
+#include "curves/manipulate.h"
 #include "curves/spacetangents.h"
 #include "curves/spatial.h"
 #include "curves/tangents.h"
@@ -52,6 +53,7 @@ struct Row {
 // What the calls hand over and get. Answers are in `number`, behind the arguments.
 double number[16];
 T_Time const Time{450, 600};
+T_Time at{450, 600};
 T_Time time_;
 int index_, count;
 char code;
@@ -124,6 +126,11 @@ std::vector<Row> const& Rows()
         {"GetKeySpFlags", CALL(KFS_GetKeySpFlags(s, i, &spFlags)), TakesIndex | SpatialOnly, 75, Inquire, 72, Inquire},
         {"SetKeySpContinuous", CALL(KFS_SetKeySpContinuous(s, 1, i)), TakesIndex | SpatialOnly, 74, Alter, 72, Inquire},
         {"SetKeySpModifiable", CALL(KFS_SetKeySpModifiable(s, 0, i)), TakesIndex | SpatialOnly, 75, Alter, 72, Inquire},
+        {"DirectManipArc", CALL(KFS_DirectManipArc(s, &at, s->IsSpatial(), -1, Out())), Tells | ChangesAll, 98, Alter,
+         98, Alter},
+        {"ConvertStreamDim from", CALL(KFS_ConvertStreamDim(2, 0.0, s, other)), 0, 106, "copy a key value from", 0, ""},
+        {"ConvertStreamDim to", CALL(KFS_ConvertStreamDim(2, 0.0, other, s)), Tells | ChangesAll, 106,
+         "copy a key value to", 0, ""},
         {"FindKeyTime", CALL(KFS_FindKeyTime(s, &Time, 0, &byte, &index_, &time_)), 0, 22, "get a key value from", 0,
          ""},
         {"FindNearestKeyTime", CALL(KFS_FindNearestKeyTime(s, &Time, &index_, &time_)), 0, 23, Inquire, 0, ""},
