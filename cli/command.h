@@ -28,5 +28,6 @@ extern Command const EvalCommand;
 extern Command const PlotCommand;
 extern Command const ImportCommand;
 extern Command const SaveAsCommand;
+extern Command const DragCommand;
 extern Command const DumpCommand;
 extern Command const DiffCommand;

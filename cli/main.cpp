@@ -9,8 +9,8 @@
 
 namespace {
 
-constexpr Command const* Commands[] = {&InfoCommand,   &EvalCommand,   &DiffCommand, &PlotCommand,
-                                       &ImportCommand, &SaveAsCommand, &DumpCommand};
+constexpr Command const* Commands[] = {&InfoCommand,   &EvalCommand, &DiffCommand,   &PlotCommand,
+                                       &ImportCommand, &DragCommand, &SaveAsCommand, &DumpCommand};
 
 // One line as for any other error, with a hint. What stands where a command should is told by its name.
 std::string TellUsageError(CLI::App const* app, CLI::Error const& error)
@@ -42,6 +42,7 @@ int Run(int argc, char** argv)
         "  kfs plot walk.glb --stream '*/Hips/translation' -o hips.svg\n"
         "  kfs plot walk.glb --motion --stream '*/Hips/translation' -o path.svg\n"
         "  kfs import walk.glb -o walk.kfs\n"
+        "  kfs drag walk.kfs --stream '*/Hips/translation' --component y --at 12f --to 90 -o higher.kfs\n"
         "\n"
         "Exit codes: 0 done; 1 diff or dump found something, or a project had to be changed so that it could be\n"
         "loaded, which lines on the standard error tell; 2 failed. What failed, a command line that isn't\n"

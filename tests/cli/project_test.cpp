@@ -6,6 +6,7 @@
 #include <chrono>
 #include <csignal>
 #include <random>
+#include <sstream>
 #include <thread>
 
 #include <fcntl.h>
@@ -39,6 +40,34 @@ TEST_F(KfsProject, SavedAgainItIsTheSameBytesAndTheOldFileStaysWhole)
     EXPECT_TRUE(bytes == FileContent(project_));
     EXPECT_EQ(2, RunKfs({"save-as", Sample, "-o", copy}).code) << "not a project";
     EXPECT_TRUE(bytes == FileContent(copy));
+}
+
+// The values of the sample's position at 1.1 s.
+std::vector<double> PositionsIn(std::string const& file)
+{
+    std::string const text =
+        RunKfs({"eval", file, "--stream", "*/translation", "--from", "1.1", "--to", "1.1", "--format", "csv"}).output;
+    std::istringstream line(text.substr(text.find('\n') + 1));
+    std::vector<double> values;
+    for (std::string cell; std::getline(line, cell, ',');) values.push_back(std::atof(cell.c_str()));
+    return values;
+}
+
+TEST_F(KfsProject, ADraggedComponentHasItsValueAndTheOthersStay)
+{
+    std::string const dragged = folder_.Path("dragged");
+    std::string const picture = folder_.Path("drag.svg");
+    std::vector<double> expected = PositionsIn(project_);
+    ASSERT_EQ(5U, expected.size());
+    Outcome const outcome = RunKfs({"drag", project_, "--stream", "*/translation", "--component", "y", "--at", "1.1",
+                                    "--to", "-2.5", "--plot", picture, "-o", dragged});
+    EXPECT_EQ(0, outcome.code) << outcome.errors;
+    EXPECT_EQ(dragged + ": bounce/ball/translation dragged to -2.5 at 11/10 s\n", outcome.output);
+    expected[3] = -2.5;
+    std::vector<double> const found = PositionsIn(dragged);
+    ASSERT_EQ(5U, found.size());
+    for (std::size_t i = 0; i < 5; ++i) EXPECT_NEAR(expected[i], found[i], 1e-12) << i;
+    EXPECT_EQ(1U, Count(FileContent(picture), ">y after<"));
 }
 
 // Starts `kfs save-as from -o to` and kills it after a while, unless it is done by then.
