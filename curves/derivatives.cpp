@@ -2,6 +2,7 @@
 #include "curves/derivatives.h"
 
 #include "curves/interpolate_private.h"
+#include "curves/keyhandles_private.h"
 #include "curves/neighbours_private.h"
 #include "curves/spacetangents.h"
 #include "curves/spatial_private.h"
@@ -24,6 +25,7 @@
 #include <cmath>
 #include <cstring>
 #include <optional>
+#include <utility>
 #include <vector>
 
 namespace {
@@ -107,70 +109,90 @@ int VelocityOfKey(Question const& asked, int index, double* value)
     return KFS_GetKeyVelocityF(asked.stream, index, 1, isLast ? value : nullptr, isLast ? nullptr : value);
 }
 
-// The cache record's numbers, cleared: a curve that has no rate of its own writes nothing.
-double* ClearedNumbers(Question const& asked, KFS_StreamKeyData const* data)
-{
-    double* const numbers = KFSp_Numbers(data->cache);
-    int const size =
-        KFS_GetKeyScalarDataSize(asked.stream->GetValueDesc(), asked.stream->IsSpatial(), asked.stream->GetDimension());
-    std::memset(numbers, 0, static_cast<std::size_t>(size));
-    return numbers;
-}
-
-// Copies the cache record's numbers out, which are a rate; the record doesn't hold it any longer then.
-int TakeFromCache(Question const& asked, KFS_StreamKeyData const* data, double* value)
+// Takes an interpolation's numbers out of the cache record, which never holds a rate.
+int TakeFromCache(Question const& asked, KFS_StreamKeyData const* data, int code, double* value)
 {
     data->cache->time = KFS_INVALID_INDEX;
-    std::copy_n(KFSp_Numbers(data->cache), std::max(asked.Elements(), 0), value);
+    if (code == 0) std::copy_n(KFSp_Numbers(data->cache), asked.Elements(), value);
+    return code;
+}
+
+// The keys that a speed lies between.
+struct Segment {
+    KFS_KeyScalar const* a = nullptr;
+    KFS_KeyScalar const* b = nullptr;
+    int aIndex = KFS_INVALID_INDEX;
+};
+
+// Nearly always the keys at `next` - 1 and `next`. On a path a float key at the time is passed over, and where arc lengths
+// count so are those around it; then an end may be missing.
+int FindSegment(Question const& asked, KFS_StreamKeyData const* data, int next, Segment* segment)
+{
+    auto const [a, b] = KFSp_GetKeyPair(data, next - 1);
+    bool const anchorsOnly = asked.seen->IsSpatial() && asked.seen->IsSParametrized();
+    bool const asTheyAre = (KFSp_HasShortcuts || a) && b->time != asked.time;
+    if (asTheyAre && !(anchorsOnly && (KFSp_Roves(data, a, next - 1) || KFSp_Roves(data, b, next)))) {
+        *segment = {a, b, next - 1};
+        return 0;
+    }
+    KFSp_Neighbours around;
+    int const code = KFSp_FindAround(asked.seen, asked.time, 0, &around);
+    *segment = {around.prev, around.next, around.prevIndex};
+    return code;
+}
+
+// The slopes that KFS_GetKeyVelocityF has for the key in front of a straight segment.
+int SlopeOfLine(Question const& asked, Segment const& segment, double* value)
+{
+    if (!KFSp_HasHandleRuns(asked.seen)) return KFS_GetKeyVelocityF(asked.stream, segment.aIndex, 1, nullptr, value);
+    KFSp_FillSlopes(asked.seen, segment.a, segment.b, value);
+    value[0] = KFSp_SettledSpeed(value[0]);
     return 0;
 }
 
-int VelocityBetweenKeys(Question const& asked, KFS_StreamKeyData const* data, int earlier, double* value)
+int VelocityInGap(Question const& asked, KFS_StreamKeyData const* data, int next, double* value)
 {
-    KFS_Stream const* const stream = asked.seen;
+    Segment segment;
+    if (int const code = FindSegment(asked, data, next, &segment)) return code;
+    auto const kind = segment.a && segment.b ? KFSp_GetSegmentKind(segment.a->outInterp, segment.b->inInterp)
+                                             : KFSp_SegmentKind::Hold;
+    if (kind == KFSp_SegmentKind::Linear) return SlopeOfLine(asked, segment, value);
+    if (kind != KFSp_SegmentKind::Curved) {  // held, or codes without a shape
+        Zero(asked, value);
+        return 0;
+    }
+    auto const derive = asked.seen->IsSpatial() ? &KFSp_InterpDerivSpatial : &KFSp_InterpDeriv;
+    return TakeFromCache(asked, data, derive(asked.seen, 0, asked.time, next - 1), value);
+}
+
+int VelocityBetweenKeys(Question const& asked, KFS_StreamKeyData const* data, int next, double* value)
+{
+    if (next == 0 || next >= KFSp_ItemCount(data)) {
+        Zero(asked, value);
+        return 0;
+    }
+    if (KFSp_HasShortcuts && !asked.seen->IsSpatial()) return VelocityInGap(asked, data, next, value);
     KFSp_FirstError error;
     {
         KFSp_ScConstPin const pin(data->keys, error);
-        if (!error.None()) return error.Code();
-        KFS_KeyScalar *at = nullptr, *a = nullptr, *b = nullptr;
-        int aIndex = 0;
-        error.Keep(KFSp_GetNeighborsFromTime(stream, asked.time, 0, &at, &a, &b, &aIndex, nullptr, nullptr));
-        bool const moves = error.None() && a && b && a->outInterp != KFS_Interp_Hold && b->inInterp != KFS_Interp_Hold;
-        if (!moves) {
-            Zero(asked, value);
-        } else if (a->outInterp == KFS_Interp_Linear && b->inInterp == KFS_Interp_Linear) {
-            error.Keep(KFS_GetKeyVelocityF(asked.stream, aIndex, 1, nullptr, value));
-        } else {
-            static_cast<void>(ClearedNumbers(asked, data));
-            error.Keep(stream->IsSpatial() ? KFSp_InterpDerivSpatial(stream, 0, asked.time, earlier)
-                                           : KFSp_InterpDeriv(stream, 0, asked.time, earlier));
-            if (error.None()) error.Keep(TakeFromCache(asked, data, value));
-        }
+        if (error.None()) error.Keep(VelocityInGap(asked, data, next, value));
     }
     return error.Code();
 }
 
+// A plain stream has no path between its keys either: it is refused as at a key.
 int TangentBetweenKeys(Question const& asked, KFS_StreamKeyData const* data, int next, double* value)
 {
     KFS_Stream const* const stream = asked.seen;
     int const last = KFSp_ItemCount(data) - 1;
-    if (next == 0 || next > last) return TangentOfKey(asked, std::min(next, last), value);
-    if (!stream->IsSpatial()) {
-        KFS_KeyScalar const *a = nullptr, *b = nullptr;
-        if (int const code = KFSp_GetConstKey(data, next - 1, &a)) return code;
-        if (int const code = KFSp_GetConstKey(data, next, &b)) return code;
-        if (a->outInterp == KFS_Interp_Hold) return TangentOfKey(asked, next - 1, value);
-        if (b->inInterp == KFS_Interp_Hold) return TangentOfKey(asked, next, value);
-    }
+    if (next == 0 || next > last || !stream->IsSpatial()) return TangentOfKey(asked, std::min(next, last), value);
     KFSp_FirstError error;
     {
         KFSp_ScConstPin const pin(data->keys, error);
         if (!error.None()) return error.Code();
         if (!stream->GetInterpFunc())  // told, and no failure
             static_cast<void>(KFSp_ReportRow(KFSp_Op_GetTangent, 0, KFSp_Row_NoInterpFunc));
-        static_cast<void>(ClearedNumbers(asked, data));
-        error.Keep(KFSp_InterpTangentSpatial(stream, 0, asked.time, next - 1));
-        if (error.None()) error.Keep(TakeFromCache(asked, data, value));
+        error.Keep(TakeFromCache(asked, data, KFSp_InterpTangentSpatial(stream, 0, asked.time, next - 1), value));
     }
     return error.Code();
 }
@@ -203,7 +225,7 @@ int DeriveKeys(Question const& asked, double* value, unsigned char* atKey)
     }
     if (atKey) *atKey = found ? 1 : 0;
     if (!error.None() || !value) return error.Code();
-    error.Keep(KFSp_ClearCache(stream));
+    error.Keep(KFSp_ClearCacheRecord(stream, data->cache));
     if (!error.None() || stream->GetDimension() < 1) return error.Code();
 
     bool const isTangent = asked.tangentMode == KFS_Deriv_SpaceTangent;
@@ -211,7 +233,7 @@ int DeriveKeys(Question const& asked, double* value, unsigned char* atKey)
         error.Keep(isTangent ? TangentOfKey(asked, index, value) : VelocityOfKey(asked, index, value));
     else if (!asked.keyOnly)
         error.Keep(isTangent ? TangentBetweenKeys(asked, data, index, value)
-                             : VelocityBetweenKeys(asked, data, index - 1, value));
+                             : VelocityBetweenKeys(asked, data, index, value));
     data->cache->time = KFS_INVALID_INDEX;  // the record never holds a rate after this
     return error.Code();
 }
@@ -356,7 +378,7 @@ int KFS_GetDeriv(KFS_Stream const* stream, T_Time const* time, char tangentMode,
     if (int const code = KFSp_CheckStream(KFSp_Op_GetDeriv, stream, KFSp_Row_GetValue)) return code;
     return KFSp_Boundary([&] {
         Question asked{.stream = stream,
-                       .seen = KFSp_Seen(stream),
+                       .seen = KFSp_Seen(stream, Q_RenderContext::PeekCurrent()),
                        .tangentMode = tangentMode,
                        .keyOnly = keyOnly != 0,
                        .flags = flags,
@@ -386,7 +408,8 @@ int KFS_GetDerivs(KFS_Stream const* stream, T_Time const* start, T_Time const* s
         value = reinterpret_cast<double*>(*made);
     }
     T_Time at = start ? *start : T_Time{0, seen->GetTimeScale()};
-    int code = KFS_GetDeriv(stream, &at, KFS_Deriv_Velocity, 0, flags, value, nullptr, bag, sampleFilter, filter);
+    int code = KFS_GetDeriv(stream, &at, KFS_Deriv_Velocity, 0, flags, value, nullptr, bag, std::move(sampleFilter),
+                            std::move(filter));
     if (code == 0) code = KFS_AddTime(step, &at, 0, &at);
     if (made && code == 0) *values = made;
     if (made && code != 0) Q_FreeHandle(made);

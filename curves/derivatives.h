@@ -15,6 +15,7 @@
 // Results: 0, or
 //   2                        the stream is damaged
 //   7427 KFS_Err_NoKeys      the stream has no key, or is a constant without a value
+//   7434 KFS_Err_NotSpatial  a plain stream has no directions
 //   7441 KFS_Err_CustomValue a client's values have no rate
 //   the services' codes, those of the curves, and what a filter answered
 //
@@ -46,7 +47,7 @@ inline constexpr char KFS_Deriv_SpaceTangent =
 
 // One velocity at `start`, whatever the step. Goes to the caller's `value`; with a null one `values` receives a handle of one
 // sample, which the caller frees with Q_FreeHandle, and which stays unset on an error. Code 3, reported, if both are null; 4
-// when out of memory. `step` isn't null. Operation 58.
+// when out of memory. `step` isn't null, and one that can't be added to `start` is an error. Operation 58.
 [[nodiscard]] KFS_API int KFS_GetDerivs(KFS_Stream const* stream, T_Time const* start, T_Time const* step, char unused,
                                         int flags, double* value, char*** values, KFS_ParamBag const* bag,
                                         KFS_DerivSampleFilter sampleFilter, KFS_DerivFilter filter);
@@ -56,6 +57,8 @@ inline constexpr char KFS_Deriv_SpaceTangent =
 // 0 if there is none. A stream with separated dimensions answers its followers' rates, and `value` takes at least three
 // doubles there. Its length means nothing.
 //
-// Operation 97. KFS_Err_NotSpatial, reported.
+//   keyOnly  as in KFS_GetDeriv. Between keys the caller's own zeros in `value` count as a stand-still, and are looked past.
+//
+// Operation 97.
 [[nodiscard]] KFS_API int KFS_GetSpaceTangent(KFS_Stream const* stream, T_Time const* time, unsigned char keyOnly,
                                               int flags, double* value, unsigned char* atKey, KFS_ParamBag const* bag);

@@ -15,14 +15,15 @@ struct Segment {
     KFS_KeyScalar const* b = nullptr;
 };
 
-// Whether the hint names the key right before the time; `segment` is the answer then. An index past the end is refused
-// by the look-up.
+// Whether the hint names the key right before the time; `segment` is the answer then.
 bool TakeHint(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int keyIndex, Segment* segment)
 {
-    if (keyIndex < 0 || stream->HasNoKeys()) return false;
+    if (keyIndex < 0 || keyIndex >= KFSp_ItemCount(data) - 1 || stream->HasNoKeys()) return false;
     if (stream->IsSpatial() && stream->IsSParametrized()) return false;  // a neighbour may be a float key
-    return KFSp_GetConstKey(data, keyIndex, &segment->a) == 0 &&
-           KFSp_GetConstKey(data, keyIndex + 1, &segment->b) == 0 && segment->a->time < time && time < segment->b->time;
+    auto const [a, b] = KFSp_GetKeyPair(data, keyIndex);
+    if (!KFSp_HasShortcuts && !a) return false;
+    *segment = {a, b};
+    return a->time < time && time < b->time;
 }
 
 int FindSegment(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time, int keyIndex, Segment* segment)

@@ -76,6 +76,22 @@ struct KFSp_Refusal {
     return KFSp_GetKey(data, index, key);
 }
 
+// The slopes of the straight line from key to key, one for each component of a plain value.
+inline void KFSp_FillSlopes(KFS_Stream const* stream, KFS_KeyScalar const* from, KFS_KeyScalar const* to,
+                            double* slopes)
+{
+    double const duration = KFSp_Seconds(to->time, from->time, stream->GetTimeScale());
+    for (int i = 0; i < stream->GetDimension(); ++i)
+        slopes[i] = (KFSp_Numbers(to)[i] - KFSp_Numbers(from)[i]) / duration;
+}
+
+// A first speed is told as rest from here on.
+inline double KFSp_SettledSpeed(double speed)
+{
+    constexpr double least = 1e-10;
+    return speed < least && speed > -least ? 0.0 : speed;
+}
+
 // The cache record as room for numbers of the key's own layout. What it held is gone, unless it is the key itself.
 inline KFS_KeyScalar* KFSp_BorrowCache(KFS_StreamKeyData const* data, KFS_KeyScalar const* key)
 {

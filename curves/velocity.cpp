@@ -16,7 +16,6 @@
 namespace {
 
 constexpr double NoDuration = 1e-12;
-constexpr double NoSpeed = 1e-10;
 constexpr int NoDurationError = KFS_Err_LegacyMismatch;
 
 // A key, a side of which is asked for.
@@ -100,10 +99,9 @@ int ComputeSlopes(AskedKey const& asked, KFSp_Side side, double const** slopes)
         return code;
     KFS_KeyScalar const* const from = side == KFSp_Side::In ? beside : asked.key;
     KFS_KeyScalar const* const to = side == KFSp_Side::In ? asked.key : beside;
-    double const duration = KFSp_Seconds(to->time, from->time, asked.stream->GetTimeScale());
-    KFSp_Handles<double> const scratch = KFSp_GetHandles(asked.stream, KFSp_BorrowCache(asked.data, asked.key), side);
-    for (int i = 0; i < scratch.count; ++i) scratch.speed[i] = (KFSp_Numbers(to)[i] - KFSp_Numbers(from)[i]) / duration;
-    *slopes = scratch.speed;
+    double* const scratch = KFSp_GetHandles(asked.stream, KFSp_BorrowCache(asked.data, asked.key), side).speed;
+    KFSp_FillSlopes(asked.stream, from, to, scratch);
+    *slopes = scratch;
     return 0;
 }
 
@@ -135,7 +133,7 @@ int GetSpeed(AskedKey const& asked, KFSp_Side side, bool zeroAtEnds, double* spe
     int const code = asked.stream->IsSpatial() ? GetSpatialSpeed(asked, side, zeroAtEnds, speed, &answered)
                                                : GetPlainSpeed(asked, side, speed, &answered);
     bool const hasElement = KFSp_HandleArraySize(asked.stream) > 0;
-    if (code == 0 && answered && hasElement && std::fabs(speed[0]) < NoSpeed) speed[0] = 0.0;
+    if (code == 0 && answered && hasElement) speed[0] = KFSp_SettledSpeed(speed[0]);
     return code;
 }
 

@@ -1,5 +1,6 @@
 #include "keystore/evaluate.h"
 
+#include "curves/derivatives.h"
 #include "frame/errors.h"
 #include "keystore/attributes.h"
 #include "keystore/lookup.h"
@@ -10,6 +11,7 @@
 
 #include <boost/weak_ptr.hpp>
 
+#include <cmath>
 #include <stdexcept>
 
 namespace {
@@ -90,24 +92,26 @@ TEST_F(Evaluate, TheStagesGoInTheirOrder)
         int flags;
         int code;
         double value;
-        int atKey;  // 9: untouched
+        int atKey;    // 9: untouched
+        double rate;  // of an expression, as long as it is switched on, whether it has a value or not
     };
     Row const rows[] = {
-        {"no expression", [] {}, 0, 0, 2.0, 1},
-        {"an expression answers, and no key stands there", [&] { info.SetExpression(Text("x")); }, 0, 0, 1100.0, 0},
-        {"the flag goes straight to the keys", [] {}, 1, 0, 2.0, 1},
-        {"the host's flags don't", [] {}, 0xF0, 0, 1100.0, 0},
-        {"switched off", [&] { info.SetFlags(KFS_ExprFlag_Disabled); }, 0, 0, 2.0, 1},
-        {"the engine can't run now", [&] { info.SetFlags(0), engine->canRun = false; }, 0, 0, 2.0, 1},
-        {"there is no context to run it in", [&] { engine->hasContext = false; }, 0, 0, 2.0, 1},
+        {"no expression", [] {}, 0, 0, 2.0, 1, 6.0},
+        {"an expression answers, and no key stands there", [&] { info.SetExpression(Text("x")); }, 0, 0, 1100.0, 0,
+         600.0},
+        {"the flag goes straight to the keys", [] {}, 1, 0, 2.0, 1, 6.0},
+        {"the host's flags don't", [] {}, 0xF0, 0, 1100.0, 0, 600.0},
+        {"switched off", [&] { info.SetFlags(KFS_ExprFlag_Disabled); }, 0, 0, 2.0, 1, 6.0},
+        {"the engine can't run now", [&] { info.SetFlags(0), engine->canRun = false; }, 0, 0, 2.0, 1, 0.0},
+        {"there is no context to run it in", [&] { engine->hasContext = false; }, 0, 0, 2.0, 1, 0.0},
         {"no value here: the keys answer",
          [&] {
              engine->hasContext = engine->canRun = true;
              engine->expression = [](KFS_Stream const*, int, double*) -> int { return KFS_Err_ExprNoValue; };
          },
-         0, 0, 2.0, 1},
+         0, 0, 2.0, 1, 0.0},
         {"any other error is the result",
-         [&] { engine->expression = [](KFS_Stream const*, int, double*) { return 99; }; }, 0, 99, -1.0, 9},
+         [&] { engine->expression = [](KFS_Stream const*, int, double*) { return 99; }; }, 0, 99, -1.0, 9, -1.0},
     };
     T_Time const at{100, 600};
     for (Row const& row : rows) {
@@ -118,6 +122,10 @@ TEST_F(Evaluate, TheStagesGoInTheirOrder)
         EXPECT_EQ(row.code, KFS_GetValueFPlus(stream, &at, row.flags, &value, &atKey, nullptr));
         EXPECT_EQ(row.value, value);
         EXPECT_EQ(row.atKey, atKey);
+        double rate = -1.0;
+        EXPECT_EQ(row.code,
+                  KFS_GetDeriv(stream, &at, KFS_Deriv_Velocity, 0, row.flags, &rate, nullptr, nullptr, {}, {}));
+        EXPECT_EQ(row.rate, rate);
     }
     engine->expression = [](KFS_Stream const*, int, double*) -> int { throw std::runtime_error("bad token"); };
     double value = 0.0;
@@ -275,10 +283,51 @@ TEST_F(Evaluate, SamplesComeInOneHandle)
     Q_FailAllocation(0);
 }
 
+// A rate of an expression is the difference to the next unit of time, and the filters see what goes in and comes out.
+TEST_F(Evaluate, RatesOfExpressionsPassTheFilters)
+{
+    Q_ScSetCurrentRenderContext const current(context);
+    TestStream path({.dimension = 3, .spatial = true});
+    path.Key(0, {0.0, 0.0, 0.0});
+    path->GetExprInfoForModify().SetExpression(Text("x"));
+    engine->expression = [](KFS_Stream const*, int time, double* value) {
+        for (int i = 0; i < 3; ++i) value[i] = (i + 1) * (time > 7 ? 1.0 : 0.0);
+        return 0;
+    };
+    T_Time const at{7, 600};
+    auto const derive = [&](char mode, int sampleCode, int code, std::vector<double>* seen) {
+        std::vector<double> rates(4, -1.0);
+        EXPECT_EQ(sampleCode + code, KFS_GetDeriv(
+                                         path, &at, mode, 0, 0, rates.data(), nullptr, nullptr,
+                                         [&](double* value) { return value[1] *= 2.0, sampleCode; },
+                                         [&](double* rate, bool isSpeed) {
+                                             seen->push_back(isSpeed ? -*rate : *rate);
+                                             return *rate += 1.0, code;
+                                         }));
+        return rates;
+    };
+    std::vector<double> seen;
+    double const speed = std::sqrt(600.0 * 600.0 + 2400.0 * 2400.0 + 1800.0 * 1800.0);
+    EXPECT_EQ((std::vector{speed + 1.0, -1.0, -1.0, -1.0}), derive(KFS_Deriv_Velocity, 0, 0, &seen));
+    EXPECT_EQ((std::vector{601.0, 2401.0, 1801.0, -1.0}), derive(KFS_Deriv_SpaceTangent, 0, 0, &seen));
+    EXPECT_EQ((std::vector{-speed, 600.0, 2400.0, 1800.0}), seen);
+    EXPECT_EQ(std::vector(4, -1.0), derive(KFS_Deriv_SpaceTangent, 0, 77, &seen));
+    EXPECT_EQ(std::vector(4, -1.0), derive(KFS_Deriv_Velocity, 78, 0, &seen));
+    EXPECT_EQ(5u, seen.size());
+    double still[3] = {};
+    T_Time const later{8, 600};
+    EXPECT_EQ(0, KFS_GetSpaceTangent(path, &later, 0, 0, still, nullptr, nullptr)) << "nothing is searched here";
+    EXPECT_EQ(0.0, still[0]);
+}
+
 // Leaves that stand for the dimensions of a separated leader.
 class Leader : public KFS_Stream {
 public:
     using KFS_Stream::KFS_Stream;
+    M_Vector4T<double> GetVector4Ex(KFS_EvalData const& asked) const override
+    {
+        return {{0.5 * asked.time.value, 1.0, 2.0 * asked.time.value * asked.time.value, 0.0}};
+    }
     KFS_Stream const* GetSeparationFollower(int dimension) const override
     {
         return dimension < static_cast<int>(followers.size()) ? followers[static_cast<std::size_t>(dimension)]
@@ -317,6 +366,23 @@ TEST_F(Evaluate, SeparatedDimensionsAnswerFromTheirFollowers)
     auto const* const values = reinterpret_cast<double const*>(*handle);
     EXPECT_EQ((std::vector{15.0, 5.0, 0.0, 20.0, 5.0, 0.0}), std::vector(values, values + 6));
     Q_FreeHandle(handle);
+
+    // Its direction is their rates, and where all of them rest the way past the nearest time that has keys.
+    leader.SetKFSFlags(static_cast<unsigned short>(leader.GetKFSFlags() | KFS_StreamFlag_Spatial));
+    T_Time const late{5000, 600};
+    struct Row {
+        T_Time const* at;
+        std::array<double, 3> way;
+        int atKey;
+    } const rows[] = {{&at, {60.0, 0.0, 0.0}, 0},
+                      {nullptr, {60.0, 0.0, 0.0}, 1},
+                      {&late, {1.0, 0.0, 2.0 * (101 * 101 - 99 * 99)}, 0}};
+    for (Row const& row : rows) {
+        ASSERT_EQ(0, KFS_GetSpaceTangent(&leader, row.at, 0, 0, value.data(), &atKey, nullptr));
+        EXPECT_EQ(row.way, value);
+        EXPECT_EQ(row.atKey, atKey);
+    }
+    leader.SetKFSFlags(static_cast<unsigned short>(leader.GetKFSFlags() & ~KFS_StreamFlag_Spatial));
 }
 
 TEST_F(Evaluate, ReadsAllocateNothing)
