@@ -50,7 +50,7 @@ foreach(name IN LISTS testFolders)
 endforeach()
 
 # The library with KFS_FOREIGN_SERVICES. Only the files that ask whether there are shortcuts are compiled once more.
-set(shortcutSources tree/birth.cpp keystore/cache.cpp curves/interpolate.cpp curves/spatial.cpp)
+set(shortcutSources tree/birth.cpp keystore/cache.cpp curves/derivatives.cpp curves/interpolate.cpp curves/spatial.cpp)
 add_library(kfs_foreign_objects OBJECT ${shortcutSources})
 kfs_library_code(kfs_foreign_objects)
 target_compile_definitions(kfs_foreign_objects PRIVATE KFS_FOREIGN_SERVICES)
@@ -68,6 +68,7 @@ add_library(kfs_curve_truth STATIC "${museum}/truth.cpp")
 target_include_directories(kfs_curve_truth PRIVATE "${PROJECT_SOURCE_DIR}")
 target_compile_options(kfs_curve_truth PRIVATE -O2 -fno-sanitize=all)
 target_link_libraries(test_services PRIVATE kfs_curve_truth)
+target_link_libraries(test_curves PRIVATE kfs_curve_truth)
 add_executable(draw_museum EXCLUDE_FROM_ALL "${museum}/draw.cpp")
 target_link_libraries(draw_museum PRIVATE kfs_services)
 
