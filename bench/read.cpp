@@ -1,6 +1,7 @@
 // Reads of plain streams through the public door, beside a bare search and a bare solve over the same segments.
 
 #include "bench/common.h"
+#include "curves/derivatives.h"
 #include "curves/tangents.h"
 #include "frame/services/curvekernel.h"
 #include "keystore/edit.h"
@@ -104,6 +105,20 @@ void Read(benchmark::State& state, Fixture const& fixture, Order order)
     }
 }
 
+// How fast it changes there, beside its value.
+void ReadRate(benchmark::State& state, Fixture const& fixture, Order order)
+{
+    std::vector<int> const asked = fixture.Times(order);
+    double rate[4] = {};
+    std::size_t i = 0;
+    for (auto _ : state) {
+        T_Time const at{asked[i++ % Asked], Scale};
+        benchmark::DoNotOptimize(
+            KFS_GetDeriv(fixture.stream.get(), &at, KFS_Deriv_Velocity, 0, 0, rate, nullptr, nullptr, {}, {}));
+        benchmark::DoNotOptimize(rate);
+    }
+}
+
 template <class Solve>
 void Bare(benchmark::State& state, Fixture const& fixture, Order order, Solve&& solve)
 {
@@ -164,6 +179,23 @@ void LinearYardstick(benchmark::State& state)
 }
 BENCHMARK(LinearOurs)->Name("read_linear_random/ours")->Arg(8)->Arg(1000)->Arg(30000);
 BENCHMARK(LinearYardstick)->Name("read_linear_random/yardstick")->Arg(8)->Arg(1000)->Arg(30000);
+
+template <char Interp, Order order>
+void RateOurs(benchmark::State& state)
+{
+    ReadRate(state, Get(1000, 1, Interp), order);
+}
+template <char Interp, Order order>
+void RateYardstick(benchmark::State& state)
+{
+    Read(state, Get(1000, 1, Interp), order);
+}
+BENCHMARK(RateOurs<KFS_Interp_Spline, Order::Random>)->Name("rate_spline_random/ours");
+BENCHMARK(RateYardstick<KFS_Interp_Spline, Order::Random>)->Name("rate_spline_random/yardstick");
+BENCHMARK(RateOurs<KFS_Interp_Spline, Order::Frames>)->Name("rate_spline_24_a_second/ours");
+BENCHMARK(RateYardstick<KFS_Interp_Spline, Order::Frames>)->Name("rate_spline_24_a_second/yardstick");
+BENCHMARK(RateOurs<KFS_Interp_Linear, Order::Random>)->Name("rate_linear_random/ours");
+BENCHMARK(RateYardstick<KFS_Interp_Linear, Order::Random>)->Name("rate_linear_random/yardstick");
 
 void Spline3Ours(benchmark::State& state)
 {

@@ -2,6 +2,7 @@
 // edit; a drag.
 
 #include "bench/common.h"
+#include "curves/derivatives.h"
 #include "curves/spacetangents.h"
 #include "frame/services/curvekernel.h"
 #include "frame/services/sequence.h"
@@ -158,6 +159,23 @@ void ReadYardstick(benchmark::State& state)
 }
 BENCHMARK(ReadOurs)->Name("read_path_random/ours")->Arg(8)->Arg(1000)->Arg(30000);
 BENCHMARK(ReadYardstick)->Name("read_path_random/yardstick")->Arg(8)->Arg(1000)->Arg(30000);
+
+// The speed there, beside the place.
+void RateOurs(benchmark::State& state)
+{
+    Fixture const& fixture = Get(static_cast<int>(state.range(0)));
+    std::vector<int> const asked = RandomTimes(static_cast<int>(state.range(0)));
+    double speed = 0.0;
+    std::size_t i = 0;
+    for (auto _ : state) {
+        T_Time const at{asked[i++ % Asked], Scale};
+        benchmark::DoNotOptimize(
+            KFS_GetDeriv(fixture.stream.get(), &at, KFS_Deriv_Velocity, 0, 0, &speed, nullptr, nullptr, {}, {}));
+        benchmark::DoNotOptimize(speed);
+    }
+}
+BENCHMARK(RateOurs)->Name("rate_path_random/ours")->Arg(1000);
+BENCHMARK(ReadOurs)->Name("rate_path_random/yardstick")->Arg(1000);
 
 // A value moved in the middle and the read beside it, which measures the arcs anew. The yardstick has ten keys: the
 // cost must not grow with their number.

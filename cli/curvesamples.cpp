@@ -106,11 +106,11 @@ private:
         if (outInterp == KFS_Interp_Hold || inInterp == KFS_Interp_Hold) {
             AddHold(from, to);
         } else if (isLinear && !isRotation_) {
-            AddPieces(from, to, 1, start, end);
+            AddPieces(from, to, 1, index);
         } else {
             double const wanted = (static_cast<double>(to) - from) / scale_ * pointsPerSecond_;
             std::int64_t const least = isLinear ? 1 : 24;  // the arc of a rotation bends little
-            AddPieces(from, to, std::clamp(static_cast<std::int64_t>(wanted), least, std::int64_t{4000}), start, end);
+            AddPieces(from, to, std::clamp(static_cast<std::int64_t>(wanted), least, std::int64_t{4000}), index);
         }
     }
 
@@ -126,14 +126,15 @@ private:
         }
     }
 
-    // A part of the segment between `start` and `end`.
-    void AddPieces(int from, int to, std::int64_t pieces, int start, int end)
+    // A part of the segment behind a key. Where it ends in the next one the rate is the one before that.
+    void AddPieces(int from, int to, std::int64_t pieces, int index)
     {
+        int const end = KeyUnits(index + 1);
         std::int64_t const length = std::int64_t{to} - from;
         pieces = std::min(pieces, length);
         for (std::int64_t i = 0; i <= pieces; ++i) {
             int const time = static_cast<int>(from + (pieces == 0 ? 0 : length * i / pieces));
-            std::vector<double> const& rates = rates_.At(time, start, end);
+            std::vector<double> const& rates = time == end ? rates_.Into(index + 1) : rates_.At(time);
             Read(time, row_);
             for (std::size_t c = 0; c < components_.size(); ++c) {
                 ComponentCurve& curve = curves_.components[c];

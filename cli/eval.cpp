@@ -2,6 +2,7 @@
 #include "cli/errors.h"
 #include "cli/options.h"
 #include "cli/output.h"
+#include "cli/rates.h"
 #include "cli/table.h"
 #include "host/framegrid.h"
 #include "host/rotations.h"
@@ -29,6 +30,7 @@ struct Options {
     std::string to;     // empty: the frame at or after the last key
     std::string fps;    // empty: the rate of the keys
     bool raw = false;   // the stored components of rotations, not normalised
+    bool rate = false;  // rates of change in place of values
     std::string euler;  // rotations as angles about the axes in this order; empty: as quaternions
     Format format = Format::Table;
 };
@@ -70,12 +72,16 @@ std::vector<Rational> SampleTimes(Options const& options, Rational const& fps, s
     return times;
 }
 
-// What is printed of a stream: its components, or what they mean where they are a rotation's.
+// What is printed of a stream: its components, or what they mean where they are a rotation's, or their rates.
 class Shown {
 public:
     Shown(StreamItem const& item, Options const& options) : item_(&item), components_(item.components)
     {
         isRotation_ = kfshost::IsRotation(item) && !options.raw;
+        if (options.rate) {
+            rates_.emplace(*item.stream, isRotation_);
+            for (std::string& name : components_) name += "/s";
+        }
         if (isRotation_ && !options.euler.empty()) {
             order_ = kfshost::EulerOrder::Parse(options.euler);
             components_ = order_->Components();
@@ -87,10 +93,12 @@ public:
     StreamItem const& Item() const { return *item_; }
     std::vector<std::string> const& Components() const { return components_; }
     bool HasKeys() const { return kfshost::KeyCount(*item_->stream) != 0; }
+    bool AreRates() const { return rates_.has_value(); }
 
     // Valid until the next call.
     std::vector<double> const& Read(Rational const& time)
     {
+        if (rates_) return rates_->At(time.ToUnits(item_->stream->GetTimeScale()));
         kfshost::ReadAt(*item_->stream, time, stored_.data());
         if (isRotation_) kfshost::Normalise(stored_.data());
         if (order_)
@@ -105,6 +113,7 @@ private:
     std::vector<std::string> components_;
     bool isRotation_ = false;
     std::optional<kfshost::EulerOrder> order_;
+    std::optional<Rates> rates_;
     std::vector<double> stored_;
     std::vector<double> row_;
 };
@@ -218,9 +227,10 @@ std::string Pair(Rational const& number)
 
 void WriteJsonStream(Evaluation const& evaluation, Shown& stream, Output& output)
 {
-    output.Add(fmt::format(R"({{"path":{},"kind":{},"interpolation":{},"components":{},"values":[)",
+    output.Add(fmt::format(R"({{"path":{},"kind":{},"interpolation":{},"components":{},"{}":[)",
                            Quoted(stream.Item().path), Quoted(NameOf(stream.Item().kind)),
-                           Quoted(NameOf(stream.Item().interpolation)), nlohmann::json(stream.Components()).dump()));
+                           Quoted(NameOf(stream.Item().interpolation)), nlohmann::json(stream.Components()).dump(),
+                           stream.AreRates() ? "rates" : "values"));
     for (std::size_t i = 0; stream.HasKeys() && i < evaluation.times.size(); ++i)
         output.Add((i == 0 ? "" : ",") + nlohmann::json(stream.Read(evaluation.times[i])).dump());
     output.Add("]}");
@@ -254,9 +264,9 @@ void TellRounding(Evaluation const& evaluation, std::optional<TimeSpan> const& s
         break;  // one scale serves all streams of a file
     }
     if (worst > 0.0) {
-        TellAbout(
-            selection.file,
-            fmt::format("values are those of the nearest 1/{} s, up to {:.2g} s from the times shown", scale, worst));
+        TellAbout(selection.file,
+                  fmt::format("{} are those of the nearest 1/{} s, up to {:.2g} s from the times shown",
+                              evaluation.streams.front().AreRates() ? "rates" : "values", scale, worst));
     }
 }
 
@@ -281,6 +291,8 @@ Rational FindFps(Options const& options, std::vector<StreamItem const*> const& i
 void CheckOptions(Options const& options)
 {
     if (options.euler.empty()) return;
+    if (options.rate)
+        throw UserError("--rate", "tells the rates of a rotation's components, so it can't go with --euler");
     if (options.raw) throw UserError("--raw", "shows components as they are stored, so it can't go with --euler");
     if (!kfshost::EulerOrder::Parse(options.euler))
         throw UserError("--euler", '"' + options.euler + "\" isn't an order of the three axes like XYZ or ZXY");
@@ -325,6 +337,8 @@ Work Prepare(CLI::App& command)
     command.add_option("--fps", options->fps, "samples a second, like 24 or 30000/1001 (default: the keys' rate)")
         ->type_name("RATE");
     command.add_flag("--raw", options->raw, "rotations as they are stored, of any length (default: of length 1)");
+    command.add_flag("--rate", options->rate,
+                     "how fast values change, in their units a second: behind a key, at the last key before it");
     command
         .add_option("--euler", options->euler,
                     "rotations as degrees about the axes, whose matrices are multiplied in this order, like XYZ")
@@ -343,4 +357,4 @@ Work Prepare(CLI::App& command)
 
 }  // namespace
 
-Command const EvalCommand{"Look into files", "eval", "Print values at regular times", Prepare};
+Command const EvalCommand{"Look into files", "eval", "Print values, or their rates, at regular times", Prepare};

@@ -4,6 +4,7 @@
 #include "cli/motionviews.h"
 #include "cli/output.h"
 #include "cli/panel.h"
+#include "cli/rates.h"
 #include "cli/thin.h"
 #include "cli/usererror.h"
 #include "host/paths.h"
@@ -320,15 +321,17 @@ private:
 
     void DrawSpeed(Motion const& motion, Axis const& time)
     {
-        double highest = 0.0;
-        for (Point const& point : motion.samples.speed) highest = std::max(highest, point.y);
+        double const highest = RatesInSight(motion.samples.speed).high;
+        double peak = 0.0;
+        for (Point const& point : motion.samples.speed)
+            if (point.y > highest) peak = std::max(peak, point.y);
         Axis const speeds(0.0, highest == 0.0 ? 1.0 : highest * 1.1, 6);
         Panel const panel({PanelLeft, top_, PanelRight - PanelLeft, SpeedHeight}, time, speeds);
-        panel.DrawFrame(svg_, "speed along the path, distance a second");
+        panel.DrawFrame(svg_, "speed along the path, distance a second" + PeakNote(peak));
         panel.DrawLabelsBelow(svg_, unit_.name);
         std::vector<Point> line;
         for (Point const& point : motion.samples.speed)
-            line.push_back({panel.X(point.x * unit_.perSecond), panel.Y(point.y)});
+            line.push_back({panel.X(point.x * unit_.perSecond), panel.Held(panel.Y(point.y))});
         svg_.Polyline(ThinGraph(std::move(line), MostPoints / shown_.size() / 4), {SpeedColor, 2.0});
         auto const& keys = motion.samples.keys;
         double const room = (PanelRight - PanelLeft) / static_cast<double>(std::max<std::size_t>(keys.size(), 1));

@@ -33,8 +33,7 @@ std::array<std::size_t, 3> AxesOf(StreamItem const& item)
 
 class Sampler {
 public:
-    explicit Sampler(StreamItem const& item) : item_(item), stream_(*item.stream), axes_(AxesOf(item)), rates_(stream_)
-    {}
+    explicit Sampler(StreamItem const& item) : item_(item), stream_(*item.stream), axes_(AxesOf(item)) {}
 
     MotionSamples Run(TimeSpan const& part, double pointsPerSecond)
     {
@@ -43,7 +42,7 @@ public:
         Key before;
         for (int i = 0; i < keys; ++i) {
             Key const key = ReadKey(i, i == 0 || i + 1 == keys);
-            if (i > 0 && before.time < part.last && key.time > part.first) AddSegment(before, key, pointsPerSecond);
+            if (i > 0 && before.time < part.last && key.time > part.first) AddSegment(before, key, i, pointsPerSecond);
             if (key.time >= part.first && key.time <= part.last) samples_.keys.push_back(key.mark);
             before = key;
         }
@@ -90,7 +89,7 @@ private:
         return key;
     }
 
-    void AddSegment(Key const& before, Key const& key, double pointsPerSecond)
+    void AddSegment(Key const& before, Key const& key, int index, double pointsPerSecond)
     {
         MotionKey const& from = before.mark;
         MotionKey const& to = key.mark;
@@ -107,7 +106,7 @@ private:
         samples_.segments.push_back({isWhole ? Route(from, to) : PartOfRoute(before.time, key.time), false});
         bool const isLinear = before.out == KFS_Interp_Linear && key.in == KFS_Interp_Linear;
         std::int64_t const wanted = static_cast<std::int64_t>((last - first) * pointsPerSecond);
-        AddSpeed(before.time, key.time, isLinear ? 1 : std::clamp(wanted, std::int64_t{24}, std::int64_t{4000}));
+        AddSpeed(before.time, key.time, index, isLinear ? 1 : std::clamp(wanted, std::int64_t{24}, std::int64_t{4000}));
     }
 
     // What of a segment is to be seen, point after point in time.
@@ -133,7 +132,8 @@ private:
         return route;
     }
 
-    void AddSpeed(Rational const& startTime, Rational const& endTime, std::int64_t pieces)
+    // On the way to the key at `index`. Where it ends there the speed is the one before that key.
+    void AddSpeed(Rational const& startTime, Rational const& endTime, int index, std::int64_t pieces)
     {
         unsigned int const scale = stream_.GetTimeScale();
         int const start = startTime.ToUnits(scale);
@@ -143,16 +143,18 @@ private:
         pieces = std::min(pieces, length);
         for (std::int64_t i = 0; i <= pieces; ++i) {
             std::int64_t const time = from + (pieces == 0 ? 0 : length * i / pieces);
-            double squares = 0.0;
-            for (double const rate : rates_.At(static_cast<int>(time), start, end)) squares += rate * rate;
-            samples_.speed.push_back({static_cast<double>(time) / scale, std::sqrt(squares)});
+            double speed = 0.0;
+            if (time == end)
+                ReadRateInto(stream_, index, &speed);
+            else
+                ReadRate(stream_, static_cast<int>(time), &speed);
+            samples_.speed.push_back({static_cast<double>(time) / scale, speed});
         }
     }
 
     StreamItem const& item_;
     KFS_Stream const& stream_;
     std::array<std::size_t, 3> axes_;
-    Rates rates_;
     TimeSpan part_;
     MotionSamples samples_;
 };

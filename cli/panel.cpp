@@ -1,5 +1,7 @@
 #include "cli/panel.h"
 
+#include <fmt/format.h>
+
 using kfshost::StreamItem;
 
 namespace {
@@ -37,6 +39,11 @@ std::string ShortenedPath(std::string const& path)
     std::size_t start = path.size() - most;
     while ((static_cast<unsigned char>(path[start]) & 0xC0) == 0x80) ++start;
     return "..." + path.substr(start);
+}
+
+std::string PeakNote(double peak)
+{
+    return peak == 0.0 ? "" : fmt::format(", off the panel up to {:.3g}", peak);
 }
 
 Panel::Panel(PanelBox const& box, Axis const& horizontal, Axis const& vertical, bool downward)

@@ -4,6 +4,7 @@
 #include "cli/drawing.h"
 #include "cli/svg.h"
 
+#include <algorithm>
 #include <string>
 
 // The frame that all drawings share: graphs between the two, labels to their left, legends to their right.
@@ -26,6 +27,9 @@ Axis MakeTimeAxis(DrawingOptions const& options, std::vector<kfshost::StreamItem
 // The end of a path that is too long for a title.
 std::string ShortenedPath(std::string const& path);
 
+// What a caption says of numbers that go off the panel, of which `peak` is the greatest; nothing where none do.
+std::string PeakNote(double peak);
+
 struct PanelBox {
     double left;
     double top;
@@ -43,6 +47,8 @@ public:
     double Bottom() const { return box_.top + box_.height; }
     double X(double number) const;
     double Y(double number) const;
+    // A height as it is inside the panel, at its edge where it would be beyond.
+    double Held(double y) const { return std::clamp(y, box_.top, Bottom()); }
 
     // The ground with its grid, the numbers at its left, and a caption above.
     void DrawFrame(Svg& svg, std::string const& caption) const;

@@ -1,28 +1,36 @@
 #pragma once
 
+#include "cli/axis.h"
+#include "cli/svg.h"
 #include "keystore/stream.h"
 
-#include <cstdint>
 #include <vector>
 
-// How fast a stream changes at a time, in value units a second, component by component.
+// Rates as the library answers them, in units of the value a second: `dimension` doubles, or of a path its one speed.
+// Times are in units of the stream's scale. Throw StoreError.
+void ReadRate(KFS_Stream const& stream, int time, double* rate);  // at a key the rate behind it
+void ReadRateInto(KFS_Stream const& stream, int index,
+                  double* rate);  // with which a key is reached; of the first key 0
+
+// How fast what is shown of a stream changes, component by component. Answers stand until the next call.
 class Rates {
 public:
     // With `asRotation` those of the normalised quaternion; only for a rotation.
     explicit Rates(KFS_Stream const& stream, bool asRotation = false);
 
-    // The rate at `time` as it is on the side of the segment between `start` and `end`, all in units of the stream's
-    // scale: nothing beyond a key takes part, where the rate may be another. The answer stands until the next call.
-    // Throws StoreError.
-    std::vector<double> const& At(int time, int start, int end);
+    std::vector<double> const& At(int time);
+    std::vector<double> const& Into(int index);
 
 private:
-    void Read(std::int64_t time, std::vector<double>& row) const;
+    void FinishRotation(T_Time const& at);
+    void GoAlong(std::vector<double> const& way);
+    std::vector<double> WayInto(int index) const;
 
     KFS_Stream const& stream_;
     bool asRotation_;
-    std::vector<double> before_;
-    std::vector<double> here_;
-    std::vector<double> after_;
     std::vector<double> rate_;
 };
+
+// Which rates of a graph are to be drawn: all, but for peaks that are over at once and so high that nothing else could be
+// seen beside them, as at a vertical tangent.
+Range RatesInSight(std::vector<Point> const& graph);

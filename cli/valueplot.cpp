@@ -2,6 +2,7 @@
 #include "cli/curvesamples.h"
 #include "cli/drawing.h"
 #include "cli/panel.h"
+#include "cli/rates.h"
 #include "cli/thin.h"
 #include "cli/usererror.h"
 
@@ -195,10 +196,12 @@ private:
         DrawKeys(valuePanel, drawn, curves, spacing);
         double const legendBottom = DrawLegend(drawn, curves, valuePanel);
 
-        Axis const speeds = SpeedAxis(item, curves, values, time);
+        double peak = 0.0;
+        Axis const speeds = SpeedAxis(item, curves, values, time, &peak);
         Panel const speedPanel({Left, valuePanel.Bottom() + PanelGap, Right - Left, HeightOf(speeds, SpeedHeight)},
                                time, speeds);
-        speedPanel.DrawFrame(svg_, isAngle ? "speed, degrees a second" : "speed, units a second");
+        speedPanel.DrawFrame(svg_, std::string(isAngle ? "speed, degrees a second" : "speed, units a second") +
+                                       PeakNote(peak));
         DrawCurves(speedPanel, drawn, curves, &ComponentCurve::speed);
         speedPanel.DrawLabelsBelow(svg_, unit_.name);
         return std::max(speedPanel.Bottom() + AxisHeight, legendBottom);
@@ -221,22 +224,26 @@ private:
         return {pixels, fits, fits && pixels >= LeastHandleDistance && keys.size() * 5 <= marksOfCurve_};
     }
 
-    Range Extent(StreamItem const& item, StreamCurves const& curves, CurvePoints points) const
+    Range const& Drawable(StreamItem const& item, Range const& range) const
     {
-        Range range{HUGE_VAL, -HUGE_VAL};
-        for (ComponentCurve const& curve : curves.components)
-            for (Point const& point : curve.*points)
-                range = {std::min(range.low, point.y), std::max(range.high, point.y)};
-        if (range.low > range.high) return {0.0, 0.0};
         if (!std::isfinite(range.high - range.low))
             throw UserError(options_.selection.file + ": " + item.path, "the numbers are too large to draw");
         return range;
     }
 
+    Range Extent(StreamItem const& item, StreamCurves const& curves) const
+    {
+        Range range{HUGE_VAL, -HUGE_VAL};
+        for (ComponentCurve const& curve : curves.components)
+            for (Point const& point : curve.value)
+                range = {std::min(range.low, point.y), std::max(range.high, point.y)};
+        return range.low > range.high ? Range{0.0, 0.0} : Drawable(item, range);
+    }
+
     // Room for the curves, and for the ends of the handles where they are drawn.
     Axis ValueAxis(StreamItem const& item, StreamCurves const& curves, bool withHandles) const
     {
-        Range range = Extent(item, curves, &ComponentCurve::value);
+        Range range = Extent(item, curves);
         for (Handle const& handle : curves.handles)
             if (withHandles) range = {std::min(range.low, handle.end.y), std::max(range.high, handle.end.y)};
         double const size = std::max(std::abs(range.low), std::abs(range.high));
@@ -245,14 +252,22 @@ private:
         return {range.low, range.high, 9};
     }
 
-    // Speed 0 is always in sight: it is where things rest.
-    Axis SpeedAxis(StreamItem const& item, StreamCurves const& curves, Axis const& values, Axis const& time) const
+    // Speed 0 is always in sight: it is where things rest. `peak`: out, the greatest of those that aren't.
+    Axis SpeedAxis(StreamItem const& item, StreamCurves const& curves, Axis const& values, Axis const& time,
+                   double* peak) const
     {
-        Range range = Extent(item, curves, &ComponentCurve::speed);
+        Range range{0.0, 0.0};
+        for (ComponentCurve const& curve : curves.components) {
+            Range const own = RatesInSight(curve.speed);
+            range = {std::min(range.low, own.low), std::max(range.high, own.high)};
+        }
+        for (ComponentCurve const& curve : curves.components)
+            for (Point const& point : curve.speed)
+                if (point.y < range.low || point.y > range.high) *peak = std::max(*peak, std::abs(point.y));
         double const seconds = (time.High() - time.Low()) / unit_.perSecond;
         double const drift = (values.High() - values.Low()) / seconds;
         if (values.IsConstant() || std::max(-range.low, range.high) <= drift * 1e-3) return Axis::Around(0.0);
-        range = WithAir({std::min(range.low, 0.0), std::max(range.high, 0.0)}, 0.07, drift / 100);
+        range = WithAir(Drawable(item, range), 0.07, drift / 100);
         return {range.low, range.high, 6};
     }
 
@@ -278,7 +293,10 @@ private:
     {
         for (std::size_t d = 0; d < curves.components.size(); ++d) {
             std::vector<Point> placed;
-            for (Point const& point : curves.components[d].*points) placed.push_back(Place(panel, point));
+            for (Point const& point : curves.components[d].*points) {
+                Point const at = Place(panel, point);
+                placed.push_back({at.x, panel.Held(at.y)});
+            }
             svg_.Polyline(ThinGraph(std::move(placed), pointsOfCurve_),
                           CurvePen(drawn, curves, d, points, Tolerance(panel)));
         }

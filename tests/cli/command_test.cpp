@@ -86,6 +86,37 @@ TEST(Kfs, EvalAnswersTheParabolaOfAFall)
     }
 }
 
+// Its speed grows by g a second and turns round at the ground; the same along the path; a step has none; a rotation's is at
+// right angles to it. The formats agree.
+TEST(Kfs, EvalTellsRates)
+{
+    auto const run = [](std::string const& stream, std::vector<std::string> const& more) {
+        std::vector<std::string> arguments{"eval", Sample, "--rate", "--fps", "4", "--to", "3/4", "--stream", stream};
+        arguments.insert(arguments.end(), more.begin(), more.end());
+        return RunKfs(arguments).output;
+    };
+    json const fall = json::parse(run("*/translation", {"--format", "json"})).at("streams").at(0);
+    EXPECT_EQ(json::array({"x/s", "y/s", "z/s"}), fall.at("components"));
+    json const path = json::parse(run("*/translation", {"--format", "json", "--as", "spatial"})).at("streams").at(0);
+    EXPECT_FALSE(fall.contains("values"));
+    for (json const& rates : {fall.at("rates"), path.at("rates")}) {
+        ASSERT_EQ(4U, rates.size());
+        EXPECT_NEAR(1.5, rates[2][0].get<double>(), 1e-6);
+        EXPECT_NEAR(9.81 * 0.375, rates[2][1].get<double>(), 1e-5) << "up again";
+    }
+    EXPECT_NEAR(-9.81 / 4, fall.at("rates")[1][1].get<double>(), 1e-5);
+    EXPECT_EQ("frame,seconds,bounce/ball/scale.x/s,bounce/ball/scale.y/s,bounce/ball/scale.z/s\n"
+              "0,0,0,0,0\n1,0.25,0,0,0\n2,0.5,0,0,0\n3,0.75,0,0,0\n",
+              run("*/scale", {"--format", "csv"}));
+    EXPECT_EQ(
+        0U,
+        run("*/scale", {}).find("bounce/ball/scale\nframe  seconds  x/s  y/s  z/s\n    0        0    0    0    0\n"));
+    json const turn = json::parse(run("*/rotation", {"--format", "json"})).at("streams").at(0).at("rates");
+    json const raw = json::parse(run("*/rotation", {"--format", "json", "--raw"})).at("streams").at(0).at("rates");
+    EXPECT_EQ(raw[0], raw[1]) << "straight from key to key";
+    EXPECT_LT(std::abs(turn[0][3].get<double>()), 1e-12);
+}
+
 // The three formats print the same doubles, to the last bit.
 TEST(Kfs, NumbersReadBackAsTheyWere)
 {
@@ -194,6 +225,6 @@ TEST(Kfs, HelpTellsTheCommandsAndTheirOptions)
         EXPECT_NE(std::string::npos, help.output.find(word)) << word;
     Outcome const eval = RunKfs({"eval", "--help"});
     EXPECT_EQ(0, eval.code);
-    for (char const* word : {"FILE", "--stream", "--from", "--to", "--fps", "--format", "--time-scale"})
+    for (char const* word : {"FILE", "--stream", "--from", "--to", "--fps", "--rate", "--format", "--time-scale"})
         EXPECT_NE(std::string::npos, eval.output.find(word)) << word;
 }

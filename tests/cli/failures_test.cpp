@@ -63,6 +63,8 @@ std::vector<Refusal> Refusals()
          "--fps: leads to times that don't fit fractions of 64 bits"},
         {{"eval", "SAMPLE", "--fps", "1/9223372036854775807", "--to", "2f"},
          "--to: leads to times that don't fit fractions of 64 bits"},
+        {{"eval", "SAMPLE", "--rate", "--euler", "XYZ"},
+         "--rate: tells the rates of a rotation's components, so it can't go with --euler"},
         {{"eval", "SAMPLE", "--rove"}, "--rove: only paths have keys that can float: add --as spatial"},
         {{"eval", "SAMPLE", "--as", "spatial", "--stream", "*/scale"}, NoPosition},
         {{"eval", "SAMPLE"}, "standard output: can't be written: No space left on device", "/dev/full"},
