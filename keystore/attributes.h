@@ -32,7 +32,8 @@
 // Operation 50. KFS_Err_NotSpatial, reported: the stream isn't spatial. A listener's exception becomes the result.
 [[nodiscard]] KFS_API int KFS_SetStreamSParametrize(KFS_Stream* stream, unsigned char on);
 
-// The client's item functions, either may be null, for the stream and its key list. Operation 39.
+// The client's item functions, either may be null, for the stream and its key list. Operation 39. Trap: a stream that is
+// read from a file hands them the file's bytes, or null pointers, see KFS_Stream::IsCustomValuePointer.
 [[nodiscard]] KFS_API int KFS_SetCustomFuncs(KFS_Stream* stream, KFS_CopyItemFunc copyItem,
                                              KFS_DisposeItemFunc disposeItem);
 

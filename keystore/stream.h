@@ -8,6 +8,7 @@
 #include "overrides/expression.h"
 #include "tree/streambase.h"
 
+#include <atomic>
 #include <vector>
 
 class KFS_ParamBag;
@@ -120,8 +121,9 @@ public:
     //
     // Read takes the list that the caller has entered; null stands for the next one at the file's place. It replaces
     // what the stream had. A failed Read leaves a whole stream with some of the file's content. A stream of exactly
-    // this class takes its dimension and value description from the file; one of a derived class keeps its own, and
-    // refuses another dimension with KFS_Err_BadFileInfo.
+    // this class takes its dimension and value description from the file, unless a client's item functions couldn't take
+    // such values (KFS_Err_BadValueDesc); one of a derived class keeps its own, and refuses another dimension with
+    // KFS_Err_BadFileInfo.
     void Read(CKF_File* file, CKF_ChunkInfo const* chunk) override;
     bool ShouldWriteForVersion(CKF_File const* file) const override;
     void Write(CKF_File* file) const override;
@@ -182,6 +184,11 @@ public:
     virtual void GetSeparationFollowers(std::vector<KFS_Stream const*>& followers) const;
     virtual KFS_Stream* GetSeparationFollower(int dimension);
     virtual KFS_Stream const* GetSeparationFollower(int dimension) const;
+    // Whether a custom value is a pointer, or otherwise means nothing outside this run. Such values aren't in files: after
+    // Read a constant has the value that it had before, or its default (InsertDefaultKey) where it had none, and each key
+    // has zero bytes, a null pointer. The class's own Read puts in what it saves itself, once KFS_Stream::Read is through;
+    // its item and interpolation functions must take a null pointer. Of a class that answers false the file's bytes are
+    // the values, and its functions are handed them.
     virtual bool IsCustomValuePointer() const;
     // Runs the expression at the tree's root. 1 means that there is no value.
     [[nodiscard]] virtual int EvaluateExpression(T_Time const* time, double* values, void** customValue,
@@ -330,6 +337,7 @@ private:
     // The stand-in for `original` in a render's copy of its key data.
     explicit KFS_Stream(KFS_Stream const& original, KFS_StreamKeyData const& source);
     void TakeForm(KFS_Stream const& original);
+    unsigned int IndexInLayout(KFS_NamedStreamGroup const* group) const;
     void CopyKeysFrom(KFS_Stream const& source);
     void CopyExpressionFrom(KFS_Stream const& source);
 
@@ -355,6 +363,7 @@ private:
     unsigned int disabledUpdateCount_ = 0;
     unsigned int disabledLegalizeCount_ = 0;
     bool expressionErrorsAreQuiet_ = false;
+    mutable std::atomic<unsigned int> lastIndexInLayout_{0};  // a guess: reads of a separated leader ask each time
 };
 
 // Changes what a value of the stream is; the old description goes to `oldDesc` if that isn't null, and a null `newDesc`

@@ -30,6 +30,7 @@ struct Layout {
     explicit Layout(KFS_Stream const* stream)
         : spatial(stream->IsSpatial()),
           custom(stream->IsCustom()),
+          pointers(custom && stream->IsCustomValuePointer()),
           diskHead(spatial ? KFSp_DiskSpatialHeadSize : KFSp_DiskHeadSize),
           memoryHead(spatial ? KFS_KeySpatialHeadSize : KFS_KeyHeadSize),
           data(KFSp_ValueDataSize(stream))
@@ -38,6 +39,7 @@ struct Layout {
 
     bool spatial;
     bool custom;
+    bool pointers;
     int diskHead;
     int memoryHead;
     int data;
@@ -81,12 +83,14 @@ void CopyHead(bool spatial, From const* from, To* to)
     }
 }
 
+// Pointers are left out both ways: in a file they mean nothing, and who takes one from there hands it to a client.
 void ToDiskRecord(Layout const& layout, void const* key, void* record)
 {
     std::memset(record, 0, static_cast<std::size_t>(layout.DiskSize()));
     CopyHead(layout.spatial, static_cast<KFS_KeyScalar const*>(key), static_cast<KFS_KeyScalarDisk*>(record));
-    std::memcpy(static_cast<char*>(record) + layout.diskHead, static_cast<char const*>(key) + layout.memoryHead,
-                static_cast<std::size_t>(layout.data));
+    if (!layout.pointers)
+        std::memcpy(static_cast<char*>(record) + layout.diskHead, static_cast<char const*>(key) + layout.memoryHead,
+                    static_cast<std::size_t>(layout.data));
     SwapRecord(layout, static_cast<KFS_KeyScalarDisk*>(record));
 }
 
@@ -96,9 +100,11 @@ void FromDiskRecord(Layout const& layout, void const* record, int recordSize, vo
 {
     auto* const memory = static_cast<KFS_KeyScalar*>(key);
     CopyHead(layout.spatial, static_cast<KFS_KeyScalarDisk const*>(record), memory);
-    int const dataSize = std::min(recordSize - layout.diskHead, keySize - layout.memoryHead);
-    std::memcpy(static_cast<char*>(key) + layout.memoryHead, static_cast<char const*>(record) + layout.diskHead,
-                static_cast<std::size_t>(dataSize));
+    if (!layout.pointers) {
+        int const dataSize = std::min(recordSize - layout.diskHead, keySize - layout.memoryHead);
+        std::memcpy(static_cast<char*>(key) + layout.memoryHead, static_cast<char const*>(record) + layout.diskHead,
+                    static_cast<std::size_t>(dataSize));
+    }
     // The layout is the stream's, whatever a file's flag says: were it believed, numbers would pass for an arc table.
     KFSp_ThrowIf(KFSp_SetKeySpatialState(nullptr, layout.spatial ? 1 : 0, 0, key));
 }

@@ -5,6 +5,7 @@
 #include "frame/services/reports.h"
 #include "keystore/cache_private.h"
 #include "keystore/check_private.h"
+#include "keystore/items_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/stream.h"
 #include "keystore/valuedata_private.h"
@@ -83,6 +84,7 @@ public:
           file_(file),
           list_(list),
           isDerived_(typeid(*stream) != typeid(KFS_Stream)),
+          wasConstant_(stream->HasNoKeys()),
           record_(ReadRecord(file, list))
     {}
 
@@ -91,9 +93,11 @@ public:
     void Finish();
 
 private:
+    bool SuitsClientFuncs(KFS_ValueDesc const& desc) const;
     void CheckHeader() const;
     void TakeHeader();
     void TakeDescription();
+    void KeepPointer();
     void ReadValue();
     void ReadConstant();
     void ReadKeys();
@@ -106,9 +110,19 @@ private:
     CKF_File* file_;
     CKF_ChunkInfo const* list_;
     bool isDerived_;
+    bool wasConstant_;
     bool spatialMismatch_ = false;
     KFSp_StreamDiskData record_;
 };
+
+// A client's item functions know one shape of value only.
+bool LeafReader::SuitsClientFuncs(KFS_ValueDesc const& desc) const
+{
+    KFS_CopyItemFunc const copy = stream_->GetCopyItemFunc();
+    if (!stream_->GetDisposeItemFunc() && (!copy || copy == KFSp_FakeCopyItemFunc)) return true;
+    return stream_->IsCustom() == (desc.isCustom != 0) &&
+           (!desc.isCustom || desc.itemSize == stream_->GetValueDesc()->itemSize);
+}
 
 // Refuses what the stream can't become, before it is touched.
 void LeafReader::CheckHeader() const
@@ -123,7 +137,8 @@ void LeafReader::CheckHeader() const
     bool const spatial = (record_.kfsFlags & KFS_StreamFlag_Spatial) != 0;
     KFS_ValueDesc const desc = DescriptionOf(record_);
     bool const knownType = desc.isCustom || static_cast<signed char>(record_.dataType) <= KFS_Type_Double;
-    if (!knownType || !KFSp_KeyItemFits(desc, spatial, record_.dimension)) throw int{KFS_Err_BadValueDesc};
+    if (!knownType || !KFSp_KeyItemFits(desc, spatial, record_.dimension) || !SuitsClientFuncs(desc))
+        throw int{KFS_Err_BadValueDesc};
 }
 
 void LeafReader::TakeHeader()
@@ -169,10 +184,6 @@ void LeafReader::TakeDescription()
 
 void LeafReader::ReadValue()
 {
-    if (stream_->IsCustomValuePointer()) {
-        static_cast<void>(KFSp_ReadLong(file_, list_, KFSp_ValueId));  // the value isn't in the file
-        return;
-    }
     // Read aside, so that the old value is given back once the new one is there.
     int const size = KFSp_ValueDataSize(stream_);
     std::vector<unsigned char> value(static_cast<std::size_t>(size));
@@ -180,13 +191,28 @@ void LeafReader::ReadValue()
     KFSp_ThrowIf(KFSp_ClearCache(stream_));
     std::copy(value.begin(), value.end(), static_cast<unsigned char*>(KFSp_ValueData(stream_->GetCache())));
     KFSp_ThrowIf(KFSp_KeyScalarDataSwap(stream_, stream_->GetCache()));
+    stream_->GetCache()->time = record_.cacheTime;
+}
+
+// The value isn't in the file. A constant keeps the one that it has, and a stream without one takes its default; what a
+// keyed stream's cache record happens to hold is none. The record of a stream that has no default stays empty, since its
+// bytes may once have been a pointer.
+void LeafReader::KeepPointer()
+{
+    static_cast<void>(KFSp_ReadLong(file_, list_, KFSp_ValueId));
+    bool const fileHasValue = record_.cacheTime != KFS_INVALID_INDEX;
+    if (!wasConstant_ || !fileHasValue) KFSp_ThrowIf(KFSp_ClearCache(stream_));
+    if (!fileHasValue) return;
+    unsigned short const flags = stream_->GetCache()->flags;
+    if (KFSp_CacheIsEmpty(stream_->GetCache())) stream_->InsertDefaultKey(T_Time{0, stream_->GetTimeScale()});
+    stream_->GetCache()->flags = flags;
+    if (!KFSp_CacheIsEmpty(stream_->GetCache())) stream_->GetCache()->time = record_.cacheTime;
 }
 
 void LeafReader::ReadConstant()
 {
-    if (!spatialMismatch_) ReadValue();
+    if (!spatialMismatch_) stream_->IsCustomValuePointer() ? KeepPointer() : ReadValue();
     KFS_KeyScalar* const cache = stream_->GetCache();
-    cache->time = record_.cacheTime;
     cache->inInterp = record_.cacheInInterp;
     cache->outInterp = record_.cacheOutInterp;
     if (stream_->IsSpatial()) {

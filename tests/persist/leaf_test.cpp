@@ -544,17 +544,63 @@ TEST_F(Leaves, AllKeysAreStaleHoweverMany)
     EXPECT_EQ(69998.0, (stream.Key(140000, {0.0}), stream.At1(69998)));
 }
 
-// A class whose values own something.
+// A class whose values own something. As pointers they aren't in files, and a null one is nobody's.
 class OwnedLeaf : public KFS_Stream {
 public:
-    OwnedLeaf()
+    explicit OwnedLeaf(bool pointers = false, bool hasDefault = false)
         : KFS_Stream(1, 600, 1, 0, KFS_InterpMask_All, 0,
                      {.isCustom = 1, .itemSize = sizeof(OwnedValues::Ticket), .interpFunc = OwnedValues::Interpolate},
-                     nullptr, nullptr, false)
+                     nullptr, nullptr, false),
+          pointers_(pointers),
+          hasDefault_(hasDefault)
     {
-        EXPECT_EQ(0, KFS_SetCustomFuncs(this, OwnedValues::Copy, OwnedValues::Dispose));
+        EXPECT_EQ(0, KFS_SetCustomFuncs(this, CopyOrNull, DisposeUnlessNull));
     }
+    bool IsCustomValuePointer() const override { return pointers_; }
+    void InsertDefaultKey(T_Time const& time) override
+    {
+        if (hasDefault_) Insert(this, time.value, 7.0);
+    }
+    static void Insert(KFS_Stream* stream, int time, double value)
+    {
+        T_Time const at{time, 600};
+        OwnedValues::Ticket const mine = OwnedValues::Make(value);
+        EXPECT_EQ(0, KFS_InsertKey(stream, &at, 1, &mine, KFS_Interp_Hold, KFS_Interp_Hold));
+        OwnedValues::Free(mine);
+    }
+
+private:
+    static bool IsNull(void const* block)
+    {
+        int number;
+        std::memcpy(&number, block, sizeof number);
+        return number == 0;
+    }
+    static int CopyOrNull(KFS_Stream const* stream, long refcon, short kind, void const* source, void* destination)
+    {
+        if (!IsNull(source)) return OwnedValues::Copy(stream, refcon, kind, source, destination);
+        std::memset(destination, 0, sizeof(OwnedValues::Ticket));
+        return 0;
+    }
+    static int DisposeUnlessNull(KFS_Stream const* stream, long refcon, short kind, void* block)
+    {
+        return IsNull(block) ? 0 : OwnedValues::Dispose(stream, refcon, kind, block);
+    }
+
+    bool pointers_;
+    bool hasDefault_;
 };
+
+// A file's leaf with that custom value: a constant, or two keys.
+std::string OwnedInFile(bool keyed, int number, int constantTime = 0)
+{
+    std::string data(sizeof number, '\0');
+    std::memcpy(data.data(), &number, sizeof number);
+    LeafRecord record;
+    record.Put(56, Short(1)).Put(58, Short(4)).Put(72, Long(static_cast<unsigned>(constantTime)));
+    if (!keyed) return Form(Leaf(record, Atom("cdat", data)));
+    return Form(Leaf(record.Flags(0).HasList(), Keys(12, {KeyHead(0, 1, 1, 0) + data, KeyHead(9, 1, 1, 0) + data})));
+}
 
 // The stream owns what the file brings, and has given back what it had.
 TEST_F(Leaves, WhoseValuesOwnSomething)
@@ -574,6 +620,49 @@ TEST_F(Leaves, WhoseValuesOwnSomething)
             ASSERT_EQ(0, ReadLeaf(stream.get(), Form(leaf)));
             EXPECT_EQ(1, OwnedValues::Live());
             EXPECT_EQ(2.0, OwnedValues::Read(stream.get(), 0));
+        }
+        if (derived) continue;
+        // What the client's functions can't take is refused before the stream is touched.
+        for (LeafRecord const& other : {LeafRecord(), LeafRecord().Put(56, Short(1)).Put(58, Short(1))})
+            EXPECT_EQ(KFS_Err_BadValueDesc, ReadLeaf(stream.get(), Form(Leaf(other, OneValue))));
+        EXPECT_EQ(2.0, OwnedValues::Read(stream.get(), 0));
+    }
+}
+
+// A pointer from a file reaches nobody, and none is made up: what a client is handed it has made, or it is null.
+TEST_F(Leaves, WhosePointersAreNotInFiles)
+{
+    constexpr int FromAnotherRun = 0x41414141;
+    struct {
+        bool wasKeyed, hadValue, hasDefault, keyedFile;
+        int fileTime;
+        double expected;  // the value then, -1 for none
+    } const cases[] = {{false, true, false, false, 5, 1.0},   {false, true, true, false, KFS_INVALID_INDEX, -1.0},
+                       {false, false, false, false, 0, -1.0}, {false, false, true, false, 0, 7.0},
+                       {true, true, false, false, 0, -1.0},   {true, true, true, false, 0, 7.0},
+                       {false, true, true, true, 0, 0.0},     {true, true, true, true, 0, 0.0}};
+    for (auto const& c : cases) {
+        SCOPED_TRACE(testing::Message() << c.wasKeyed << c.hadValue << c.hasDefault << c.keyedFile << c.fileTime);
+        OwnedValues::Scope const owned;
+        OwnedLeaf stream(true, c.hasDefault);
+        OwnedLeaf::Insert(&stream, 0, 1.0);  // a record whose value has been given back keeps its bytes
+        if (c.wasKeyed) {
+            ASSERT_EQ(0, stream.SetConstant(false, true));
+            EXPECT_EQ(1.0, OwnedValues::Read(&stream, 3));
+        } else if (!c.hadValue) {
+            OwnedValues::RemoveKey(&stream, 0);
+        }
+        ASSERT_EQ(0, ReadLeaf(&stream, OwnedInFile(c.keyedFile, FromAnotherRun, c.fileTime)));
+        int const live = OwnedValues::Live();
+        EXPECT_EQ(c.expected > 0 ? 1 : 0, live);
+        EXPECT_EQ(c.expected < 0, stream.HasNoValue());
+        if (c.expected > 0) EXPECT_EQ(c.expected, OwnedValues::Read(&stream, c.fileTime));
+        if (c.keyedFile) {
+            OwnedLeaf::Insert(&stream, 9, 3.0);  // as its class would
+            EXPECT_EQ(3.0, OwnedValues::Read(&stream, 9));
+            MemoryFile const file = Written(&stream);
+            EXPECT_NE(std::string::npos, std::string(file.Bytes().begin(), file.Bytes().end())
+                                             .find(KeyHead(9, KFS_Interp_Hold, KFS_Interp_Hold, 0) + Long(0)));
         }
     }
 }
