@@ -46,6 +46,11 @@ inline double KFS_DefaultNumber(FX_ParamDef const& def)
     }
 }
 
+// The number that the bag of `eval` gives in place of the stream's value, on the heap; `value` stays as it was where none
+// does. An override without a number is 0.0, as in reads. Throws boost::bad_get where it is something else than numbers, and
+// what its value function throws.
+KFS_API void KFS_ExtractOverrideNumber(KFS_Stream const* stream, KFS_EvalData const& eval, double*& value);
+
 // Errors: operations throw the int codes of what they call, and disposal has then happened. A DisposeValue that throws while
 // another exception unwinds ends the process.
 //
@@ -144,8 +149,8 @@ public:
         return GetValueEx({time, flags, bag});
     }
     virtual T GetValueEx(KFS_EvalData const& eval) const = 0;
-    // A value on the heap that an override gives in place of the stream's; the pointer stays as it was without one. A bag's
-    // overrides aren't looked up yet, so that is what happens in all classes of this header.
+    // A value on the heap that an override gives in place of the stream's; the pointer stays as it was without one, and
+    // always in a class that doesn't say how.
     virtual void ExtractCapsuleOverrideValue(T*&, KFS_EvalData const&) const {}
     virtual void DisposeCapsuleOverrideValue(T*& value) const
     {
@@ -197,6 +202,10 @@ public:
     using KFS_FloatBasedStream<Traits>::KFS_FloatBasedStream;
     using KFS_DerivedStream<Traits>::ExtractCapsuleOverrideValue;
 
+    void ExtractCapsuleOverrideValue(double*& value, KFS_EvalData const& eval) const override
+    {
+        KFS_ExtractOverrideNumber(this, eval, value);
+    }
     double GetValueEx(KFS_EvalData const& eval) const override
     {
         double value = 0.0;

@@ -78,13 +78,19 @@ bool AnswersFromFollowers(KFS_Stream const* stream, void const* value)
     return value && stream->GetParent() && !stream->IsCanonical() && stream->AreDimensionsSeparated();
 }
 
+// What stands in a follower's place may be a group, or a leaf that has no room for its value there.
+bool IsFollower(KFS_Stream const* leaf)
+{
+    return leaf && leaf->GetDimension() == 1;
+}
+
 // The buffer is taken as doubles, whatever the data type. A dimension without a follower keeps what is there.
 int ReadFollowers(Reading const& reading, double* value)
 {
     T_Time const at{reading.time, reading.seen->GetTimeScale()};
     for (int d = 0; d < reading.seen->GetDimension(); ++d) {
         KFS_Stream const* const follower = reading.stream->GetSeparationFollower(d);
-        if (!follower || follower->GetDimension() != 1) continue;  // a leaf of another kind stands there
+        if (!IsFollower(follower)) continue;
         int const code = KFS_GetValueFPlus(follower, &at, reading.flags, value + d, nullptr, reading.bag);
         if (code != 0) return code;
     }
@@ -195,10 +201,9 @@ int ReadSamples(KFS_Stream const* stream, T_Time time, T_Time const* step, int c
         if (!separated) error.Keep(KFS_GetValueFPlus(stream, &time, flags, values, nullptr, nullptr));
         for (int d = 0; separated && d < dimension && error.None(); ++d) {
             values[d] = 0.0;
-            if (static_cast<std::size_t>(d) < followers.size()) {
-                error.Keep(KFS_GetValueFPlus(followers[static_cast<std::size_t>(d)], &time, flags, values + d, nullptr,
-                                             nullptr));
-            }
+            auto const place = static_cast<std::size_t>(d);
+            if (place < followers.size() && IsFollower(followers[place]))
+                error.Keep(KFS_GetValueFPlus(followers[place], &time, flags, values + d, nullptr, nullptr));
         }
         if (error.None() && sample + 1 < count) error.Keep(KFS_AddTime(step, &time, 0, &time));
         if (!error.None()) return error.Code();

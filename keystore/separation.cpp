@@ -21,13 +21,6 @@ KFS_Stream* LeafAt(KFS_NamedStreamGroup* group, unsigned int index)
     return child ? child->GetAsLeaf() : nullptr;
 }
 
-KFS_Stream* FindFollower(KFS_Stream const* leader, int dimension)
-{
-    KFS_NamedStreamGroup* const group = GroupOf(leader);
-    if (!group) return nullptr;
-    return LeafAt(group, static_cast<unsigned int>(dimension) + group->GetIndexInUILayout(leader->GetMatchName()) + 1);
-}
-
 template <class Stream>
 void FindFollowers(KFS_Stream const* leader, std::vector<Stream*>& followers)
 {
@@ -71,6 +64,14 @@ bool KFS_Stream::IsSeparationLeader() const
 bool KFS_Stream::IsSeparationFollower() const
 {
     return false;
+}
+
+unsigned int KFS_Stream::IndexInLayout(KFS_NamedStreamGroup const* group) const
+{
+    unsigned int const guess = lastIndexInLayout_.load(std::memory_order_relaxed);
+    unsigned int const index = group->GetIndexInUILayout(GetMatchName(), guess);
+    if (index != guess) lastIndexInLayout_.store(index, std::memory_order_relaxed);
+    return index;
 }
 
 int KFS_Stream::GetSeparationDimension() const
@@ -118,14 +119,15 @@ KFS_Stream* KFS_Stream::GetSeparationFollower(int dimension)
 
 KFS_Stream const* KFS_Stream::GetSeparationFollower(int dimension) const
 {
-    return FindFollower(this, dimension);
+    KFS_NamedStreamGroup* const group = GroupOf(this);
+    return group ? LeafAt(group, IndexInLayout(group) + static_cast<unsigned int>(dimension) + 1) : nullptr;
 }
 
 // ---- followers
 
 KFS_SeparationFollowerStream::KFS_SeparationFollowerStream(KFS_MatchName const& name, unsigned int timeScale,
                                                            KFS_StreamFactory* factory)
-    : KFS_FloatStream(1, timeScale, 0, 0, 0xFFFF, KFS_InterpMask_Linear, DoubleDesc(), &name, factory, false)
+    : KFS_FloatStream(1, timeScale, 1, 0, 0xFFFF, KFS_InterpMask_Linear, DoubleDesc(), &name, factory, false)
 {}
 
 KFS_SeparationFollowerStream::KFS_SeparationFollowerStream(KFS_Stream const& leader, int dimension,

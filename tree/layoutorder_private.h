@@ -19,6 +19,10 @@ public:
     std::vector<unsigned int> const& Subgroups() const { return subgroups_; }
     unsigned int SlotOf(unsigned int position) const { return slotOf_[position]; }
     unsigned int PositionOf(unsigned int slot) const { return positionOf_[slot]; }
+    bool IsAt(unsigned int position, KFS_MatchName const& name) const
+    {
+        return position < slotOf_.size() && names_[slotOf_[position]] == name;
+    }
     // The slot of a name, or None.
     unsigned int Find(KFS_MatchName const& name) const;
 

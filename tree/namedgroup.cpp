@@ -88,6 +88,11 @@ unsigned int KFS_NamedStreamGroup::GetNumStreams() const
 
 KFS_StreamBase* KFS_NamedStreamGroup::GetEditableStream(unsigned int index)
 {
+    // Reads of separated dimensions come this way, and what is real needs no look-up.
+    if (IsComplete() && index < streams_.size()) [[likely]] {
+        KFS_StreamBase* const child = streams_[layoutOrder_->SlotOf(index)];
+        if (!child->IsCanonical()) return child;
+    }
     return GetEditableStream(NameAt(index, GetNumStreams()));
 }
 

@@ -148,6 +148,11 @@ unsigned int KFS_StreamGroup::GetIndexInUILayout(KFS_MatchName const& name) cons
     KFSp_FailVerification("match name isn't in UI layout");
 }
 
+unsigned int KFS_StreamGroup::GetIndexInUILayout(KFS_MatchName const& name, unsigned int guess) const
+{
+    return layoutOrder_ && layoutOrder_->IsAt(guess, name) ? guess : GetIndexInUILayout(name);
+}
+
 std::optional<unsigned int> KFS_StreamGroup::FindPosition(KFS_MatchName const& name) const
 {
     unsigned int const slot = layoutOrder_ ? layoutOrder_->Find(name) : KFSp_LayoutOrder::None;

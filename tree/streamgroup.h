@@ -85,6 +85,8 @@ public:
 
     // The display position of a kind of child.
     unsigned int GetIndexInUILayout(KFS_MatchName const& name) const;
+    // The same for who asks again: no search where the guess is right.
+    unsigned int GetIndexInUILayout(KFS_MatchName const& name, unsigned int guess) const;
     // The layout of the group type of that name; empty if the factory knows no such group.
     boost::shared_ptr<KFS_CanonicalLayout> GetCanonicalLayout(KFS_MatchName const& name) const;
 

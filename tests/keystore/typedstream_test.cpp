@@ -1,6 +1,9 @@
 #include "keystore/paramstreams.h"
 #include "keystore/separation.h"
+#include "overrides/parambag.h"
 #include "tests/support/groups.h"
+
+#include <boost/make_shared.hpp>
 
 #include <cmath>
 #include <limits>
@@ -193,6 +196,22 @@ TEST_F(TypedStream, GivesEachValueBackOnceWhateverFails)
     } const rows[] = {
         {"is modified",
          [](Tokens& s, Tokens&, T_Time const&, T_Time const&) { EXPECT_TRUE(s.IsStaticValueModified()); }},
+        {"validated",
+         [](Tokens& s, Tokens&, T_Time const& t, T_Time const&) {
+             Tokens keyed(false);
+             keyed.failAt = s.failAt;
+             keyed.ValidateCacheAtTime(t);
+         }},
+        {"override",
+         [](Tokens& s, Tokens&, T_Time const& t, T_Time const&) {
+             void* value = new Token(s.GetValue(t, 0));
+             static_cast<KFS_Stream&>(s).ExtractCapsuleOverrideValue(value, {t, 0, nullptr});
+             EXPECT_NE(nullptr, value) << "it stays as it was";
+             for (int times : {1, 2}) {
+                 static_cast<KFS_Stream&>(s).DisposeCapsuleOverrideValue(value);
+                 EXPECT_EQ(nullptr, value) << times;
+             }
+         }},
         {"default key", [](Tokens& s, Tokens&, T_Time const& t, T_Time const&) { s.InsertDefaultKey(t); }},
         {"copied default", [](Tokens& s, Tokens& o, T_Time const& t, T_Time const&) { o.CopyDefaultKey(t, &s); }},
         {"forced", [](Tokens& s, Tokens&, T_Time const& t, T_Time const&) { s.ForceInterpolateAtTime(t); }},
@@ -226,6 +245,29 @@ TEST_F(TypedStream, GivesEachValueBackOnceWhateverFails)
     stream.CopyDefaultKey(a, nullptr);
     stream.CopyDefaultKey(a, &unrelated);
     EXPECT_TRUE(Tokens::alive.empty());
+}
+
+TEST_F(TypedStream, TakesNumbersOfABag)
+{
+    Described const stream;
+    KFS_ParamBag bag;
+    double own = 1.0;
+    auto const extracted = [&](KFS_ParamBag const* from) {
+        void* value = &own;
+        stream.ExtractCapsuleOverrideValue(value, {{3, 1}, 0, from});
+        return static_cast<double*>(value);
+    };
+    EXPECT_EQ(&own, extracted(nullptr));
+    EXPECT_EQ(&own, extracted(&bag));
+    for (std::vector<double> const& numbers : {std::vector<double>{2.5, 9.0}, std::vector<double>{}}) {
+        bag.AddOverride(&stream, boost::make_shared<KFS_StreamOverride>(&stream, KFS_OverrideValue(numbers), false));
+        double* value = extracted(&bag);
+        ASSERT_NE(&own, value);
+        EXPECT_EQ(numbers.empty() ? 0.0 : 2.5, *value);
+        stream.DisposeCapsuleOverrideValue(value);
+    }
+    bag.AddOverride(&stream, boost::make_shared<KFS_StreamOverride>(&stream, KFS_OverrideValue(u16str(3, 'a')), false));
+    EXPECT_THROW(extracted(&bag), boost::bad_get);
 }
 
 // ---- values in the parameter record
@@ -278,6 +320,7 @@ protected:
             auto& stream = dynamic_cast<Stream&>(*made);
             EXPECT_EQ(kind, stream.GetParamDef().paramType);
             EXPECT_EQ(KFS_BaseFlag_Active, stream.GetStreamBaseFlags());
+            EXPECT_EQ(KFS_StreamFlag_NoKeys, stream.GetKFSFlags());
             EXPECT_FALSE(stream.CanBeAnimated());
             EXPECT_EQ(standard, stream.GetValue({0, 1}, 0));
             EXPECT_FALSE(stream.IsModified());
@@ -368,7 +411,7 @@ protected:
             };
         };
         kinds.Leaf("a", 1, 0.0);
-        kinds.Leaf("b", 1, 0.0);
+        kinds.Leaf("b", 2, 0.0);
         batch.Register(Name("P"), position(3), false);
         batch.Register(Name("Q"), position(2), false);
         kinds.Named("G", {Name("a"), Name("P"), Name("Q"), Name("b")});
@@ -395,6 +438,7 @@ TEST_F(Separation, FollowersStandBehindTheirLeader)
 
     KFS_Stream const* const canonical = Get_VX_StreamFactory()->GetCanonicalStream(Name("P_1"))->GetAsLeaf();
     EXPECT_TRUE(canonical->IsHidden() && canonical->IsActive() && canonical->IsSeparationFollower());
+    EXPECT_TRUE(canonical->HasNoKeys() && canonical->GetInterpMask() == 0xFFFF && canonical->GetSpInterpMask() == 1);
     EXPECT_EQ(nullptr, canonical->GetSeparationLeader());
     EXPECT_EQ(u"Y P", std::u16string(canonical->GetDisplayName().begin(), canonical->GetDisplayName().end()));
 
@@ -405,7 +449,11 @@ TEST_F(Separation, FollowersStandBehindTheirLeader)
         EXPECT_FALSE(follower->IsCanonical());
         EXPECT_EQ(leader, follower->GetSeparationLeader());
         EXPECT_EQ(d, follower->GetSeparationDimension());
-        EXPECT_EQ(d + 1.0, follower->GetDefaultVector4()[0]);
+        EXPECT_EQ((M_Vector4T<double>{{d + 1.0, 0.0, 0.0, 0.0}}), follower->GetDefaultVector4());
+        EXPECT_EQ((M_Vector4T<double>{}), follower->GetVector4({0, 1}, 0)) << "it began before it had a leader";
+        EXPECT_EQ(leader->GetEnglishDimensionName(static_cast<short>(d)) + Q_AsciiToUTF16String(" ") +
+                      leader->GetEnglishDisplayName(),
+                  follower->GetEnglishDisplayName());
         EXPECT_EQ(leader->GetUnitsName(), follower->GetUnitsName());
         KFS_StreamIDPath path;
         path.AddTail(Name("P"));
@@ -413,7 +461,7 @@ TEST_F(Separation, FollowersStandBehindTheirLeader)
         EXPECT_EQ(follower, root->FindStream(found));
         EXPECT_FALSE(root->AreLeafDimensionsSeparated(path));
     }
-    std::vector<KFS_Stream*> followers;
+    std::vector<KFS_Stream*> followers{leader};
     Leaf("Q")->GetSeparationFollowers(followers);
     ASSERT_EQ(2u, followers.size());
     EXPECT_EQ("Q_1", NameOf(followers[1]));
@@ -428,7 +476,7 @@ TEST_F(Separation, FollowersStandBehindTheirLeader)
 
 TEST_F(Separation, ALeaderThatIsSeparatedAnswersFromItsFollowers)
 {
-    KFS_Stream* const leader = Leaf("P");
+    KFS_Stream* leader = Leaf("P");
     ASSERT_EQ(0, leader->SetConstant(false, false));
     for (int time : {0, 600}) {
         T_Time const at{time, 600};
@@ -454,6 +502,18 @@ TEST_F(Separation, ALeaderThatIsSeparatedAnswersFromItsFollowers)
     ASSERT_EQ(0, KFS_GetValuesFPlus(leader, &start, &step, 3, 0, &many));
     EXPECT_EQ(21.0, reinterpret_cast<double*>(*many)[8]);
     Q_FreeHandle(many);
+
+    // Another property in a follower's place: it has no room for a vector, and a group has no value.
+    leader = Leaf("Q");
+    leader->SetDimension(3);
+    leader->SetDimensionsSeparated(true);
+    double wide[4] = {-1.0, -1.0, -1.0, -1.0};
+    EXPECT_EQ(0, KFS_GetValueFPlus(leader, &half, 0, wide, nullptr, nullptr));
+    EXPECT_EQ(-1.0, wide[2]);
+    ASSERT_EQ(0, KFS_GetValuesFPlus(leader, &start, &step, 1, 0, &many));
+    EXPECT_EQ(0.0, reinterpret_cast<double*>(*many)[2]);
+    Q_FreeHandle(many);
+    leader->SetDimension(2);
 }
 
 // A kind that is registered again finds its followers' names free.
