@@ -7,12 +7,23 @@ find_package(rapidcheck REQUIRED)
 include(GoogleTest)
 
 add_library(kfs_test_base STATIC tests/support/places.cpp)
-target_compile_definitions(kfs_test_base PRIVATE
-    "KFS_TEST_DATA=\"${KFS_TEST_DATA}\"" "KFS_TEST_SOURCE=\"${PROJECT_SOURCE_DIR}\"")
+# For that file alone: precompiled headers that were made with a definition are refused without it.
+set(placeDefinitions "KFS_TEST_DATA=\"${KFS_TEST_DATA}\"" "KFS_TEST_SOURCE=\"${PROJECT_SOURCE_DIR}\"")
 if(TARGET kfs_cli)
-    target_compile_definitions(kfs_test_base PRIVATE "KFS_TEST_COMMAND=\"$<TARGET_FILE:kfs_cli>\"")
+    list(APPEND placeDefinitions "KFS_TEST_COMMAND=\"$<TARGET_FILE:kfs_cli>\"")
 endif()
+set_source_files_properties(tests/support/places.cpp PROPERTIES COMPILE_DEFINITIONS "${placeDefinitions}")
 target_compile_features(kfs_test_base PUBLIC cxx_std_20)
+target_compile_options(kfs_test_base PUBLIC ${KFS_LIGHT_OPTIONS})
+# All tests take its precompiled headers, so it is compiled as they are, which are programs.
+set_target_properties(kfs_test_base PROPERTIES POSITION_INDEPENDENT_CODE OFF)
+target_compile_options(kfs_test_base PRIVATE -fPIE)
+kfs_precompile(kfs_test_base <gtest/gtest.h> <cmath> <random>)
+function(kfs_precompile_test target)
+    if(KFS_PRECOMPILE)
+        target_precompile_headers(${target} REUSE_FROM kfs_test_base)
+    endif()
+endfunction()
 target_include_directories(kfs_test_base PUBLIC "${PROJECT_SOURCE_DIR}")
 target_link_libraries(kfs_test_base PUBLIC GTest::gtest_main GTest::gtest rapidcheck)
 
@@ -24,6 +35,7 @@ function(kfs_add_test_folder name)
     set(target "test_${name}")
     add_executable(${target} ${sources})
     target_link_libraries(${target} PRIVATE kfs_test_base)
+    kfs_precompile_test(${target})
     if(NOT name STREQUAL "services" AND TARGET kfs_host)
         target_link_libraries(${target} PRIVATE kfs_host)
     endif()
@@ -59,6 +71,7 @@ list(JOIN shortcutSources "|" shortcutObjects)
 add_executable(test_foreign tests/foreign/list.cpp tests/foreign/services_test.cpp host/session.cpp host/kinds.cpp host/names.cpp
     "$<FILTER:$<TARGET_OBJECTS:kfs_objects>,EXCLUDE,/(${shortcutObjects})\\.o>" $<TARGET_OBJECTS:kfs_foreign_objects>)
 target_link_libraries(test_foreign PRIVATE kfs_test_base kfs_services Boost::thread Threads::Threads ${CMAKE_DL_LIBS})
+kfs_precompile_test(test_foreign)
 gtest_discover_tests(test_foreign DISCOVERY_MODE PRE_TEST DISCOVERY_TIMEOUT 120 TEST_PREFIX "foreign."
     PROPERTIES LABELS foreign TIMEOUT 600)
 
