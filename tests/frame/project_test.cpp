@@ -65,12 +65,17 @@ TEST_F(Projects, DetectingErrorsAndSuspensionsNest)
     EXPECT_FALSE(render.GetAutoDecanonicalizeIsSuspended());
 }
 
-// A bag that holds entries without streams, to see contents come and go.
+// A bag with entries for streams of these names, to see contents come and go.
 class FilledBag : public KFS_ParamBag {
 public:
-    explicit FilledBag(std::initializer_list<unsigned short> names)
+    explicit FilledBag(std::initializer_list<char const*> names)
     {
-        for (unsigned short const name : names) overrides_[u16str(1, name)] = nullptr;
+        for (char const* const name : names) {
+            TestStream const stream;  // a canonical instance is known by its name
+            stream->SetMatchName(KFS_MatchName(name, false));
+            stream->SetCanonical(true);
+            AddOverride(stream, nullptr);
+        }
     }
 };
 
@@ -80,11 +85,11 @@ TEST_F(Projects, CapsuleBagsAreReplacedAndMergedForAScope)
     EXPECT_EQ(0u, overrides.GetCapsuleParamBag()->GetOverrideCount());
     {
         Q_ScSetReset<KFS_ParamBag> first;
-        overrides.SetScopedCapsuleParamBag(first, FilledBag{'a', 'b'});
+        overrides.SetScopedCapsuleParamBag(first, FilledBag{"a", "b"});
         EXPECT_EQ(2u, overrides.GetCapsuleParamBag()->GetOverrideCount());
         {
             Q_ScSetReset<KFS_ParamBag> second;
-            overrides.MergeInScopedCapsuleParamBag(second, FilledBag{'b', 'c'});
+            overrides.MergeInScopedCapsuleParamBag(second, FilledBag{"b", "c"});
             EXPECT_EQ(3u, overrides.GetCapsuleParamBag()->GetOverrideCount());
         }
         EXPECT_EQ(2u, overrides.GetCapsuleParamBag()->GetOverrideCount());
