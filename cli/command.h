@@ -31,3 +31,5 @@ extern Command const SaveAsCommand;
 extern Command const DragCommand;
 extern Command const DumpCommand;
 extern Command const DiffCommand;
+extern Command const SeparateCommand;
+extern Command const JoinCommand;

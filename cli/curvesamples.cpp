@@ -19,10 +19,10 @@ namespace {
 // it takes what the quaternion stands for, of length 1, as all that is shown of one.
 class Sampler {
 public:
-    Sampler(kfshost::StreamItem const& item, std::vector<std::size_t> const& components, TimeSpan const& part,
+    Sampler(KFS_Stream const& stream, bool isRotation, std::vector<std::size_t> const& components, TimeSpan const& part,
             double pointsPerSecond)
-        : stream_(*item.stream),
-          isRotation_(kfshost::IsRotation(item)),
+        : stream_(stream),
+          isRotation_(isRotation),
           components_(components),
           scale_(stream_.GetTimeScale()),
           first_(part.first.ToUnits(scale_)),
@@ -156,10 +156,25 @@ private:
     StreamCurves curves_;
 };
 
+// Each component by the keys of its own stream.
+StreamCurves SampleSeparated(KFS_Stream const& leader, std::vector<std::size_t> const& components, TimeSpan const& part,
+                             double pointsPerSecond)
+{
+    std::vector<KFS_Stream const*> const followers = kfshost::MoversOf(leader);
+    StreamCurves curves;
+    for (std::size_t c = 0; c < components.size(); ++c) {
+        StreamCurves one = Sampler(*followers[components[c]], false, {0}, part, pointsPerSecond).Run();
+        curves.components.push_back(std::move(one.components.front()));
+        for (Handle const& handle : one.handles) curves.handles.push_back({c, handle.key, handle.end});
+    }
+    return curves;
+}
+
 }  // namespace
 
 StreamCurves SampleCurves(kfshost::StreamItem const& item, std::vector<std::size_t> const& components,
                           TimeSpan const& part, double pointsPerSecond)
 {
-    return Sampler(item, components, part, pointsPerSecond).Run();
+    if (kfshost::IsSeparated(*item.stream)) return SampleSeparated(*item.stream, components, part, pointsPerSecond);
+    return Sampler(*item.stream, kfshost::IsRotation(item), components, part, pointsPerSecond).Run();
 }

@@ -25,7 +25,10 @@ std::string Shape(StreamItem const& item)
 {
     KFS_Stream const& stream = *item.stream;
     std::string const form = stream.IsSpatial() ? "path" : "curves";
-    return fmt::format("{} of {}", form, fmt::join(item.components, " ")) + (stream.HasNoKeys() ? ", constant" : "");
+    return fmt::format("{} of {}", form, fmt::join(item.components, " ")) + (kfshost::IsSeparated(stream)
+                                                                                 ? ", separated"
+                                                                             : stream.HasNoKeys() ? ", constant"
+                                                                                                  : "");
 }
 
 // A key without its time.
@@ -125,6 +128,7 @@ std::string Keys(KFS_Stream const& stream)
 std::string FirstDifference(StreamItem const& before, StreamItem const& after)
 {
     std::string text = Against(Shape(before), Shape(after));
+    if (text.empty() && kfshost::IsSeparated(*before.stream)) return "";  // the components are told by themselves
     if (text.empty()) text = Against(Keys(*before.stream), Keys(*after.stream));
     if (text.empty() && before.stream->HasNoKeys())
         text = Against(ConstantText(*before.stream), ConstantText(*after.stream));

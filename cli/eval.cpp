@@ -92,7 +92,7 @@ public:
 
     StreamItem const& Item() const { return *item_; }
     std::vector<std::string> const& Components() const { return components_; }
-    bool HasKeys() const { return kfshost::KeyCount(*item_->stream) != 0; }
+    bool HasKeys() const { return kfshost::HasKeys(*item_->stream); }
     bool AreRates() const { return rates_.has_value(); }
 
     // Valid until the next call.

@@ -2,12 +2,15 @@
 #include "cli/options.h"
 #include "cli/output.h"
 #include "cli/table.h"
+#include "frame/services/strings.h"
+#include "host/channelstream.h"
 #include "host/framegrid.h"
 #include "host/paths.h"
 #include "host/timescale.h"
 
 #include <fmt/format.h>
 
+#include <algorithm>
 #include <iterator>
 
 using kfshost::Rational;
@@ -48,7 +51,8 @@ std::string FramesText(std::vector<StreamItem const*> const& items)
 std::string Summary(kfshost::Scene const& scene, std::vector<StreamItem const*> const& items)
 {
     std::size_t keys = 0;
-    for (StreamItem const* item : items) keys += static_cast<std::size_t>(kfshost::KeyCount(*item->stream));
+    for (StreamItem const* item : items)
+        keys += static_cast<std::size_t>(std::max(kfshost::KeyCount(*item->stream), 0));
     std::string text =
         fmt::format("{}: {}, {}", scene.name, Plural(items.size(), "stream", "streams"), Plural(keys, "key", "keys"));
     if (auto const span = SpanOf(items))
@@ -60,7 +64,7 @@ std::string Summary(kfshost::Scene const& scene, std::vector<StreamItem const*> 
 std::string Interpolation(StreamItem const& item)
 {
     std::string const name(NameOf(item.interpolation));
-    if (!item.stream->IsSpatial()) return name;
+    if (!item.stream->IsSpatial() || kfshost::IsSeparated(*item.stream)) return name;
     std::size_t const floating = kfshost::FloatKeyCount(*item.stream);
     return name + (floating == 0 ? " path" : fmt::format(" path, {}", Plural(floating, "float key", "float keys")));
 }
@@ -73,6 +77,55 @@ std::string Joined(std::vector<std::string> const& names)
     return names.size() > mostNames ? text + " ..." : text;
 }
 
+std::string UnitsOf(KFS_Stream const& stream)
+{
+    std::string const name = Q_UTF16ToMBString(stream.GetUnitsName());
+    return name.empty() ? "-" : name;
+}
+
+// What an editor offers; a file may have values beyond.
+std::string LimitsOf(KFS_Stream const& stream)
+{
+    if (!stream.HasMinValue() && !stream.HasMaxValue()) return "-";
+    return (stream.HasMinValue() ? fmt::format("{} ", stream.GetMinValue()) : "") + "to" +
+           (stream.HasMaxValue() ? fmt::format(" {}", stream.GetMaxValue()) : "");
+}
+
+std::string DefaultOf(KFS_Stream const& stream)
+{
+    std::vector<std::string> numbers;
+    if (auto const* const channel = dynamic_cast<kfshost::ChannelStream const*>(&stream))
+        for (double const number : channel->GetDefaultValue()) numbers.push_back(fmt::format("{}", number));
+    else
+        numbers.push_back(fmt::format("{}", stream.GetDefaultVector4()[0]));
+    return Joined(numbers);
+}
+
+// Whether each component has a stream of its own.
+std::string SeparationOf(StreamItem const& item)
+{
+    if (kfshost::IsFollower(item)) return "dimension";
+    if (kfshost::IsSeparated(*item.stream)) return "yes";
+    return item.stream->IsSeparationLeader() ? "no" : "-";
+}
+
+std::vector<std::string> RowOf(StreamItem const& item)
+{
+    auto const span = SpanOf({&item});
+    return {item.path,
+            std::string(NameOf(item.kind)),
+            std::to_string(item.stream->GetDimension()),
+            Joined(item.components),
+            UnitsOf(*item.stream),
+            LimitsOf(*item.stream),
+            DefaultOf(*item.stream),
+            SeparationOf(item),
+            item.stream->HasNoKeys() ? "-" : std::to_string(kfshost::KeyCount(*item.stream)),
+            span ? SecondsText(span->first) : "-",
+            span ? SecondsText(span->last) : "-",
+            Interpolation(item)};
+}
+
 int Run(Selection const& selection)
 {
     kfshost::Scene const scene = LoadScene(selection);
@@ -81,17 +134,15 @@ int Run(Selection const& selection)
                  {"kind", Align::Left},
                  {"dimension", Align::Right},
                  {"components", Align::Left},
+                 {"units", Align::Left},
+                 {"limits", Align::Left},
+                 {"default", Align::Left},
+                 {"separated", Align::Left},
                  {"keys", Align::Right},
                  {"first", Align::Right},
                  {"last", Align::Right},
                  {"interpolation", Align::Left}});
-    for (StreamItem const* item : items) {
-        int const keys = kfshost::KeyCount(*item->stream);
-        table.AddRow({item->path, std::string(NameOf(item->kind)), std::to_string(item->stream->GetDimension()),
-                      Joined(item->components), std::to_string(keys),
-                      keys == 0 ? "-" : SecondsText(kfshost::KeyTime(*item->stream, 0)),
-                      keys == 0 ? "-" : SecondsText(kfshost::KeyTime(*item->stream, keys - 1)), Interpolation(*item)});
-    }
+    for (StreamItem const* item : items) table.AddRow(RowOf(*item));
     WriteToStandardOutput(Summary(scene, items) + '\n' + table.ToText());
     return ExitDone;
 }
@@ -100,10 +151,14 @@ Work Prepare(CLI::App& command)
 {
     auto const selection = std::make_shared<Selection>();
     AddSelection(command, *selection);
+    command.footer(
+        "Limits are what an editor offers; values of a file may lie beyond. Separated: whether each component has a\n"
+        "stream of its own, which is listed below it; - where it can't have.");
     return [selection] { return Run(*selection); };
 }
 
 }  // namespace
 
-Command const InfoCommand{"Look into files", "info", "List what is animated: streams, keys, span, interpolation",
+Command const InfoCommand{"Look into files", "info",
+                          "List what is animated: streams, their units, limits and defaults, keys, span, interpolation",
                           Prepare};

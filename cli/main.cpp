@@ -9,8 +9,8 @@
 
 namespace {
 
-constexpr Command const* Commands[] = {&InfoCommand,   &EvalCommand, &DiffCommand,   &PlotCommand,
-                                       &ImportCommand, &DragCommand, &SaveAsCommand, &DumpCommand};
+constexpr Command const* Commands[] = {&InfoCommand, &EvalCommand,   &DiffCommand,     &PlotCommand, &ImportCommand,
+                                       &DragCommand, &SaveAsCommand, &SeparateCommand, &JoinCommand, &DumpCommand};
 
 // One line as for any other error, with a hint. What stands where a command should is told by its name.
 std::string TellUsageError(CLI::App const* app, CLI::Error const& error)

@@ -1,6 +1,7 @@
 #include "cli/selection.h"
 
 #include "cli/errors.h"
+#include "host/dimensions.h"
 #include "host/import.h"
 #include "host/paths.h"
 #include "host/projectfile.h"
@@ -23,6 +24,13 @@ bool Matches(StreamItem const& item, Selection const& selection)
 
 void HoldAsPath(StreamItem& item, Selection const& selection)
 {
+    if (kfshost::IsSeparated(*item.stream)) {  // a path has no use for dimensions of their own
+        try {
+            item.stream = kfshost::JoinedCopy(*item.stream);
+        } catch (kfshost::DimensionsError const& error) {
+            throw UserError(selection.file + ": " + item.path, error.what());
+        }
+    }
     if (kfshost::KeyCount(*item.stream) > kfshost::MaxPathKeys) {
         throw UserError(selection.file + ": " + item.path,
                         fmt::format("has more than {} keys, too many for a path", kfshost::MaxPathKeys));
@@ -99,10 +107,13 @@ std::optional<TimeSpan> SpanOf(std::vector<StreamItem const*> const& items)
 {
     std::optional<TimeSpan> span;
     for (StreamItem const* item : items) {
-        int const keys = kfshost::KeyCount(*item->stream);
-        if (keys == 0) continue;
-        TimeSpan const own{kfshost::KeyTime(*item->stream, 0), kfshost::KeyTime(*item->stream, keys - 1)};
-        span = span ? TimeSpan{std::min(span->first, own.first), std::max(span->last, own.last)} : own;
+        for (KFS_Stream const* stream : kfshost::MoversOf(*item->stream)) {
+            int const keys = kfshost::KeyCount(*stream);
+            bool const isStill = keys < 0 && kfshost::IsSeparated(*item->stream);
+            if (keys == 0 || isStill) continue;
+            TimeSpan const own{kfshost::KeyTime(*stream, 0), kfshost::KeyTime(*stream, keys - 1)};
+            span = span ? TimeSpan{std::min(span->first, own.first), std::max(span->last, own.last)} : own;
+        }
     }
     return span;
 }

@@ -84,7 +84,8 @@ std::string_view ColorOf(StreamItem const& item, std::size_t component)
 {
     char const letter = item.components[component].front();
     std::size_t const axis = std::string_view("XYZ").find(letter);
-    return Colors[axis == std::string_view::npos ? component % Colors.size() : axis];
+    std::size_t const place = IsFollower(item) ? static_cast<std::size_t>(item.component) : component;
+    return Colors[axis == std::string_view::npos ? place % Colors.size() : axis];
 }
 
 // What is drawn of one stream.
@@ -191,7 +192,9 @@ private:
         Panel const valuePanel({Left, top + TitleHeight, Right - Left, HeightOf(values, ValueHeight)}, time, values);
         valuePanel.DrawFrame(svg_, std::string(NameOf(item.kind)) + (isAngle ? " in degrees, " : ", ") +
                                        std::string(NameOf(item.interpolation)) +
-                                       (item.stream->IsSpatial() ? " along a path" : ""));
+                                       (kfshost::IsSeparated(*item.stream) ? ", separated"
+                                        : item.stream->IsSpatial()         ? " along a path"
+                                                                           : ""));
         DrawCurves(valuePanel, drawn, curves, &ComponentCurve::value);
         DrawKeys(valuePanel, drawn, curves, spacing);
         double const legendBottom = DrawLegend(drawn, curves, valuePanel);
@@ -388,7 +391,7 @@ std::vector<StreamItem const*> StreamsToDraw(DrawingOptions const& options, kfsh
     std::string const& file = options.selection.file;
     auto items = SelectStreams(scene, options.selection);
     std::erase_if(items, [pathsOnly](StreamItem const* item) {
-        return kfshost::KeyCount(*item->stream) == 0 || (pathsOnly && !item->stream->IsSpatial());
+        return !kfshost::HasKeys(*item->stream) || !SpanOf({item}) || (pathsOnly && !item->stream->IsSpatial());
     });
     if (items.empty()) throw UserError(file, "the chosen streams have no keys to draw");
     std::erase_if(items, [&options](StreamItem const* item) {

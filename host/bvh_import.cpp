@@ -93,16 +93,16 @@ private:
         item.path = paths_.Make(PathOf(item));
         item.components = channels.names;
         try {
-            item.stream = BuildStream(item.path, channels);
+            item.stream = BuildStream(channels);
         } catch (StoreError const& error) {
             throw ImportError(place, error.what());
         }
         scene_.streams.push_back(std::move(item));
     }
 
-    std::unique_ptr<KFS_Stream> BuildStream(std::string const& path, ChannelSet const& channels) const
+    std::unique_ptr<KFS_Stream> BuildStream(ChannelSet const& channels) const
     {
-        StreamBuilder builder(static_cast<int>(channels.columns.size()), scene_.timeScale, path);
+        StreamBuilder builder(channels.kind, static_cast<int>(channels.columns.size()), scene_.timeScale);
         std::vector<double> value(channels.columns.size());
         for (std::size_t frame = 0; frame < motion_.frames; ++frame) {
             double const* const row = motion_.numbers.data() + frame * motion_.channelCount;

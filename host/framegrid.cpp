@@ -28,10 +28,12 @@ std::vector<KeyTimes> CollectTimes(std::vector<StreamItem const*> const& items)
         unsigned int const scale = item->stream->GetTimeScale();
         auto times = std::ranges::find(all, scale, &KeyTimes::scale);
         if (times == all.end()) times = all.insert(all.end(), KeyTimes{scale, {}});
-        for (int i = 0; i < KeyCount(*item->stream); ++i) {
-            T_Time time{};
-            ThrowIfFailed(KFS_IndexToTime(item->stream.get(), i, &time));
-            times->units.insert(times->units.end(), time.value);
+        for (KFS_Stream const* stream : MoversOf(*item->stream)) {
+            for (int i = 0; i < KeyCount(*stream); ++i) {
+                T_Time time{};
+                ThrowIfFailed(KFS_IndexToTime(stream, i, &time));
+                times->units.insert(times->units.end(), time.value);
+            }
         }
     }
     return all;

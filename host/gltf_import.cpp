@@ -226,7 +226,7 @@ private:
         // A spline is the curve of the numbers as they stand: with another sign it would be another curve.
         if (isRotation && !isSpline) AlignSigns(values.numbers);
         try {
-            StreamBuilder builder(static_cast<int>(values.dimension), scene_.timeScale, channel.item.path);
+            StreamBuilder builder(channel.item.kind, static_cast<int>(values.dimension), scene_.timeScale);
             if (isRotation && channel.item.interpolation == SourceInterpolation::Linear && arcTolerance_ > 0.0)
                 AppendArcs(builder, times, values);
             else

@@ -2,9 +2,8 @@
 
 #include "frame/frame.h"
 #include "frame/services/strings.h"
+#include "host/channelstream.h"
 #include "host/names.h"
-#include "host/storeerror.h"
-#include "keystore/edit.h"
 
 #include <utility>
 
@@ -26,42 +25,6 @@ KFS_MatchName const& NameOfNodes()
 {
     static KFS_MatchName const name("KFS Node", true);
     return name;
-}
-
-// A leaf that nothing moves stands at this value. Where a file gives a stream another dimension it has that one.
-struct LeafKind {
-    StreamKind kind;
-    char const* matchName;
-    short dimension;
-    std::array<double, 4> value;
-};
-
-constexpr LeafKind LeafKinds[] = {
-    {StreamKind::Translation, "KFS Translation", 3, {}},
-    {StreamKind::Rotation, "KFS Rotation", 4, {0.0, 0.0, 0.0, 1.0}},
-    {StreamKind::Scale, "KFS Scale", 3, {1.0, 1.0, 1.0}},
-    {StreamKind::Weights, "KFS Weights", 1, {}},
-    {StreamKind::Angles, "KFS Angles", 3, {}},
-};
-static_assert(std::size(LeafKinds) == std::size(AllStreamKinds));
-
-KFS_MatchName MatchNameOf(StreamKind kind)
-{
-    return {LeafKinds[static_cast<std::size_t>(kind)].matchName, true};
-}
-
-// A plain KFS_Stream, so that it takes its dimension from the file.
-KFS_StreamBase* MakeLeaf(LeafKind const& kind, KFS_MatchName const& name, KFS_StreamFactory* factory, bool constant,
-                         unsigned int timeScale, bool canonical)
-{
-    KFS_ValueDesc description;
-    description.dataType = KFS_Type_Double;
-    auto leaf = std::make_unique<KFS_Stream>(kind.dimension, timeScale, constant, false, KFS_InterpMask_All, 0,
-                                             description, &name, factory, canonical);
-    leaf->pSetDisplayName(Q_AsciiToUTF16String(kind.matchName));
-    T_Time const start{0, timeScale};
-    if (int const code = KFS_InsertKeyF(leaf.get(), &start, 1, kind.value.data(), 0, 0)) throw int{code};
-    return leaf.release();
 }
 
 // Appends a new group of a kind, which a tree doesn't take before it is in it.
@@ -116,11 +79,23 @@ KFS_Stream const* NodeGroup::FindChannel(StreamKind kind) const
     return leaf ? leaf->GetAsLeaf() : nullptr;
 }
 
+KFS_Stream const* NodeGroup::FindFollower(StreamKind kind, int dimension) const
+{
+    if (kind != StreamKind::Translation || dimension < 0 || dimension >= UsualDimension(kind)) return nullptr;
+    KFS_StreamBase const* const leaf = GetEditableStreamNullOK(FollowerNameOf(kind, dimension));
+    return leaf ? leaf->GetAsLeaf() : nullptr;
+}
+
 void NodeGroup::PutChannel(StreamKind kind, std::unique_ptr<KFS_Stream> stream)
 {
-    stream->SetMatchName(MatchNameOf(kind));
-    Q_ScAutoPtr<KFS_StreamBase> incoming(stream.release());
+    Q_ScAutoPtr<KFS_StreamBase> incoming(AsChannel(kind, std::move(stream)).release());
     SwapStream(&incoming);
+}
+
+void NodeGroup::PutFollower(std::unique_ptr<KFS_Stream> follower)
+{
+    Q_ScAutoPtr<KFS_StreamBase> incoming(follower.release());
+    Q_ScAutoPtr<KFS_StreamBase> const replaced(SwapStream(&incoming));
 }
 
 std::unique_ptr<KFS_Stream> NodeGroup::TakeChannel(StreamKind kind)
@@ -200,11 +175,14 @@ std::string DisplayNameOf(KFS_StreamBase const& node)
 // Children before the groups whose layouts name them.
 SceneKinds::SceneKinds() : batch_(Get_VX_StreamFactory())
 {
-    for (LeafKind const& kind : LeafKinds) {
+    for (StreamKind const kind : AllStreamKinds) {
         batch_.Register(
-            MatchNameOf(kind.kind),
-            [&kind](KFS_MatchName const& name, KFS_StreamFactory* factory, bool constant, unsigned int timeScale,
-                    bool canonical) { return MakeLeaf(kind, name, factory, constant, timeScale, canonical); },
+            MatchNameOf(kind),
+            [kind](KFS_MatchName const&, KFS_StreamFactory* factory, bool constant, unsigned int timeScale,
+                   bool canonical) -> KFS_StreamBase* {
+                return new ChannelStream(kind, UsualDimension(kind), timeScale, StreamForm::Curves, constant, factory,
+                                         canonical);
+            },
             false);
     }
     batch_.Register(NameOfNodes(), MakeGroup<NodeGroup>, false);

@@ -14,7 +14,9 @@
 //
 //   SceneGroup       animations, any number
 //   AnimationGroup   nodes, any number
-//   NodeGroup        one leaf for each StreamKind; canonical while the animation doesn't move it
+//   NodeGroup        one leaf for each StreamKind, and behind the translation its three followers, each moving one
+//                    component while the translation's dimensions are separated; canonical while the animation doesn't
+//                    move it
 //
 // Names of animations and nodes are display names: they need not differ.
 
@@ -36,12 +38,20 @@ public:
     KFS_StreamBase* CloneStream(KFS_CloneStreamParams const& params) const override;
     void FillCanonicalLayout(KFS_CanonicalLayout* layout) override;
     void FillInDisplayName() const override;
+    // A leaf comes in the form that the file has: as many components, a path or not. Leaves of files from before kinds had
+    // records have no range for editors, and take their kind's.
+    void ReadAndStore(KFS_MatchName const& name, CKF_File* file, CKF_ChunkInfo const* chunk) override;
 
     // The leaf that an animation moves; null while it is canonical.
     KFS_Stream const* FindChannel(StreamKind kind) const;
+    // The leaf that moves one component where dimensions are separated; null while it is canonical, and for kinds that
+    // aren't leaders.
+    KFS_Stream const* FindFollower(StreamKind kind, int dimension) const;
     // Puts a leaf into the slot of its kind, which must be free. The node has to be in its scene already, since a leaf
-    // takes the scale of the tree that it comes into.
+    // takes the scale of the tree that it comes into. A stream of no kind becomes one of this kind.
     void PutChannel(StreamKind kind, std::unique_ptr<KFS_Stream> stream);
+    // Puts a follower that was taken out of another node into its slot.
+    void PutFollower(std::unique_ptr<KFS_Stream> follower);
     // Makes the slot canonical again; null if it was.
     std::unique_ptr<KFS_Stream> TakeChannel(StreamKind kind);
 

@@ -93,7 +93,7 @@ bool IsPosition(StreamItem const& item)
 std::unique_ptr<KFS_Stream> MakePath(StreamItem const& item)
 {
     KFS_Stream const& source = *item.stream;
-    StreamBuilder builder(source.GetDimension(), source.GetTimeScale(), item.path, StreamForm::Path);
+    StreamBuilder builder(item.kind, source.GetDimension(), source.GetTimeScale(), StreamForm::Path);
     SourceKey key(item.components.size());
     Box box;
     constexpr double third = 1.0 / 3.0;

@@ -132,10 +132,21 @@ std::string FaultOf(KFS_Stream const& stream, unsigned int timeScale)
     if (stream.IsSpatial() && (stream.GetDimension() < 2 || stream.GetDimension() > 3))
         return "is a path in " + std::to_string(stream.GetDimension()) + " dimensions";
     if (stream.GetTimeScale() != timeScale) return "isn't in the times of its scene";
+    if (stream.AreDimensionsSeparated() && !stream.IsSeparationLeader()) return "is separated, which it can't be";
     // A reader makes a constant of a stream that may not move, and needs its first key's value for that.
     if (stream.HasKeys() && stream.GetKeyCount() == 0 && !stream.CanBeAnimated())
         return "may not move, and has no value to stand at";
     return FaultOfKeys(stream);
+}
+
+// The same of a channel and its followers, whether or not they count at the moment.
+std::string FaultOf(Channel const& channel, unsigned int timeScale)
+{
+    std::string fault = FaultOf(StreamOf(channel), timeScale);
+    for (int d = 0; d < StreamOf(channel).GetDimension() && fault.empty(); ++d)
+        if (KFS_Stream const* const follower = channel.node.FindFollower(channel.kind, d))
+            fault = FaultOf(*follower, timeScale);
+    return fault;
 }
 
 // What is known of a channel, and the usual names for the components of one that an edit has made and nobody described.
@@ -145,6 +156,13 @@ ChannelFacts DescriptionOf(Channel const& channel)
     auto const dimension = static_cast<std::size_t>(StreamOf(channel).GetDimension());
     if (facts.components.size() != dimension) facts.components = UsualComponents(channel.kind, dimension);
     return facts;
+}
+
+// A read of a separated stream makes its followers real where they aren't, which reads in other threads mustn't.
+void MakeFollowersReal(KFS_Stream const& stream)
+{
+    std::vector<KFS_Stream const*> followers;
+    if (stream.AreDimensionsSeparated()) stream.GetSeparationFollowers(followers);
 }
 
 // ---- writing
@@ -184,7 +202,7 @@ void CheckTree(SceneGroup const& tree, std::string const& fileName)
     ForEachChannel(
         tree,
         [&](Channel const& channel) {
-            if (std::string const fault = FaultOf(StreamOf(channel), tree.times.scale); !fault.empty())
+            if (std::string const fault = FaultOf(channel, tree.times.scale); !fault.empty())
                 throw ProjectError(fileName, "can't be saved: " + Sentence(channel, fault));
         });
 }
@@ -307,7 +325,8 @@ private:
     {
         KFS_Stream const& stream = StreamOf(channel);
         try {
-            if (std::string const fault = FaultOf(stream, tree_->times.scale); !fault.empty()) FailIn(channel, fault);
+            if (std::string const fault = FaultOf(channel, tree_->times.scale); !fault.empty()) FailIn(channel, fault);
+            MakeFollowersReal(stream);
             channel.node.SetFacts(channel.kind, ReadFacts(channel, static_cast<std::size_t>(stream.GetDimension())));
         } catch (int code) {
             Fail(code);
@@ -376,6 +395,16 @@ private:
     std::unordered_map<std::string, std::size_t> leaves_;
 };
 
+// A stream as its holder's own. One that has a place in a tree leaves it.
+std::unique_ptr<KFS_Stream> TakeOut(StreamPtr stream)
+{
+    bool const isOwner = stream.get_deleter().isOwner;
+    KFS_Stream* const taken = stream.release();
+    if (isOwner) return std::unique_ptr<KFS_Stream>(taken);
+    KFS_StreamBase* const left = taken->GetParent()->GetAsNamedGroup()->SwapCanonicalForStream(taken->GetMatchName());
+    return std::unique_ptr<KFS_Stream>(left->GetAsLeaf());
+}
+
 }  // namespace
 
 std::unique_ptr<SceneGroup> MakeTree(Scene scene)
@@ -384,11 +413,16 @@ std::unique_ptr<SceneGroup> MakeTree(Scene scene)
     tree->SetDisplayName(Q_MBToUTF16String(scene.name));
     tree->times = {scene.timeScale, scene.exactTimes, scene.worstTimeError};
     std::optional<AnimationBuilder> animation;
+    NodeGroup* node = nullptr;
     for (StreamItem& item : scene.streams) {
+        if (IsFollower(item)) {  // behind its leader
+            if (node) node->PutFollower(TakeOut(std::move(item.stream)));
+            continue;
+        }
         if (!animation || animation->Name() != item.animation) animation.emplace(*tree, item.animation);
-        NodeGroup& node = animation->NodeFor(item);
-        node.PutChannel(item.kind, std::move(item.stream));
-        node.SetFacts(item.kind, {item.interpolation, std::move(item.components)});
+        node = &animation->NodeFor(item);
+        node->PutChannel(item.kind, TakeOut(std::move(item.stream)));
+        node->SetFacts(item.kind, {item.interpolation, std::move(item.components)});
     }
     return tree;
 }
@@ -403,17 +437,27 @@ Scene TakeScene(std::unique_ptr<SceneGroup> tree)
     UniqueNames paths;
     ForEachChannel(*tree, [&](Channel const& channel) {
         ChannelFacts const facts = DescriptionOf(channel);
-        StreamItem item;
-        item.animation = DisplayNameOf(channel.animation);
-        item.node = DisplayNameOf(channel.node);
-        item.kind = channel.kind;
-        item.path = paths.Make(PathOf(item));
-        item.place = item.path;
-        item.interpolation = facts.interpolation;
-        item.components = facts.components;
-        item.stream = channel.node.TakeChannel(channel.kind);
-        scene.streams.push_back(std::move(item));
+        auto const add = [&](KFS_Stream const* stream, int component) {
+            StreamItem item;
+            item.animation = DisplayNameOf(channel.animation);
+            item.node = DisplayNameOf(channel.node);
+            item.kind = channel.kind;
+            item.interpolation = facts.interpolation;
+            item.component = component;
+            item.components = facts.components;
+            if (IsFollower(item)) item.components = {facts.components[static_cast<std::size_t>(component)]};
+            item.path = paths.Make(PathOf(item));
+            item.place = item.path;
+            item.stream = StreamPtr(const_cast<KFS_Stream*>(stream), StreamDeleter(false));
+            scene.streams.push_back(std::move(item));
+        };
+        KFS_Stream const& stream = StreamOf(channel);
+        add(&stream, StreamItem::WholeValue);
+        if (!IsSeparated(stream)) return;
+        int component = 0;
+        for (KFS_Stream const* const follower : MoversOf(stream)) add(follower, component++);
     });
+    scene.tree = std::move(tree);
     return scene;
 }
 

@@ -26,8 +26,8 @@ public:
 // other in the way that importers list them.
 std::unique_ptr<SceneGroup> MakeTree(Scene scene);
 
-// The reverse: the streams leave the tree, which is of no use afterwards. Items come in the tree's order, with the
-// paths that they had.
+// The reverse. The streams stay in the tree, which becomes the scene's. Items come in the tree's order, with the paths that
+// they had.
 Scene TakeScene(std::unique_ptr<SceneGroup> tree);
 
 // Replaces the file by a complete new one or leaves it as it is. The hook is for tests, and may be null. Throws

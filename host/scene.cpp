@@ -5,6 +5,8 @@
 #include "keystore/evaluate.h"
 #include "keystore/lookup.h"
 
+#include <algorithm>
+
 namespace kfshost {
 
 std::string_view NameOf(StreamKind kind)
@@ -41,7 +43,32 @@ std::vector<std::string> UsualComponents(StreamKind kind, std::size_t dimension)
 
 std::string PathOf(StreamItem const& item)
 {
-    return item.animation + '/' + item.node + '/' + std::string(NameOf(item.kind));
+    std::string const path = item.animation + '/' + item.node + '/' + std::string(NameOf(item.kind));
+    return IsFollower(item) ? path + '/' + item.components.front() : path;
+}
+
+bool IsFollower(StreamItem const& item)
+{
+    return item.component != StreamItem::WholeValue;
+}
+
+bool IsSeparated(KFS_Stream const& stream)
+{
+    return stream.GetParent() && stream.AreDimensionsSeparated();
+}
+
+std::vector<KFS_Stream const*> MoversOf(KFS_Stream const& stream)
+{
+    if (!IsSeparated(stream)) return {&stream};
+    std::vector<KFS_Stream const*> followers;
+    stream.GetSeparationFollowers(followers);
+    return followers;
+}
+
+bool HasKeys(KFS_Stream const& stream)
+{
+    return std::ranges::any_of(
+        MoversOf(stream), [](KFS_Stream const* mover) { return KeyCount(*mover) != 0; });
 }
 
 int KeyCount(KFS_Stream const& stream)

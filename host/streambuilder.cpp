@@ -29,10 +29,24 @@ std::unique_ptr<KFS_Stream> MakeStream(int dimension, unsigned int timeScale, st
     }
 }
 
+std::unique_ptr<KFS_Stream> MakeChannel(StreamKind kind, int dimension, unsigned int timeScale, StreamForm form)
+{
+    try {
+        return std::make_unique<ChannelStream>(kind, static_cast<short>(dimension), timeScale, form, false,
+                                               Get_VX_StreamFactory(), false);
+    } catch (int code) {
+        throw StoreError(code);
+    }
+}
+
 }  // namespace
 
 StreamBuilder::StreamBuilder(int dimension, unsigned int timeScale, std::string const& name, StreamForm form)
     : stream_(MakeStream(dimension, timeScale, name, form))
+{}
+
+StreamBuilder::StreamBuilder(StreamKind kind, int dimension, unsigned int timeScale, StreamForm form)
+    : stream_(MakeChannel(kind, dimension, timeScale, form))
 {}
 
 // The value is in the external form, which is doubles here as well: KFS_InsertKey saves the detour of its double form.

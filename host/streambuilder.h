@@ -1,6 +1,6 @@
 #pragma once
 
-#include "keystore/stream.h"
+#include "host/channelstream.h"
 
 #include <memory>
 #include <span>
@@ -17,14 +17,13 @@ struct KeyHandles {
     double const* outInfluence;
 };
 
-// What a stream's keys describe: a curve for each component, or a route with one speed graph for all of them.
-enum class StreamForm { Curves, Path };
-
 // Makes one stream of doubles, key after key. All of it throws StoreError.
 class StreamBuilder {
 public:
     // `dimension` is 1 to MaxDimension; 2 or 3 for a path.
     StreamBuilder(int dimension, unsigned int timeScale, std::string const& name, StreamForm form = StreamForm::Curves);
+    // A leaf of a scene, as its kind describes it.
+    StreamBuilder(StreamKind kind, int dimension, unsigned int timeScale, StreamForm form = StreamForm::Curves);
 
     // A key's record, five doubles a component behind a head, has to fit the 15 bits of a list item's size.
     static constexpr int MaxDimension = 818;

@@ -33,16 +33,21 @@ TEST(Kfs, InfoListsWhatIsAnimated)
     Outcome const outcome = RunKfs({"info", Sample});
     EXPECT_EQ(0, outcome.code);
     EXPECT_EQ("", outcome.errors);
-    EXPECT_EQ("bouncing_ball: 3 streams, 20 keys, 0 s to 2.5 s\n"
-              "times in 1/120000 s: every key time of the file is one of these, to 2 units in the last place of its "
-              "float\n"
-              "all keys are on frames of 24 a second\n"
-              "\n"
-              "stream                   kind         dimension  components  keys  first         last  interpolation\n"
-              "bounce/ball/translation  translation          3  x y z          6      0          2.5  spline\n"
-              "bounce/ball/rotation     rotation             4  x y z w        5      0          2.5  linear\n"
-              "bounce/ball/scale        scale                3  x y z          9      0  2.333 (7/3)  step\n",
-              outcome.output);
+    EXPECT_EQ(
+        "bouncing_ball: 3 streams, 20 keys, 0 s to 2.5 s\n"
+        "times in 1/120000 s: every key time of the file is one of these, to 2 units in the last place of its "
+        "float\n"
+        "all keys are on frames of 24 a second\n"
+        "\n"
+        "stream                   kind         dimension  components  units  limits   default  separated  keys  "
+        "first         last  interpolation\n"
+        "bounce/ball/translation  translation          3  x y z       -      -        0 0 0    no            6      "
+        "0          2.5  spline\n"
+        "bounce/ball/rotation     rotation             4  x y z w     -      -1 to 1  0 0 0 1  -             5      "
+        "0          2.5  linear\n"
+        "bounce/ball/scale        scale                3  x y z       -      -        1 1 1    -             9      "
+        "0  2.333 (7/3)  step\n",
+        outcome.output);
 }
 
 TEST(Kfs, InfoSaysHowFarKeysAreRounded)

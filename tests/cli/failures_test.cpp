@@ -54,6 +54,18 @@ std::vector<Refusal> Refusals()
          "standard output: can't be written: No space left on device (@/project was saved)",
          "/dev/full"},
 
+        {{"separate", "SAMPLE", "-o", "@/x.svg"}, "--stream is required" + help},
+        {{"separate", "SAMPLE", "--stream", "*", "-o", "@/x.svg"},
+         "SAMPLE: bounce/ball/rotation: isn't of a kind whose dimensions can be separated"},
+        {{"separate", "@/apart", "--stream", "*/translation", "-o", "@/x.svg"},
+         "@/apart: bounce/ball/translation: is separated already"},
+        {{"separate", "@/still.bvh", "--stream", "*", "-o", "@/x.svg"},
+         "@/still.bvh: motion/a/translation: has neither keys nor a value"},
+        {{"join", "@/project", "--stream", "*/translation", "-o", "@/x.svg"},
+         "@/project: bounce/ball/translation: isn't separated"},
+        {{"join", "@/apart", "--stream", "*/translation/y", "-o", "@/x.svg"},
+         "@/apart: bounce/ball/translation/y: is one dimension of a stream, not the whole"},
+
         {{"eval", "SAMPLE", "--from", "soon"},
          "--from: \"soon\" isn't a time: seconds like 0.5 or 1/24, or frames like 12f"},
         {{"eval", "SAMPLE", "--from", "2", "--to", "1"}, "--to: 1 s is before --from, 2 s"},
@@ -137,11 +149,13 @@ TEST(KfsFailures, AreOneLineAndCodeTwoAndChangeNothing)
     ScratchFolder const folder;
     std::string const project = RunKfs({"import", Sample, "-o", "-"}).output;
     std::vector<Refusal> refusals = Refusals();
-    std::map<std::string, std::string> files{{"project", project},
-                                             {"copy.gltf", FileContent(Sample)},
-                                             {"old.svg", "an earlier drawing"},
-                                             {"still.bvh", Motion({})},
-                                             {"giant.bvh", Motion({"1e308 0 0", "-1e308 0 0"})}};
+    std::map<std::string, std::string> files{
+        {"project", project},
+        {"apart", RunKfs({"separate", Sample, "--stream", "*/translation", "-o", "-"}).output},
+        {"copy.gltf", FileContent(Sample)},
+        {"old.svg", "an earlier drawing"},
+        {"still.bvh", Motion({})},
+        {"giant.bvh", Motion({"1e308 0 0", "-1e308 0 0"})}};
     for (BadFile const& bad : BadFiles) {
         std::string const file = std::string("@/") + bad.name;
         files[bad.name] = bad.bytes;

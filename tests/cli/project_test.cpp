@@ -116,6 +116,70 @@ TEST_F(KfsProject, TheSamplesBytesAndTheirDumpAreTheGoldenOnes)
     EXPECT_EQ(FileContent(golden + ".txt"), RunKfs({"dump", golden + ".project"}).output);
 }
 
+// Projects from before the leaves of scenes had classes and records of their own.
+TEST_F(KfsProject, AnEarlierProjectAnswersAsEverAndIsSavedAsOneOfToday)
+{
+    std::string const earlier = kfstest::SourceFolder() / "tests/cli/golden/bouncing_ball_without_records.project";
+    Outcome const same = RunKfs({"diff", earlier, Sample});
+    EXPECT_EQ(0, same.code) << same.output << same.errors;
+    for (std::string const format : {"csv", "table"}) {
+        std::vector<std::string> const eval{"eval", "--raw", "--fps", "30", "--format", format};
+        auto const of = [&](std::string const& file) {
+            std::vector<std::string> words = eval;
+            words.push_back(file);
+            return RunKfs(words);
+        };
+        EXPECT_EQ(of(Sample).output, of(earlier).output);
+        EXPECT_EQ("", of(earlier).errors);
+    }
+    Outcome const saved = RunKfs({"save-as", earlier, "-o", "-"});
+    EXPECT_TRUE(FileContent(project_) == saved.output) << saved.errors;
+}
+
+// There and back: the keys are those that were, and in between all commands see the same motion.
+TEST_F(KfsProject, SeparatesAndJoins)
+{
+    std::string const golden = kfstest::SourceFolder() / "tests/cli/golden/bouncing_ball_separated";
+    std::string const apart = folder_.Path("apart");
+    Outcome const separated =
+        RunKfs({"separate", project_, "--stream", "*/translation", "-o", apart, "--tolerance", "0"});
+    EXPECT_EQ("0 " + apart + ": 1 stream separated\n", std::to_string(separated.code) + ' ' + separated.output);
+    EXPECT_EQ("", separated.errors);
+    EXPECT_TRUE(FileContent(golden + ".project") == FileContent(apart));
+    EXPECT_EQ(FileContent(golden + ".txt"), RunKfs({"dump", apart}).output);
+    EXPECT_TRUE(FileContent(apart) == RunKfs({"save-as", apart, "-o", "-"}).output);
+
+    for (std::vector<std::string> command : {std::vector<std::string>{"eval", "--fps", "30"},
+                                             {"eval", "--format", "csv"},
+                                             {"eval", "--as", "spatial"},
+                                             {"eval", "--as", "spatial", "--rove"}}) {
+        command.insert(command.end(), {"--stream", "*/translation", project_});
+        Outcome const whole = RunKfs(command);
+        command.back() = apart;
+        EXPECT_EQ(whole.output, RunKfs(command).output);
+    }
+    std::string const y = RunKfs({"eval", apart, "--stream", "*/y", "--to", "1/24", "--format", "csv"}).output;
+    EXPECT_TRUE(y.starts_with("frame,seconds,bounce/ball/translation/y.y\n0,0,1.2262500524520874\n")) << y;
+    std::string const svg = RunKfs({"plot", apart, "--stream", "*/translation", "-o", "-"}).output;
+    EXPECT_EQ(6U, Count(svg, "<polyline"));
+    EXPECT_EQ(0, RunKfs({"plot", apart, "--motion", "-o", "-"}).code);
+    EXPECT_EQ("~ bounce/ball/translation: curves of x y z | curves of x y z, separated\n"
+              "+ bounce/ball/translation/x\n+ bounce/ball/translation/y\n+ bounce/ball/translation/z\n",
+              RunKfs({"diff", project_, apart}).output);
+    EXPECT_EQ(0, RunKfs({"diff", apart, apart}).code);
+    std::string const info = RunKfs({"info", apart, "--stream", "*/translation*"}).output;
+    for (char const* const row :
+         {"translation          3  x y z       -      -       0 0 0    yes           -      0   2.5  spline\n",
+          "translation          1  y           -      -       0        dimension     6      0   2.5  spline\n"})
+        EXPECT_NE(std::string::npos, info.find(row)) << info;
+
+    std::string const together = folder_.Path("together");
+    Outcome const joined = RunKfs({"join", apart, "--stream", "*/translation*", "-o", together});
+    EXPECT_EQ("0 " + together + ": 1 stream joined\n", std::to_string(joined.code) + ' ' + joined.output);
+    EXPECT_EQ("", joined.errors);
+    EXPECT_EQ("", RunKfs({"diff", project_, together}).output);
+}
+
 TEST_F(KfsProject, AnswersLikeTheFileThatItWasImportedFrom)
 {
     std::vector<std::vector<std::string>> const commands{{"info"},

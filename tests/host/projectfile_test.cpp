@@ -183,7 +183,8 @@ TEST_F(ProjectFile, KeepsNamesAndShapes)
     });
 }
 
-// What nothing moves isn't in the tree's file: a node shows it with the kind's default value.
+// What nothing moves isn't in the tree's file: a node shows it with the kind's default value. Followers stand behind their
+// leader.
 TEST_F(ProjectFile, WhatIsNotAnimatedStaysCanonical)
 {
     auto const tree = kfshost::MakeTree(SmallScene());
@@ -192,9 +193,9 @@ TEST_F(ProjectFile, WhatIsNotAnimatedStaysCanonical)
     std::vector<bool> canonical;
     for (unsigned int i = 0; i < node->GetAsGroup()->GetNumStreams(); ++i)
         canonical.push_back(node->GetAsGroup()->GetStream(i)->IsCanonical());
-    EXPECT_EQ((std::vector<bool>{false, true, true, false, true}), canonical);
-    EXPECT_EQ(1.0, ReadOne(*node->GetAsGroup()->GetStream(1u)->GetAsLeaf(), kfshost::Rational(0, 1), 3));
-    EXPECT_EQ(1.0, ReadOne(*node->GetAsGroup()->GetStream(2u)->GetAsLeaf(), kfshost::Rational(0, 1), 2));
+    EXPECT_EQ((std::vector<bool>{false, true, true, true, true, true, false, true}), canonical);
+    EXPECT_EQ(1.0, ReadOne(*node->GetAsGroup()->GetStream(4u)->GetAsLeaf(), kfshost::Rational(0, 1), 3));
+    EXPECT_EQ(1.0, ReadOne(*node->GetAsGroup()->GetStream(5u)->GetAsLeaf(), kfshost::Rational(0, 1), 2));
 }
 
 // A saved project with one thing replaced, and the version that it says it has.

@@ -1,3 +1,4 @@
+#include "host/dimensions.h"
 #include "host/paths.h"
 #include "host/session.h"
 #include "keystore/attributes.h"
@@ -51,7 +52,7 @@ std::unique_ptr<KFS_Stream> EndlessPath()
     return path;
 }
 
-constexpr unsigned int ScaleSlot = 2;
+constexpr unsigned int ScaleSlot = 5;
 
 Edit const Edits[] = {
     {"a leaf that nobody described", [](NodeGroup& node, KFS_Stream&) { node.GetEditableStream(ScaleSlot); }},
@@ -79,6 +80,17 @@ Edit const Edits[] = {
      "saved: can't be saved: walk/ball/translation has a key without a finite value"},
     {"another scale", [](NodeGroup&, KFS_Stream& stream) { EXPECT_EQ(0, KFS_RescaleStream(&stream, 600)); },
      "saved: can't be saved: walk/ball/translation isn't in the times of its scene"},
+    {"separated dimensions",
+     [](NodeGroup&, KFS_Stream& stream) { EXPECT_FALSE(kfshost::SeparateDimensions(stream).IsOff()); }},
+    {"a dimension that isn't finite",
+     [](NodeGroup&, KFS_Stream& stream) {
+         kfshost::SeparateDimensions(stream);
+         SetNumbers(*stream.GetSeparationFollower(2), 0, std::numeric_limits<double>::quiet_NaN());
+     },
+     "saved: can't be saved: walk/ball/translation has a key without a finite value"},
+    {"a separated scale",
+     [](NodeGroup& node, KFS_Stream&) { node.GetEditableStream(ScaleSlot)->SetDimensionsSeparated(true); },
+     "saved: can't be saved: walk/ball/scale is separated, which it can't be"},
     {"nothing to stand at",
      [](NodeGroup&, KFS_Stream& stream) {
          RemoveKeys(stream);

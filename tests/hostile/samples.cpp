@@ -2,6 +2,7 @@
 
 #include "frame/services/chunkfile.h"
 #include "fuzz/treekinds.h"
+#include "host/dimensions.h"
 #include "host/paths.h"
 #include "keystore/edit.h"
 #include "overrides/streamexpression.h"
@@ -86,6 +87,20 @@ std::string WithOldExpression()
     std::string bytes = WithExpression();
     bytes.replace(bytes.find("Utf8"), 4, "expr");
     return bytes;
+}
+
+// Each component with keys of its own.
+std::string Separated()
+{
+    std::vector<StreamItem> items;
+    items.push_back(Item("ball", StreamKind::Translation, 3, 2, KFS_Interp_Spline));
+    return Saved(std::move(items), [](kfshost::SceneGroup& tree) {
+        KFS_StreamGroup& node = *tree.GetEditableStream(0U)->GetAsGroup()->GetEditableStream(0U)->GetAsGroup();
+        KFS_Stream& leader = *node.GetEditableStream(0U)->GetAsLeaf();
+        kfshost::SeparateDimensions(leader);
+        T_Time const at{5, 24};
+        static_cast<void>(KFS_InsertKeyF(leader.GetSeparationFollower(1), &at, 0, nullptr, 0, 0));
+    });
 }
 
 std::string WithManyNodes()
@@ -185,6 +200,7 @@ std::vector<Sample> ProjectSamples()
             {"path", SavedOne(Path(3, false))},
             {"float_keys", SavedOne(Path(5, true))},
             {"constant", Constant()},
+            {"separated", Separated()},
             {"expression", WithExpression()},
             {"expression_71", OfVersion(71, WithOldExpression())},
             {"many_nodes", WithManyNodes()},
