@@ -107,6 +107,8 @@ void FindTarget(Options const& options, Drag& drag)
 
 void CheckForm(Options const& options, StreamItem const& item)
 {
+    if (kfshost::IsSeparated(*item.stream))
+        throw UserError(item.path, "is separated, so one of its dimensions can be dragged, and not the whole");
     bool const isFlat = item.stream->IsSpatial() && item.stream->GetDimension() == 2;
     if (options.path && !isFlat) throw UserError("--path", item.path + " isn't held as a path in two dimensions");
     if (options.path && !options.component.empty())

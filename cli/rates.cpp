@@ -61,10 +61,12 @@ Range RatesInSight(std::vector<Point> const& graph)
     return {-PeakInSight(graph, -1.0), PeakInSight(graph, 1.0)};
 }
 
+// A stream with separated dimensions has the rates of those.
 void ReadRate(KFS_Stream const& stream, int time, double* rate)
 {
     T_Time const at{time, stream.GetTimeScale()};
-    ThrowIfFailed(KFS_GetDeriv(&stream, &at, KFS_Deriv_Velocity, 0, 0, rate, nullptr, nullptr, {}, {}));
+    for (KFS_Stream const* mover : kfshost::MoversOf(stream))
+        ThrowIfFailed(KFS_GetDeriv(mover, &at, KFS_Deriv_Velocity, 0, 0, rate++, nullptr, nullptr, {}, {}));
 }
 
 void ReadRateInto(KFS_Stream const& stream, int index, double* rate)
@@ -85,7 +87,7 @@ std::vector<double> const& Rates::At(int time)
 {
     T_Time const at{time, stream_.GetTimeScale()};
     ReadRate(stream_, time, rate_.data());
-    if (stream_.IsSpatial()) {
+    if (stream_.IsSpatial() && !kfshost::IsSeparated(stream_)) {
         std::vector<double> way(rate_.size());
         ThrowIfFailed(KFS_GetSpaceTangent(&stream_, &at, 0, 0, way.data(), nullptr, nullptr));
         GoAlong(way);

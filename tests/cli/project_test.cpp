@@ -150,7 +150,7 @@ TEST_F(KfsProject, SeparatesAndJoins)
     EXPECT_TRUE(FileContent(apart) == RunKfs({"save-as", apart, "-o", "-"}).output);
 
     for (std::vector<std::string> command : {std::vector<std::string>{"eval", "--fps", "30"},
-                                             {"eval", "--format", "csv"},
+                                             {"eval", "--rate", "--format", "csv"},
                                              {"eval", "--as", "spatial"},
                                              {"eval", "--as", "spatial", "--rove"}}) {
         command.insert(command.end(), {"--stream", "*/translation", project_});
