@@ -79,23 +79,28 @@ std::vector<float> RandomNumbers(unsigned int seed, std::size_t count)
 
 }  // namespace
 
+// At keys and beyond, whatever lies between; and everywhere where nothing moves.
 TEST_F(Paths, AgreeWithThePlainReadingAtKeysAndBeyond)
 {
-    for (char const* interpolation : {"STEP", "LINEAR", "CUBICSPLINE"}) {
-        for (unsigned int seed = 1; seed <= 20; ++seed) {
+    for (std::string const interpolation : {"STEP", "LINEAR", "CUBICSPLINE"})
+        for (unsigned int seed = 0; seed <= 20; ++seed) {
             SCOPED_TRACE(testing::Message() << interpolation << ", seed " << seed);
-            Scene const scene = Import(interpolation, RandomNumbers(seed, interpolation[0] == 'C' ? 27 : 9));
+            bool const isCurved = interpolation == "CUBICSPLINE";
+            std::vector<float> numbers = RandomNumbers(seed, isCurved ? 27 : 9);
+            for (std::size_t i = 0; i < numbers.size() && seed == 0; ++i)
+                numbers[i] = isCurved && i / 3 % 3 != 1 ? 0.0F : static_cast<float>(5 + i % 3);
+            Scene const scene = Import(interpolation, numbers);
             StreamItem const& item = scene.streams.front();
             auto const path = kfshost::MakePath(item);
             ASSERT_EQ(3, kfshost::KeyCount(*path));
-            for (Rational const& time :
-                 {Rational(-5, 1), Rational(0, 1), Rational(1, 2), Rational(1, 1), Rational(7, 1)})
-                EXPECT_EQ(At(*item.stream, time), At(*path, time)) << time.ToString();
+            if (seed == 0) kfshost::LetInnerKeysFloat(*path);
+            for (int const half : {-10, 0, 1, 2, 14})
+                EXPECT_EQ(At(*item.stream, Rational(half, 2)), At(*path, Rational(half, 2))) << half;
             for (int const units : {1, 59999, 60001, 119999})
-                if (interpolation[0] == 'S')
-                    EXPECT_EQ(At(*path, Rational(units / 60000, 2)), At(*path, Rational(units, 120000))) << units;
+                EXPECT_TRUE((interpolation != "STEP" && seed > 0) ||
+                            At(*path, Rational(units / 60000, 2)) == At(*path, Rational(units, 120000)))
+                    << units;
         }
-    }
 }
 
 // A straight segment is gone through in equal steps, as the file's linear interpolation does.
@@ -147,23 +152,6 @@ TEST_F(Paths, CurvedSegmentsLeaveKeysWithTheFilesVelocity)
     EXPECT_NEAR(2.0 / 6, out[1], 1e-15);
 }
 
-TEST_F(Paths, WhatNeverMovesStaysThere)
-{
-    for (char const* interpolation : {"LINEAR", "CUBICSPLINE"}) {
-        std::vector<float> numbers;
-        for (int key = 0; key < 3; ++key) {
-            std::vector<float> const one =
-                interpolation[0] == 'C' ? std::vector<float>{0, 0, 0, 5, 6, 7, 0, 0, 0} : std::vector<float>{5, 6, 7};
-            numbers.insert(numbers.end(), one.begin(), one.end());
-        }
-        Scene const scene = Import(interpolation, numbers);
-        auto const path = kfshost::MakePath(scene.streams.front());
-        kfshost::LetInnerKeysFloat(*path);
-        for (int i = 0; i <= 24; ++i)
-            EXPECT_EQ((Place{5, 6, 7}), At(*path, Rational(i, 24))) << interpolation << ' ' << i;
-    }
-}
-
 TEST_F(Paths, OnlyPositionsOfTwoOrThreeComponentsAreOnes)
 {
     StreamItem item;
@@ -175,20 +163,4 @@ TEST_F(Paths, OnlyPositionsOfTwoOrThreeComponentsAreOnes)
     item.kind = kfshost::StreamKind::Scale;
     item.components.resize(3);
     EXPECT_FALSE(kfshost::IsPosition(item));
-}
-
-// Captured motion, thousands of short straight segments.
-TEST_F(Paths, CapturedMotionIsTheSameAsAPath)
-{
-    SKIP_WITHOUT_SHARED_DATA();
-    Scene const scene = kfshost::ImportBvh(SharedData("bvh/cmu_01_01.bvh"));
-    StreamItem const& item = scene.streams.front();
-    ASSERT_TRUE(kfshost::IsPosition(item));
-    auto const path = kfshost::MakePath(item);
-    for (int i = 0; i < kfshost::KeyCount(*path); ++i) {
-        Rational const time = kfshost::KeyTime(*item.stream, i);
-        ASSERT_EQ(At(*item.stream, time), At(*path, time)) << i;
-        Rational const between = time + Rational(1, 300);
-        ASSERT_NEAR(0.0, Distance(At(*item.stream, between), At(*path, between)), 3e-4) << i;
-    }
 }

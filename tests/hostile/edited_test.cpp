@@ -1,6 +1,8 @@
 #include "host/dimensions.h"
 #include "host/paths.h"
+#include "host/projectfile.h"
 #include "host/session.h"
+#include "host/streambuilder.h"
 #include "keystore/attributes.h"
 #include "keystore/edit.h"
 #include "tests/hostile/samples.h"
@@ -8,7 +10,6 @@
 
 #include <gtest/gtest.h>
 
-#include <algorithm>
 #include <functional>
 #include <limits>
 
@@ -99,20 +100,15 @@ Edit const Edits[] = {
      "saved: can't be saved: walk/ball/translation may not move, and has no value to stand at"},
 };
 
-std::vector<unsigned char> Bytes(std::string const& text)
-{
-    return {text.begin(), text.end()};
-}
-
 TEST(EditedProject, IsSavedAsWhatCanBeLoaded)
 {
     kfshost::Session const session;
     ReportRecorder reports;
-    std::vector<Sample> const samples = ProjectSamples();
-    auto const linear = std::ranges::find(samples, "linear", &Sample::name);
+    std::string const linear = Samples("project").at("linear");
     for (Edit const& edit : Edits) {
         SCOPED_TRACE(edit.what);
-        auto const tree = kfshost::LoadProjectFromMemory(Bytes(linear->bytes), "sample");
+        auto const tree =
+            kfshost::LoadProjectFromMemory(std::vector<unsigned char>(linear.begin(), linear.end()), "sample");
         auto& node = dynamic_cast<NodeGroup&>(*tree->GetEditableStream(0U)->GetAsGroup()->GetEditableStream(0U));
         edit.make(node, *node.GetEditableStream(0U)->GetAsLeaf());
         std::string refusal;

@@ -1,22 +1,17 @@
 #pragma once
 
-#include "host/projectfile.h"
-#include "host/streambuilder.h"
-#include "tests/host/gltf_files.h"
+#include "tests/support/places.h"
+#include "tests/support/scratchfolder.h"
 
+#include <map>
 #include <string>
-#include <vector>
 
-// Small files of all kinds and shapes, made by this build: what the hostile tests damage, and where fuzzing begins.
-
-struct Sample {
-    std::string name;
-    std::string bytes;
-};
-
-// Projects: each with another thing in it.
-std::vector<Sample> ProjectSamples();
-// Groups of the kinds of fuzz/treekinds.h, which must be registered.
-std::vector<Sample> TreeSamples();
-std::vector<Sample> GltfSamples();
-std::vector<Sample> BvhSamples();
+// Small files of all kinds and shapes, by name: what fuzzing begins with, and what the hostile tests damage.
+// `target`: a folder of fuzz/corpus. New ones are saved by `kfs import` or found by fuzzing.
+inline std::map<std::string, std::string> Samples(std::string const& target)
+{
+    std::map<std::string, std::string> samples;
+    for (auto const& entry : std::filesystem::directory_iterator(kfstest::SourceFolder() / "fuzz/corpus" / target))
+        samples.emplace(entry.path().filename().string(), FileContent(entry.path().string()));
+    return samples;
+}

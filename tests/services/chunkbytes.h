@@ -57,6 +57,24 @@ inline u16str Units(std::initializer_list<int> units)
     return u16str(units.begin(), units.end());
 }
 
+// UTF-8 the plain way. A surrogate without a partner counts as its own code point, or as `lone`.
+inline std::string PlainUtf8(u16str const& units, int lone = 0)
+{
+    std::string bytes;
+    for (std::size_t i = 0; i < units.size(); ++i) {
+        int point = units[i];
+        if (point / 0x400 == 0x36 && i + 1 < units.size() && units[i + 1] / 0x400 == 0x37)
+            point = 0x10000 + point % 0x400 * 0x400 + units[++i] % 0x400;
+        else if (lone != 0 && point / 0x800 == 0x1B)
+            point = lone;
+        int const more = point < 0x80 ? 0 : point < 0x800 ? 1 : point < 0x10000 ? 2 : 3;
+        constexpr int marks[] = {0, 0xC0, 0xE0, 0xF0};
+        bytes += static_cast<char>(marks[more] + (point >> (6 * more)));
+        for (int k = more; k-- > 0;) bytes += static_cast<char>(0x80 + (point >> (6 * k)) % 0x40);
+    }
+    return bytes;
+}
+
 // The code that a call throws, or 0.
 template <class Call>
 int Thrown(Call call)

@@ -5,7 +5,8 @@
 #include "frame/services/memory.h"
 #include "frame/services/sequence.h"
 
-#include <random>
+#include <algorithm>
+#include <tuple>
 #include <vector>
 
 namespace {
@@ -58,29 +59,21 @@ void TakeEverything(std::string const& bytes)
         << "the walk sees a problem where a reader fails, and only there";
 }
 
-TEST(ChunkFileHostile, EveryTruncationIsRefused)
-{
-    std::string const sample = NestedSample();
-    TakeEverything(sample);
-    for (std::size_t size = 0; size < sample.size(); ++size) {
-        // A block of its own size, so that the sanitizer sees a read behind it.
-        std::string const cut(sample.data(), size);
-        CKF_File file;
-        int const code = file.Open(Span(cut));
-        EXPECT_TRUE(code == CKF_Err_Corrupt || code == CKF_Err_NotAChunkFile) << size << " gives " << code;
-        TakeEverything(cut);
-    }
-    CKF_File file;
-    std::string const longer = sample + '\0';
-    EXPECT_EQ(CKF_Err_Corrupt, file.Open(Span(longer)));
-    EXPECT_EQ(sample.size(), file.LastErrorOffset());
-    TakeEverything(longer);
-}
-
-TEST(ChunkFileHostile, BentAndRandomBytesAreSurvived)
+TEST(ChunkFileHostile, CutBentAndRandomBytesAreSurvived)
 {
     std::string const sample = NestedSample();
     Q_MemoryCount const before = Q_MemoryLive(nullptr);
+    TakeEverything(sample);
+    for (std::size_t size = 0; size <= sample.size() + 1; ++size) {
+        if (size == sample.size()) continue;
+        // A block of its own size, so that the sanitizer sees a read behind it.
+        std::string const cut = size < sample.size() ? std::string(sample.data(), size) : sample + '\0';
+        CKF_File file;
+        int const code = file.Open(Span(cut));
+        EXPECT_TRUE(code == CKF_Err_Corrupt || code == CKF_Err_NotAChunkFile) << size << " gives " << code;
+        EXPECT_TRUE(size < sample.size() || file.LastErrorOffset() == sample.size());
+        TakeEverything(cut);
+    }
     for (std::size_t at = 0; at < sample.size(); ++at)
         for (int const mask : {0x01, 0x80, 0xFF}) {
             std::string bent = sample;
@@ -88,15 +81,15 @@ TEST(ChunkFileHostile, BentAndRandomBytesAreSurvived)
             SCOPED_TRACE(testing::Message() << "byte " << at << " mask " << mask);
             TakeEverything(bent);
         }
-    std::mt19937 random(20);
+    Dice dice(20);
     char const* const words[] = {
         "LIST", "kfgp", "kfbs", "KFSF", "kfmn", "seql", "Utf8", "\0\0\0\0", "\xFF\xFF\xFF\xFF", "\x7F\xFF\xFF\xFF"};
     for (int round = 0; round < Rounds(1500); ++round) {
         std::string bytes = sample;
-        for (unsigned i = 0; i < 1 + random() % 6; ++i) {
-            std::string const word(words[random() % std::size(words)], 4);
-            bytes.replace(8 + random() % (bytes.size() - 16), 4, round % 2 ? word : Long(random() % 64));
-        }
+        for (int i = dice.Below(6); i >= 0; --i)
+            bytes.replace(8 + static_cast<std::size_t>(dice.Below(static_cast<int>(bytes.size()) - 16)), 4,
+                          round % 2 ? std::string(words[dice.Below(10)], 4)
+                                    : Long(static_cast<std::uint32_t>(dice.Below(64))));
         TakeEverything(bytes);
     }
     EXPECT_EQ(before, Q_MemoryLive(nullptr));
@@ -104,35 +97,21 @@ TEST(ChunkFileHostile, BentAndRandomBytesAreSurvived)
 
 TEST(ChunkFileHostile, ListsNestAsDeepAsTheWriterCanAndNoDeeper)
 {
-    auto const nested = [](int depth) {
-        std::string content = Atom("core", "x");
-        for (int i = 0; i < depth; ++i) content = List("kfgp", content);
-        return Form(content);
-    };
-    std::string const deepest = nested(CKF_MaxDepth);
     CKF_File file;
-    ASSERT_EQ(0, file.Open(Span(deepest)));
-    EXPECT_EQ(0, Thrown([&] { Outline(&file); }));
-
-    std::string const deeper = nested(CKF_MaxDepth + 1);
-    ASSERT_EQ(0, file.Open(Span(deeper)));
-    EXPECT_EQ(CKF_Err_TooDeep, Thrown([&] { Outline(&file); }));
-
-    // A hundred thousand lists in each other: no recursion may follow them.
-    constexpr std::size_t lists = 100000;
-    std::string bottomless;
-    bottomless.reserve(lists * 12);
-    for (std::size_t i = 0; i < lists; ++i)
-        bottomless += "LIST" + Long(static_cast<std::uint32_t>(12 * (lists - i) - 8)) + "kfgp";
-    std::string const bytes = Form(bottomless);
-    ASSERT_EQ(0, file.Open(Span(bytes)));
-    EXPECT_EQ(CKF_Err_TooDeep, Thrown([&] { Outline(&file); }));
-    CKF_ChunkWalk walk{Span(bytes)};
-    CKF_RawChunk chunk{};
-    int deepestSeen = 0;
-    while (walk.Next(&chunk)) deepestSeen = std::max(deepestSeen, chunk.depth);
-    EXPECT_EQ(CKF_MaxDepth + 1, deepestSeen);
-    EXPECT_FALSE(walk.Sound());
+    // The last are a hundred thousand lists in each other: no recursion may follow them.
+    for (std::uint32_t const lists : {CKF_MaxDepth, CKF_MaxDepth + 1, 100000}) {
+        std::string nested;
+        for (std::uint32_t i = 0; i < lists; ++i) nested += "LIST" + Long(12 * (lists - i) - 8) + "kfgp";
+        std::string const bytes = Form(nested);
+        ASSERT_EQ(0, file.Open(Span(bytes)));
+        EXPECT_EQ(lists > CKF_MaxDepth ? CKF_Err_TooDeep : 0, Thrown([&] { Outline(&file); }));
+        CKF_ChunkWalk walk{Span(bytes)};
+        CKF_RawChunk chunk{};
+        int deepest = 0;
+        while (walk.Next(&chunk)) deepest = std::max(deepest, chunk.depth);
+        EXPECT_EQ(std::min(static_cast<int>(lists), CKF_MaxDepth + 1), deepest);
+        EXPECT_EQ(lists == CKF_MaxDepth, walk.Sound());
+    }
 }
 
 // Each name makes a reader look for a group and a leaf that never come. Looking through the rest each time would make
@@ -201,26 +180,20 @@ TEST(ChunkFileHostile, OpeningIsExactAboutTheOuterForm)
     auto const with = [&](std::size_t at, std::string const& bytes) {
         return std::string(good).replace(at, bytes.size(), bytes);
     };
-    const struct {
-        char const* why;
-        std::string bytes;
-        int code;
-    } rows[] = {
-        {"nothing", "", CKF_Err_NotAChunkFile},
-        {"another kind of file", "RIFF\0\0\0\4WAVE----------------", CKF_Err_NotAChunkFile},
-        {"another type of form", with(8, "song"), CKF_Err_NotAChunkFile},
-        {"no version record", with(12, "vors"), CKF_Err_NotAChunkFile},
-        {"a version record without an encoding",
-         std::string(good).replace(4, 4, Long(22)).replace(16, 4, Long(8)).substr(0, 30), CKF_Err_NotAChunkFile},
-        {"a form that is too long", with(4, Long(26)), CKF_Err_Corrupt},
-        {"a form that is too short", with(4, Long(22)), CKF_Err_Corrupt},
-        {"only the form", "KFSF" + Long(4) + "proj", CKF_Err_NotAChunkFile},
-    };
-    for (auto const& row : rows) {
+    std::tuple<std::string, int> const rows[] = {
+        {"", CKF_Err_NotAChunkFile},
+        {"RIFF\0\0\0\4WAVE----------------", CKF_Err_NotAChunkFile},
+        {with(8, "song"), CKF_Err_NotAChunkFile},
+        {with(12, "vors"), CKF_Err_NotAChunkFile},
+        {with(4, Long(22)).replace(16, 4, Long(8)).substr(0, 30), CKF_Err_NotAChunkFile},  // without an encoding
+        {"KFSF" + Long(4) + "proj", CKF_Err_NotAChunkFile},
+        {with(4, Long(26)), CKF_Err_Corrupt},
+        {with(4, Long(22)), CKF_Err_Corrupt}};
+    for (auto const& [bytes, code] : rows) {
         CKF_File file;
-        EXPECT_EQ(row.code, file.Open(Span(row.bytes))) << row.why;
-        EXPECT_STRNE("", file.LastErrorText()) << row.why;
-        EXPECT_TRUE(file.GetBytes().empty()) << row.why;
+        EXPECT_EQ(code, file.Open(Span(bytes))) << bytes;
+        EXPECT_STRNE("", file.LastErrorText()) << bytes;
+        EXPECT_TRUE(file.GetBytes().empty()) << bytes;
     }
     CKF_File file;
     for (std::string const& inside : {Form(Form("")), Form(List("kfgp", Form("")))}) {

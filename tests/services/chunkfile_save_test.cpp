@@ -126,36 +126,28 @@ TEST(ChunkFileSave, WhatIsNotCommittedLeavesNothing)
 {
     ScratchFolder const folder;
     folder.Write(Project, "the old file");
-    auto const begin = [&](CKF_File& file) {
-        ASSERT_EQ(0, file.Create(folder.Path(Project).c_str()));
-        ASSERT_EQ(0, CKF_WriteAtom(&file, CKF_Id("cdat"), 3, "abc"));
-        ASSERT_EQ(2u, folder.Names().size());
-    };
-    {
-        CKF_File destroyed;
-        begin(destroyed);
+    std::string const path = folder.Path(Project), made = folder.Path("new.kfs");
+    constexpr int codes[] = {0, 0, CKF_Err_NotAChunkFile, CKF_Err_BadArgument};
+    for (int const end : {0, 1, 2, 3}) {  // destroyed, closed, opened for something else, failed
+        SCOPED_TRACE(end);
+        {
+            CKF_File file;
+            EXPECT_EQ(0, file.Create(path.c_str()));
+            EXPECT_EQ(0, CKF_WriteAtom(&file, CKF_Id("cdat"), 3, "abc"));
+            EXPECT_EQ(2u, folder.Names().size());
+            if (end == 1) file.Close();
+            EXPECT_EQ(codes[end], end == 2   ? file.Open(path.c_str())
+                                  : end == 3 ? CKF_WriteAtom(&file, 0, 0, nullptr) | file.Commit()
+                                             : 0);
+            EXPECT_EQ(end == 0 ? 2u : 1u, folder.Names().size());
+        }
+        EXPECT_EQ(Names{Project}, folder.Names());
     }
-    EXPECT_EQ(Names{Project}, folder.Names());
-    {
-        CKF_File made;
-        ASSERT_EQ(0, made.Create(folder.Path("new.kfs").c_str()));
-        EXPECT_EQ(0, made.Commit());
-        EXPECT_EQ(Form(""), FileContent(folder.Path("new.kfs"))) << "there was none";
-        EXPECT_EQ(CKF_Err_NotOpen, CKF_WriteAtom(&made, CKF_Id("late"), 0, nullptr));
-        fs::remove(folder.Path("new.kfs"));
-    }
+    EXPECT_EQ("the old file", FileContent(path));
     CKF_File file;
-    begin(file);
-    file.Close();
-    EXPECT_EQ(Names{Project}, folder.Names()) << "closed";
-    begin(file);
-    EXPECT_EQ(CKF_Err_NotAChunkFile, file.Open(folder.Path(Project).c_str()));
-    EXPECT_EQ(Names{Project}, folder.Names()) << "opened for something else";
-    begin(file);
-    static_cast<void>(CKF_WriteAtom(&file, 0, 0, nullptr));
-    EXPECT_EQ(CKF_Err_BadArgument, file.Commit());
-    EXPECT_EQ(Names{Project}, folder.Names()) << "failed";
-    EXPECT_EQ("the old file", FileContent(folder.Path(Project)));
+    EXPECT_EQ(0, file.Create(made.c_str()) + file.Commit());
+    EXPECT_EQ(Form(""), FileContent(made)) << "there was none";
+    EXPECT_EQ(CKF_Err_NotOpen, CKF_WriteAtom(&file, CKF_Id("late"), 0, nullptr));
 }
 
 TEST(ChunkFileSave, ALinkStaysALinkAndRightsStay)
@@ -249,7 +241,7 @@ TEST(ChunkFileSave, OnlyWhoAsksForItWritesIntoAPipe)
     EXPECT_EQ(Names{"pipe"}, folder.Names());
 }
 
-TEST(ChunkFileSave, APlaceThatCantBeWrittenIsRefusedAtOnce)
+TEST(ChunkFileSave, OnlyPlacesForFilesAreWrittenAndOnlyRegularProjectFilesOpened)
 {
     ScratchFolder const folder;
     for (std::string const& path : {folder.Path("no/such/folder.kfs"), folder.Path("new/"), folder.Path("."),
@@ -261,16 +253,11 @@ TEST(ChunkFileSave, APlaceThatCantBeWrittenIsRefusedAtOnce)
         EXPECT_EQ(CKF_Err_Io, file.Commit());
     }
     EXPECT_EQ(Names{}, folder.Names());
-}
-
-TEST(ChunkFileSave, OnlyRegularProjectFilesAreOpened)
-{
-    ScratchFolder const folder;
     folder.Write("text", "KFS is not KFSF");
     folder.Write("empty", "");
     folder.Write("cut", Form("").substr(0, 20));
     ASSERT_EQ(0, ::mkfifo(folder.Path("pipe").c_str(), 0600));
-    const std::pair<char const*, int> rows[] = {{"text", CKF_Err_NotAChunkFile},
+    std::pair<char const*, int> const rows[] = {{"text", CKF_Err_NotAChunkFile},
                                                 {"empty", CKF_Err_NotAChunkFile},
                                                 {"cut", CKF_Err_Corrupt},
                                                 {"pipe", CKF_Err_Io},

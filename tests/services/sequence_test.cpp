@@ -356,22 +356,18 @@ TEST(Sequence, SearchAgreesWithTheStandardLibraryAtEveryCount)
     }
 }
 
-TEST(Sequence, DisposeDisposesAllAndAnswersTheFirstFailure)
+TEST(Sequence, DisposesAllWalksWhatShrinksAndKeepsAddressesUnderPins)
 {
     Tokens tokens;
-    SEQ_Head** list = nullptr;
-    ASSERT_EQ(0, SEQ_New(0, 4, 4, 1, &list));
-    for (int i = 1; i <= 5; ++i) EXPECT_EQ(0, SEQ_Insert(Item(4, tokens.Make(i), i).data(), -1, list));
+    SEQ_Head** disposed = nullptr;
+    ASSERT_EQ(0, SEQ_New(0, 4, 4, 1, &disposed));
+    for (int i = 1; i <= 5; ++i) EXPECT_EQ(0, SEQ_Insert(Item(4, tokens.Make(i), i).data(), -1, disposed));
     SEQ_Funcs const funcs{nullptr, Dispose, nullptr};
-    EXPECT_EQ(0, SEQ_SetFuncs(list, 3, &funcs));
-    EXPECT_EQ(0, SEQ_SetRefcon(&tokens, list));
+    EXPECT_EQ(0, SEQ_SetFuncs(disposed, 3, &funcs) + SEQ_SetRefcon(&tokens, disposed));
     tokens.failDisposeIn = 2;
-    EXPECT_EQ(DisposeFailed, SEQ_Dispose(list, 0));
+    EXPECT_EQ(DisposeFailed, SEQ_Dispose(disposed, 0)) << "the first failure";
     EXPECT_EQ(1, tokens.Alive()) << "only the item that refused is left";
-}
 
-TEST(Sequence, WalksFollowAListThatShrinksUnderThem)
-{
     List const list(8, {1, 2, 3, 4, 5, 6});
     auto const removeEven = [](SEQ_Head** handle, long, int index, void* item) {
         return *static_cast<int*>(item) % 2 == 0 ? SEQ_Remove(index, handle, 0, nullptr) : 0;
@@ -382,26 +378,18 @@ TEST(Sequence, WalksFollowAListThatShrinksUnderThem)
         return index >= refcon ? 42 + index : 0;
     };
     EXPECT_EQ(43, SEQ_ForEachConst(list, 1, stopAt, 0)) << "and end where they are told";
-}
 
-TEST(Sequence, PinsNestAndHoldAddressesThroughEverythingButGrowth)
-{
-    List const list(8, {1, 2, 3});
     ASSERT_EQ(0, SEQ_ReserveSpace(10, list));
     void const* const pinned = list.At(0);
-    EXPECT_EQ(0, SEQ_Lock(1, list));
-    EXPECT_EQ(0, SEQ_LockConst(1, list));
-    EXPECT_EQ(0, SEQ_Compact(list));
+    EXPECT_EQ(0, SEQ_Lock(1, list) + SEQ_LockConst(1, list) + SEQ_Compact(list));
     for (int i = 0; i < 7; ++i) EXPECT_EQ(0, SEQ_InsertCopy(Item(8, 9, 9).data(), -1, list, 0));
-    EXPECT_EQ(0, SEQ_SetItemCopy(Item(8, 4, 4).data(), 1, list, 0, 0));
-    EXPECT_EQ(0, SEQ_SetNumItems(2, list, 0));
+    EXPECT_EQ(0, SEQ_SetItemCopy(Item(8, 4, 4).data(), 1, list, 0, 0) + SEQ_SetNumItems(2, list, 0));
     EXPECT_EQ(pinned, list.At(0));
     EXPECT_EQ((std::vector<int>{1, 4}), list.Values());
-    EXPECT_EQ(2, SEQ_GetPinCount(list));
-    EXPECT_EQ(0, SEQ_Unlock(list));
-    EXPECT_EQ(0, SEQ_UnlockConst(list));
-    EXPECT_EQ(SEQ_Err_NotPinned, SEQ_UnlockConst(list));
-    EXPECT_EQ(0, SEQ_GetPinCount(list)) << "a surplus unlock isn't paid for later";
+    EXPECT_EQ((std::vector<int>{2, 0, 0, SEQ_Err_NotPinned, 0}),
+              (std::vector<int>{SEQ_GetPinCount(list), SEQ_Unlock(list), SEQ_UnlockConst(list), SEQ_UnlockConst(list),
+                                SEQ_GetPinCount(list)}))
+        << "a surplus unlock isn't paid for later";
 }
 
 TEST(Sequence, RoomIsWhatWasAskedForAndGoesBack)

@@ -196,34 +196,30 @@ TEST(Time, AScaleOfZeroIsRefusedAndOrderedBeforeAllOthers)
 TEST(Time, DoublesAreRoundedToTheNearestAtEverySize)
 {
     constexpr double infinity = std::numeric_limits<double>::infinity(), nan = std::numeric_limits<double>::quiet_NaN();
-    std::pair<double, long> const table[] = {
-        {0.49999999999999994, 0},
-        {-0.49999999999999994, 0},
-        {4503599627370497.5, 4503599627370498},
-        {9007199254740993.0, 9007199254740992},
-        {9223372036854774784.0, 9223372036854774784},
-        {9223372036854775808.0, LONG_MAX},
-        {-9223372036854775808.0, LONG_MIN},
-        {-1e300, LONG_MIN},
-        {infinity, LONG_MAX},
-        {nan, 0},
-        {5e-324, 0},
-        {0.5, 1},
-        {-2.5, -3},
-    };
+    std::pair<double, long> const table[] = {{0.49999999999999994, 0},
+                                             {-0.49999999999999994, 0},
+                                             {4503599627370497.5, 4503599627370498},
+                                             {9007199254740993.0, 9007199254740992},
+                                             {9223372036854774784.0, 9223372036854774784},
+                                             {9223372036854775808.0, LONG_MAX},
+                                             {-9223372036854775808.0, LONG_MIN},
+                                             {-1e300, LONG_MIN},
+                                             {infinity, LONG_MAX},
+                                             {nan, 0},
+                                             {5e-324, 0},
+                                             {0.5, 1},
+                                             {-2.5, -3}};
     for (auto const& [number, rounded] : table) EXPECT_EQ(rounded, M_RoundDouble(number)) << number;
-    std::tuple<unsigned, double, int> const seconds[] = {
-        {600, 0.5, 300},
-        {2, 0.25, 1},
-        {2, -0.25, -1},
-        {2, 0.2499, 0},
-        {1, 2147483647.4, INT_MAX},
-        {1, 2147483648.0, INT_MAX},
-        {600, 1e300, INT_MAX},
-        {600, -infinity, INT_MIN},
-        {600, nan, 0},
-        {0, infinity, 0},
-    };
+    std::tuple<unsigned, double, int> const seconds[] = {{600, 0.5, 300},
+                                                         {2, 0.25, 1},
+                                                         {2, -0.25, -1},
+                                                         {2, 0.2499, 0},
+                                                         {1, 2147483647.4, INT_MAX},
+                                                         {1, 2147483648.0, INT_MAX},
+                                                         {600, 1e300, INT_MAX},
+                                                         {600, -infinity, INT_MIN},
+                                                         {600, nan, 0},
+                                                         {0, infinity, 0}};
     for (auto const& [scale, number, value] : seconds) EXPECT_EQ(value, T_FpLong2TimeValue(scale, number)) << number;
     Times random(6);
     for (int i = 0; i < Rounds(20000); ++i) {

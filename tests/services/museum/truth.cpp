@@ -11,7 +11,7 @@ namespace {
 
 using Big = boost::multiprecision::number<boost::multiprecision::cpp_bin_float<50>, boost::multiprecision::et_off>;
 
-template <class R>
+template <class R = Big>
 using Cubic = std::array<R, 4>;
 
 template <class R = Big>
@@ -20,11 +20,15 @@ Cubic<R> Coordinate(Curve const& curve, std::size_t i)
     return {R(curve.p[0][i]), R(curve.p[1][i]), R(curve.p[2][i]), R(curve.p[3][i])};
 }
 
-template <class R>
-R Value(Cubic<R> c, R const& t)
+// One step of de Casteljau for the first `count` points.
+void Halve(Cubic<>& c, Big const& t, std::size_t count)
 {
-    for (std::size_t level = 3; level > 0; --level)
-        for (std::size_t k = 0; k < level; ++k) c[k] += t * (c[k + 1] - c[k]);
+    for (std::size_t k = 0; k < count; ++k) c[k] += t * (c[k + 1] - c[k]);
+}
+
+Big Value(Cubic<> c, Big const& t)
+{
+    for (std::size_t count = 3; count > 0; --count) Halve(c, t, count);
     return c[0];
 }
 
@@ -42,7 +46,7 @@ R Second(Cubic<R> const& c, R const& t)
 }
 
 // The parameters in [0, 1] at which the derivative vanishes, ascending; none where it vanishes everywhere.
-std::vector<Big> Turns(Cubic<Big> const& c, Big* apart = nullptr)
+std::vector<Big> Turns(Cubic<> const& c, Big* apart = nullptr)
 {
     Big const u = c[1] - c[0], v = c[2] - c[1], w = c[3] - c[2];
     Big const a = u - 2 * v + w, b = v - u;  // a t^2 + 2 b t + u
@@ -62,74 +66,13 @@ std::vector<Big> Turns(Cubic<Big> const& c, Big* apart = nullptr)
 }
 
 // Coordinate i turned so that it runs upwards from p0 to p3.
-Cubic<Big> Upwards(Curve const& curve, std::size_t i, int& direction)
+Cubic<> Upwards(Curve const& curve, std::size_t i, int& direction)
 {
     direction = curve.p[3][i] < curve.p[0][i] ? -1 : 1;
-    Cubic<Big> c = Coordinate(curve, i);
+    Cubic<> c = Coordinate(curve, i);
     for (Big& value : c) value *= direction;
     return c;
 }
-
-// The path's speed and where it is slowest, in either precision.
-template <class R>
-struct Path {
-    std::vector<Cubic<R>> coordinates;
-    std::vector<R> slowest;
-    R tolerance;
-
-    Path(Curve const& curve, R const& polygon, R const& relative) : tolerance(polygon * relative)
-    {
-        for (std::size_t i = 0; i < curve.Size(); ++i) coordinates.push_back(Coordinate<R>(curve, i));
-        for (int i = 0; i < 200; ++i) {
-            R low = R(i) / 200, high = R(i + 1) / 200;
-            if (!(Slowing(low) < 0 && Slowing(high) >= 0)) continue;
-            for (int half = 0; half < 70; ++half) (Slowing((low + high) / 2) < 0 ? low : high) = (low + high) / 2;
-            slowest.push_back(low);
-        }
-    }
-    R Slowing(R const& t) const
-    {
-        R sum = 0;
-        for (Cubic<R> const& c : coordinates) sum += First(c, t) * Second(c, t);
-        return sum;
-    }
-    R Speed(R const& t) const
-    {
-        using std::sqrt;
-        R squares = 0;
-        for (Cubic<R> const& c : coordinates) squares += First(c, t) * First(c, t);
-        return sqrt(squares);
-    }
-    R Rule(R const& from, R const& to) const
-    {
-        using std::sqrt;
-        static R const tenSevenths = sqrt(R(10) / 7);
-        static R const inner = sqrt(5 - 2 * tenSevenths) / 3, outer = sqrt(5 + 2 * tenSevenths) / 3;
-        static R const root70 = 13 * sqrt(R(70));
-        R const half = (to - from) / 2, middle = (to + from) / 2;
-        R const sum = R(512) / 900 * Speed(middle) +
-                      (322 + root70) / 900 * (Speed(middle - inner * half) + Speed(middle + inner * half)) +
-                      (322 - root70) / 900 * (Speed(middle - outer * half) + Speed(middle + outer * half));
-        return half * sum;
-    }
-    R Refined(R const& from, R const& to, R const& whole, int depth) const
-    {
-        R const middle = (from + to) / 2, left = Rule(from, middle), right = Rule(middle, to);
-        R const error = left + right - whole;
-        if (depth > 45 || (error < 0 ? -error : error) <= tolerance) return left + right;
-        return Refined(from, middle, left, depth + 1) + Refined(middle, to, right, depth + 1);
-    }
-    R Length(R from, R const& to) const
-    {
-        R sum = 0;
-        for (R const& cut : slowest)
-            if (cut > from && cut < to) {
-                sum += Refined(from, cut, Rule(from, cut), 0);
-                from = cut;
-            }
-        return sum + Refined(from, to, Rule(from, to), 0);
-    }
-};
 
 Real Round(Big const& value)
 {
@@ -157,17 +100,14 @@ std::array<std::array<Real, 4>, 5> Split(Curve const& curve, Real t)
 {
     std::array<std::array<Real, 4>, 5> rows{};
     for (std::size_t i = 0; i < curve.Size(); ++i) {
-        Cubic<Big> c = Coordinate(curve, i);
-        auto const step = [&](std::size_t count) {
-            for (std::size_t k = 0; k < count; ++k) c[k] += t * (c[k + 1] - c[k]);
-        };
-        step(3);
+        Cubic<> c = Coordinate(curve, i);
+        Halve(c, t, 3);
         rows[0][i] = Round(c[0]);
         rows[4][i] = Round(c[2]);
-        step(2);
+        Halve(c, t, 2);
         rows[1][i] = Round(c[0]);
         rows[3][i] = Round(c[1]);
-        step(1);
+        Halve(c, t, 1);
         rows[2][i] = Round(c[0]);
     }
     return rows;
@@ -176,7 +116,7 @@ std::array<std::array<Real, 4>, 5> Split(Curve const& curve, Real t)
 Real FirstReach(Curve const& curve, std::size_t i, Real value)
 {
     int direction;
-    Cubic<Big> const c = Upwards(curve, i, direction);
+    Cubic<> const c = Upwards(curve, i, direction);
     Big const wanted = Big(value) * direction;
     if (wanted <= c[0]) return 0;
     if (wanted >= c[3]) return 1;
@@ -198,7 +138,7 @@ Real FirstReach(Curve const& curve, std::size_t i, Real value)
 Real FurthestX(Curve const& curve, Real t)
 {
     int direction;
-    Cubic<Big> const c = Upwards(curve, 0, direction);
+    Cubic<> const c = Upwards(curve, 0, direction);
     Big furthest = std::max(c[0], Value(c, Big(t)));
     for (Big const& turn : Turns(c))
         if (turn < t) furthest = std::max(furthest, Value(c, turn));
@@ -208,7 +148,7 @@ Real FurthestX(Curve const& curve, Real t)
 Real FallsBack(Curve const& curve)
 {
     int direction;
-    Cubic<Big> const c = Upwards(curve, 1, direction);
+    Cubic<> const c = Upwards(curve, 1, direction);
     std::vector<Big> places = Turns(c);
     places.push_back(1);
     Big top = c[0], worst = 0;
@@ -222,8 +162,8 @@ Real FallsBack(Curve const& curve)
 
 SlopePlaces PlacesOfSlope(Curve const& curve, Real slope)
 {
-    Cubic<Big> excess = Coordinate(curve, 1);
-    Cubic<Big> const x = Coordinate(curve, 0);
+    Cubic<> excess = Coordinate(curve, 1);
+    Cubic<> const x = Coordinate(curve, 0);
     for (std::size_t k = 0; k < 4; ++k) excess[k] -= slope * x[k];
     SlopePlaces places;
     Big apart;
@@ -232,41 +172,61 @@ SlopePlaces PlacesOfSlope(Curve const& curve, Real slope)
     return places;
 }
 
-struct Ruler::Impl {
-    Real polygon;
-    Path<Real> quick;
-    Curve curve;
-};
-
 Ruler::Ruler(Curve const& curve)
 {
-    Real polygon = 0;
     for (std::size_t k = 0; k < 3; ++k) {
         Real squares = 0;
-        for (std::size_t i = 0; i < curve.Size(); ++i) {
-            Real const step = Real(curve.p[k + 1][i]) - curve.p[k][i];
-            squares += step * step;
-        }
+        for (std::size_t i = 0; i < curve.Size(); ++i) squares += std::pow(Real(curve.p[k + 1][i]) - curve.p[k][i], 2);
         polygon += std::sqrt(squares);
     }
-    impl_.reset(new Impl{polygon, {curve, polygon, 1e-13L}, curve});
+    for (std::size_t i = 0; i < curve.Size(); ++i) coordinates_.push_back(Coordinate<Real>(curve, i));
+    auto const slowing = [this](Real t) {
+        Real sum = 0;
+        for (Cubic<Real> const& c : coordinates_) sum += First(c, t) * Second(c, t);
+        return sum;
+    };
+    for (int i = 0; i < 200; ++i) {
+        Real low = i / 200.0L, high = (i + 1) / 200.0L;
+        if (!(slowing(low) < 0 && slowing(high) >= 0)) continue;
+        for (int half = 0; half < 70; ++half) (slowing((low + high) / 2) < 0 ? low : high) = (low + high) / 2;
+        slowest_.push_back(low);
+    }
 }
 
-Ruler::~Ruler() = default;
-
-Real Ruler::Polygon() const
+Real Ruler::Rule(Real from, Real to) const
 {
-    return impl_->polygon;
+    static Real const root = 2 * std::sqrt(10.0L / 7), root70 = 13 * std::sqrt(70.0L);
+    static Real const inner = std::sqrt(5 - root) / 3, outer = std::sqrt(5 + root) / 3;
+    Real const half = (to - from) / 2, middle = (to + from) / 2;
+    auto const speeds = [&](Real offset) {
+        Real sum = 0;
+        for (Real const t : {middle - offset * half, middle + offset * half}) {
+            Real squares = 0;
+            for (Cubic<Real> const& c : coordinates_) squares += First(c, t) * First(c, t);
+            sum += std::sqrt(squares);
+        }
+        return sum;
+    };
+    return half * (256 * speeds(0) + (322 + root70) * speeds(inner) + (322 - root70) * speeds(outer)) / 900;
+}
+
+Real Ruler::Refined(Real from, Real to, Real whole, int depth) const
+{
+    Real const middle = (from + to) / 2, left = Rule(from, middle), right = Rule(middle, to);
+    if (depth > 45 || std::fabs(left + right - whole) <= 1e-13L * polygon) return left + right;
+    return Refined(from, middle, left, depth + 1) + Refined(middle, to, right, depth + 1);
 }
 
 Real Ruler::Length(Real from, Real to) const
 {
-    return from <= to ? impl_->quick.Length(from, to) : -impl_->quick.Length(to, from);
-}
-
-Real Ruler::ExactLength() const
-{
-    return Round(Path<Big>(impl_->curve, Big(impl_->polygon), Big(1e-16L)).Length(0, 1));
+    if (from > to) return -Length(to, from);
+    Real sum = 0;
+    for (Real const cut : slowest_)
+        if (cut > from && cut < to) {
+            sum += Refined(from, cut, Rule(from, cut), 0);
+            from = cut;
+        }
+    return sum + Refined(from, to, Rule(from, to), 0);
 }
 
 }  // namespace truth

@@ -4,7 +4,6 @@
 
 #include "tests/services/museum/museum.h"
 
-#include <memory>
 #include <vector>
 
 namespace truth {
@@ -35,18 +34,21 @@ struct SlopePlaces {
 };
 SlopePlaces PlacesOfSlope(Curve const& curve, Real slope);
 
-// Lengths of a path, by Gauss's five points on ever smaller stretches that begin where the path is slowest.
+// Lengths of a path to 1e-13 of the polygon's, by Gauss's five points on ever smaller stretches that begin where the path
+// is slowest.
 class Ruler {
 public:
     explicit Ruler(Curve const& curve);
-    ~Ruler();
-    Real Polygon() const;
-    Real Length(Real from, Real to) const;  // in long double throughout, to 1e-13 of the polygon's length
-    Real ExactLength() const;               // of the whole, in fifty digits
+    Real Length(Real from, Real to) const;
+
+    Real polygon = 0;
 
 private:
-    struct Impl;
-    std::unique_ptr<Impl> impl_;
+    Real Rule(Real from, Real to) const;
+    Real Refined(Real from, Real to, Real whole, int depth) const;
+
+    std::vector<std::array<Real, 4>> coordinates_;
+    std::vector<Real> slowest_;
 };
 
 }  // namespace truth
