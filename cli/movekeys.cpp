@@ -6,7 +6,6 @@
 #include "cli/projectoutput.h"
 
 #include <fmt/format.h>
-#include <fmt/ranges.h>
 
 using kfshost::MoveNotes;
 using kfshost::Scene;
@@ -54,7 +53,9 @@ std::string TextOf(MoveNotes const& notes, StreamItem const& item)
         parts.push_back(Plural(notes.addedKeys, "key time", "key times") + " that not all dimensions had");
     if (notes.heldKeys > 0)
         parts.push_back(Plural(notes.heldKeys, "key", "keys") + " added one unit beside the jump of a dimension");
-    return fmt::format("{}", fmt::join(parts, "; "));
+    std::string text;
+    for (std::string const& part : parts) text += (text.empty() ? "" : "; ") + part;
+    return text;
 }
 
 // Of the streams that are chosen those that are to be moved; where dimensions go with their leader, without them.

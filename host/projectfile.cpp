@@ -414,11 +414,13 @@ std::unique_ptr<SceneGroup> MakeTree(Scene scene)
     tree->times = {scene.timeScale, scene.exactTimes, scene.worstTimeError};
     std::optional<AnimationBuilder> animation;
     NodeGroup* node = nullptr;
+    bool isSeparated = false;
     for (StreamItem& item : scene.streams) {
-        if (IsFollower(item)) {  // behind its leader
-            if (node) node->PutFollower(TakeOut(std::move(item.stream)));
+        if (IsFollower(item)) {  // behind its leader; of no use to one that has been joined meanwhile
+            if (isSeparated) node->PutFollower(TakeOut(std::move(item.stream)));
             continue;
         }
+        isSeparated = item.stream->AreDimensionsSeparated();
         if (!animation || animation->Name() != item.animation) animation.emplace(*tree, item.animation);
         node = &animation->NodeFor(item);
         node->PutChannel(item.kind, TakeOut(std::move(item.stream)));
