@@ -43,17 +43,35 @@ class Overridden {
 public:
     Overridden(KFS_Stream const* stream, int time, KFS_ParamBag const* bag)
     {
+        if (!bag) return;
         KFS_StreamOverride const* found = nullptr;
-        if (!bag || !bag->GetStreamOverride(stream, &found) || stream->IsCustom()) return;
-        KFS_OverrideValue value = found->GetValAtTime({time, stream->GetTimeScale()});
-        auto* const numbers = boost::get<std::vector<double>>(&value);
-        if (!numbers) return;  // a text or another source, which isn't a plain stream's value
-        numbers_.swap(*numbers);
-        numbers_.resize(static_cast<std::size_t>(stream->GetDimension()), 0.0);
+        if (bag->GetStreamOverride(stream, &found)) Take(*found, *stream->GetKeyData()->stream, time);
     }
-    void const* Source() const { return numbers_.empty() ? nullptr : numbers_.data(); }
+    void const* Source() const { return source_; }
 
 private:
+    // `seen`: the stream as this thread's reads see it, and as `time` is meant.
+    void Take(KFS_StreamOverride const& found, KFS_Stream const& seen, int time)
+    {
+        if (seen.IsCustom()) return;
+        auto const dimension = static_cast<std::size_t>(seen.GetDimension());
+        if (found.IsTimeInvariant()) {
+            auto const* const fixed = boost::get<std::vector<double>>(&found.GetValue());
+            if (!fixed) return;  // a text or another source, which isn't a plain stream's value
+            source_ = fixed->data();
+            if (fixed->size() >= dimension) return;
+            numbers_ = *fixed;
+        } else {
+            KFS_OverrideValue value = found.GetValAtTime({time, seen.GetTimeScale()});
+            auto* const numbers = boost::get<std::vector<double>>(&value);
+            if (!numbers) return;
+            numbers_.swap(*numbers);
+        }
+        numbers_.resize(dimension, 0.0);
+        source_ = numbers_.data();
+    }
+
+    double const* source_ = nullptr;
     std::vector<double> numbers_;
 };
 

@@ -1,3 +1,4 @@
+#include "keystore/attributes.h"
 #include "overrides/expression.h"
 #include "overrides/parambag.h"
 #include "overrides/streamexpression.h"
@@ -266,6 +267,15 @@ TEST_F(Bags, TakeThePlaceOfAStreamsKeys)
     EXPECT_EQ(11, Read(a_, 3, &bag)) << "each time from a fresh copy of the value";
     EXPECT_EQ(9, Read(a_, 2, &bag));
     EXPECT_EQ(100, Read(b_, 2, &bag));
+    auto const render = kfshost::MakeRenderContext(true);
+    auto const readInRender = [&] {
+        Q_ScSetCurrentRenderContext const current(render);
+        return Read(a_, 3, &bag);
+    };
+    EXPECT_EQ(11, readInRender());
+    EXPECT_EQ(0, KFS_RescaleStream(const_cast<KFS_Stream*>(a_), 24));
+    EXPECT_EQ(11, Read(a_, 3, &bag));
+    EXPECT_EQ(11, readInRender()) << "which still counts time as the stream did";
     EXPECT_EQ(100, Read(a_, 2, nullptr)) << "the stream itself hasn't heard of it";
     KFS_OverrideValue value(Text("as it was"));
     EXPECT_FALSE(bag.StreamOverridden(b_, T_Time{1, 1}, &value));
