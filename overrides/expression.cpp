@@ -39,6 +39,7 @@ KFS_ExprInfo::KFS_ExprInfo(KFS_ExprInfo const& source)
     *this = source;
 }
 
+// What can run out of memory comes first. The block stays, for renders may be adding dependencies to it.
 KFS_ExprInfo& KFS_ExprInfo::operator=(KFS_ExprInfo const& source)
 {
     if (this == &source) return *this;
@@ -47,17 +48,21 @@ KFS_ExprInfo& KFS_ExprInfo::operator=(KFS_ExprInfo const& source)
         clear();
         return *this;
     }
-    // What can run out of memory comes first.
-    auto copy = std::make_unique<Data>();
-    copy->expression = from->expression;
-    copy->errorText = from->errorText;
-    copy->errorLine = from->errorLine;
-    copy->errorShort = from->errorShort;
-    copy->flags = from->flags;
-    copy->dependencies = source.GetDependencyIds();
+    u16str expression = from->expression;
+    u16str errorText = from->errorText;
+    u16str errorShort = from->errorShort;
+    std::set<int> dependencies = source.GetDependencyIds();
     boost::any cache = source.GetExpressionCache();
-    delete data_.exchange(copy.release());
-    GetExpressionCacheImpl()->swap(cache);
+    boost::any* const ownCache = GetExpressionCacheImpl();
+    Data& data = FieldsForModify();
+    data.expression.swap(expression);
+    data.errorText.swap(errorText);
+    data.errorLine = from->errorLine;
+    data.errorShort.swap(errorShort);
+    data.flags = from->flags;
+    ownCache->swap(cache);
+    hearth::threads::ScRecursiveLock const guard(data.lock);
+    data.dependencies.swap(dependencies);
     return *this;
 }
 
@@ -89,10 +94,12 @@ void KFS_ExprInfo::SetExpressionError(u16str const& text, int line, u16str const
 {
     if (text == GetExpressionError() && line == GetExpressionErrorLine() && shortText == GetExpressionErrorShort())
         return;
+    u16str newText = text;
+    u16str newShortText = shortText;
     Data& data = FieldsForModify();
-    data.errorText = text;
+    data.errorText.swap(newText);
     data.errorLine = line;
-    data.errorShort = shortText;
+    data.errorShort.swap(newShortText);
 }
 
 void KFS_ExprInfo::SetFlags(unsigned int flags)

@@ -33,7 +33,7 @@ int KFS_SetStreamExprFlags(KFS_Stream* stream, unsigned int mask, unsigned int v
 {
     KFSp_FirstError error;
     if ((mask & KFS_ExprFlag_Disabled) != 0) error.Keep(KFSp_Boundary([stream] { ForgetError(stream); }));
-    stream->GetExprInfoForModify().SetFlagMask(value, mask);
+    error.Keep(KFSp_Boundary([&] { stream->GetExprInfoForModify().SetFlagMask(value, mask); }));
     error.Keep(KFSp_Boundary([stream] { stream->ShowChangeInCopy(); }));
     error.Keep(KFSp_Boundary([stream] { stream->NotifyValueChanged(); }));
     return error.Code();
