@@ -19,13 +19,18 @@ KFS_ParamBag::KFS_ParamBag(KFS_ParamBag const& a, KFS_ParamBag const& b) : overr
     overrides_.insert(b.overrides_.begin(), b.overrides_.end());
 }
 
+// What can run out of memory comes first: a GUID must never stand beside a content that isn't its own.
 KFS_ParamBag& KFS_ParamBag::operator=(KFS_ParamBag const& source)
 {
-    if (this == &source) return *this;
-    overrides_ = source.overrides_;
-    boost::mutex::scoped_lock const hold(source.lock_);
-    guid_ = source.guid_;
-    dirty_ = source.dirty_.load();
+    if (this != &source) *this = KFS_ParamBag(source);
+    return *this;
+}
+
+KFS_ParamBag& KFS_ParamBag::operator=(KFS_ParamBag&& source) noexcept
+{
+    overrides_.swap(source.overrides_);
+    std::swap(guid_, source.guid_);
+    dirty_ = source.dirty_.exchange(dirty_);
     return *this;
 }
 

@@ -30,6 +30,8 @@ public:
     // The union of both; where both hold an override for one stream, `a` wins.
     KFS_ParamBag(KFS_ParamBag const& a, KFS_ParamBag const& b);
     KFS_ParamBag& operator=(KFS_ParamBag const& source);
+    // Exchanges the two, without memory: so a scope can always give a bag its content back.
+    KFS_ParamBag& operator=(KFS_ParamBag&& source) noexcept;
     virtual ~KFS_ParamBag();
 
     // Forgets the GUID. For those who have changed an override in place before sharing it.
