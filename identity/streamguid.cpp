@@ -310,9 +310,10 @@ void KFS_Stream::MixInValueAtTime(KFSp_IdentityHash& hash, T_Time const& time, K
     int const count = GetEffectiveDimension();
     M_Vector4T<double> const vector = GetVector4Ex(KFS_EvalData{time, 0, bag});
     hash.Mix(vector.v, sizeof(double) * static_cast<std::size_t>(std::clamp(count, 0, VectorSize)));
-    if (count <= VectorSize || KFSp_Seen(this)->IsCustom()) return;
+    KFS_Stream const* const seen = KFSp_Seen(this);
+    if (count <= VectorSize || seen->IsCustom()) return;
     // What a vector has no room for changes the picture all the same.
-    Numbers values(static_cast<std::size_t>(std::max<int>(count, GetDimension())), 0.0);
+    Numbers values(static_cast<std::size_t>(std::max<int>(count, seen->GetDimension())), 0.0);
     KFSp_ThrowIf(KFS_GetValueFPlus(this, &time, 0, values.data(), nullptr, bag));
     hash.Mix(values.data() + VectorSize, sizeof(double) * static_cast<std::size_t>(count - VectorSize));
 }
