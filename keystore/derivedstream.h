@@ -47,8 +47,7 @@ inline double KFS_DefaultNumber(FX_ParamDef const& def)
 }
 
 // The number that the bag of `eval` gives in place of the stream's value, on the heap; `value` stays as it was where none
-// does. An override without a number is 0.0, as in reads. Throws boost::bad_get where it is something else than numbers, and
-// what its value function throws.
+// does. Throws boost::bad_get where an override gives no number, and what its value function throws.
 KFS_API void KFS_ExtractOverrideNumber(KFS_Stream const* stream, KFS_EvalData const& eval, double*& value);
 
 // Errors: operations throw the int codes of what they call, and disposal has then happened. A DisposeValue that throws while

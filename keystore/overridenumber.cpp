@@ -9,5 +9,6 @@ void KFS_ExtractOverrideNumber(KFS_Stream const* stream, KFS_EvalData const& eva
     KFS_OverrideValue given;
     if (!eval.bag->StreamOverridden(stream, eval.time, &given)) return;
     auto const& numbers = boost::get<std::vector<double>>(given);
-    value = new double(numbers.empty() ? 0.0 : numbers.front());
+    if (numbers.empty()) throw boost::bad_get();
+    value = new double(numbers.front());
 }

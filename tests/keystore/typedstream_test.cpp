@@ -259,15 +259,19 @@ TEST_F(TypedStream, TakesNumbersOfABag)
     };
     EXPECT_EQ(&own, extracted(nullptr));
     EXPECT_EQ(&own, extracted(&bag));
-    for (std::vector<double> const& numbers : {std::vector<double>{2.5, 9.0}, std::vector<double>{}}) {
-        bag.AddOverride(&stream, boost::make_shared<KFS_StreamOverride>(&stream, KFS_OverrideValue(numbers), false));
-        double* value = extracted(&bag);
-        ASSERT_NE(&own, value);
-        EXPECT_EQ(numbers.empty() ? 0.0 : 2.5, *value);
-        stream.DisposeCapsuleOverrideValue(value);
+    auto const give = [&](KFS_OverrideValue const& value) {
+        bag.AddOverride(&stream, boost::make_shared<KFS_StreamOverride>(&stream, value, false));
+    };
+    give(std::vector<double>{2.5, 9.0});
+    double* value = extracted(&bag);
+    ASSERT_NE(&own, value);
+    EXPECT_EQ(2.5, *value);
+    stream.DisposeCapsuleOverrideValue(value);
+    for (KFS_OverrideValue const& noNumber :
+         {KFS_OverrideValue(std::vector<double>{}), KFS_OverrideValue(u16str(3, 'a'))}) {
+        give(noNumber);
+        EXPECT_THROW(extracted(&bag), boost::bad_get);
     }
-    bag.AddOverride(&stream, boost::make_shared<KFS_StreamOverride>(&stream, KFS_OverrideValue(u16str(3, 'a')), false));
-    EXPECT_THROW(extracted(&bag), boost::bad_get);
 }
 
 // ---- values in the parameter record
