@@ -3,14 +3,19 @@
 #include "curves/spatial.h"
 #include "curves/tangents.h"
 #include "curves/update.h"
+#include "identity/renderoptions.h"
 #include "keystore/attributes.h"
 #include "keystore/cachestate.h"
 #include "keystore/copykeys.h"
 #include "keystore/keyflags.h"
 #include "keystore/lookup.h"
+#include "overrides/parambag.h"
 #include "overrides/streamexpression.h"
+#include "tests/support/groups.h"
 #include "tests/support/streams.h"
 #include "tests/support/text.h"
+
+#include <boost/make_shared.hpp>
 
 #include <algorithm>
 #include <array>
@@ -18,6 +23,8 @@
 #include <cmath>
 #include <random>
 #include <thread>
+#include <utility>
+#include <vector>
 
 namespace {
 
@@ -258,6 +265,92 @@ TEST_F(RenderThreads, RendersSeeTheStreamsAsTheyStoodWhileTheMainThreadEdits)
     EXPECT_EQ(0, differing);
     EXPECT_GT(edits, 1);
     EXPECT_NE(expected, Sample());
+}
+
+// A span over a few keys, with a bag.
+struct Frame final : KFS_RenderOptionsBase {
+    T_Time const* GetTimeSpanStart() const override { return &start; }
+    void SetTimeSpanStart(T_Time const*) override {}
+    T_Time const* GetTimeSpanDuration() const override { return &duration; }
+    void SetTimeSpanDuration(T_Time const*) override {}
+    T_Time const* GetShutterDuration() const override { return &shutter; }
+    void GetShutterSpan(int, T_Time*, T_Time*) const override {}
+    KFS_ParamBag const* GetParamBag() const override { return &bag; }
+
+    T_Time start{130, 600}, duration{200, 600}, shutter{0, 1};
+    KFS_ParamBag bag;
+};
+
+class TreeRenders : public SceneTest {
+protected:
+    TestRoot<TestIndexedGroup> root{"layers"};
+    std::vector<KFS_Stream*> leaves;
+
+    TreeRenders()
+    {
+        for (int n = 0; n < 3; ++n) {
+            Q_ScAutoPtr<KFS_StreamBase> made = TestKinds::Make("opacity");
+            leaves.push_back(root.GetEditableStream(root.AppendStream(&made))->GetAsLeaf());
+            EXPECT_EQ(0, leaves.back()->SetConstant(0, 0));
+            for (int i = 0; i < Keys; ++i) {
+                T_Time const at{i * 60, 600};
+                double const value = i * i * (n + 1) % 100;
+                EXPECT_EQ(0, KFS_InsertKeyF(leaves.back(), &at, 1, &value, KFS_Interp_Spline, KFS_Interp_Spline));
+            }
+        }
+    }
+};
+
+// What is computed when first asked for (a bag's GUID, what identifies a stream in it, the expression's record) is asked
+// for by all at once.
+TEST_F(TreeRenders, OverriddenValuesAndIdentitiesAreTheSameInAllOfThem)
+{
+    Frame shared;
+    shared.bag.AddOverride(leaves[0], boost::make_shared<KFS_StreamOverride>(
+                                          leaves[0], KFS_OverrideValue(std::vector<double>{1.0}), false));
+    shared.bag.AddOverride(leaves[1],
+                           boost::make_shared<KFS_StreamOverride>(
+                               leaves[1], KFS_OverrideValue(std::vector<double>{3.0}), leaves[2], T_Time{10, 600},
+                               [](T_Time const& time, KFS_OverrideValue& value) {
+                                   boost::get<std::vector<double>>(value)[0] += time.value;
+                               },
+                               hearth::utility::Guid(), false));
+    using Answers = std::pair<std::vector<double>, std::vector<hearth::utility::Guid>>;
+    constexpr int Step = 50;
+    auto const ask = [&] {
+        Q_ScSetCurrentRenderContext const current(kfshost::MakeRenderContext(true));
+        Answers answers;
+        for (int time = 0; time < Span; time += Step) {
+            for (KFS_Stream const* const leaf : leaves) {
+                T_Time const moment{time, 600};
+                EXPECT_EQ(0, KFS_GetValueFPlus(leaf, &moment, 0, &answers.first.emplace_back(), nullptr, &shared.bag));
+                leaf->GetExprInfo().AddDependency(time);
+            }
+        }
+        answers.second = {root.GetRenderGuid(shared, nullptr), shared.bag.GetGUID()};
+        return answers;
+    };
+    std::vector<Answers> answers(Renders);
+    std::atomic<int> done{0};
+    std::vector<std::thread> renders;
+    for (Answers& answer : answers)
+        renders.emplace_back([&] {
+            answer = ask();
+            ++done;
+        });
+    std::size_t dependencies = 0;
+    while (done < Renders) {
+        std::size_t const now = leaves[0]->GetExprInfo().GetDependencyIds().size();
+        EXPECT_LE(dependencies, now);
+        dependencies = now;
+    }
+    for (std::thread& render : renders) render.join();
+
+    Answers const expected = ask();
+    EXPECT_EQ(1.0, expected.first[3]);
+    EXPECT_EQ(3.0 + Step, expected.first[4]);
+    for (Answers const& answer : answers) EXPECT_TRUE(expected == answer);
+    EXPECT_EQ(static_cast<std::size_t>(Span / Step), leaves[0]->GetExprInfo().GetDependencyIds().size());
 }
 
 TEST_F(RenderThreads, ReportsOfRendersDontMix)
