@@ -184,7 +184,7 @@ private:
         Motion const motion(item, options_.Cut(*SpanOf({&item})), pointsPerUnit * unit_.perSecond);
         svg_.Text({PanelLeft, top_ + 14}, ShortenedPath(item.path), {15.0, "#111111", Anchor::Start, true});
         top_ += TitleHeight;
-        MotionLayout const layout = LayOutViews(motion.Box(), top_, options_.selection.file + ": " + item.path);
+        MotionLayout const layout = LayOutViews(motion.Box(), top_, options_.selection.ShownFile() + ": " + item.path);
         double const keyDistance = motion.KeyDistance(layout.unitsPerPixel);
         Rational const step = DotStep(motion, options_.fps, layout.unitsPerPixel);
         std::vector<Place> const dots = Dots(motion, step);

@@ -81,7 +81,7 @@ int Run(Options const& options, Move const& move)
             std::string const text = TextOf(move.run(*item->stream, options.tolerance), *item);
             if (!text.empty()) told.push_back(item->path + ": " + text);
         } catch (kfshost::DimensionsError const& error) {
-            throw UserError(kfshost::ShownFileName(options.selection.file) + ": " + item->path, error.what());
+            throw UserError(options.selection.ShownFile() + ": " + item->path, error.what());
         }
     }
     for (std::string const& text : told) TellAbout(options.selection.file, text);

@@ -28,15 +28,15 @@ void HoldAsPath(StreamItem& item, Selection const& selection)
         try {
             item.stream = kfshost::JoinedCopy(*item.stream);
         } catch (kfshost::DimensionsError const& error) {
-            throw UserError(selection.file + ": " + item.path, error.what());
+            throw UserError(selection.ShownFile() + ": " + item.path, error.what());
         }
     }
     if (kfshost::KeyCount(*item.stream) > kfshost::MaxPathKeys) {
-        throw UserError(selection.file + ": " + item.path,
+        throw UserError(selection.ShownFile() + ": " + item.path,
                         fmt::format("has more than {} keys, too many for a path", kfshost::MaxPathKeys));
     }
     if (selection.roving && item.interpolation == kfshost::SourceInterpolation::Step) {
-        throw UserError(selection.file + ": " + item.path,
+        throw UserError(selection.ShownFile() + ": " + item.path,
                         "steps from key to key, so there is no way on which keys could rove");
     }
     if (!item.stream->IsSpatial())  // a project may hold it as a path already
@@ -57,7 +57,7 @@ void HoldAsPaths(kfshost::Scene& scene, Selection const& selection)
     }
     if (!any) {
         throw UserError(
-            selection.file,
+            selection.ShownFile(),
             selected == 1 ? "the chosen stream isn't a position in 2 or 3 dimensions"
                           : fmt::format("none of the {} chosen streams is a position in 2 or 3 dimensions", selected));
     }
@@ -78,14 +78,19 @@ kfshost::Scene ReadScene(Selection const& selection)
 
 }  // namespace
 
+std::string Selection::ShownFile() const
+{
+    return kfshost::ShownFileName(file);
+}
+
 std::vector<StreamItem const*> SelectStreams(kfshost::Scene const& scene, Selection const& selection)
 {
     std::vector<StreamItem const*> items;
     for (StreamItem const& item : scene.streams)
         if (Matches(item, selection)) items.push_back(&item);
-    if (scene.streams.empty()) throw UserError(selection.file, "nothing is animated");
+    if (scene.streams.empty()) throw UserError(selection.ShownFile(), "nothing is animated");
     if (items.empty()) {
-        throw UserError(selection.file,
+        throw UserError(selection.ShownFile(),
                         fmt::format("--stream {}: none of the {} streams has such a path (kfs info lists them)",
                                     selection.glob, scene.streams.size()));
     }

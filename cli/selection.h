@@ -13,6 +13,9 @@ struct Selection {
     unsigned int timeScale = 0;
     bool asPaths = false;  // positions are to be held as spatial streams
     bool roving = false;   // and their inner keys are to float; only with asPaths
+
+    // The file as it is called when something is told of it.
+    std::string ShownFile() const;
 };
 
 // The scene of a selection's file, with paths where the selection asks for them. Throws UserError and what loading

@@ -230,7 +230,7 @@ private:
     Range const& Drawable(StreamItem const& item, Range const& range) const
     {
         if (!std::isfinite(range.high - range.low))
-            throw UserError(options_.selection.file + ": " + item.path, "the numbers are too large to draw");
+            throw UserError(options_.selection.ShownFile() + ": " + item.path, "the numbers are too large to draw");
         return range;
     }
 
@@ -388,7 +388,7 @@ private:
 
 std::vector<StreamItem const*> StreamsToDraw(DrawingOptions const& options, kfshost::Scene const& scene, bool pathsOnly)
 {
-    std::string const& file = options.selection.file;
+    std::string const file = options.selection.ShownFile();
     auto items = SelectStreams(scene, options.selection);
     std::erase_if(items, [pathsOnly](StreamItem const* item) {
         return !kfshost::HasKeys(*item->stream) || !SpanOf({item}) || (pathsOnly && !item->stream->IsSpatial());

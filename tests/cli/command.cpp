@@ -1,6 +1,11 @@
 #include "tests/cli/command.h"
 #include "tests/support/places.h"
 
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cstdlib>
+#include <fstream>
 #include <stdexcept>
 
 #include <fcntl.h>
@@ -10,7 +15,7 @@
 
 namespace {
 
-int Spawn(std::vector<std::string> const& arguments, std::string const& output, std::string const& errors)
+int Spawn(std::vector<std::string> const& arguments, Streams const& streams, std::string const& errors)
 {
     std::vector<char*> pointers;
     std::string command = kfstest::Command();
@@ -20,8 +25,9 @@ int Spawn(std::vector<std::string> const& arguments, std::string const& output, 
 
     posix_spawn_file_actions_t actions;
     posix_spawn_file_actions_init(&actions);
-    posix_spawn_file_actions_addopen(&actions, STDIN_FILENO, "/dev/null", O_RDONLY, 0);
-    posix_spawn_file_actions_addopen(&actions, STDOUT_FILENO, output.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600);
+    posix_spawn_file_actions_addopen(&actions, STDIN_FILENO, streams.input.c_str(), O_RDONLY, 0);
+    posix_spawn_file_actions_addopen(&actions, STDOUT_FILENO, streams.output.c_str(), O_WRONLY | O_CREAT | O_TRUNC,
+                                     0600);
     posix_spawn_file_actions_addopen(&actions, STDERR_FILENO, errors.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600);
     pid_t child = 0;
     int const failed = posix_spawn(&child, command.c_str(), &actions, nullptr, pointers.data(), environ);
@@ -34,13 +40,24 @@ int Spawn(std::vector<std::string> const& arguments, std::string const& output, 
 
 }  // namespace
 
-Outcome RunKfs(std::vector<std::string> const& arguments, std::string const& output)
+Outcome RunKfs(std::vector<std::string> const& arguments, Streams const& streams)
 {
     ScratchFolder const folder;
-    std::string const out = output.empty() ? folder.Path("output") : output;
+    bool const isKept = streams.output.empty();
     Outcome outcome;
-    outcome.code = Spawn(arguments, out, folder.Path("errors"));
-    outcome.output = output.empty() ? FileContent(out) : "";
+    outcome.code =
+        Spawn(arguments, {streams.input, isKept ? folder.Path("output") : streams.output}, folder.Path("errors"));
+    outcome.output = isKept ? FileContent(folder.Path("output")) : "";
     outcome.errors = FileContent(folder.Path("errors"));
     return outcome;
+}
+
+void ExpectGolden(std::string const& name, std::string const& text)
+{
+    std::string const file = kfstest::SourceFolder() / "tests/cli/golden" / name;
+    if (std::getenv("KFS_WRITE_GOLDEN")) std::ofstream(file, std::ios::binary) << text;
+    std::string const golden = FileContent(file);
+    auto const [ours, theirs] = std::mismatch(text.begin(), text.end(), golden.begin(), golden.end());
+    EXPECT_TRUE(text == golden) << name << " differs from line " << 1 + std::count(text.begin(), ours, '\n')
+                                << " on; with KFS_WRITE_GOLDEN=1 it is written anew, and git shows what changed";
 }

@@ -13,25 +13,27 @@ struct Outcome {
     std::string errors;
 };
 
-// Runs the built command. The arguments need no quoting. `output`: where its standard output goes in place of the
-// result.
-Outcome RunKfs(std::vector<std::string> const& arguments, std::string const& output = "");
+// Where a run gets its standard input from, and where its standard output goes in place of the result.
+struct Streams {
+    std::string input = "/dev/null";
+    std::string output;
+};
+
+// Runs the built command. The arguments need no quoting.
+Outcome RunKfs(std::vector<std::string> const& arguments, Streams const& streams = {});
 
 // The animation of a bouncing ball: three streams.
 inline std::string const Sample = kfstest::SamplesFolder() / "bouncing_ball.gltf";
 
-inline std::size_t Count(std::string const& text, std::string const& part)
-{
-    std::size_t count = 0;
-    for (std::size_t at = 0; (at = text.find(part, at)) != std::string::npos; at += part.size()) ++count;
-    return count;
-}
-
 // A joint that goes through these rows of "x y z", one a step.
-inline std::string Motion(std::vector<std::string> const& rows, std::string const& step = "1")
+inline std::string Motion(std::vector<std::string> const& rows, std::string const& step = "1",
+                          std::string const& channels = "3 Xposition Yposition Zposition")
 {
-    std::string text = "HIERARCHY\nROOT a\n{\nCHANNELS 3 Xposition Yposition Zposition\n}\nMOTION\nFrames: " +
-                       std::to_string(rows.size()) + "\nFrame Time: " + step + '\n';
+    std::string text = "HIERARCHY\nROOT a\n{\nCHANNELS " + channels +
+                       "\n}\nMOTION\nFrames: " + std::to_string(rows.size()) + "\nFrame Time: " + step + '\n';
     for (std::string const& row : rows) text += row + '\n';
     return text;
 }
+
+// Holds a text against the file tests/cli/golden/NAME, or writes the file where KFS_WRITE_GOLDEN is set.
+void ExpectGolden(std::string const& name, std::string const& text);
