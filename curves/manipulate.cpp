@@ -14,6 +14,7 @@
 #include "keystore/pins_private.h"
 #include "keystore/valuedata_private.h"
 
+#include <cmath>
 #include <vector>
 
 namespace {
@@ -55,20 +56,24 @@ struct Seen {
     KFS_KeyScalar const* held = nullptr;  // the key whose value it showed, if it held
 };
 
-// Makes a spline of the segment between two keys, with the handles that its other sides were answered to have.
-Seen MakeSpline(KFS_Stream const* stream, KFS_KeyScalar* a, KFS_KeyScalar* b)
+// Makes a spline of the segment between two keys, with the handles that its other sides were answered to have. Nothing is
+// written where the keys lie too far apart for that.
+int MakeSpline(KFS_Stream const* stream, KFS_KeyScalar* a, KFS_KeyScalar* b, Seen* seen)
 {
-    Seen seen;
     if (a->outInterp == KFS_Interp_Hold)
-        seen.held = a;
+        seen->held = a;
     else if (b->inInterp == KFS_Interp_Hold)
-        seen.held = b;
+        seen->held = b;
+    bool const isSpline = a->outInterp == KFS_Interp_Spline && b->inInterp == KFS_Interp_Spline;
     int const dimension = stream->GetDimension();
     double const seconds = KFSp_Seconds(b->time, a->time, stream->GetTimeScale());
     KFSp_TemporalRuns<double> const from = KFSp_GetTemporalRuns(a, dimension);
     KFSp_TemporalRuns<double> const to = KFSp_GetTemporalRuns(b, dimension);
+    auto const speedOf = [&](int i) { return seen->held ? 0.0 : (to.value[i] - from.value[i]) / seconds; };
+    for (int i = 0; i < dimension; ++i)
+        if (!isSpline && !std::isfinite(speedOf(i))) return CRV_Err_NotFinite;
     for (int i = 0; i < dimension; ++i) {
-        double const speed = seen.held ? 0.0 : (to.value[i] - from.value[i]) / seconds;
+        double const speed = speedOf(i);
         if (a->outInterp != KFS_Interp_Spline) {
             from.outSpeed[i] = speed;
             from.outInfluence[i] = KFSp_OneSixth;
@@ -81,7 +86,7 @@ Seen MakeSpline(KFS_Stream const* stream, KFS_KeyScalar* a, KFS_KeyScalar* b)
     a->outInterp = KFS_Interp_Spline;
     b->inInterp = KFS_Interp_Spline;
     for (KFS_KeyScalar* const key : {a, b}) key->flags &= static_cast<unsigned short>(~KFS_KeyFlag_Modifiable);
-    return seen;
+    return 0;
 }
 
 // The graph tangents of the segment's two sides, `dimension` numbers each.
@@ -143,7 +148,8 @@ int DragGraph(Drag const& drag, KFSp_Neighbours const& around)
     if (int const code = CheckInside(around)) return code;
     int const dimension = drag.stream->GetDimension();
     Tangents tangents(dimension);
-    Seen const seen = MakeSpline(drag.stream, around.prev, around.next);
+    Seen seen;
+    if (int const code = MakeSpline(drag.stream, around.prev, around.next, &seen)) return code;
     if (int const code = KFSp_ClearCache(drag.stream)) return code;
     for (int i = 0; i < dimension; ++i)
         if (int const code = DragComponent(drag, around, seen, i, &tangents)) return code;
