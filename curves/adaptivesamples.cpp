@@ -25,7 +25,7 @@ namespace {
 
 constexpr unsigned int ExpressionRate = 30;  // samples a second
 constexpr int ScratchId = 0x1d0006;
-constexpr short PointSize = 16;  // bytes of a point of a chain
+constexpr short PointSize = 16;  // bytes of a sample and of a point of a chain
 constexpr int Runs = 6;          // of `dimension` doubles in the scratch block
 
 struct FreePtr {
@@ -41,6 +41,7 @@ double Seconds(T_Time const& time)
 struct Build {
     short dimension;
     KFS_Stream* stream;
+    KFS_Stream const* seen;  // the stream as this thread reads it
     T_Time start, duration;
     KFS_AdaptiveTransformFunc* transform;
     KFS_AdaptiveSplitFunc* splitCurve;
@@ -76,7 +77,7 @@ struct Build {
     T_Time end{};
     if (int const code = T_AddTime(&build.start, &build.duration, &end)) return code;
     if (int const code = T_AddTime(&end, &step, &end)) return code;
-    std::vector<double> values(static_cast<std::size_t>(build.stream->GetDimension()));
+    std::vector<double> values(static_cast<std::size_t>(build.seen->GetDimension()));
     for (;;) {
         if (int const code = KFS_GetValueF(build.stream, &time, 0, values.data(), nullptr, nullptr)) return code;
         double y = values[static_cast<std::size_t>(build.dimension)];
@@ -95,6 +96,19 @@ struct Build {
 
 // ---- keys
 
+// A chain of a split, which is given back whatever happens: also where the caller's test throws.
+class ScPieces {
+public:
+    ScPieces(SEQ_Head** list, KFSp_FirstError& error) : list_(list), error_(error) {}
+    ~ScPieces() { error_.Keep(SEQ_Dispose(list_, 0)); }
+    ScPieces(ScPieces const&) = delete;
+    ScPieces& operator=(ScPieces const&) = delete;
+
+private:
+    SEQ_Head** list_;
+    KFSp_FirstError& error_;
+};
+
 // A key as the polyline sees it.
 struct Key {
     int index = 0;
@@ -111,8 +125,8 @@ public:
     KeySampler(Build& build, double* scratch)
         : build_(build),
           value_(scratch),
-          x_(scratch + 4 * build.stream->GetDimension()),
-          y_(scratch + 5 * build.stream->GetDimension()),
+          x_(scratch + 4 * build.seen->GetDimension()),
+          y_(scratch + 5 * build.seen->GetDimension()),
           startSec_(Seconds(build.start)),
           endSec_(startSec_ + Seconds(build.duration))
     {}
@@ -201,15 +215,14 @@ private:
         return pieces ? AddChain(pieces) : 0;
     }
 
-    // The list is given back whatever happens.
     [[nodiscard]] int AddChain(SEQ_Head** pieces)
     {
         KFSp_FirstError error;
         {
+            ScPieces const given(pieces, error);
             KFSp_ScPin const pin(pieces, error);
             if (error.None()) error.Keep(EvaluateChain(pieces));
         }
-        error.Keep(SEQ_Dispose(pieces, 0));
         return error.Code();
     }
 
@@ -245,16 +258,16 @@ private:
 
 [[nodiscard]] int SampleKeys(Build& build)
 {
-    std::size_t const size = static_cast<std::size_t>(build.stream->GetDimension()) * Runs * sizeof(double);
+    std::size_t const size = static_cast<std::size_t>(build.seen->GetDimension()) * Runs * sizeof(double);
     std::unique_ptr<double, FreePtr> const scratch(
         static_cast<double*>(Q_AllocatePtrClear(ScratchId, KFSp_MessageText(KFSp_Row_AdaptiveSamples), size)));
-    SEQ_Head** const keys = build.stream->GetKeys();
+    SEQ_Head** const keys = build.seen->GetKeyData()->keys;
     if (!scratch || !keys) return 0;
     KFSp_FirstError error;
     {
         KFSp_ScPin const pin(keys, error);
         if (!error.None()) return error.Code();
-        error.Keep(build.stream->UpdateStream());  // times and handles are read one by one, and belong together
+        error.Keep(build.seen->UpdateStream());  // times and handles are read one by one, and belong together
         if (error.None()) error.Keep(KeySampler(build, scratch.get()).Run((*keys)->count));
     }
     return error.Code();
@@ -269,9 +282,11 @@ int KFS_GetAdaptiveSampleStream(short dimension, KFS_Stream* stream, T_Time cons
 {
     return KFSp_Boundary([&] {
         if (!stream || !start || !duration || !out || !out->samples) return 0;
-        if (dimension < 0 || dimension >= stream->GetDimension()) return int{KFS_Err_LegacyMismatch};
-        Build build{dimension,  stream, *start,       *duration, transform, splitCurve,
-                    sampleFunc, refCon, out->samples, minValue,  maxValue};
-        return KFSp_Seen(stream)->HasActiveExpression() ? SampleExpression(build, aborter) : SampleKeys(build);
+        KFS_Stream const* const seen = KFSp_Seen(stream);
+        if (dimension < 0 || dimension >= seen->GetDimension()) return int{KFS_Err_LegacyMismatch};
+        if (SEQ_GetItemSize(out->samples) != PointSize) return int{KFS_Err_LegacyMismatch};
+        Build build{dimension,  stream,     seen,   *start,       *duration, transform,
+                    splitCurve, sampleFunc, refCon, out->samples, minValue,  maxValue};
+        return seen->HasActiveExpression() ? SampleExpression(build, aborter) : SampleKeys(build);
     });
 }

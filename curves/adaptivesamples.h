@@ -47,9 +47,12 @@ using KFS_AdaptiveSplitFunc = int(void* refCon, CRV_Curve* curve, SEQ_Head*** pi
 //   aborter     asked between samples of an expression, and only while the debug entry "KFS_AllowAbortAudio" is on
 //
 // An active expression is sampled 30 times a second, to a sample behind the end. A null stream, time or list is no
-// error and gives nothing, and so does a constant. Result: 0; 3 for a component that the stream hasn't; KFS_Err_CustomValue;
-// the services' and the callbacks' codes. Samples of a failed build stay in the list. Brings the stream up to date, as
-// reads do, and pins its keys meanwhile.
+// error and gives nothing, and so does a constant. Of a path the samples show the keys and, between them, no component:
+// its handles are of distance by time.
+//
+// Result: 0; 3 for a component that the stream hasn't, or a list of other items; KFS_Err_CustomValue; the services' and
+// the callbacks' codes. Samples of a failed build stay in the list; what a split gave is disposed. Brings the stream up
+// to date, as reads do, and pins its keys meanwhile.
 [[nodiscard]] KFS_API int KFS_GetAdaptiveSampleStream(short dimension, KFS_Stream* stream, T_Time const* start,
                                                       T_Time const* duration, KFS_AdaptiveTransformFunc* transform,
                                                       KFS_AdaptiveSplitFunc* splitCurve, CRV_SampleFunc* sampleFunc,

@@ -62,6 +62,10 @@ int KFS_InitIterateAdaptiveSampleStream(KFS_AdaptiveSampleStream* stream, double
 int KFS_IterateAdaptiveSampleStream(double x, double step, KFS_AdaptiveSampleStream*, double* samples, int count,
                                     int* nextIndex, KFS_AdaptiveSampleStreamCache* cache, double* slope, double* value)
 {
+    if (cache->inSegment && cache->x0 <= x && cache->x1 > x) [[likely]] {
+        cache->value += cache->step;
+        return Answer(cache->slope, cache->value, slope, value);
+    }
     CloseIfEmpty(cache);
     for (;;) {
         if (cache->x0 > x) return AnswerStill(cache, cache->y0, slope, value);
@@ -72,10 +76,6 @@ int KFS_IterateAdaptiveSampleStream(double x, double step, KFS_AdaptiveSampleStr
         TakeSample(samples, (*nextIndex)++, &cache->x1, &cache->y1);
         cache->inSegment = false;
         CloseIfEmpty(cache);
-    }
-    if (cache->inSegment) {
-        cache->value += cache->step;
-        return Answer(cache->slope, cache->value, slope, value);
     }
     double const width = cache->x1 - cache->x0;
     if (width == 0.0) return AnswerStill(cache, cache->y1, slope, value);

@@ -51,9 +51,26 @@ struct Stretch {
     return 0;
 }
 
-// Appends what comes behind the stretch's start. Halving ends where no parameter or no x is left between the ends.
-[[nodiscard]] int AppendStretch(CRV_SampleFunc* test, void* refCon, CRV_Curve const* curve, Stretch const& stretch,
-                                unsigned int depth, Polyline const& out)
+// A curve on its way into a polyline. Where x turns back, what lies left of the farthest x so far isn't part of the graph,
+// nor is what swings out beyond its end.
+struct Piece {
+    CRV_SampleFunc* test;
+    void* refCon;
+    CRV_Curve const* curve;
+    Polyline const& out;
+    double farthest;
+    double end;
+
+    [[nodiscard]] int Append(Sample const& sample)
+    {
+        if (sample.x < farthest || sample.x > end) return 0;
+        farthest = sample.x;
+        return out.Append(sample);
+    }
+};
+
+// Appends what comes behind the stretch's start. Halving ends where no parameter is left between the ends.
+[[nodiscard]] int AppendStretch(Piece& piece, Stretch const& stretch, unsigned int depth)
 {
     double const middleT = 0.5 * (stretch.t0 + stretch.t1);
     bool const canDivide = depth < CRV_MostHalvings && middleT > stretch.t0 && middleT < stretch.t1;
@@ -61,14 +78,14 @@ struct Stretch {
     if (canDivide) {
         double start[2] = {stretch.start.x, stretch.start.y};
         double end[2] = {stretch.end.x, stretch.end.y};
-        if (int const code = test(refCon, depth, stretch.t0, stretch.t1, start, end, curve, &divide)) return code;
+        if (int const code = piece.test(piece.refCon, depth, stretch.t0, stretch.t1, start, end, piece.curve, &divide))
+            return code;
     }
-    if (divide == 0) return out.Append(stretch.end);
+    if (divide == 0) return piece.Append(stretch.end);
     Sample middle{};
-    if (int const code = PointAt(curve, middleT, &middle)) return code;
-    Stretch const left{stretch.t0, middleT, stretch.start, middle};
-    if (int const code = AppendStretch(test, refCon, curve, left, depth + 1, out)) return code;
-    return AppendStretch(test, refCon, curve, {middleT, stretch.t1, middle, stretch.end}, depth + 1, out);
+    if (int const code = PointAt(piece.curve, middleT, &middle)) return code;
+    if (int const code = AppendStretch(piece, {stretch.t0, middleT, stretch.start, middle}, depth + 1)) return code;
+    return AppendStretch(piece, {middleT, stretch.t1, middle, stretch.end}, depth + 1);
 }
 
 // The parameter at a bound of the span, and the point there: an end of the curve where the bound lies outside.
@@ -107,5 +124,6 @@ int CRV_EvaluateAdaptively(CRV_SampleFunc* sampleFunc, void* refCon, double cons
     if (int const code = FindBound(curve, *endX, &stretch.t1, &stretch.end)) return code;
     if (*endX < curve->p0[0] || *startX > curve->p3[0] || stretch.t1 < stretch.t0) return 0;
     if (int const code = out.Append(stretch.start)) return code;
-    return AppendStretch(sampleFunc, refCon, curve, stretch, 0, out);
+    Piece piece{sampleFunc, refCon, curve, out, stretch.start.x, stretch.end.x};
+    return AppendStretch(piece, stretch, 0);
 }

@@ -2,6 +2,7 @@
 
 #include "curves/tangents.h"
 #include "frame/services/debug.h"
+#include "frame/services/memory.h"
 #include "overrides/streamexpression.h"
 #include "tests/support/dice.h"
 #include "tests/support/streams.h"
@@ -193,6 +194,33 @@ TEST_F(AdaptiveSamples, AsksTheCallbacks)
     };
     EXPECT_EQ(0, Build(stream, {0, 1}, {2, 1}, 0, 1e3, nullptr, split));
     EXPECT_EQ((std::vector<Sample>{{0, 1}, {0.5, 10}, {1, 2}}), Samples());
+
+    // A test that throws leaves nothing behind, and a curve that turns back in x gives no sample left of the farthest.
+    Empty();
+    Q_MemoryCount const before = Q_MemoryLive(nullptr);
+    auto const throws = [](void*, unsigned int, double, double, double*, double*, CRV_Curve const*,
+                           unsigned char*) -> int { throw 88; };
+    for (CRV_SampleFunc* const test : {static_cast<CRV_SampleFunc*>(throws), &Flat}) {
+        auto const fold = [](void*, CRV_Curve* curve, SEQ_Head*** pieces) {
+            Sample const start{curve->p0[0], 0}, out{curve->p3[0] + 5, 9}, in{curve->p0[0] - 5, 9},
+                end{curve->p3[0], 1};
+            EXPECT_EQ(0, SEQ_New(0, sizeof(Sample), 4, 1, pieces));
+            for (Sample const& point : {start, out, in, end}) EXPECT_EQ(0, SEQ_Insert(&point, -1, *pieces));
+            return 0;
+        };
+        double tolerance = 1e-2;
+        T_Time const start{1, 10}, duration{2, 1};
+        Empty();
+        EXPECT_EQ(test == &Flat ? 0 : 88,
+                  KFS_GetAdaptiveSampleStream(0, stream, &start, &duration, nullptr, fold, test, &tolerance, &out_,
+                                              &least_, &greatest_, aborter_));
+        std::vector<Sample> const samples = Samples();
+        EXPECT_TRUE(std::ranges::is_sorted(samples, {}, &Sample::x));
+        EXPECT_EQ(test == &Flat, samples.size() > 5);
+        EXPECT_EQ(0, stream.Pins());
+    }
+    Empty();
+    EXPECT_EQ(before, Q_MemoryLive(nullptr));
 
     KFS_SetStreamExpression(stream, Text("x"));
     for (bool const mayAbort : {false, true}) {
