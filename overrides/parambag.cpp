@@ -3,11 +3,12 @@
 #include "tree/streambase.h"
 
 #include <algorithm>
+#include <iterator>
 #include <utility>
 
 using hearth::utility::Guid;
 
-KFS_ParamBag::KFS_ParamBag(KFS_ParamBag const& source) : overrides_(source.overrides_)
+KFS_ParamBag::KFS_ParamBag(KFS_ParamBag const& source) : overrides_(source.overrides_), hashes_(source.hashes_)
 {
     boost::mutex::scoped_lock const hold(source.lock_);
     guid_ = source.guid_;
@@ -17,6 +18,8 @@ KFS_ParamBag::KFS_ParamBag(KFS_ParamBag const& source) : overrides_(source.overr
 KFS_ParamBag::KFS_ParamBag(KFS_ParamBag const& a, KFS_ParamBag const& b) : overrides_(a.overrides_)
 {
     overrides_.insert(b.overrides_.begin(), b.overrides_.end());
+    hashes_.reserve(a.hashes_.size() + b.hashes_.size());
+    std::set_union(a.hashes_.begin(), a.hashes_.end(), b.hashes_.begin(), b.hashes_.end(), std::back_inserter(hashes_));
 }
 
 // What can run out of memory comes first: a GUID must never stand beside a content that isn't its own.
@@ -29,6 +32,7 @@ KFS_ParamBag& KFS_ParamBag::operator=(KFS_ParamBag const& source)
 KFS_ParamBag& KFS_ParamBag::operator=(KFS_ParamBag&& source) noexcept
 {
     overrides_.swap(source.overrides_);
+    hashes_.swap(source.hashes_);
     std::swap(guid_, source.guid_);
     dirty_ = source.dirty_.exchange(dirty_);
     return *this;
@@ -66,6 +70,9 @@ void KFS_ParamBag::ComputeGuid() const
 
 void KFS_ParamBag::AddOverride(KFS_StreamBase const* stream, boost::shared_ptr<KFS_StreamOverride> streamOverride)
 {
+    unsigned int const hash = stream->GetStreamCapsuleHash();
+    auto const place = std::lower_bound(hashes_.begin(), hashes_.end(), hash);
+    if (place == hashes_.end() || *place != hash) hashes_.insert(place, hash);
     overrides_[stream->GetStreamCapsuleData().id] = std::move(streamOverride);
     SetDirty();
 }
@@ -73,12 +80,14 @@ void KFS_ParamBag::AddOverride(KFS_StreamBase const* stream, boost::shared_ptr<K
 void KFS_ParamBag::Clear()
 {
     overrides_.clear();
+    hashes_.clear();
     SetDirty();
 }
 
 KFS_StreamOverride const* KFS_ParamBag::Find(KFS_StreamBase const* stream) const
 {
-    if (overrides_.empty()) return nullptr;
+    if (hashes_.empty()) return nullptr;
+    if (!std::binary_search(hashes_.begin(), hashes_.end(), stream->GetStreamCapsuleHash())) return nullptr;
     auto const place = overrides_.find(stream->GetStreamCapsuleData().id);
     return place == overrides_.end() ? nullptr : place->second.get();
 }

@@ -68,6 +68,9 @@ private:
     void ComputeGuid() const;
 
     std::map<u16str, boost::shared_ptr<KFS_StreamOverride>> overrides_;
+    // Sorted: KFS_StreamBase::GetStreamCapsuleHash of each stream that is named, perhaps of more. Nearly all streams that
+    // are read aren't named, and are told so by this.
+    std::vector<unsigned int> hashes_;
     mutable hearth::utility::Guid guid_;
     mutable boost::mutex lock_;  // guards guid_ and the way of dirty_ to false
     mutable std::atomic<bool> dirty_{true};

@@ -11,6 +11,7 @@
 
 #include <boost/any.hpp>
 
+#include <atomic>
 #include <set>
 #include <vector>
 
@@ -177,6 +178,13 @@ public:
     void SlowGetPathFromRootToMe(KFS_StreamGroup const** root, KFS_StreamIDPath* path) const;
     // Of the place that the node has when first asked: the answer is kept and doesn't follow the node through the tree.
     KFS_StreamCapsuleData const& GetStreamCapsuleData() const;
+    // A hash of the identifier in it, never 0: what tells most streams apart without a lock and without a string. Means
+    // nothing outside the process.
+    unsigned int GetStreamCapsuleHash() const
+    {
+        unsigned int const known = capsuleHash_.load(std::memory_order_acquire);
+        return known != 0 ? known : ComputeCapsuleHash();
+    }
 
     // These ask the factory. Without one they are a broken invariant: reported, and the int 3 thrown.
     KFS_StreamBase* CreateStream(KFS_MatchName const& name, bool constant, unsigned int timeScale, bool reportIfUnknown,
@@ -250,11 +258,13 @@ private:
 
     bool HasFlag(KFS_BaseFlag flag) const { return (flags_ & flag) != 0; }
     void SetFlag(KFS_BaseFlag flag, bool on) { SetStreamBaseFlags(on ? flag : 0U, flag); }
+    unsigned int ComputeCapsuleHash() const;
 
     KFS_MatchName matchName_;
     unsigned int flags_;
     KFS_StreamGroup* parent_ = nullptr;
     int listenerState_ = KFS_ListenerState_Unknown;
+    mutable std::atomic<unsigned int> capsuleHash_{0};  // set once capsuleData_ won't change any more
     mutable FX_ParamDef paramDef_{};
     KFS_StreamFactory* factory_;
     mutable u16str displayName_;

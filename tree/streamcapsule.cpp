@@ -1,6 +1,7 @@
 #include "tree/streambase.h"
 #include "tree/streamgroup.h"
 
+#include <algorithm>
 #include <utility>
 
 namespace {
@@ -30,6 +31,7 @@ void KFS_StreamBase::SlowGetPathFromRootToMe(KFS_StreamGroup const** root, KFS_S
 
 KFS_StreamCapsuleData const& KFS_StreamBase::GetStreamCapsuleData() const
 {
+    if (capsuleHash_.load(std::memory_order_acquire) != 0) return capsuleData_;
     hearth::threads::ScRecursiveLock const guard(lock_);
     if (!capsuleData_.id.empty()) return capsuleData_;
     if (IsCanonical()) {
@@ -42,4 +44,18 @@ KFS_StreamCapsuleData const& KFS_StreamBase::GetStreamCapsuleData() const
     found.id = (root ? root->GetCapsuleStreamID() : u16str()) + found.path.GetAs_JSON();
     capsuleData_ = std::move(found);
     return capsuleData_;
+}
+
+// FNV-1a, over units instead of bytes.
+unsigned int KFS_StreamBase::ComputeCapsuleHash() const
+{
+    constexpr unsigned int Basis = 0x811c9dc5;
+    constexpr unsigned int Prime = 0x01000193;
+    u16str const& id = GetStreamCapsuleData().id;
+    unsigned int hash = Basis;
+    for (unsigned short const unit : id) hash = (hash ^ unit) * Prime;
+    hash = std::max(hash, 1U);
+    // An empty identifier is looked up anew each time, as it may have become another by then.
+    if (!id.empty()) capsuleHash_.store(hash, std::memory_order_release);
+    return hash;
 }
