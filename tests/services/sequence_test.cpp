@@ -137,6 +137,7 @@ public:
         SEQ_Funcs const funcs{owns ? Copy : nullptr, owns ? Dispose : nullptr, Compare};
         EXPECT_EQ(0, SEQ_SetFuncs(list_, 3, &funcs));
         EXPECT_EQ(0, SEQ_SetRefcon(&tokens_, list_));
+        empty_ = Q_MemoryLive(nullptr);
     }
     ~Script()
     {
@@ -149,7 +150,7 @@ public:
     {
         int const count = static_cast<int>(model_.size()), index = dice_.Below(count + 4) - 2;
         bool const inList = index >= 0 && index < count, insertable = index >= -1 && index <= count;
-        int value = 1 + dice_.Below(100000);
+        int value = 1 + dice_.Below(size_ < 4 ? 250 : 100000);
         int const number = owns_ ? tokens_.Make(value) : value;
         std::string const outside = Item(size_, number, value);
         void const* source = outside.data();
@@ -159,8 +160,10 @@ public:
             value = model_[static_cast<std::size_t>(from)];
         }
         wanted_ = model_;
-        bool took = false;
-        int const kind = dice_.Below(9);
+        bool took = false, mayMove = true;
+        long long const room = Room();
+        void const* const first = count > 0 ? list_.At(0) : nullptr;
+        int const kind = dice_.Below(11);
         switch (kind) {
         case 0:
         case 1:
@@ -173,15 +176,20 @@ public:
             Arm();
             Expect(insertable, took ? SEQ_Insert(source, index, list_) : SEQ_InsertCopy(source, index, list_, 0));
             if (insertable) wanted_.insert(index == -1 ? wanted_.end() : wanted_.begin() + index, value);
+            mayMove = count >= room;
+            if (source == outside.data() && took && !mayMove) EXPECT_NE(4, code_) << "there was room";
+            if (code_ == 0 && mayMove) EXPECT_GE(Room(), room + room / 4) << "appending moves the items rarely";
             took = took && code_ == 0;
             break;
         }
         case 3:
+            mayMove = false;
             Arm();
             Expect(inList, SEQ_SetItemCopy(source, index, list_, 0, 0));
             if (inList) wanted_[static_cast<std::size_t>(index)] = value;
             break;
         case 4:
+            mayMove = false;
             Arm();
             Expect(inList, SEQ_Remove(index, list_, 0, nullptr));
             if (inList) wanted_.erase(wanted_.begin() + index);
@@ -205,15 +213,29 @@ public:
             if (code_ == DisposeFailed) model_.resize(static_cast<std::size_t>((*list_)->count));  // how far it came
             break;
         }
-        case 7:
+        case 7: {
+            int const wanted = dice_.Below(2) ? count + dice_.Below(20) : -1;
+            mayMove = wanted > room || (wanted < 0 && pins_ == 0);
             Arm();
-            Expect(true, dice_.Below(2) ? SEQ_Compact(list_) : SEQ_ReserveSpace(count + dice_.Below(20), list_));
+            Expect(true, wanted < 0 ? SEQ_Compact(list_) : SEQ_ReserveSpace(wanted, list_));
+            if (mayMove && code_ == 0) EXPECT_EQ(wanted < 0 ? count : wanted, Room()) << "exactly what was asked for";
             break;
+        }
         case 8: Duplicate(); break;
+        case 9: WriteAndRead(); break;
+        case 10:
+            Expect(true, dice_.Below(2) ? SEQ_Lock(1, list_) : SEQ_LockConst(1, list_));
+            for (++pins_; pins_ > dice_.Below(3); --pins_)
+                EXPECT_EQ(0, dice_.Below(2) ? SEQ_Unlock(list_) : SEQ_UnlockConst(list_));
+            break;
         }
         Q_FailAllocation(0);
         tokens_.failCopyIn = tokens_.failDisposeIn = 0;
         if (owns_ && !took) Dispose(&tokens_, list_, const_cast<char*>(outside.data()));
+        if (!mayMove || (kind == 6 && Room() == room)) {
+            EXPECT_EQ(room, Room());
+            if (!model_.empty() && (*list_)->count > 0) EXPECT_EQ(first, list_.At(0));
+        }
         if (code_ == 0) model_ = wanted_;
         failures_ += code_ != 0;
         ASSERT_EQ(model_, list_.Values(owns_ ? &tokens_ : nullptr)) << "code " << code_;
@@ -223,10 +245,12 @@ public:
     }
 
 private:
+    // How many items the list has memory for.
+    long long Room() const { return (Q_MemoryLive(nullptr).bytes - empty_.bytes) / (*list_)->stride; }
     static int Number(std::string const& item)
     {
-        int number;
-        std::memcpy(&number, item.data(), sizeof number);
+        int number = 0;
+        std::memcpy(&number, item.data(), std::min(item.size(), sizeof number));
         return number;
     }
     void Arm()
@@ -246,6 +270,10 @@ private:
     void Duplicate()
     {
         SEQ_Head** made = nullptr;
+        Q_MemoryCount const before = Q_MemoryLive(nullptr);
+        int const count = static_cast<int>(model_.size()), bytes = count * (*list_)->stride;
+        bool const isOneBlock = bytes <= 16384 && !(owns_ && count > 0);
+        std::size_t const tokens = tokens_.values.size();
         Arm();
         tokens_.failDisposeIn = 0;
         EXPECT_EQ(0, SEQ_Lock(1, list_));
@@ -254,12 +282,51 @@ private:
         Q_FailAllocation(0);
         EXPECT_EQ(code_ == 0, made != nullptr);
         if (!made) return;
+        EXPECT_EQ(before.blocks + (isOneBlock ? 1 : 2), Q_MemoryLive(nullptr).blocks);
         EXPECT_EQ(model_, list_.Values(owns_ ? &tokens_ : nullptr, made));
         EXPECT_EQ(0, SEQ_GetPinCount(made));
         EXPECT_TRUE((*made)->refcon == &tokens_ && (*made)->sort == Compare && (*made)->dispose == (*list_)->dispose);
-        if (dice_.Below(2)) EXPECT_EQ(0, SEQ_SetNumItems((*made)->count + 30, made, 0)) << "it grows like any list";
-        EXPECT_EQ(0, SEQ_Compact(made));
-        EXPECT_EQ(0, SEQ_Dispose(made, 0));
+        tokens_.failCopyIn = 0;
+        if (dice_.Below(2)) {
+            if (count > 0) EXPECT_EQ(0, SEQ_SetNumItems(count - 1, made, 0));
+            Q_FailAllocation(1);
+            if (count > 0) EXPECT_EQ(0, SEQ_Insert(std::string(size_, '\0').data(), 0, made)) << "room is reused";
+            EXPECT_EQ(4, SEQ_Insert(std::string(size_, '\0').data(), 0, made));
+            EXPECT_EQ(0, SEQ_SetNumItems(count + 30, made, 0) + SEQ_SetNumItems(0, made, 0) + SEQ_Compact(made));
+            EXPECT_LE(Q_MemoryLive(nullptr).bytes, before.bytes + (isOneBlock ? bytes : 0) + 200);
+        }
+        tokens_.failDisposeIn = 2;
+        bool const refuses = owns_ && (*made)->count > 1;
+        EXPECT_EQ(refuses ? DisposeFailed : 0, SEQ_Dispose(made, 0)) << "the first failure, and the others go";
+        EXPECT_EQ(refuses && model_[1] != 0, std::count_if(tokens_.values.begin() + static_cast<long>(tokens),
+                                                           tokens_.values.end(), [](int v) { return v >= 0; }));
+        tokens_.values.resize(tokens);
+    }
+    // Only the items go into the chunk, and they come back, or nothing does.
+    void WriteAndRead()
+    {
+        std::string items;
+        for (int i = 0; i < (*list_)->count; ++i) items.append(static_cast<char const*>(list_.At(i)), size_);
+        CKF_File file;
+        ASSERT_EQ(0, file.CreateInMemory() + SEQ_Write(list_, &file) + file.Commit());
+        std::string const atom = Atom("seql", Long(static_cast<std::uint32_t>(size_)) +
+                                                  Long(static_cast<std::uint32_t>(model_.size())) + items);
+        ASSERT_EQ(Form(atom), Bytes(file));
+        std::string const bytes = Form(Atom("what", "x") + ::List("kfbs", Atom("odd_", "x") + atom) + atom);
+        CKF_File read;
+        ASSERT_EQ(0, read.Open(Span(bytes)));
+        CKF_ScDescendList const leaf(&read, CKF_Id("kfbs"), nullptr, nullptr);
+        SEQ_Head **back = nullptr, **none = nullptr;
+        Arm();
+        Expect(true, SEQ_Read(&read, &back));
+        Q_FailAllocation(0);
+        ASSERT_EQ(code_ == 0, back != nullptr);
+        if (!back) return;
+        EXPECT_TRUE(SEQ_GetItemSize(back) == static_cast<int>(size_) && !(*back)->refcon && !(*back)->dispose);
+        EXPECT_EQ(model_, list_.Values(owns_ ? &tokens_ : nullptr, back));
+        EXPECT_EQ(0, SEQ_Dispose(back, 0));
+        EXPECT_EQ(CKF_Err_NoSuchChunk, SEQ_Read(&read, &none)) << "it stays in its list";
+        EXPECT_EQ(nullptr, none);
     }
     // Everything that only looks.
     void Look(int index)
@@ -268,8 +335,9 @@ private:
         void* item = nullptr;
         void const* constItem = nullptr;
         EXPECT_EQ(code, SEQ_GetAddress(list_, index, 1, &item));
-        EXPECT_EQ(code == 0 ? 1 : 0, SEQ_GetPinCount(list_)) << "a failure owes no unlock";
-        EXPECT_EQ(code == 0 ? 0 : SEQ_Err_NotPinned, SEQ_Unlock(list_));
+        EXPECT_EQ(pins_ + (code == 0), SEQ_GetPinCount(list_)) << "a failure owes no unlock";
+        EXPECT_EQ(code == 0 || pins_-- > 0 ? 0 : SEQ_Err_NotPinned, SEQ_Unlock(list_));
+        pins_ = std::max(pins_, 0);
         EXPECT_EQ(index == -1 && count > 0 ? 0 : code, SEQ_GetConstAddress(list_, index, &constItem));
         if (code == 0)
             EXPECT_EQ(item, constItem);
@@ -310,20 +378,23 @@ private:
     bool owns_, armed_ = false;
     List list_;
     std::vector<int> model_, wanted_;
-    int code_ = 0, failures_ = 0;
+    int code_ = 0, failures_ = 0, pins_ = 0;
+    Q_MemoryCount empty_;
 };
 
 TEST(Sequence, FollowsAVectorThroughSuccessAndFailure)
 {
     Q_MemoryCount const before = Q_MemoryLive(nullptr);
-    for (int const itemSize : {4, 8, 9, 104, 600})  // below, beside and above the alignment and the scratch item
+    // Below, beside and above the alignment and the scratch item; many items of the last don't go in one block.
+    for (int const itemSize : {1, 3, 4, 8, 9, 104, 600, 3000})
         for (bool const owns : {false, true}) {
+            if (owns && itemSize < 4) continue;
             Script script(itemSize, owns);
             for (int step = 0; step < Rounds(1500) && !testing::Test::HasFailure(); ++step) {
                 SCOPED_TRACE(testing::Message() << "items of " << itemSize << ", owning " << owns << ", step " << step);
                 script.Step();
             }
-            EXPECT_GT(script.Failures(), Rounds(200)) << "the failures that this test is about";
+            EXPECT_GT(script.Failures(), Rounds(150)) << "the failures that this test is about";
         }
     EXPECT_EQ(before, Q_MemoryLive(nullptr));
 }
@@ -356,18 +427,8 @@ TEST(Sequence, SearchAgreesWithTheStandardLibraryAtEveryCount)
     }
 }
 
-TEST(Sequence, DisposesAllWalksWhatShrinksAndKeepsAddressesUnderPins)
+TEST(Sequence, WalksWhatShrinks)
 {
-    Tokens tokens;
-    SEQ_Head** disposed = nullptr;
-    ASSERT_EQ(0, SEQ_New(0, 4, 4, 1, &disposed));
-    for (int i = 1; i <= 5; ++i) EXPECT_EQ(0, SEQ_Insert(Item(4, tokens.Make(i), i).data(), -1, disposed));
-    SEQ_Funcs const funcs{nullptr, Dispose, nullptr};
-    EXPECT_EQ(0, SEQ_SetFuncs(disposed, 3, &funcs) + SEQ_SetRefcon(&tokens, disposed));
-    tokens.failDisposeIn = 2;
-    EXPECT_EQ(DisposeFailed, SEQ_Dispose(disposed, 0)) << "the first failure";
-    EXPECT_EQ(1, tokens.Alive()) << "only the item that refused is left";
-
     List const list(8, {1, 2, 3, 4, 5, 6});
     auto const removeEven = [](SEQ_Head** handle, long, int index, void* item) {
         return *static_cast<int*>(item) % 2 == 0 ? SEQ_Remove(index, handle, 0, nullptr) : 0;
@@ -378,60 +439,8 @@ TEST(Sequence, DisposesAllWalksWhatShrinksAndKeepsAddressesUnderPins)
         return index >= refcon ? 42 + index : 0;
     };
     EXPECT_EQ(43, SEQ_ForEachConst(list, 1, stopAt, 0)) << "and end where they are told";
-
-    ASSERT_EQ(0, SEQ_ReserveSpace(10, list));
-    void const* const pinned = list.At(0);
-    EXPECT_EQ(0, SEQ_Lock(1, list) + SEQ_LockConst(1, list) + SEQ_Compact(list));
-    for (int i = 0; i < 7; ++i) EXPECT_EQ(0, SEQ_InsertCopy(Item(8, 9, 9).data(), -1, list, 0));
-    EXPECT_EQ(0, SEQ_SetItemCopy(Item(8, 4, 4).data(), 1, list, 0, 0) + SEQ_SetNumItems(2, list, 0));
-    EXPECT_EQ(pinned, list.At(0));
-    EXPECT_EQ((std::vector<int>{1, 4}), list.Values());
-    EXPECT_EQ((std::vector<int>{2, 0, 0, SEQ_Err_NotPinned, 0}),
-              (std::vector<int>{SEQ_GetPinCount(list), SEQ_Unlock(list), SEQ_UnlockConst(list), SEQ_UnlockConst(list),
-                                SEQ_GetPinCount(list)}))
-        << "a surplus unlock isn't paid for later";
-}
-
-TEST(Sequence, RoomIsWhatWasAskedForAndGoesBack)
-{
-    List const list(104);
-    Q_MemoryCount const empty = Q_MemoryLive(nullptr);
-    ASSERT_EQ(0, SEQ_ReserveSpace(50, list));
-    EXPECT_EQ(empty.bytes + 50 * 104, Q_MemoryLive(nullptr).bytes);
-    Q_FailAllocation(1);
-    for (int i = 0; i < 50; ++i) ASSERT_EQ(0, SEQ_Insert(Item(104, i, i).data(), 0, list));
-    EXPECT_FALSE(Q_FailAllocationFired()) << "reserved room needs no memory";
-    EXPECT_EQ(4, SEQ_Insert(Item(104, 1, 1).data(), -1, list));
-    ASSERT_EQ(0, SEQ_SetNumItems(7, list, 0));
-    ASSERT_EQ(0, SEQ_Compact(list));
-    EXPECT_EQ(empty.bytes + 7 * 104, Q_MemoryLive(nullptr).bytes);
-
-    for (int const count : {3, 400}) {  // a small duplicate is one block, a large one gives its room back
-        ASSERT_EQ(0, SEQ_SetNumItems(count, list, 0));
-        Q_MemoryCount const before = Q_MemoryLive(nullptr);
-        SEQ_Head** made = nullptr;
-        ASSERT_EQ(0, SEQ_Duplicate(list, 0, &made));
-        EXPECT_EQ(before.blocks + (count == 3 ? 1 : 2), Q_MemoryLive(nullptr).blocks);
-        ASSERT_EQ(0, SEQ_SetNumItems(count - 1, made, 0));
-        Q_FailAllocation(1);
-        EXPECT_EQ(0, SEQ_InsertCopy(Item(104, 1, 1).data(), 0, made, 0)) << "room is reused";
-        EXPECT_EQ(4, SEQ_InsertCopy(Item(104, 1, 1).data(), 0, made, 0));
-        EXPECT_EQ(0, SEQ_SetNumItems(count + 1, made, 0));
-        EXPECT_EQ(0, SEQ_SetNumItems(1, made, 0));
-        EXPECT_EQ(0, SEQ_Compact(made));
-        EXPECT_LT(Q_MemoryLive(nullptr).bytes, before.bytes + (count == 3 ? 4 : 2) * 104 + 200);
-        EXPECT_EQ(0, SEQ_Dispose(made, 0));
-    }
-    ASSERT_EQ(0, SEQ_SetNumItems(0, list, 0));
-    ASSERT_EQ(0, SEQ_Compact(list));
-    EXPECT_EQ(empty, Q_MemoryLive(nullptr));
-    int moves = 0;
-    for (int i = 0; i < 20000; ++i) {
-        void const* const first = i ? list.At(0) : nullptr;
-        ASSERT_EQ(0, SEQ_Insert(Item(104, i, i).data(), -1, list));
-        moves += first != list.At(0);
-    }
-    EXPECT_LE(moves, 25) << "appending moves the items a rare number of times";
+    auto const remove = [](SEQ_Head** handle, long, int index, void*) { return SEQ_Remove(index, handle, 0, nullptr); };
+    EXPECT_EQ(SEQ_Err_BadIndex, SEQ_ForRange(list, 0, 2, 0, remove, nullptr)) << "what was to come is gone";
 }
 
 TEST(Sequence, NonsenseIsRefused)
@@ -461,54 +470,6 @@ TEST(Sequence, NonsenseIsRefused)
                     SEQ_New(0, 8, 4, 1, nullptr)));
     EXPECT_EQ(nullptr, made);
     EXPECT_EQ((std::vector<int>{1}), list.Values());
-}
-
-// ---- files
-
-TEST(SequenceFile, OnlyTheItemsGoIntoTheChunkAndComeBackOrNothingDoes)
-{
-    Q_MemoryCount const before = Q_MemoryLive(nullptr);
-    for (int const itemSize : {1, 3, 7, 8, 12, 104, 32767})
-        for (int const count : {0, 1, 2, 27}) {
-            SCOPED_TRACE(testing::Message() << count << " items of " << itemSize);
-            List const list(itemSize);
-            std::string items;
-            for (int i = 0; i < count; ++i) {
-                items += Item(static_cast<std::size_t>(itemSize), i, i + 1);
-                ASSERT_EQ(0, SEQ_Insert(&items[items.size() - static_cast<std::size_t>(itemSize)], -1, list));
-            }
-            CKF_File file;
-            ASSERT_EQ(0, file.CreateInMemory());
-            ASSERT_EQ(0, SEQ_Write(list, &file));
-            ASSERT_EQ(0, file.Commit());
-            std::string const atom = Atom("seql", Long(static_cast<std::uint32_t>(itemSize)) +
-                                                      Long(static_cast<std::uint32_t>(count)) + items);
-            EXPECT_EQ(Form(atom), Bytes(file));
-            std::string const bytes = Form(Atom("what", "x") + ::List("kfbs", Atom("odd_", "x") + atom) + atom);
-            for (int n = 0;; ++n) {
-                CKF_File read;
-                ASSERT_EQ(0, read.Open(Span(bytes)));
-                CKF_ScDescendList const leaf(&read, CKF_Id("kfbs"), nullptr, nullptr);
-                SEQ_Head** back = nullptr;
-                Q_FailAllocation(n + 1);
-                int const code = SEQ_Read(&read, &back);
-                bool const fired = Q_FailAllocationFired();
-                Q_FailAllocation(0);
-                EXPECT_EQ(fired ? Q_Err_OutOfMemory : 0, code);
-                EXPECT_EQ(fired, back == nullptr);
-                if (fired) continue;
-                EXPECT_TRUE((*back)->itemSize == itemSize && (*back)->count == count && !(*back)->refcon);
-                std::string item(static_cast<std::size_t>(itemSize), '#'), all;
-                for (int i = 0; i < count && SEQ_GetItemCopy(back, 0, i, item.data()) == 0; ++i) all += item;
-                EXPECT_EQ(items, all);
-                EXPECT_EQ(0, SEQ_Dispose(back, 0));
-                SEQ_Head** none = nullptr;
-                EXPECT_EQ(CKF_Err_NoSuchChunk, SEQ_Read(&read, &none)) << "it stays in its list";
-                EXPECT_EQ(nullptr, none);
-                break;
-            }
-        }
-    EXPECT_EQ(before, Q_MemoryLive(nullptr));
 }
 
 }  // namespace
