@@ -179,8 +179,11 @@ int Run(Options const& options)
         drag.target, drag.isDragged,  options.path};
     if (!options.plot.empty()) picture.before = Sample(drag);
     Perform(options, drag);
-    std::string const what = fmt::format("{} dragged to {} at {} s", item.path, fmt::join(options.to, ","),
-                                         TimeText(Rational(drag.units, static_cast<std::int64_t>(drag.Time().scale))));
+    std::string what;  // stays empty where it would stand behind a drawing
+    if (options.plot != "-") {
+        what = fmt::format("{} dragged to {} at {} s", item.path, fmt::join(options.to, ","),
+                           TimeText(Rational(drag.units, static_cast<std::int64_t>(drag.Time().scale))));
+    }
     if (!options.plot.empty()) {
         picture.after = Sample(drag);
         WriteWholeFile(options.plot, DrawDrag(picture));

@@ -12,5 +12,5 @@ void WriteProject(kfshost::SceneGroup const& tree, std::string const& output, st
         return;
     }
     kfshost::SaveProject(tree, output);
-    WriteToStandardOutput(Shown(output) + ": " + what + '\n', Shown(output) + " was saved");
+    if (!what.empty()) WriteToStandardOutput(Shown(output) + ": " + what + '\n', Shown(output) + " was saved");
 }

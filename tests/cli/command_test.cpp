@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
 
+#include <algorithm>
 #include <cmath>
 #include <sstream>
 
@@ -31,7 +32,7 @@ std::string Plot(std::vector<std::string> arguments)
 std::vector<double> NumbersOf(std::string text)
 {
     for (char& c : text)
-        if (std::string("0123456789.-").find(c) == std::string::npos) c = ' ';
+        if (std::string("0123456789.-e").find(c) == std::string::npos) c = ' ';
     std::istringstream stream(text);
     std::vector<double> numbers;
     for (double number = 0.0; stream >> number;) numbers.push_back(number);
@@ -69,26 +70,18 @@ TEST(Kfs, EvalTellsTheSpeedOfAFall)
 // The three formats print the same doubles, to the last bit.
 TEST(Kfs, NumbersReadBackAsTheyWere)
 {
-    std::vector<std::vector<double>> found;
-    for (std::string const format : {"json", "csv", "table"}) {
-        std::string const text =
+    std::vector<double> found[3];
+    for (auto const& [format, numbers] : {std::pair{"json", &found[0]}, {"csv", &found[1]}, {"table", &found[2]}}) {
+        std::string text =
             RunKfs({"eval", Sample, "--stream", "*/translation", "--fps", "30000/1001", "--format", format}).output;
-        if (format == "json") {
-            found.emplace_back();
-            json const document = json::parse(text);
-            for (json const& row : document.at("streams").at(0).at("values"))
-                for (json const& number : row) found.back().push_back(number);
-            EXPECT_EQ(76U * 3, found.back().size());  // the last key is between two frames, and its pose is in
-            continue;
-        }
-        found.emplace_back();
+        if (text.front() == '{') text.erase(0, text.find("\"values\""));
+        std::ranges::replace(text, '[', '\n');  // a line for each row
         std::istringstream lines(text);
-        for (std::string line; std::getline(lines, line);) {
-            std::vector<double> const numbers = NumbersOf(line);
-            if (line.find_first_of("0123456789") == line.find_first_not_of(' '))
-                found.back().insert(found.back().end(), numbers.end() - 3, numbers.end());
-        }
+        for (std::string line; std::getline(lines, line);)
+            if (std::vector<double> const row = NumbersOf(line); row.size() >= 3)
+                numbers->insert(numbers->end(), row.end() - 3, row.end());
     }
+    EXPECT_EQ(76U * 3, found[0].size());  // the last key is between two frames, and its pose is in
     EXPECT_EQ(found[0], found[1]);
     EXPECT_EQ(found[0], found[2]);
 }

@@ -3,8 +3,6 @@
 #include <gtest/gtest.h>
 
 #include <csignal>
-#include <cstdlib>
-#include <sstream>
 
 #include <sys/resource.h>
 
@@ -79,34 +77,6 @@ TEST(KfsProject, SeparatesAndJoins)
     EXPECT_EQ(0, RunKfs({"join", apart, "--stream", "*/translation*", "-o", together}).code);
     Outcome const same = RunKfs({"diff", Sample, together});
     EXPECT_EQ(0, same.code) << same.output << same.errors;
-}
-
-// The values of the sample's position at 1.1 s, behind frame and time.
-std::vector<double> PositionsIn(std::string const& file)
-{
-    std::string const text =
-        RunKfs({"eval", file, "--stream", "*/translation", "--from", "1.1", "--to", "1.1", "--format", "csv"}).output;
-    std::istringstream line(text.substr(text.find('\n') + 1));
-    std::vector<double> values;
-    for (std::string cell; std::getline(line, cell, ',');) values.push_back(std::atof(cell.c_str()));
-    return values;
-}
-
-TEST(KfsProject, ADraggedComponentHasItsValueAndTheOthersStay)
-{
-    ScratchFolder const folder;
-    std::string const dragged = folder.Path("dragged"), picture = folder.Path("drag.svg");
-    std::vector<double> expected = PositionsIn(Sample);
-    ASSERT_EQ(5U, expected.size());
-    Outcome const outcome = RunKfs({"drag", Sample, "--stream", "*/translation", "--component", "y", "--at", "1.1",
-                                    "--to", "-2.5", "--plot", picture, "-o", dragged});
-    EXPECT_EQ(0, outcome.code) << outcome.errors;
-    EXPECT_EQ(dragged + ": bounce/ball/translation dragged to -2.5 at 11/10 s\n", outcome.output);
-    expected[3] = -2.5;
-    std::vector<double> const found = PositionsIn(dragged);
-    ASSERT_EQ(5U, found.size());
-    for (std::size_t i = 0; i < 5; ++i) EXPECT_NEAR(expected[i], found[i], 1e-12) << i;
-    EXPECT_NE(std::string::npos, FileContent(picture).find(">y after<"));
 }
 
 // As on a full disk: the process may not write files of more than so many bytes.

@@ -25,6 +25,9 @@ std::map<std::string, std::string> Inputs()
     std::size_t const second = project.find("seql") + 16 + 128;  // a key of the translation, behind another
     return {{"project", project},
             {"apart", RunKfs({"separate", Sample, "--stream", "*/translation", "-o", "-"}).output},
+            {"dragged", RunKfs({"drag", Sample, "--stream", "*/translation", "--component", "y", "--at", "1.1", "--to",
+                                "-2.5", "-o", "-"})
+                            .output},
             {"half", project.substr(0, project.size() / 2)},
             {"cut3", project.substr(0, 3)},
             {"cut30", project.substr(0, 30)},
