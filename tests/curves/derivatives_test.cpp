@@ -1,7 +1,7 @@
 #include "curves/derivatives.h"
 
 #include "frame/errors.h"
-#include "tests/curves/pathstream.h"
+#include "tests/curves/keyedstream.h"
 #include "tests/services/museum/truth.h"
 #include "tests/support/dice.h"
 #include "tests/support/ownedvalues.h"

@@ -1,13 +1,15 @@
 #pragma once
 
 #include "curves/segment_private.h"
+#include "curves/spacetangents.h"
+#include "curves/update.h"
 #include "frame/errors.h"
 #include "tests/support/streams.h"
 
 #include <algorithm>
-#include <random>
-#include <string>
+#include <cmath>
 #include <tuple>
+#include <utility>
 #include <vector>
 
 // The handles of one component, or of a spatial key.
@@ -16,7 +18,6 @@ struct Handle {
     double inInfluence = 0.0;
     double outSpeed = 0.0;
     double outInfluence = 0.0;
-    bool operator==(Handle const&) const = default;
 };
 
 // A stream whose derived data is settled, so that a test can write records as it needs them and nothing recomputes
@@ -83,13 +84,6 @@ public:
         return {runs.inSpeed[component], runs.inInfluence[component], runs.outSpeed[component],
                 runs.outInfluence[component]};
     }
-
-    int Index(KFS_KeyScalar const* key) const
-    {
-        for (int i = 0; i < Count(); ++i)
-            if (Record(i) == key) return i;
-        return key ? -2 : -1;  // -1: no key
-    }
 };
 
 // A one-dimensional stream with keys (time, value), all sides of one code, settled.
@@ -103,9 +97,62 @@ inline KeyedStream MakeKeyed(std::vector<std::pair<int, double>> const& keys, ch
     return stream;
 }
 
-inline std::string NoKeysText(std::string const& action)
+using Vector = std::vector<double>;
+
+// A spatial stream: dimension 2 or 3 is parametrised by arc length; `automatic` asks for automatic tangents.
+inline StreamOptions PathOptions(short dimension = 2, bool automatic = true)
 {
-    return "attempt to " + action + " a time stream with no key values.";
+    unsigned short const spInterpMask = automatic ? KFS_InterpMask_Negative : 0;
+    return {.dimension = dimension, .spatial = true, .spInterpMask = spInterpMask};
+}
+
+// A stream whose keys stand on a path, up to date.
+class PathStream : public KeyedStream {
+public:
+    struct Stop {
+        int time;
+        Vector place;
+    };
+
+    explicit PathStream(std::vector<Stop> const& stops, char interp = KFS_Interp_Linear,
+                        StreamOptions const& options = PathOptions())
+        : KeyedStream(options)
+    {
+        for (Stop const& stop : stops) Key(stop.time, stop.place, interp);
+        EXPECT_EQ(0, get()->UpdateStream());
+    }
+
+    // Gives a key its tangents; from then on they stay.
+    PathStream& Tangents(int index, Vector const& in, Vector const& out)
+    {
+        EXPECT_EQ(0, KFS_SetKeySpaceTangentsF(get(), index, -1, in.data(), out.data()));
+        return *this;
+    }
+
+    PathStream& Straighten()
+    {
+        Vector const zero(static_cast<std::size_t>(get()->GetDimension()), 0.0);
+        for (int i = 0; i < Count(); ++i) Tangents(i, zero, zero);
+        EXPECT_EQ(0, get()->UpdateStream());
+        return *this;
+    }
+
+    // Lets the update pass bend the path through the keys; a new key's tangents aren't automatic by themselves.
+    PathStream& Bend()
+    {
+        for (int i = 0; i < Count(); ++i) EXPECT_EQ(0, KFS_SetKeySpModifiable(get(), 1, i));
+        EXPECT_EQ(0, get()->UpdateStream());
+        return *this;
+    }
+
+    double Arc(int index) const { return Record(index)->arcLength; }
+};
+
+inline double Distance(Vector const& a, Vector const& b)
+{
+    double sum = 0.0;
+    for (std::size_t i = 0; i < a.size(); ++i) sum += (a[i] - b[i]) * (a[i] - b[i]);
+    return std::sqrt(sum);
 }
 
 // A point of a cubic by de Casteljau, with more digits than the library has.
@@ -113,12 +160,6 @@ inline long double CubicAt(long double const (&p)[4], long double t)
 {
     long double const u = 1.0L - t;
     return u * u * u * p[0] + 3.0L * u * u * t * p[1] + 3.0L * u * t * t * p[2] + t * t * t * p[3];
-}
-
-inline long double CubicSlopeAt(long double const (&p)[4], long double t)
-{
-    long double const u = 1.0L - t;
-    return 3.0L * (u * u * (p[1] - p[0]) + 2.0L * u * t * (p[2] - p[1]) + t * t * (p[3] - p[2]));
 }
 
 // The parameter at which a cubic that doesn't fall reaches `x`, by bisection.

@@ -55,6 +55,11 @@ Done Leaf::NoKeys(int operation, std::string const& action) const
     return Refuse(KFS_Err_NoKeys, operation, "attempt to " + action + " a time stream with no key values.");
 }
 
+Done Leaf::Check(int index, int operation, std::string const& action) const
+{
+    return HasNoValue() ? NoKeys(operation, action) : Done{IsBadIndex(index) ? SEQ_Err_BadIndex : 0, {}, 0};
+}
+
 bool Leaf::CanDo(int code, Done& done) const
 {
     bool const can = code == 0 || (code < 0 ? (set.interpMask & 8) != 0 : ((set.interpMask >> (code - 1)) & 1) != 0);
@@ -113,23 +118,21 @@ Key Leaf::EmptyKey(int time, int in, int out) const
 
 Around Leaf::Neighbours(int time, bool allKeys) const
 {
-    int const position = LowerBound(time);
-    if (int const found = Find(time); found >= 0) {
-        Around around = NeighboursOf(found, allKeys);
-        around.at = found;
-        return around;
-    }
-    Around around{-1, position - 1, position < Count() ? position : -1};
-    if (!SkipsFloats(allKeys)) return around;
-    while (around.next >= 0 && around.next < Count() - 1 && At(around.next).Has(KFS_KeyFlag_Float)) ++around.next;
-    while (around.prev > 0 && At(around.prev).Has(KFS_KeyFlag_Float)) --around.prev;
+    int const position = LowerBound(time), found = Find(time);
+    if (found < 0) return Anchors({-1, position - 1, position < Count() ? position : -1}, allKeys);
+    Around around = NeighboursOf(found, allKeys);
+    around.at = found;
     return around;
 }
 
 Around Leaf::NeighboursOf(int index, bool allKeys) const
 {
-    Around around{-1, index - 1, index + 1 < Count() ? index + 1 : -1};
-    if (!SkipsFloats(allKeys)) return around;
+    return Anchors({-1, index - 1, index + 1 < Count() ? index + 1 : -1}, allKeys);
+}
+
+Around Leaf::Anchors(Around around, bool allKeys) const
+{
+    if (allKeys || !set.spatial || !set.sParametrize) return around;
     while (around.next >= 0 && around.next < Count() - 1 && At(around.next).Has(KFS_KeyFlag_Float)) ++around.next;
     while (around.prev > 0 && At(around.prev).Has(KFS_KeyFlag_Float)) --around.prev;
     return around;
@@ -312,8 +315,7 @@ Done Leaf::SetKey(int index, Numbers const* value, int in, int out)
 {
     Done done;
     if (!CanDo(in, done) || !CanDo(out, done)) return done;
-    if (HasNoValue()) return NoKeys(27, Alter);
-    if (IsBadIndex(index)) return {SEQ_Err_BadIndex, {}, 0};
+    if (Done const done = Check(index, 27, Alter); done.code != 0) return done;
     Key& key = set.constant ? *single : At(index);
     if (in != 0) key.in = in;
     if (out != 0) key.out = out;
@@ -335,8 +337,7 @@ void Leaf::TakeOut(int index)
 
 Done Leaf::RemoveKey(int index, Numbers* value)
 {
-    if (HasNoValue()) return NoKeys(18, "remove a key value from");
-    if (IsBadIndex(index)) return {SEQ_Err_BadIndex, {}, 0};
+    if (Done const done = Check(index, 18, "remove a key value from"); done.code != 0) return done;
     if (value) *value = set.constant ? single->value : At(index).value;
     if (set.constant)
         single.reset();
@@ -509,6 +510,20 @@ Done Leaf::PrepareSetValue(int time)
 
 // ---- the stream as a whole
 
+Done Leaf::Swap(Leaf& other)
+{
+    std::swap(*this, other);
+    std::swap(set.interpMask, other.set.interpMask);  // stays at its place
+    return {0, {}, 1};
+}
+
+// A clone is this leaf with all of it stale.
+Done Leaf::SwapWithClone()
+{
+    stale = arcStale = keys.empty() ? Range{} : Range{0, Count() - 1};
+    return {0, {}, 1};
+}
+
 Done Leaf::SetSParametrize(bool on)
 {
     if (!set.spatial) return Refuse(KFS_Err_NotSpatial, 50, "stream isn#{rsquo}t spatial");
@@ -532,6 +547,18 @@ Done Leaf::SetMultiplier(Numbers const& multiplier)
 Done Leaf::SetSpInterp(int spInterp)
 {
     set.spInterp = spInterp;
+    return {};
+}
+
+Done Leaf::DisposeRemapTables()
+{
+    if (set.spatial && !set.constant && !keys.empty()) arcStale = {0, Count() - 1};
+    return {};
+}
+
+Done Leaf::SetAccuracy(double accuracy, double& old)
+{
+    old = std::sqrt(std::exchange(set.accuracy, accuracy * accuracy));
     return {};
 }
 
@@ -621,8 +648,7 @@ Done Leaf::SetKeyTangents(int index, Numbers const* inX, Numbers const* inY, Num
 
 Done Leaf::GetKeyTangents(int index, Numbers& inX, Numbers& inY, Numbers& outX, Numbers& outY)
 {
-    if (HasNoValue()) return NoKeys(30, Get);
-    if (IsBadIndex(index)) return {SEQ_Err_BadIndex, {}, 0};
+    if (Done const done = Check(index, 30, Get); done.code != 0) return done;
     UpdateIfStale(index);
     Key const& key = set.constant ? *single : At(index);
     Around const around = set.constant ? Around{} : NeighboursOf(index, false);
@@ -734,8 +760,7 @@ Done Leaf::SetKeyInfluence(int index, Numbers const* in, Numbers const* out)
 
 Done Leaf::GetKeyInfluence(int index, Numbers& in, Numbers& out)
 {
-    if (HasNoValue()) return NoKeys(54, Get);
-    if (IsBadIndex(index)) return {SEQ_Err_BadIndex, {}, 0};
+    if (Done const done = Check(index, 54, Get); done.code != 0) return done;
     UpdateIfStale(index);
     Key& key = set.constant ? *single : At(index);
     for (std::size_t i = 0; i < key.inInfluence.size(); ++i) {
@@ -751,8 +776,7 @@ Done Leaf::GetKeyInfluence(int index, Numbers& in, Numbers& out)
 Done Leaf::GetClamped(int index, Numbers& inVelocity, Numbers& inInfluence, Numbers& outVelocity, Numbers& outInfluence,
                       bool& clamped)
 {
-    if (HasNoValue()) return NoKeys(101, Get);
-    if (IsBadIndex(index)) return {SEQ_Err_BadIndex, {}, 0};
+    if (Done const done = Check(index, 101, Get); done.code != 0) return done;
     UpdateIfStale(index);
     if (set.constant) return {};
     Key const& key = At(index);
@@ -799,8 +823,7 @@ Done Leaf::SetKeySpaceTangents(int index, Numbers const* in, Numbers const* out)
 {
     if (!set.spatial) return NotSpatial(31);
     if (set.constant && !single) return NoKeys(72, Inquire);  // a record's flags are asked for
-    if (HasNoValue()) return NoKeys(31, Alter);
-    if (IsBadIndex(index)) return {SEQ_Err_BadIndex, {}, 0};
+    if (Done const done = Check(index, 31, Alter); done.code != 0) return done;
     Key& key = set.constant ? *single : At(index);
     Numbers const* const given = in ? in : out;
     bool const mirrors = (key.spFlags & KFS_KeySpFlag_Continuous) != 0 && (in == nullptr) != (out == nullptr);
@@ -831,10 +854,9 @@ Done Leaf::GetKeySpaceTangents(int index, Numbers& in, Numbers& out)
     return {};
 }
 
-Done Leaf::AlterSpFlags(int index, unsigned int set2, unsigned int clear, int)
+Done Leaf::AlterSpFlags(int index, unsigned int set2, unsigned int clear)
 {
-    if (HasNoValue()) return NoKeys(72, Inquire);
-    if (IsBadIndex(index)) return {SEQ_Err_BadIndex, {}, 0};
+    if (Done const done = Check(index, 72, Inquire); done.code != 0) return done;
     Key& key = set.constant ? *single : At(index);
     key.spFlags = (key.spFlags & ~clear) | set2;
     return {};
@@ -843,7 +865,7 @@ Done Leaf::AlterSpFlags(int index, unsigned int set2, unsigned int clear, int)
 Done Leaf::SetKeySpFlags(int index, unsigned int mask, unsigned int values)
 {
     if (HasNoValue()) return NoKeys(76, Inquire);
-    Done done = AlterSpFlags(index, values & mask, mask, 76);
+    Done done = AlterSpFlags(index, values & mask, mask);
     bool const marks =
         (mask & KFS_KeySpFlag_Modifiable) != 0 || ((mask & KFS_KeySpFlag_Continuous) != 0 && done.code == 0);
     if (!set.constant && marks) {
@@ -855,29 +877,42 @@ Done Leaf::SetKeySpFlags(int index, unsigned int mask, unsigned int values)
 
 Done Leaf::SetKeySpModifiable(bool on, int index)
 {
-    Done const done = on ? AlterSpFlags(index, KFS_KeySpFlag_Modifiable, 0, 74)
-                         : AlterSpFlags(index, 0, KFS_KeySpFlag_Modifiable, 75);
+    constexpr unsigned int flag = KFS_KeySpFlag_Modifiable;
+    Done const done = AlterSpFlags(index, on ? flag : 0U, flag);
     if (on && done.code == 0) MarkArcs(index + 1, 2);
     return done;
 }
 
 Done Leaf::SetKeySpContinuous(bool on, int index)
 {
-    return on ? AlterSpFlags(index, KFS_KeySpFlag_Continuous, 0, 74)
-              : AlterSpFlags(index, 0, KFS_KeySpFlag_Continuous, 75);
+    constexpr unsigned int flag = KFS_KeySpFlag_Continuous;
+    return AlterSpFlags(index, on ? flag : 0U, flag);
 }
 
 // ---- lookups
 
 Done Leaf::GetKey(int index, Numbers& value, int& in, int& out)
 {
-    if (HasNoValue()) return NoKeys(28, Get);
-    if (IsBadIndex(index)) return {SEQ_Err_BadIndex, {}, 0};
+    if (Done const done = Check(index, 28, Get); done.code != 0) return done;
     Key const& key = set.constant ? *single : At(index);
     value = key.value;
     in = key.in;
     out = key.out;
     return {};
+}
+
+Done Leaf::GetFlags(int index, unsigned int& flags)
+{
+    if (Done const done = Check(index, 72, Inquire); done.code != 0) return done;
+    flags = set.constant ? single->flags : At(index).flags;
+    return {};
+}
+
+Done Leaf::GetSpFlags(int index, unsigned int& flags)
+{
+    Done const done = GetFlags(index, flags);  // which is what a constant answers
+    if (done.code == 0 && !set.constant) flags = At(index).spFlags;
+    return done;
 }
 
 Done Leaf::FindKeyTime(int time, bool backward, bool atTime, bool& found, int& index, T_Time& keyTime)

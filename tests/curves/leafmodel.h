@@ -94,7 +94,11 @@ public:
     Done SetSParametrize(bool on);
     Done SetMultiplier(Numbers const& multiplier);
     Done SetSpInterp(int spInterp);
+    Done DisposeRemapTables();
+    Done SetAccuracy(double accuracy, double& old);
     Done PrepareSetValue(int time);
+    Done Swap(Leaf& other);
+    Done SwapWithClone();
     Done ForceUpdate();
     void Update();
 
@@ -107,6 +111,8 @@ public:
     Done GetClamped(int index, Numbers& inVelocity, Numbers& inInfluence, Numbers& outVelocity, Numbers& outInfluence,
                     bool& clamped);
     Done GetKeySpaceTangents(int index, Numbers& in, Numbers& out);
+    Done GetFlags(int index, unsigned int& flags);
+    Done GetSpFlags(int index, unsigned int& flags);
     Done FindKeyTime(int time, bool backward, bool atTime, bool& found, int& index, T_Time& keyTime);
     Done FindNearest(int time, int& index, T_Time& keyTime);
     Done TimeToIndex(int time, int& index);
@@ -121,6 +127,8 @@ public:
 private:
     Done Refuse(int code, int operation, std::string const& text) const;
     Done NoKeys(int operation, std::string const& action) const;
+    // What is wrong with asking for a key, if anything.
+    Done Check(int index, int operation, std::string const& action) const;
     bool HasNoValue() const { return set.constant ? !single : keys.empty(); }
     bool IsBadIndex(int index) const { return !set.constant && (index < 0 || index >= Count()); }
     bool CanDo(int code, Done& done) const;
@@ -130,13 +138,13 @@ private:
     int LowerBound(int time) const;
     int Find(int time) const;  // -1
     bool IsAuto() const { return set.spInterp == KFS_SpInterp_Auto; }
-    bool SkipsFloats(bool allKeys) const { return !allKeys && set.spatial && set.sParametrize; }
     double Seconds(int later, int earlier) const;
     double ArcsFrom(int first, int last) const;
     Key EmptyKey(int time, int in, int out) const;
 
     Around Neighbours(int time, bool allKeys) const;
     Around NeighboursOf(int index, bool allKeys) const;
+    Around Anchors(Around around, bool allKeys) const;  // past float keys, unless all count
 
     Range Marked(int index, int count) const;
     void Mark(int index, int count);
@@ -153,7 +161,7 @@ private:
     void ComputeFloatTime(int index);
     void UpdateIfStale(int index);
     double Length(int index) const;
-    Done AlterSpFlags(int index, unsigned int set, unsigned int clear, int operation);
+    Done AlterSpFlags(int index, unsigned int set, unsigned int clear);
 
     Numbers Interpolate(int time);
     double SpeedGraph(Key const& a, Key const& b, double total, int time) const;

@@ -1,5 +1,5 @@
 // Random scripts of edits and questions on a leaf and on its twin. After each step everything stored must agree, and
-// every answer on the way. A script that fails is cut down and printed as the calls that fail.
+// every answer on the way. A script that fails is cut down and printed as the steps that fail.
 // KFS_TEST_SCRIPTS=N runs N scripts a row instead of the usual number, KFS_TEST_SEED=S begins at another seed.
 
 #include "curves/floatkeys.h"
@@ -9,6 +9,7 @@
 #include "frame/errors.h"
 #include "keystore/attributes.h"
 #include "keystore/copykeys.h"
+#include "keystore/items.h"
 #include "keystore/keyflags.h"
 #include "keystore/lookup.h"
 #include "tests/curves/leafmodel.h"
@@ -54,149 +55,22 @@ Row const Rows[] = {
     {.why = "three numbers between two scales", .options = {.dimension = 3, .timeScale = 24}, .secondScale = 30},
     {.why = "holds only", .options = {.interpMask = KFS_InterpMask_Hold}},
     {.why = "a constant", .options = {.dimension = 2, .noKeys = true}},
+    {.why = "shorts", .options = {.dimension = 2, .type = KFS_Type_S16}},
     {.why = "a path with automatic tangents", .options = Path(3, true), .grid = 1000},
     {.why = "a path with tangents of its own", .options = Path(2, false), .grid = 100},
     {.why = "a path tick by tick", .options = Path(2, true), .grid = 1},
+    {.why = "a path in fixed numbers",
+     .options = {.dimension = 2, .spatial = true, .type = KFS_Type_Fixed},
+     .grid = 100},
     {.why = "chords", .options = Path(4, false), .grid = 100},
     {.why = "a path by its parameter", .options = Path(2, true), .grid = 100, .plainPath = true},
     {.why = "a constant place", .options = {.dimension = 2, .noKeys = true, .spatial = true}},
 };
 
-enum Op {
-    Insert,
-    InsertOnCurve,
-    Set,
-    Remove,
-    CopyOne,
-    CopyAll,
-    Retime,
-    Flags,
-    Float,
-    Tangents,
-    Velocity,
-    Influence,
-    SpaceTangents,
-    SpFlags,
-    SpModifiable,
-    SpContinuous,
-    Scale,
-    Constant,
-    Keyed,
-    Parametrize,
-    Multiplier,
-    SpInterp,
-    Prepare,
-    Force,
-    Update,
-    Read,
-    ReadTangents,
-    ReadVelocity,
-    ReadInfluence,
-    ReadClamped,
-    ReadSpaceTangents,
-    ReadKey,
-    Find,
-    Nearest,
-    ToIndex,
-    KeyIndex,
-    ToTime,
-    Walk,
-    Predict,
-    Propose,
-    OpCount
-};
-
+// An operation on one of the two leaves, and the numbers that its arguments are made of.
 struct Step {
     int op, leaf, a, b, c, d;
 };
-
-// How often an operation is drawn, on plain leaves and on paths.
-struct Weight {
-    Op op;
-    int plain, path;
-};
-
-constexpr Weight Weights[] = {
-    {Insert, 12, 12},
-    {InsertOnCurve, 6, 6},
-    {Set, 5, 5},
-    {Remove, 5, 4},
-    {CopyOne, 3, 3},
-    {CopyAll, 1, 1},
-    {Retime, 6, 6},
-    {Flags, 6, 6},
-    {Float, 1, 8},
-    {Tangents, 5, 5},
-    {Velocity, 3, 3},
-    {Influence, 3, 3},
-    {SpaceTangents, 1, 5},
-    {SpFlags, 0, 3},
-    {SpModifiable, 0, 4},
-    {SpContinuous, 0, 2},
-    {Scale, 1, 1},
-    {Constant, 1, 1},
-    {Keyed, 1, 1},
-    {Parametrize, 1, 0},
-    {Multiplier, 1, 1},
-    {SpInterp, 0, 1},
-    {Prepare, 2, 2},
-    {Force, 1, 1},
-    {Update, 2, 3},
-    {Read, 6, 6},
-    {ReadTangents, 2, 2},
-    {ReadVelocity, 2, 2},
-    {ReadInfluence, 1, 1},
-    {ReadClamped, 1, 0},
-    {ReadSpaceTangents, 1, 2},
-    {ReadKey, 1, 1},
-    {Find, 2, 2},
-    {Nearest, 2, 2},
-    {ToIndex, 2, 2},
-    {KeyIndex, 1, 1},
-    {ToTime, 2, 2},
-    {Walk, 1, 1},
-    {Predict, 3, 3},
-    {Propose, 1, 1},
-};
-
-std::vector<Step> Draw(Row const& row, unsigned int seed, int length)
-{
-    std::mt19937 random(seed);
-    std::vector<int> weights;
-    for (Weight const& weight : Weights) weights.push_back(row.options.spatial ? weight.path : weight.plain);
-    std::discrete_distribution<std::size_t> op(weights.begin(), weights.end());
-    std::uniform_int_distribution<int> number(0, 999);
-    std::vector<Step> script;
-    for (int i = 0; i < length; ++i) {
-        Step step{i < 8 ? static_cast<int>(Insert) : Weights[op(random)].op, number(random) % 5 == 0, 0, 0, 0, 0};
-        for (int* field : {&step.a, &step.b, &step.c, &step.d}) *field = number(random);
-        script.push_back(step);
-    }
-    return script;
-}
-
-// ---- saying what is called
-
-std::ostream& Print(std::ostream& out, Numbers const* numbers)
-{
-    if (!numbers) return out << "nullptr";
-    out << "Numbers{";
-    for (std::size_t i = 0; i < numbers->size(); ++i) out << (i ? ", " : "") << (*numbers)[i];
-    return out << "}.data()";
-}
-Numbers const* Given(bool given, Numbers const& numbers)
-{
-    return given ? &numbers : nullptr;
-}
-std::ostream& Print(std::ostream& out, T_Time const* time)
-{
-    return time ? out << "&T_Time{" << time->value << ", " << time->scale << "}" : out << "nullptr";
-}
-template <class Value>
-std::ostream& Print(std::ostream& out, Value const& value)
-{
-    return out << value;
-}
 
 bool Near(double a, double b)
 {
@@ -218,15 +92,12 @@ struct Pair {
                 .constant = row.options.noKeys,
                 .spatial = row.options.spatial,
                 .nonDecreasing = row.options.spatial || row.nonDecreasing,
-                .sParametrize = row.options.spatial && row.options.dimension <= 3,
+                .sParametrize = row.options.spatial && row.options.dimension <= 3 && !row.plainPath,
                 .spInterp = row.options.spatial && row.options.spInterpMask != 0 ? KFS_SpInterp_Auto : 0,
                 .interpMask = row.options.interpMask})
     {
         if (row.nonDecreasing) *stream->GetKFSFlagsForModify() |= KFS_StreamFlag_NonDecreasing;
-        if (row.plainPath) {
-            EXPECT_EQ(0, KFS_SetStreamSParametrize(stream, 0));
-            leaf.set.sParametrize = false;
-        }
+        EXPECT_EQ(0, row.plainPath ? KFS_SetStreamSParametrize(stream, 0) : 0);
         root.Store(stream);
     }
     ~Pair() { stream->SetParent(nullptr); }
@@ -249,80 +120,36 @@ public:
         listener_.Take();
     }
 
-    // What differs after the step; empty if nothing does.
-    std::string Take(Step const& step)
-    {
-        Run(pairs_[static_cast<std::size_t>(step.leaf)], pairs_[static_cast<std::size_t>(1 - step.leaf)], step);
-        for (Pair& pair : pairs_) CompareStored(pair);
-        return std::exchange(fault_, {});
-    }
-    std::string TakeAll()
-    {
-        std::string const calls = calls_;
-        for (Pair& pair : pairs_) {
-            std::vector<Numbers> const rendered = Render(pair);
-            for (std::size_t i = 0; i < Samples && fault_.empty(); ++i) {
-                calls_ = calls;
-                Ask(pair, Sample(pair, i));
-                if (i < rendered.size()) Same("rendered value", rendered[i], pair.stream.At(Sample(pair, i).value));
-            }
-        }
-        return std::exchange(fault_, {});
-    }
-    std::string const& Calls() const { return calls_; }
+    // What differs after the step, or after all; empty if nothing does.
+    std::string Take(Step const& step);
+    std::string TakeAll();
+    std::string const& Steps() const { return steps_; }
 
-private:
-    template <class What>
-    void Same(std::string const& what, What const& expected, What const& actual)
+    // What is asked and got; whole numbers and truths count as numbers.
+    void Same(std::string const& what, double expected, double actual);
+    void Same(std::string const& what, Numbers const& expected, double const* actual);
+    void Same(std::string const& what, T_Time const& expected, T_Time const& actual);
+    // `actual` is in the stream's own type.
+    void SameTyped(std::string const& what, Numbers const& expected, Numbers const& actual)
     {
-        if (expected == actual) return;
-        std::ostringstream out;
-        out << what << ": expected " << expected << ", is " << actual << "\n";
-        fault_ += out.str();
-    }
-    void Same(std::string const& what, double expected, double actual)
-    {
-        if (Near(expected, actual)) return;
-        std::ostringstream out;
-        out.precision(17);
-        out << what << ": expected " << expected << ", is " << actual << "\n";
-        fault_ += out.str();
-    }
-    void Same(std::string const& what, Numbers const& expected, double const* actual)
-    {
-        for (std::size_t i = 0; i < expected.size(); ++i)
-            Same(what + "[" + std::to_string(i) + "]", expected[i], actual[i]);
-    }
-    void Same(std::string const& what, Numbers const& expected, Numbers const& actual)
-    {
-        Same(what, expected, actual.data());
-    }
-    void Same(std::string const& what, T_Time const& expected, T_Time const& actual)
-    {
-        Same(what + ".value", expected.value, actual.value);
-        Same(what + ".scale", expected.scale, actual.scale);
-    }
-
-    template <class... Args>
-    void Say(char const* function, Args const&... args)
-    {
-        std::ostringstream out;
-        [[maybe_unused]] bool first = true;
-        ((Print(out << (std::exchange(first, false) ? "" : ", "), args)), ...);
-        calls_ += std::string("    ") + function + "(" + out.str() + ");\n";
+        if (row_.options.type == KFS_Type_Double) return Same(what, expected, actual.data());
+        Same(what, 0, std::memcmp(InOwnType(&expected).data(), actual.data(), expected.size() * sizeof(double)));
     }
     // The library's call against the twin's.
-    void Compare(char const* what, Done const& expected, int code)
-    {
-        Same(std::string(what) + " result", expected.code, code);
-        std::vector<Reported> const seen = reports_.Take();
-        std::ostringstream told, heard;
-        for (Reported const& report : expected.reports) told << report;
-        for (Reported const& report : seen) heard << report;
-        Same(std::string(what) + " reports", told.str(), heard.str());
-        Same(std::string(what) + " notifications", expected.told, listener_.Take());
-    }
+    void Compare(Done const& expected, int code);
+    void Ask(Pair& pair, T_Time const& at);
 
+    // A value as the stream's own type, in room that 77.0 fills; nothing of nothing.
+    Numbers InOwnType(Numbers const* numbers) const
+    {
+        if (!numbers) return {};
+        Numbers room(numbers->size(), 77.0);
+        EXPECT_EQ(0, KFS_ConvertItemFromFloat(row_.options.dimension, row_.options.type, numbers->data(), room.data()));
+        return room;
+    }
+    Row const& GetRow() const { return row_; }
+
+private:
     static constexpr std::size_t Samples = 72;
     T_Time Sample(Pair const& pair, std::size_t i) const
     {
@@ -331,78 +158,71 @@ private:
     std::vector<Numbers> Render(Pair const& pair);
     void CompareStored(Pair& pair);
     void CompareKey(std::string const& what, leafmodel::Key const& key, KFS_KeyScalar const* record, Pair const& pair);
-    void Run(Pair& pair, Pair& other, Step const& step);
-    void RunEdit(Pair& pair, Pair& other, Step const& step);
-    void RunQuestion(Pair& pair, Step const& step);
-    void Ask(Pair& pair, T_Time const& at);
-    void AskHandles(Pair& pair, Step const& step, int index);
-
-    // From a step's numbers to arguments.
-    int Index(Pair const& pair, int n) const
-    {
-        int const count = pair.leaf.Count();
-        if (n % 37 == 36) return n % 2 ? count : -3;
-        return count == 0 ? 0 : n % count;
-    }
-    int TimeOf(int n) const { return row_.grid * (n % 31 - 4) + (n % 4 == 3 ? n % 7 : 0); }
-    Numbers Value(int n) const
-    {
-        Numbers value;
-        for (int i = 0; i < row_.options.dimension; ++i) value.push_back(n == 0 ? 0.0 : n * (2 * i + 3) % 41 - 20);
-        return value;
-    }
-    char Code(int n) const { return static_cast<char>(n % 29 == 28 ? 4 : (n / 3) % 4 == 0 ? 2 : n % 4); }
 
     Row row_;
     ReportRecorder& reports_;
     Pair pairs_[2];
     ValueListener listener_;
-    std::string calls_, fault_;
+    std::string steps_, fault_;
 };
+
+void World::Same(std::string const& what, double expected, double actual)
+{
+    if (Near(expected, actual)) return;
+    std::ostringstream out;
+    out.precision(17);
+    out << what << ": expected " << expected << ", is " << actual << "\n";
+    fault_ += out.str();
+}
+
+void World::Same(std::string const& what, Numbers const& expected, double const* actual)
+{
+    for (std::size_t i = 0; i < expected.size(); ++i)
+        Same(what + "[" + std::to_string(i) + "]", expected[i], actual[i]);
+}
+
+void World::Same(std::string const& what, T_Time const& expected, T_Time const& actual)
+{
+    Same(what + ".value", expected.value, actual.value);
+    Same(what + ".scale", expected.scale, actual.scale);
+}
+
+void World::Compare(Done const& expected, int code)
+{
+    Same("result", expected.code, code);
+    std::vector<Reported> const seen = reports_.Take();
+    if (expected.reports != seen)
+        fault_ += "reports: expected " + testing::PrintToString(expected.reports) + ", are " +
+                  testing::PrintToString(seen) + "\n";
+    Same("notifications", expected.told, listener_.Take());
+}
 
 void World::CompareKey(std::string const& what, leafmodel::Key const& key, KFS_KeyScalar const* record,
                        Pair const& pair)
 {
-    int const dimension = row_.options.dimension;
-    Same(what + " in code", key.in, static_cast<int>(record->inInterp));
-    Same(what + " out code", key.out, static_cast<int>(record->outInterp));
-    Same(what + " flags", key.flags, static_cast<unsigned int>(record->flags));
+    Same(what + " in code", key.in, record->inInterp);
+    Same(what + " out code", key.out, record->outInterp);
+    Same(what + " flags", key.flags, record->flags);
+    auto const handles = [&](double const* inSpeed, double const* inInfluence, double const* outSpeed,
+                             double const* outInfluence) {
+        if (pair.leaf.set.constant) return;
+        Same(what + " in speed", key.inSpeed, inSpeed);
+        Same(what + " in influence", key.inInfluence, inInfluence);
+        Same(what + " out speed", key.outSpeed, outSpeed);
+        Same(what + " out influence", key.outInfluence, outInfluence);
+    };
+    Same(what + " value", key.value, KFSp_Numbers(record));
     if (pair.leaf.set.spatial) {
         Same(what + " spatial flags", key.spFlags, record->spFlags);
-        KFSp_SpatialRuns<double const> const runs = KFSp_GetSpatialRuns(record, dimension);
-        Same(what + " value", key.value, runs.value);
+        handles(&record->inSpeed, &record->inInfluence, &record->outSpeed, &record->outInfluence);
+        KFSp_SpatialRuns<double const> const runs = KFSp_GetSpatialRuns(record, row_.options.dimension);
         if (pair.leaf.set.constant) return;
         Same(what + " in tangent", key.inTangent, runs.inTangent);
         Same(what + " out tangent", key.outTangent, runs.outTangent);
-        Same(what + " in speed", key.inSpeed, &record->inSpeed);
-        Same(what + " in influence", key.inInfluence, &record->inInfluence);
-        Same(what + " out speed", key.outSpeed, &record->outSpeed);
-        Same(what + " out influence", key.outInfluence, &record->outInfluence);
-        return;
+    } else {
+        KFSp_TemporalRuns<double const> const runs = KFSp_GetTemporalRuns(record, row_.options.dimension);
+        handles(runs.inSpeed, runs.inInfluence, runs.outSpeed, runs.outInfluence);
     }
-    KFSp_TemporalRuns<double const> const runs = KFSp_GetTemporalRuns(record, dimension);
-    Same(what + " value", key.value, runs.value);
-    if (pair.leaf.set.constant) return;
-    Same(what + " in speed", key.inSpeed, runs.inSpeed);
-    Same(what + " in influence", key.inInfluence, runs.inInfluence);
-    Same(what + " out speed", key.outSpeed, runs.outSpeed);
-    Same(what + " out influence", key.outInfluence, runs.outInfluence);
-}
-
-// What a render reads, which works the marks down on a copy of its own and leaves the stream alone.
-std::vector<Numbers> World::Render(Pair const& pair)
-{
-    // Without arc parametrisation a read moves float keys on, each time.
-    bool const moves = pair.leaf.set.spatial && !pair.leaf.set.sParametrize;
-    if (moves || (pair.leaf.set.constant ? !pair.leaf.single : pair.leaf.keys.empty())) return {};
-    std::vector<unsigned char> const before = pair.stream.Bytes();
-    std::vector<Numbers> values;
-    {
-        Q_ScSetCurrentRenderContext const current(kfshost::MakeRenderContext(true));
-        for (std::size_t i = 0; i < Samples; ++i) values.push_back(pair.stream.At(Sample(pair, i).value));
-    }
-    Same("untouched by a render", true, before == pair.stream.Bytes());
-    return values;
 }
 
 void World::CompareStored(Pair& pair)
@@ -434,365 +254,476 @@ void World::CompareStored(Pair& pair)
     Same(pair.name + " pins", 0, pair.stream.Pins());
 }
 
+// Reads in doubles, and then, where nothing has moved, in the stream's own type.
 void World::Ask(Pair& pair, T_Time const& at)
 {
-    Say("KFS_GetValueFPlus", pair.name, &at, 0, "value", "&atKey", "nullptr", "nullptr");
-    Numbers expected(static_cast<std::size_t>(row_.options.dimension), 77.0), actual = expected;
+    auto const size = static_cast<std::size_t>(row_.options.dimension);
+    Numbers expected(size, 77.0), actual = expected, typed = expected;
     bool atKey = false;
     unsigned char found = 0;
     Done const done = pair.leaf.GetValue(at.value, expected, atKey);
-    Compare("read", done, KFS_GetValueFPlus(pair.stream, &at, 0, actual.data(), &found, nullptr));
-    Same("value", expected, actual);
+    Compare(done, KFS_GetValueFPlus(pair.stream, &at, 0, actual.data(), &found, nullptr));
+    Same("value", expected, actual.data());
     Same("at a key", atKey, found != 0);
+    if (done.code != 0 || row_.plainPath) return;
+    Compare(done, KFS_GetValue(pair.stream, &at, 0, typed.data(), nullptr, nullptr));
+    SameTyped("value in its own type", actual, typed);
 }
 
-void World::Run(Pair& pair, Pair& other, Step const& step)
+// What a render reads, which works the marks down on a copy of its own and leaves the stream alone.
+std::vector<Numbers> World::Render(Pair const& pair)
 {
-    step.op < Update ? RunEdit(pair, other, step) : RunQuestion(pair, step);
+    // Without arc parametrisation a read moves float keys on, each time.
+    bool const moves = pair.leaf.set.spatial && !pair.leaf.set.sParametrize;
+    if (moves || (pair.leaf.set.constant ? !pair.leaf.single : pair.leaf.keys.empty())) return {};
+    std::vector<unsigned char> const before = pair.stream.Bytes();
+    std::vector<Numbers> values;
+    {
+        Q_ScSetCurrentRenderContext const current(kfshost::MakeRenderContext(true));
+        for (std::size_t i = 0; i < Samples; ++i) values.push_back(pair.stream.At(Sample(pair, i).value));
+    }
+    Same("untouched by a render", true, before == pair.stream.Bytes());
+    return values;
 }
 
-void World::RunEdit(Pair& pair, Pair& other, Step const& step)
+std::string World::TakeAll()
 {
-    KFS_Stream* const s = pair.stream;
+    for (Pair& pair : pairs_) {
+        std::vector<Numbers> const rendered = Render(pair);
+        for (std::size_t i = 0; i < Samples && fault_.empty(); ++i) {
+            Ask(pair, Sample(pair, i));
+            if (i < rendered.size()) Same("rendered value", rendered[i], pair.stream.At(Sample(pair, i).value).data());
+            if (!fault_.empty())
+                steps_ += "    " + pair.name + " read at " + std::to_string(Sample(pair, i).value) + "\n";
+        }
+    }
+    return std::exchange(fault_, {});
+}
+
+// ---- the operations
+
+// A step's numbers as arguments.
+struct Turn {
+    World& world;
+    Step const& n;
+    Pair &pair, &other;
     Leaf& leaf = pair.leaf;
-    int const index = Index(pair, step.a);
-    T_Time const at = pair.stream.Time(TimeOf(step.b));
-    Numbers const value = Value(step.c), second = Value(step.c / 3 + step.d);
-    char const in = Code(step.d), out = Code(step.d / 7);
-    bool const first = step.a % 3 != 0, last = step.a % 3 != 1;
-    auto const on = static_cast<unsigned char>(step.d % 2);
-    switch (step.op) {
-    case Insert: {
-        auto const replace = static_cast<unsigned char>(step.a % 8 != 0);
-        Say("KFS_InsertKeyF", pair.name, &at, +replace, &value, +in, +out);
-        Done const done = leaf.InsertKey(at.value, replace, &value, in, out);
-        Compare("insert", done, KFS_InsertKeyF(s, &at, replace, value.data(), in, out));
-        break;
+    KFS_Stream* s = pair.stream;
+    int index = Index(pair);
+    T_Time at = pair.stream.Time(TimeOf(n.b));
+    Numbers value = Value(n.c), second = Value(n.c / 3 + n.d);
+    Numbers const* first = n.a % 3 != 0 ? &value : nullptr;  // one of them, or both
+    Numbers const* last = n.a % 3 != 1 ? &second : nullptr;
+    char in = Code(n.d), out = Code(n.d / 7);
+    bool on = n.d % 2 != 0;
+    bool typed = n.c % 3 == 0;  // by the form that takes the stream's own type
+
+    int Index(Pair const& of) const
+    {
+        int const count = of.leaf.Count();
+        if (n.a % 37 == 36) return n.a % 2 ? count : -3;
+        return count == 0 ? 0 : n.a % count;
     }
-    case InsertOnCurve: {
-        if (leaf.set.constant) break;
-        char const i = step.a % 2 ? 0 : in, o = step.a % 3 ? 0 : out;
-        Say("KFS_InsertKeyF", pair.name, &at, 1, "nullptr", +i, +o);
-        Compare("insert on the curve", leaf.InsertKey(at.value, true, nullptr, i, o),
-                KFS_InsertKeyF(s, &at, 1, nullptr, i, o));
-        break;
+    int TimeOf(int number) const
+    {
+        return world.GetRow().grid * (number % 31 - 4) + (number % 4 == 3 ? number % 7 : 0);
     }
-    case Set: {
-        char const i = step.b % 2 ? 0 : in, o = step.b % 3 ? 0 : out;
-        Numbers const* const given = step.b % 5 ? &value : nullptr;
-        Say("KFS_SetKeyF", pair.name, index, given, +i, +o);
-        Compare("set", leaf.SetKey(index, given, i, o), KFS_SetKeyF(s, index, given ? given->data() : nullptr, i, o));
-        break;
+    Numbers Value(int number) const
+    {
+        Numbers numbers;
+        for (int i = 0; i < world.GetRow().options.dimension; ++i)
+            numbers.push_back(number == 0 ? 0.0 : number * (2 * i + 3) % 41 - 20);
+        return numbers;
     }
-    case Remove: {
-        Say("KFS_RemoveKey", pair.name, index, "nullptr");
-        Numbers expected(value.size(), 77.0), actual = expected;
-        Compare("remove", leaf.RemoveKey(index, &expected), KFS_RemoveKey(s, index, actual.data()));
-        Same("removed value", expected, actual);
-        break;
+    static char Code(int number)
+    {
+        return static_cast<char>(number % 29 == 28 ? 4 : (number / 3) % 4 == 0 ? 2 : number % 4);
     }
-    case CopyOne: {
-        Pair& source = step.c % 2 ? pair : other;
-        int const from = Index(source, step.a);
-        bool const given = step.c % 3 != 0;
-        auto const replace = static_cast<unsigned char>(step.c % 5 != 0);
-        Say("KFS_CopyKey", source.name, from, +replace, given ? &at : nullptr, pair.name, "&newIndex");
-        int expected = 77, actual = 77;
-        Done const done = leaf.CopyKey(source.leaf, from, replace, given ? &at.value : nullptr, &expected);
-        Compare("copy", done, KFS_CopyKey(source.stream, from, replace, given ? &at : nullptr, s, &actual));
-        Same("new index", expected, actual);
-        break;
-    }
-    case CopyAll:
-        Say("KFS_CopyKeys", other.name, "nullptr", pair.name);
-        Compare("copy all", leaf.CopyKeys(other.leaf), KFS_CopyKeys(other.stream, nullptr, s));
-        break;
-    case Retime: {
-        Say("KFS_SetKeyTime", pair.name, index, "nullptr", at.value, "&newIndex", "&oldTime");
-        int newIndex = 77, oldTime = 77, actualIndex = 77;
-        T_Time actualTime{};
-        Done const done = leaf.SetKeyTime(index, at.value, &newIndex, &oldTime);
-        Compare("retime", done, KFS_SetKeyTime(s, index, nullptr, at.value, &actualIndex, &actualTime));
-        if (!leaf.set.constant) Same("new index", newIndex, actualIndex);
-        if (!leaf.set.constant || leaf.single)
-            Same("old time", oldTime, done.code == KFS_Err_NoKeys ? 77 : actualTime.value);
-        break;
-    }
-    case Flags:
-    case Float: {
-        constexpr unsigned short masks[] = {KFS_KeyFlag_Continuous, KFS_KeyFlag_Modifiable,
-                                            KFS_KeyFlag_Continuous | KFS_KeyFlag_Modifiable, KFS_KeyFlag_Modifiable};
-        unsigned short const mask = step.op == Float ? (unsigned short)KFS_KeyFlag_Float : masks[step.b % 4];
-        auto const flags = static_cast<unsigned short>(step.d % 3 == 0 ? 0 : step.d % 3 == 1 ? mask : step.c);
-        Say("KFS_SetKeyFlags", pair.name, index, mask, flags);
-        Compare("flags", leaf.SetKeyFlags(index, mask, flags), KFS_SetKeyFlags(s, index, mask, flags));
-        break;
-    }
-    case Tangents: {
-        Numbers inX, outX;
-        for (double const number : value) inX.push_back(number / 40.0 - 0.25);
-        for (double const number : second) outX.push_back(number / 40.0 + 0.25);
-        double const tall = step.b % 3 ? 1.0 : 0.01;
-        Say("KFS_SetKeyTangentsF", pair.name, index, Given(first, inX), Given(first, value), Given(last, outX),
-            Given(last, second), tall);
-        Done const done = leaf.SetKeyTangents(index, Given(first, inX), &value, Given(last, outX), &second, tall);
-        Compare("tangents", done,
-                KFS_SetKeyTangentsF(s, index, first ? inX.data() : nullptr, value.data(), last ? outX.data() : nullptr,
-                                    second.data(), tall));
-        break;
-    }
-    case Velocity:
-        Say("KFS_SetKeyVelocityF", pair.name, index, Given(first, value), Given(last, second));
-        Compare("velocity", leaf.SetKeyVelocity(index, Given(first, value), Given(last, second)),
-                KFS_SetKeyVelocityF(s, index, first ? value.data() : nullptr, last ? second.data() : nullptr));
-        break;
-    case Influence: {
-        Numbers a, b;
-        for (double const number : value) a.push_back(number / 16.0);
-        for (double const number : second) b.push_back(std::fabs(number) / 25.0);
-        Say("KFS_SetKeyInfluence", pair.name, index, Given(first, a), Given(last, b));
-        Compare("influence", leaf.SetKeyInfluence(index, Given(first, a), Given(last, b)),
-                KFS_SetKeyInfluence(s, index, first ? a.data() : nullptr, last ? b.data() : nullptr));
-        break;
-    }
-    case SpaceTangents:
-        Say("KFS_SetKeySpaceTangentsF", pair.name, index, -1, Given(first, value), Given(last, second));
-        Compare("space tangents", leaf.SetKeySpaceTangents(index, Given(first, value), Given(last, second)),
-                KFS_SetKeySpaceTangentsF(s, index, -1, first ? value.data() : nullptr, last ? second.data() : nullptr));
-        break;
-    case SpFlags: {
-        unsigned int const mask = static_cast<unsigned int>(step.b) % 4, values = static_cast<unsigned int>(step.d) % 4;
-        Say("KFS_SetKeySpFlags", pair.name, index, mask, values);
-        Compare("spatial flags", leaf.SetKeySpFlags(index, mask, values), KFS_SetKeySpFlags(s, index, mask, values));
-        break;
-    }
-    case SpModifiable:
-        Say("KFS_SetKeySpModifiable", pair.name, +on, index);
-        Compare("modifiable path", leaf.SetKeySpModifiable(on, index), KFS_SetKeySpModifiable(s, on, index));
-        break;
-    case SpContinuous:
-        Say("KFS_SetKeySpContinuous", pair.name, +on, index);
-        Compare("continuous path", leaf.SetKeySpContinuous(on, index), KFS_SetKeySpContinuous(s, on, index));
-        break;
-    case Scale: {
-        unsigned int const scales[] = {24, 30, 600, 1000};
-        unsigned int const scale = scales[step.a % 4];
-        Say("KFS_RescaleStream", pair.name, scale);
-        Compare("rescale", leaf.Rescale(scale), KFS_RescaleStream(s, scale));
-        break;
-    }
-    case Constant: {
-        // The record turns the constant's value: it is read first, and then given its codes.
-        if (!leaf.set.constant && leaf.Count() > 0) Ask(pair, at);
-        Say((pair.name + ".SetConstant").c_str(), 1, 1);
-        Compare("constant", leaf.SetConstant(true, true), s->SetConstant(1, 1));
-        Say("KFS_InsertKeyF", pair.name, &at, 1, &value, 1, 2);
-        Compare("its value", leaf.InsertKey(at.value, true, &value, KFS_Interp_Hold, KFS_Interp_Hold),
-                KFS_InsertKeyF(s, &at, 1, value.data(), KFS_Interp_Hold, KFS_Interp_Hold));
-        break;
-    }
-    case Keyed:
-        Say((pair.name + ".SetConstant").c_str(), 0, step.a % 4 != 0);
-        Compare("keyed", leaf.SetConstant(false, step.a % 4 != 0), s->SetConstant(0, step.a % 4 != 0));
-        break;
-    case Parametrize:
-        Say("KFS_SetStreamSParametrize", pair.name, +on);
-        Compare("parametrise", leaf.SetSParametrize(on), KFS_SetStreamSParametrize(s, on));
-        break;
-    case Multiplier: {
-        Numbers factors;
-        for (double const number : value) factors.push_back(1.0 + std::fabs(number) / 20.0);
-        Say("KFS_SetStreamMultiplier", pair.name, Given(true, factors), "nullptr");
-        Compare("multiplier", leaf.SetMultiplier(factors), KFS_SetStreamMultiplier(s, factors.data(), nullptr));
-        break;
-    }
-    case SpInterp: {
-        auto const code = on && row_.options.dimension <= 3 ? KFS_SpInterp_Auto : static_cast<unsigned short>(0);
-        Say("KFS_SetStreamSpInterp", pair.name, code);
-        Compare("spatial interpolation", leaf.SetSpInterp(code), KFS_SetStreamSpInterp(s, code));
-        break;
-    }
-    case Prepare: {
-        Say((pair.name + ".PrepareSetValue").c_str(), &at);
-        Done const done = leaf.PrepareSetValue(at.value);
-        Compare("prepare", done, KFSp_Boundary([&] { s->PrepareSetValue(at); }));
-        break;
-    }
-    case Force:
-        Say("KFS_ForceUpdateStream", pair.name);
-        Compare("force", leaf.ForceUpdate(), KFS_ForceUpdateStream(s));
-        break;
-    default: break;
-    }
+    // For answers: a number a component, and a number a handle has.
+    Numbers Room() const { return Numbers(value.size(), 77.0); }
+    Numbers HandleRoom() const { return Numbers(leaf.set.spatial ? 1 : value.size(), 77.0); }
+    void Compare(Done const& expected, int code) const { world.Compare(expected, code); }
+};
+
+double const* Data(Numbers const* numbers)
+{
+    return numbers ? numbers->data() : nullptr;
 }
 
-void World::AskHandles(Pair& pair, Step const& step, int index)
+// A value in the stream's own type, for the rest of the caller's expression.
+void const* Typed(Turn const& t, Numbers const* numbers, Numbers&& room = {})
 {
-    KFS_Stream* const s = pair.stream;
-    Leaf& leaf = pair.leaf;
-    auto const size = static_cast<std::size_t>(row_.options.dimension);
-    Numbers const blank(row_.options.spatial && step.op != ReadSpaceTangents ? 1 : size, 77.0);
-    Numbers e[4] = {blank, blank, blank, blank}, a[4] = {blank, blank, blank, blank};
-    for (Numbers& numbers : a) numbers.resize(size, 77.0);
-    switch (step.op) {
-    case ReadTangents:
-        Say("KFS_GetKeyTangentsF", pair.name, index, "inX", "inY", "outX", "outY");
-        Compare("read tangents", leaf.GetKeyTangents(index, e[0], e[1], e[2], e[3]),
-                KFS_GetKeyTangentsF(s, index, a[0].data(), a[1].data(), a[2].data(), a[3].data()));
-        break;
-    case ReadVelocity: {
-        bool const ends = step.b % 2;
-        Say("KFS_GetKeyVelocityF", pair.name, index, ends, "in", "out");
-        Compare("read velocity", leaf.GetKeyVelocity(index, ends, e[0], e[1]),
-                KFS_GetKeyVelocityF(s, index, ends, a[0].data(), a[1].data()));
-        break;
-    }
-    case ReadInfluence:
-        Say("KFS_GetKeyInfluence", pair.name, index, "in", "out");
-        Compare("read influence", leaf.GetKeyInfluence(index, e[0], e[1]),
-                KFS_GetKeyInfluence(s, index, a[0].data(), a[1].data()));
-        break;
-    case ReadClamped: {
-        e[0] = a[0] = Value(step.c);
-        e[2] = a[2] = Value(step.d);
-        e[1] = a[1] = e[3] = a[3] = Numbers(size, 0.1 + step.b % 10 / 10.0);
-        Say("KFS_GetClampedVelInflF", pair.name, index, 0, &std::as_const(e[0]), &std::as_const(e[1]),
-            &std::as_const(e[2]), &std::as_const(e[3]), "&clamped");
-        bool expected = false;
-        unsigned char actual = 0;
-        Done const done = leaf.GetClamped(index, e[0], e[1], e[2], e[3], expected);
-        Compare("clamp", done,
-                KFS_GetClampedVelInflF(s, index, 0, a[0].data(), a[1].data(), a[2].data(), a[3].data(), &actual));
-        Same("clamped", expected, actual != 0);
-        break;
-    }
-    default:
-        Say("KFS_GetKeySpaceTangentsF", pair.name, index, -1, "in", "out");
-        Compare("read space tangents", leaf.GetKeySpaceTangents(index, e[0], e[1]),
-                KFS_GetKeySpaceTangentsF(s, index, -1, a[0].data(), a[1].data()));
-        break;
-    }
-    // What a constant's sides say about speeds of lines isn't told.
-    if (step.op == ReadVelocity && leaf.set.constant) return;
-    for (std::size_t i = 0; i < 4; ++i) Same("answer " + std::to_string(i), e[i], a[i]);
+    room = t.world.InOwnType(numbers);
+    return Data(numbers ? &room : nullptr);
 }
 
-void World::RunQuestion(Pair& pair, Step const& step)
+// Numbers of a size that handles have, from those of a value.
+Numbers Scaled(Numbers const& value, double factor, double offset, bool positive = false)
 {
-    KFS_Stream* const s = pair.stream;
-    Leaf& leaf = pair.leaf;
-    int const index = Index(pair, step.a);
-    T_Time const at = pair.stream.Time(TimeOf(step.b));
-    int expected = 77, actual = 77;
-    bool expectedFound = false;
-    unsigned char actualFound = 0;
-    T_Time expectedTime{77, 77}, actualTime{77, 77};
-    switch (step.op) {
-    case Update:
-        Say((pair.name + ".UpdateStream").c_str());
-        leaf.Update();
-        Compare("update", {}, s->UpdateStream());
-        break;
-    case Read: Ask(pair, at); break;
-    case ReadTangents:
-    case ReadVelocity:
-    case ReadInfluence:
-    case ReadClamped:
-    case ReadSpaceTangents: AskHandles(pair, step, index); break;
-    case ReadKey: {
-        Say("KFS_GetKeyF", pair.name, index, "value", "&in", "&out");
-        Numbers value(static_cast<std::size_t>(row_.options.dimension), 77.0), actualValue = value;
-        int in = 77, out = 77;
-        char actualIn = 77, actualOut = 77;
-        Done const done = leaf.GetKey(index, value, in, out);
-        Compare("read a key", done, KFS_GetKeyF(s, index, actualValue.data(), &actualIn, &actualOut));
-        if (done.code != 0) break;
-        Same("value", value, actualValue);
-        Same("in code", in, static_cast<int>(actualIn));
-        Same("out code", out, static_cast<int>(actualOut));
-        break;
+    Numbers numbers;
+    for (double const number : value) numbers.push_back((positive ? std::fabs(number) : number) * factor + offset);
+    return numbers;
+}
+
+void Insert(Turn& t, Numbers const* value, bool replaces, char in, char out)
+{
+    auto const replace = static_cast<unsigned char>(replaces);
+    t.Compare(t.leaf.InsertKey(t.at.value, replaces, value, in, out),
+              t.typed ? KFS_InsertKey(t.s, &t.at, replace, Typed(t, value), in, out)
+                      : KFS_InsertKeyF(t.s, &t.at, replace, Data(value), in, out));
+}
+
+void Flags(Turn& t, unsigned short mask)
+{
+    auto const flags = static_cast<unsigned short>(t.n.d % 3 == 0 ? 0 : t.n.d % 3 == 1 ? mask : t.n.c);
+    t.Compare(t.leaf.SetKeyFlags(t.index, mask, flags), KFS_SetKeyFlags(t.s, t.index, mask, flags));
+}
+
+// Asks both for handles: `expected` has as many places as there are answers, `actual` room for all components.
+template <class Twin, class Library>
+void AskHandles(Turn& t, Numbers const& blank, Twin&& twin, Library&& library)
+{
+    Numbers const room = t.Room();
+    Numbers expected[4] = {blank, blank, blank, blank}, actual[4] = {room, room, room, room};
+    t.Compare(twin(expected), library(actual));
+    for (std::size_t i = 0; i < 4; ++i) t.world.Same("answer " + std::to_string(i), expected[i], actual[i].data());
+}
+
+// Asks both for keys. `ask` gets the places for the answers.
+struct Answers {
+    int index = 77;
+    bool found = false;
+    unsigned char foundByte = 0;
+    T_Time time{77, 77}, end{77, 77};
+};
+
+template <class Twin, class Library>
+void AskKeys(Turn& t, Twin&& twin, Library&& library)
+{
+    Answers expected, actual;
+    Done const done = twin(expected);
+    t.Compare(done, library(actual));
+    t.world.Same("index", expected.index, actual.index);
+    t.world.Same("found", expected.found, actual.foundByte != 0);
+    t.world.Same("time", expected.time, actual.time);
+    t.world.Same("end", expected.end, actual.end);
+}
+
+struct Op {
+    char const* name;
+    int plain, path;  // how often it is drawn
+    void (*run)(Turn&);
+};
+
+// A call of both, and questions to both: the twin's and the library's expression.
+#define BOTH(twin, library) [](Turn& t) { t.Compare(twin, library); }
+#define ASK_KEYS(twin, library)                                                                                        \
+    [](Turn& t) {                                                                                                      \
+        AskKeys(                                                                                                       \
+            t, [&](Answers& a) { return twin; }, [&](Answers& a) { return library; });                                 \
     }
-    case Find: {
-        bool const backward = step.c % 2, exact = step.d % 2;
-        auto const direction = static_cast<short>((backward ? KFS_Find_Backward : 0) | (exact ? KFS_Find_AtTime : 0));
-        Say("KFS_FindKeyTime", pair.name, &at, direction, "&found", "&index", "&keyTime");
-        Done const done = leaf.FindKeyTime(at.value, backward, exact, expectedFound, expected, expectedTime);
-        Compare("find", done, KFS_FindKeyTime(s, &at, direction, &actualFound, &actual, &actualTime));
-        Same("found", expectedFound, actualFound != 0);
-        Same("index", expected, actual);
-        Same("key time", expectedTime, actualTime);
-        break;
+#define ASK_HANDLES(room, twin, library)                                                                               \
+    [](Turn& t) {                                                                                                      \
+        AskHandles(                                                                                                    \
+            t, room, [&](Numbers* n) { return twin; }, [&](Numbers* n) { return library; });                           \
     }
-    case Nearest:
-        Say("KFS_FindNearestKeyTime", pair.name, &at, "&index", "&keyTime");
-        Compare("nearest", leaf.FindNearest(at.value, expected, expectedTime),
-                KFS_FindNearestKeyTime(s, &at, &actual, &actualTime));
-        Same("index", expected, actual);
-        Same("key time", expectedTime, actualTime);
-        break;
-    case ToIndex:
-        Say("KFS_TimeToIndex", pair.name, &at, "&index");
-        Compare("time to index", leaf.TimeToIndex(at.value, expected), KFS_TimeToIndex(s, &at, &actual));
-        Same("index", expected, actual);
-        break;
-    case KeyIndex:
-        Say("KFS_GetKeyIndex", pair.name, &at, "&index", "&found");
-        Compare("key index", leaf.GetKeyIndex(at.value, expected, expectedFound),
-                KFS_GetKeyIndex(s, &at, &actual, &actualFound));
-        Same("index", expected, actual);
-        Same("found", expectedFound, actualFound != 0);
-        break;
-    case ToTime:
-        Say("KFS_IndexToTime", pair.name, index, "&time");
-        Compare("index to time", leaf.IndexToTime(index, expectedTime), KFS_IndexToTime(s, index, &actualTime));
-        Same("time", expectedTime, actualTime);
-        break;
-    case Walk: {
-        T_Time const until = pair.stream.Time(TimeOf(step.c));
-        T_Time const* const from = step.d % 3 ? &at : nullptr;
-        T_Time const* const to = step.d % 4 ? &until : nullptr;
-        Say("KFS_ForRange", pair.name, from, to, "&times", "push", "nullptr");
-        std::vector<int> expectedTimes, actualTimes;
-        auto const push = [](KFS_Stream*, long times, int, KFS_KeyScalar* key) {
-            reinterpret_cast<std::vector<int>*>(times)->push_back(key->time);
-            return 0;
-        };
-        Compare("walk", leaf.ForRange(from ? &at.value : nullptr, to ? &until.value : nullptr, expectedTimes),
-                KFS_ForRange(s, from, to, reinterpret_cast<long>(&actualTimes), push, nullptr));
-        Same("walked", testing::PrintToString(expectedTimes), testing::PrintToString(actualTimes));
-        break;
-    }
-    case Predict: {
-        auto const action = static_cast<unsigned short>(step.a % 8);
-        Say("KFS_PredictInvalid", pair.name, action, &at, "&from", "&to");
-        int from = 77, to = 77;
-        Done const done = leaf.PredictInvalid(action, at.value, from, to);
-        T_Time actualTo{};
-        Compare("predict", done, KFS_PredictInvalid(s, action, &at, &actualTime, &actualTo));
-        if (done.code != 0) break;
-        Same("from", from, actualTime.value);
-        Same("to", to, actualTo.value);
-        break;
-    }
-    default: {
-        Say("KFS_ChooseInterps", pair.name, &at, "&in", "&out");
-        int in, out;
-        unsigned int flags, spFlags;
-        leaf.Choose(at.value, in, out, flags, spFlags);
-        char actualIn = 77, actualOut = 77;
-        Compare("propose", {}, KFS_ChooseInterps(s, &at, &actualIn, &actualOut));
-        Same("in code", in, static_cast<int>(actualIn));
-        Same("out code", out, static_cast<int>(actualOut));
-        break;
-    }
-    }
+
+Op const Ops[] = {
+    {"insert", 12, 12, [](Turn& t) { Insert(t, &t.value, t.n.a % 8 != 0, t.in, t.out); }},
+    {"insert on the curve", 6, 6,
+     [](Turn& t) {
+         if (!t.leaf.set.constant) Insert(t, nullptr, true, t.n.a % 2 ? '\0' : t.in, t.n.a % 3 ? '\0' : t.out);
+     }},
+    {"set", 5, 5,
+     [](Turn& t) {
+         char const in = t.n.b % 2 ? '\0' : t.in, out = t.n.b % 3 ? '\0' : t.out;
+         Numbers const* const value = t.n.b % 5 ? &t.value : nullptr;
+         t.Compare(t.leaf.SetKey(t.index, value, in, out), t.typed ? KFS_SetKey(t.s, t.index, Typed(t, value), in, out)
+                                                                   : KFS_SetKeyF(t.s, t.index, Data(value), in, out));
+     }},
+    {"remove", 5, 4,
+     [](Turn& t) {
+         Numbers expected = t.Room(), actual = t.Room();
+         Done const done = t.leaf.RemoveKey(t.index, &expected);
+         t.Compare(done, KFS_RemoveKey(t.s, t.index, actual.data()));
+         if (done.code == 0) t.world.SameTyped("removed value", expected, actual);
+     }},
+    {"copy a key", 3, 3,
+     [](Turn& t) {
+         Pair& source = t.n.c % 2 ? t.pair : t.other;
+         int const from = t.Index(source);
+         auto const replace = static_cast<unsigned char>(t.n.c % 5 != 0);
+         T_Time const* const at = t.n.c % 3 != 0 ? &t.at : nullptr;
+         int expected = 77, actual = 77;
+         Done const done = t.leaf.CopyKey(source.leaf, from, replace, at ? &at->value : nullptr, &expected);
+         t.Compare(done, KFS_CopyKey(source.stream, from, replace, at, t.s, &actual));
+         t.world.Same("new index", expected, actual);
+     }},
+    {"copy all keys", 1, 1, BOTH(t.leaf.CopyKeys(t.other.leaf), KFS_CopyKeys(t.other.stream, nullptr, t.s))},
+    {"retime", 6, 6,
+     [](Turn& t) {
+         int index = 77, old = 77, actualIndex = 77;
+         T_Time actualOld{77, 77};
+         Done const done = t.leaf.SetKeyTime(t.index, t.at.value, &index, &old);
+         t.Compare(done, KFS_SetKeyTime(t.s, t.index, nullptr, t.at.value, &actualIndex, &actualOld));
+         if (!t.leaf.set.constant) t.world.Same("new index", index, actualIndex);
+         if (done.code != KFS_Err_NoKeys) t.world.Same("old time", {old, t.leaf.set.scale}, actualOld);
+     }},
+    {"flags", 6, 6,
+     [](Turn& t) {
+         constexpr unsigned short masks[] = {KFS_KeyFlag_Continuous, KFS_KeyFlag_Modifiable,
+                                             KFS_KeyFlag_Continuous | KFS_KeyFlag_Modifiable, KFS_KeyFlag_Modifiable};
+         Flags(t, masks[t.n.b % 4]);
+     }},
+    {"float", 1, 8, [](Turn& t) { Flags(t, KFS_KeyFlag_Float); }},
+    {"tangents", 5, 5,
+     [](Turn& t) {
+         Numbers const in = Scaled(t.value, 1 / 40.0, -0.25), out = Scaled(t.second, 1 / 40.0, 0.25);
+         Numbers const *const inX = t.first ? &in : nullptr, *const outX = t.last ? &out : nullptr;
+         double const tall = std::array{0.01, 1.0, 1e4}[static_cast<std::size_t>(t.n.b % 3)];
+         t.Compare(t.leaf.SetKeyTangents(t.index, inX, &t.value, outX, &t.second, tall),
+                   KFS_SetKeyTangentsF(t.s, t.index, Data(inX), t.value.data(), Data(outX), t.second.data(), tall));
+     }},
+    {"velocity", 3, 3,
+     BOTH(t.leaf.SetKeyVelocity(t.index, t.first, t.last),
+          t.typed && !t.leaf.set.spatial ? KFS_SetKeyVelocity(t.s, t.index, Typed(t, t.first), Typed(t, t.last))
+                                         : KFS_SetKeyVelocityF(t.s, t.index, Data(t.first), Data(t.last)))},
+    {"influence", 3, 3,
+     [](Turn& t) {
+         Numbers const in = Scaled(t.value, 1 / 16.0, 0.0), out = Scaled(t.second, 1 / 25.0, 0.0, true);
+         Numbers const *const inGiven = t.first ? &in : nullptr, *const outGiven = t.last ? &out : nullptr;
+         t.Compare(t.leaf.SetKeyInfluence(t.index, inGiven, outGiven),
+                   KFS_SetKeyInfluence(t.s, t.index, Data(inGiven), Data(outGiven)));
+     }},
+    {"space tangents", 1, 5,
+     BOTH(t.leaf.SetKeySpaceTangents(t.index, t.first, t.last),
+          t.typed ? KFS_SetKeySpaceTangents(t.s, t.index, -1, Typed(t, t.first), Typed(t, t.last))
+                  : KFS_SetKeySpaceTangentsF(t.s, t.index, -1, Data(t.first), Data(t.last)))},
+    {"spatial flags", 0, 3,
+     [](Turn& t) {
+         auto const mask = static_cast<unsigned>(t.n.b % 4), values = static_cast<unsigned>(t.n.d % 4);
+         t.Compare(t.leaf.SetKeySpFlags(t.index, mask, values), KFS_SetKeySpFlags(t.s, t.index, mask, values));
+     }},
+    {"automatic path", 0, 4,
+     BOTH(t.leaf.SetKeySpModifiable(t.on, t.index), KFS_SetKeySpModifiable(t.s, t.on, t.index))},
+    {"continuous path", 0, 2,
+     BOTH(t.leaf.SetKeySpContinuous(t.on, t.index), KFS_SetKeySpContinuous(t.s, t.on, t.index))},
+    {"rescale", 1, 1,
+     [](Turn& t) {
+         unsigned int const scale = std::array{24U, 30U, 600U, 1000U}[static_cast<std::size_t>(t.n.a % 4)];
+         t.Compare(t.leaf.Rescale(scale), KFS_RescaleStream(t.s, scale));
+     }},
+    {"make constant", 1, 1,
+     [](Turn& t) {
+         // The record turns the constant's value: it is read first, and then given its codes.
+         if (!t.leaf.set.constant && t.leaf.Count() > 0) t.world.Ask(t.pair, t.at);
+         t.Compare(t.leaf.SetConstant(true, true), t.s->SetConstant(1, 1));
+         Insert(t, &t.value, true, KFS_Interp_Hold, KFS_Interp_Hold);
+     }},
+    {"make keyed", 1, 1,
+     [](Turn& t) {
+         bool const keeps = t.n.a % 4 != 0;
+         t.Compare(t.leaf.SetConstant(false, keeps), t.s->SetConstant(0, keeps));
+     }},
+    {"parametrize", 1, 0, BOTH(t.leaf.SetSParametrize(t.on), KFS_SetStreamSParametrize(t.s, t.on))},
+    {"multiplier", 1, 1,
+     [](Turn& t) {
+         Numbers const factors = Scaled(t.value, 1 / 20.0, 1.0, true);
+         t.Compare(t.leaf.SetMultiplier(factors), KFS_SetStreamMultiplier(t.s, factors.data(), nullptr));
+     }},
+    {"spatial interpolation", 0, 1,
+     [](Turn& t) {
+         bool const automatic = t.on && t.value.size() <= 3;
+         auto const code = static_cast<unsigned short>(automatic ? KFS_SpInterp_Auto : KFS_SpInterp_None);
+         t.Compare(t.leaf.SetSpInterp(code), KFS_SetStreamSpInterp(t.s, code));
+         // Nothing is marked. An edit would bend the path at the end of its mark and not measure the arc behind.
+         t.Compare(t.leaf.ForceUpdate(), KFS_ForceUpdateStream(t.s));
+     }},
+    {"accuracy", 1, 1,
+     [](Turn& t) {
+         double const accuracy = std::array{0.01, 0.3, -0.5}[static_cast<std::size_t>(t.n.a % 3)];
+         double expected = 77.0, actual = 77.0;
+         Done const done = t.leaf.SetAccuracy(accuracy, expected);
+         t.Compare(done, KFS_SetStreamAccuracy(t.s, &accuracy, &actual));
+         t.world.Same("old accuracy", expected, actual);
+         t.Compare(t.leaf.ForceUpdate(), KFS_ForceUpdateStream(t.s));  // arcs that are measured would stay
+     }},
+    {"prepare", 2, 2,
+     [](Turn& t) {
+         t.Compare(t.leaf.PrepareSetValue(t.at.value), KFSp_Boundary([&] { t.s->PrepareSetValue(t.at); }));
+     }},
+    {"dispose arcs", 0, 1, BOTH(t.leaf.DisposeRemapTables(), KFS_DisposeRemapTables(t.s))},
+    {"force", 1, 1, BOTH(t.leaf.ForceUpdate(), KFS_ForceUpdateStream(t.s))},
+    {"swap", 1, 1,
+     [](Turn& t) { t.Compare(t.leaf.Swap(t.other.leaf), KFSp_Boundary([&] { t.s->swap(*t.other.stream); })); }},
+    {"swap with a clone", 1, 1,
+     [](Turn& t) {
+         std::unique_ptr<KFS_Stream> const clone(t.s->CloneLeaf({true, true}));
+         t.Compare(t.leaf.SwapWithClone(), KFSp_Boundary([&] { t.s->swap(*clone); }));
+     }},
+    {"update", 2, 3,
+     [](Turn& t) {
+         t.leaf.Update();
+         t.Compare({}, t.s->UpdateStream());
+     }},
+    {"read", 6, 6, [](Turn& t) { t.world.Ask(t.pair, t.at); }},
+    {"read tangents", 2, 2,
+     ASK_HANDLES(t.HandleRoom(), t.leaf.GetKeyTangents(t.index, n[0], n[1], n[2], n[3]),
+                 KFS_GetKeyTangentsF(t.s, t.index, n[0].data(), n[1].data(), n[2].data(), n[3].data()))},
+    {"read velocity", 2, 2,
+     [](Turn& t) {
+         bool const ends = t.n.b % 2;
+         // What a constant's sides say about speeds of lines isn't told.
+         AskHandles(
+             t, t.leaf.set.constant ? Numbers() : t.HandleRoom(),
+             [&](Numbers* n) { return t.leaf.GetKeyVelocity(t.index, ends, n[0], n[1]); },
+             [&](Numbers* n) { return KFS_GetKeyVelocityF(t.s, t.index, ends, n[0].data(), n[1].data()); });
+     }},
+    {"read influence", 1, 1,
+     ASK_HANDLES(t.HandleRoom(), t.leaf.GetKeyInfluence(t.index, n[0], n[1]),
+                 KFS_GetKeyInfluence(t.s, t.index, n[0].data(), n[1].data()))},
+    {"read space tangents", 1, 2,
+     ASK_HANDLES(t.Room(), t.leaf.GetKeySpaceTangents(t.index, n[0], n[1]),
+                 KFS_GetKeySpaceTangentsF(t.s, t.index, -1, n[0].data(), n[1].data()))},
+    {"clamp", 1, 0,
+     [](Turn& t) {
+         bool expected = t.on;  // which is only ever set
+         auto actual = static_cast<unsigned char>(t.on);
+         auto const fill = [&](Numbers* n) {
+             n[0] = t.value;
+             n[2] = t.second;
+             n[1] = n[3] = Numbers(t.value.size(), 0.1 + t.n.b % 10 / 10.0);
+         };
+         AskHandles(
+             t, t.Room(),
+             [&](Numbers* n) {
+                 fill(n);
+                 return t.leaf.GetClamped(t.index, n[0], n[1], n[2], n[3], expected);
+             },
+             [&](Numbers* n) {
+                 fill(n);
+                 return KFS_GetClampedVelInflF(t.s, t.index, 0, n[0].data(), n[1].data(), n[2].data(), n[3].data(),
+                                               &actual);
+             });
+         t.world.Same("clamped", expected, actual != 0);
+     }},
+    {"read a key", 1, 1,
+     [](Turn& t) {
+         Numbers value = t.Room(), actual = t.Room();
+         int in = 77, out = 77;
+         char actualIn = 77, actualOut = 77;
+         Done const done = t.leaf.GetKey(t.index, value, in, out);
+         t.Compare(done, t.typed ? KFS_GetKey(t.s, t.index, actual.data(), &actualIn, &actualOut)
+                                 : KFS_GetKeyF(t.s, t.index, actual.data(), &actualIn, &actualOut));
+         if (done.code != 0) return;
+         t.typed ? t.world.SameTyped("value", value, actual) : t.world.Same("value", value, actual.data());
+         t.world.Same("in code", in, actualIn);
+         t.world.Same("out code", out, actualOut);
+     }},
+    {"read flags", 1, 1,
+     [](Turn& t) {
+         unsigned int expected = 77, expectedPath = 77, path = 77;
+         unsigned short flags = 77;
+         Done const done = t.leaf.GetFlags(t.index, expected);
+         t.Compare(done, KFS_GetKeyFlags(t.s, t.index, &flags));
+         t.world.Same("flags", expected, flags);
+         if (!t.leaf.set.spatial) return;
+         Done const pathDone = t.leaf.GetSpFlags(t.index, expectedPath);
+         t.Compare(pathDone, KFS_GetKeySpFlags(t.s, t.index, &path));
+         t.world.Same("spatial flags", expectedPath, path);
+     }},
+    {"find", 2, 2,
+     [](Turn& t) {
+         bool const backward = t.n.c % 2, exact = t.on;
+         auto const way = static_cast<short>((backward ? KFS_Find_Backward : 0) | (exact ? KFS_Find_AtTime : 0));
+         AskKeys(
+             t, [&](Answers& a) { return t.leaf.FindKeyTime(t.at.value, backward, exact, a.found, a.index, a.time); },
+             [&](Answers& a) { return KFS_FindKeyTime(t.s, &t.at, way, &a.foundByte, &a.index, &a.time); });
+     }},
+    {"nearest", 2, 2,
+     ASK_KEYS(t.leaf.FindNearest(t.at.value, a.index, a.time), KFS_FindNearestKeyTime(t.s, &t.at, &a.index, &a.time))},
+    {"time to index", 2, 2, ASK_KEYS(t.leaf.TimeToIndex(t.at.value, a.index), KFS_TimeToIndex(t.s, &t.at, &a.index))},
+    {"key index", 1, 1,
+     ASK_KEYS(t.leaf.GetKeyIndex(t.at.value, a.index, a.found), KFS_GetKeyIndex(t.s, &t.at, &a.index, &a.foundByte))},
+    {"index to time", 2, 2, ASK_KEYS(t.leaf.IndexToTime(t.index, a.time), KFS_IndexToTime(t.s, t.index, &a.time))},
+    {"predict", 3, 3,
+     [](Turn& t) {
+         auto const action = static_cast<unsigned short>(t.n.a % 8);
+         AskKeys(
+             t, [&](Answers& a) { return t.leaf.PredictInvalid(action, t.at.value, a.time.value, a.end.value); },
+             [&](Answers& a) {
+                 a.time = a.end = t.at;
+                 int const code = KFS_PredictInvalid(t.s, action, &t.at, &a.time, &a.end);
+                 a.time.scale = a.end.scale = 77;
+                 return code;
+             });
+     }},
+    {"walk", 1, 1,
+     [](Turn& t) {
+         T_Time const until = t.pair.stream.Time(t.TimeOf(t.n.c));
+         T_Time const* const from = t.n.d % 3 ? &t.at : nullptr;
+         T_Time const* const to = t.n.d % 4 ? &until : nullptr;
+         std::vector<int> expected, actual;
+         auto const push = [](KFS_Stream*, long times, int, KFS_KeyScalar* key) {
+             reinterpret_cast<std::vector<int>*>(times)->push_back(key->time);
+             return 0;
+         };
+         t.Compare(t.leaf.ForRange(from ? &t.at.value : nullptr, to ? &until.value : nullptr, expected),
+                   KFS_ForRange(t.s, from, to, reinterpret_cast<long>(&actual), push, nullptr));
+         t.world.Same("walked as the twin", true, expected == actual);
+     }},
+    {"propose", 1, 1,
+     [](Turn& t) {
+         int in, out;
+         unsigned int flags, spFlags;
+         t.leaf.Choose(t.at.value, in, out, flags, spFlags);
+         char actualIn = 77, actualOut = 77;
+         t.Compare({}, KFS_ChooseInterps(t.s, &t.at, &actualIn, &actualOut));
+         t.world.Same("in code", in, actualIn);
+         t.world.Same("out code", out, actualOut);
+     }},
+};
+
+#undef BOTH
+#undef ASK_KEYS
+#undef ASK_HANDLES
+
+std::string World::Take(Step const& step)
+{
+    Op const& op = Ops[step.op];
+    Turn turn{*this, step, pairs_[step.leaf], pairs_[1 - step.leaf]};
+    std::ostringstream out;
+    out << "    " << turn.pair.name << ' ' << op.name << ": index " << turn.index << ", time " << turn.at.value
+        << ", values " << testing::PrintToString(turn.value) << ' ' << testing::PrintToString(turn.second) << ", codes "
+        << +turn.in << ' ' << +turn.out << ", numbers " << step.a << ' ' << step.b << ' ' << step.c << ' ' << step.d
+        << "\n";
+    steps_ += out.str();
+    op.run(turn);
+    for (Pair& pair : pairs_) CompareStored(pair);
+    return std::exchange(fault_, {});
 }
 
 // ---- running and cutting down
 
-// What went wrong, and by which calls; both empty if nothing did. `length`: how many steps it took.
+std::vector<Step> Draw(Row const& row, unsigned int seed, int length)
+{
+    std::mt19937 random(seed);
+    std::vector<int> weights;
+    for (Op const& op : Ops) weights.push_back(row.options.spatial ? op.path : op.plain);
+    std::discrete_distribution<int> op(weights.begin(), weights.end());
+    std::uniform_int_distribution<int> number(0, 999);
+    std::vector<Step> script;
+    for (int i = 0; i < length; ++i) {
+        Step step{i < 8 ? 0 : op(random), number(random) % 5 == 0, 0, 0, 0, 0};  // inserts come first
+        for (int* field : {&step.a, &step.b, &step.c, &step.d}) *field = number(random);
+        script.push_back(step);
+    }
+    return script;
+}
+
+// What went wrong, and in which steps; both empty if nothing did. `length`: how many steps it took.
 struct Outcome {
-    std::string fault, calls;
+    std::string fault, steps;
     std::size_t length = 0;
 };
 
@@ -801,9 +732,10 @@ Outcome RunScript(Row const& row, std::vector<Step> const& script, ReportRecorde
     World world(row, reports);
     for (std::size_t i = 0; i < script.size(); ++i) {
         std::string const fault = world.Take(script[i]);
-        if (!fault.empty()) return {fault, world.Calls(), i + 1};
+        if (!fault.empty()) return {fault, world.Steps(), i + 1};
     }
-    return {world.TakeAll(), world.Calls(), script.size()};
+    std::string const fault = world.TakeAll();
+    return {fault, world.Steps(), script.size()};
 }
 
 // Takes steps away, then makes their numbers smaller, for as long as the script still fails.
@@ -848,7 +780,7 @@ TEST_F(LeafScript, AgreesWithItsTwin)
             std::vector<Step> const script = Draw(row, seed, 60);
             if (RunScript(row, script, reports).fault.empty()) continue;
             Outcome const outcome = RunScript(row, Shrink(row, script, reports), reports);
-            ADD_FAILURE() << row.why << ", seed " << seed << ":\n" << outcome.calls << outcome.fault;
+            ADD_FAILURE() << row.why << ", seed " << seed << ":\n" << outcome.steps << outcome.fault;
             break;
         }
     }

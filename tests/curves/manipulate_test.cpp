@@ -6,7 +6,7 @@
 #include "keystore/attributes.h"
 #include "keystore/keyflags.h"
 #include "keystore/lookup.h"
-#include "tests/curves/pathstream.h"
+#include "tests/curves/keyedstream.h"
 #include "tests/support/dice.h"
 
 #include <climits>

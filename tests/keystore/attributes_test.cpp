@@ -1,31 +1,13 @@
 #include "keystore/attributes.h"
 
 #include "keystore/attributes_private.h"
-#include "tests/support/listening.h"
 #include "tests/support/streams.h"
-
-#include <functional>
-#include <stdexcept>
 
 namespace {
 
 class Attributes : public StreamTest {};
 
 constexpr StreamOptions Spatial2D{.dimension = 2, .spatial = true};
-
-TEST_F(Attributes, MergingLeavesBothStreamsAlone)
-{
-    TestStream a, b;
-    a.Key(0, {1.0});
-    b.Key(5, {2.0}).Key(9, {3.0});
-    auto const bytes = a.Bytes();
-    T_Time const at{3, 600};
-    KFS_Stream* other = b.get();
-    EXPECT_EQ(0, KFS_MergeStream(a, &at, &other));
-    EXPECT_EQ(b.get(), other);
-    EXPECT_EQ(bytes, a.Bytes());
-    EXPECT_EQ(2, b.Count());
-}
 
 TEST_F(Attributes, ASpatialSettingIsPermittedByTheTemporalMask)
 {
@@ -39,28 +21,13 @@ TEST_F(Attributes, ASpatialSettingIsPermittedByTheTemporalMask)
             unsigned const expected = permitted ? code : stream->GetSpInterp();
             EXPECT_EQ(permitted ? 0 : 7431, KFS_SetStreamSpInterp(stream, static_cast<unsigned short>(code)));
             EXPECT_EQ(expected, stream->GetSpInterp());
-            if (!permitted) {
-                EXPECT_REPORT(reports, 15,
-                              "spatial interpolation method not allowed for this stream (" + std::to_string(code) +
-                                  ").");
-            }
+            std::string const text =
+                "spatial interpolation method not allowed for this stream (" + std::to_string(code) + ").";
+            EXPECT_EQ(permitted ? std::vector<Reported>{} : std::vector{KfsReport(15, text)}, reports.Take());
         }
         EXPECT_EQ(7431, KFSp_CanDoSpInterp(stream, 0xFFFF));
         reports.Take();
     }
-}
-
-TEST_F(Attributes, AccuracyIsKeptSquared)
-{
-    TestStream const stream;
-    double accuracy = 0.0;
-    double const half = -0.5;
-    EXPECT_EQ(0, KFS_SetStreamAccuracy(stream, &half, &accuracy));
-    EXPECT_DOUBLE_EQ(0.01, accuracy);
-    EXPECT_EQ(0, KFS_SetStreamAccuracy(stream, nullptr, nullptr));
-    EXPECT_EQ(0.25, stream->GetAccuracy());
-    EXPECT_EQ(0, KFS_GetStreamAccuracy(stream, &accuracy));
-    EXPECT_EQ(0.5, accuracy);
 }
 
 TEST_F(Attributes, DimensionsShareTheFourComponentsOfTheMultiplier)
@@ -77,6 +44,11 @@ TEST_F(Attributes, DimensionsShareTheFourComponentsOfTheMultiplier)
     TestStream const two(Spatial2D);
     ASSERT_EQ(0, KFS_SetStreamMultiplier(two, first, nullptr));
     EXPECT_EQ((M_Vector4T<double>{{2.0, 3.0, 1.0, 1.0}}), two->GetMultiplier());
+    double const accuracy = -0.5;
+    ASSERT_EQ(0, KFS_SetStreamAccuracy(two, &accuracy, nullptr));
+    EXPECT_EQ(0.25, two->GetAccuracy()) << "kept squared";
+    ASSERT_EQ(0, KFS_GetStreamAccuracy(two, now));
+    EXPECT_EQ(0.5, now[0]);
 }
 
 // A mark reaches back by a short.

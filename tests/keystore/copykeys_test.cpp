@@ -176,7 +176,7 @@ TEST_F(CopyKeys, AFailureTakesBackWhatAReadHasMoved)
 
 TEST_F(CopyKeys, CustomValuesAreCopiedAndGivenBack)
 {
-    for (int const run : {0, 1, 2, 3, 4, 5, 6, 7}) {
+    for (int run = 0; run < 8; ++run) {
         int const failure = run % 4;  // which key's insertion fails
         bool const reads = run >= 4;  // a listener, and what is read stays in the cache record
         OwnedValues::Scope const owned;

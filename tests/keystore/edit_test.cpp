@@ -1,43 +1,14 @@
 #include "keystore/edit.h"
 
-#include "curves/segment_private.h"
-#include "curves/tangents.h"
-#include "keystore/attributes.h"
 #include "keystore/edit_private.h"
 #include "tests/support/listening.h"
 #include "tests/support/streams.h"
 
-#include <climits>
-#include <functional>
-#include <map>
-#include <optional>
-#include <random>
-#include <tuple>
-
 namespace {
 
-constexpr char None = KFS_Interp_None;
 constexpr char Linear = KFS_Interp_Linear;
 
-std::string InterpText(int code)
-{
-    return "interpolation method not allowed for this stream (" + std::to_string(code) + ").";
-}
-
 class Edit : public StreamTest {};
-
-// Without a value, or with the number in all its components.
-int Insert(TestStream const& stream, int time, std::optional<double> number, char in, char out, bool replace = false)
-{
-    T_Time const at = stream.Time(time);
-    std::vector<double> const value(static_cast<std::size_t>(stream->GetDimension()), number.value_or(0.0));
-    return KFS_InsertKeyF(stream, &at, replace, number ? value.data() : nullptr, in, out);
-}
-
-std::pair<char, char> Codes(TestStream const& stream, int index)
-{
-    return {stream.Record(index)->inInterp, stream.Record(index)->outInterp};
-}
 
 // ---- which codes are allowed
 
@@ -56,7 +27,8 @@ TEST_F(Edit, TheMaskDecidesAboutCodes)
         SCOPED_TRACE(testing::Message() << "mask " << row.mask << " code " << row.code);
         TestStream const stream({.interpMask = row.mask});
         EXPECT_EQ(row.allowed ? 0 : 7431, KFSp_CanDoInterp(stream, static_cast<char>(row.code)));
-        if (!row.allowed) EXPECT_REPORT(reports, 13, InterpText(row.code));
+        std::string const text = "interpolation method not allowed for this stream (" + std::to_string(row.code) + ").";
+        EXPECT_EQ(row.allowed ? std::vector<Reported>{} : std::vector{KfsReport(13, text)}, reports.Take());
     }
 }
 
@@ -65,36 +37,17 @@ TEST_F(Edit, TheMaskDecidesAboutCodes)
 TEST_F(Edit, ATimeIsTakenInTheStreamsScale)
 {
     double const value = 4.0;
-    for (auto const& [time, at] : {std::pair<T_Time, int>{{1, 2}, 300}, {{-1, 1}, -600}, {{1, 24000}, 0}}) {
-        TestStream const stream;
-        EXPECT_EQ(0, KFS_InsertKeyF(stream, &time, 0, &value, Linear, Linear));
-        EXPECT_EQ(std::vector<int>{at}, stream.Times());
-    }
     TestStream const stream;
-    T_Time const unfit{1, 0};
-    EXPECT_NE(0, KFS_InsertKey(stream, &unfit, 0, &value, Linear, Linear));
-    EXPECT_EQ(0, KFS_InsertKey(stream, nullptr, 0, &value, Linear, Linear));
-    EXPECT_EQ(std::vector<int>{0}, stream.Times());
+    for (T_Time const time : {T_Time{1, 2}, T_Time{-1, 1}, T_Time{1, 24000}})
+        EXPECT_EQ(0, KFS_InsertKeyF(stream, &time, 0, &value, Linear, Linear));
+    EXPECT_EQ(0, KFS_InsertKey(stream, nullptr, 1, &value, Linear, Linear));
+    EXPECT_EQ((std::vector<int>{-600, 0, 300}), stream.Times());
     // The sentinel isn't a time that a key could have.
-    EXPECT_EQ(7430, Insert(stream, KFS_INVALID_INDEX, 4.0, Linear, Linear));
+    T_Time const sentinel = stream.Time(KFS_INVALID_INDEX);
+    EXPECT_EQ(7430, KFS_InsertKeyF(stream, &sentinel, 0, &value, Linear, Linear));
     EXPECT_REPORT(reports, 17,
                   "attempt to insert a key value into a time stream at a time position not representable in the "
                   "stream time scale.");
-}
-
-TEST_F(Edit, ValuesComeInTheExternalType)
-{
-    TestStream stream({.dimension = 2, .type = KFS_Type_Fixed});
-    int const halves[2] = {98304, -98304};
-    T_Time const at = stream.Time(5);
-    ASSERT_EQ(0, KFS_InsertKey(stream, &at, 0, halves, None, None));
-    EXPECT_EQ((std::vector{1.5, -1.5}), stream.At(5));
-    EXPECT_EQ((std::pair{Linear, Linear}), Codes(stream, 0)) << "nothing to go by is linear";
-    double const numbers[2] = {0.25, 0.75};
-    ASSERT_EQ(0, KFS_SetKeyF(stream, 0, numbers, None, None));
-    std::array<int, 2> out{};
-    ASSERT_EQ(0, KFS_RemoveKey(stream, 0, out.data()));
-    EXPECT_EQ((std::array{16384, 49152}), out);
 }
 
 // ---- insertion from the cache record, the way in for everybody

@@ -109,4 +109,16 @@ TEST_F(EditCustom, AFailingItemFunctionLeavesTheKeyAsItWas)
     }
 }
 
+TEST_F(EditCustom, ACustomKeyHasFlagsAndKeepsItsValue)
+{
+    OwnedValues::Scope const owned;
+    auto const stream = OwnedValues::MakeStream(false);
+    for (int const time : {0, 100}) OwnedValues::InsertKey(stream.get(), time, 5.0, KFS_Interp_Spline);
+    OwnedValues::Read(stream.get(), 100);
+    ASSERT_EQ(3, OwnedValues::Live()) << "two keys, and the last value that was read";
+    constexpr unsigned short flags = KFS_KeyFlag_Continuous | KFS_KeyFlag_Modifiable;
+    ASSERT_EQ(0, KFS_SetKeyFlags(stream.get(), 1, flags, flags));
+    EXPECT_EQ(2, OwnedValues::Live());
+}
+
 }  // namespace

@@ -168,39 +168,16 @@ TEST_F(Evaluate, AnotherStreamsExpressionIsConvertedThroughDoubles)
     EXPECT_EQ(3 * 65536, fixed);
 }
 
-TEST_F(Evaluate, ExternalFormConvertsAndDoubleFormDoesNot)
+TEST_F(Evaluate, AVectorGoesIntoAValueBuffer)
 {
-    TestStream stream({.dimension = 2, .type = KFS_Type_U8});
-    stream.Key(0, {0.0, 10.0}).Key(100, {3.0, 300.0});
-    T_Time const at{50, 600};
-    std::array<unsigned char, 2> bytes{};
-    ASSERT_EQ(0, KFS_GetValue(stream, &at, 1, bytes.data(), nullptr, nullptr)) << "the third argument has no say";
-    EXPECT_EQ((std::array<unsigned char, 2>{2, 155}), bytes) << "halves round away from zero";
-    EXPECT_EQ((std::vector{1.5, 155.0}), stream.At(50));
     std::array<unsigned char, 4> four{};
     M_Vector4T<double> const vector{{1.0, 2.0, 3.4, 254.6}};
     TestStream const wide({.dimension = 4, .type = KFS_Type_U8});
     KFS_PostCacheVector4Value(wide, 0, vector, nullptr, four.data());
-    EXPECT_EQ((std::array<unsigned char, 4>{1, 2, 3, 255}), four) << "a vector goes into a value buffer";
+    EXPECT_EQ((std::array<unsigned char, 4>{1, 2, 3, 255}), four);
     void* pointer = nullptr;
     KFS_PostCacheVector4Value(wide, 0, vector, four.data(), &pointer);
     EXPECT_EQ(four.data(), pointer);
-}
-
-TEST_F(Evaluate, TimesComeInAnyScale)
-{
-    TestStream stream;
-    stream.Key(0, {0.0}).Key(600, {6.0});
-    double value = 0.0;
-    for (T_Time const at : {T_Time{1, 2}, T_Time{300, 600}, T_Time{15, 30}}) {
-        ASSERT_EQ(0, KFS_GetValueFPlus(stream, &at, 0, &value, nullptr, nullptr));
-        EXPECT_DOUBLE_EQ(3.0, value);
-    }
-    ASSERT_EQ(0, KFS_GetValueFPlus(stream, nullptr, 0, &value, nullptr, nullptr));
-    EXPECT_EQ(0.0, value) << "no time is the origin";
-    T_Time const beyond{2000000000, 1}, noScale{1, 0};
-    EXPECT_EQ(T_Err_Overflow, KFS_GetValueFPlus(stream, &beyond, 0, &value, nullptr, nullptr));
-    EXPECT_NE(0, KFS_GetValuePlus(stream, &noScale, 0, &value, nullptr, nullptr, nullptr, 0));
 }
 
 TEST_F(Evaluate, DoublesAreRefusedForCustomValues)

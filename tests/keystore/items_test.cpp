@@ -2,6 +2,7 @@
 
 #include "frame/boundary_private.h"
 #include "keystore/attributes.h"
+#include "keystore/edit_private.h"
 #include "keystore/items_private.h"
 #include "tests/support/ownedvalues.h"
 #include "tests/support/streams.h"
@@ -11,7 +12,6 @@
 #include <cmath>
 #include <cstdint>
 #include <limits>
-#include <random>
 #include <tuple>
 
 namespace {
@@ -96,30 +96,12 @@ TEST_F(Items, ConversionTakesTheNearestElementAndNeverClamps)
         EXPECT_EQ(expected, bytes);
         EXPECT_EQ(0, KFS_ConvertItemFromFloat(2, static_cast<char>(row.type), numbers, exported.data() + 1));
         EXPECT_EQ(expected, exported) << "both doors convert alike";
+        double inPlace[2] = {row.number, row.number};  // where the doubles shrink under the conversion
+        EXPECT_EQ(0, KFS_ConvertItemFromFloat(2, static_cast<char>(row.type), inPlace, inPlace));
+        EXPECT_EQ(0, std::memcmp(inPlace, expected.data() + 1, 2 * size));
         std::array<double, 3> back{7.0, 7.0, 7.0};
         ASSERT_EQ(0, KFSp_ConvertItemToFloat(stream, 0, KFS_Item_KeyValue, bytes.data() + 1, back.data()));
         EXPECT_EQ((std::array{row.back, row.back, 7.0}), back);
-    }
-}
-
-TEST_F(Items, ElementsThatAreRepresentableComeBackAsTheyWere)
-{
-    std::mt19937 random(20);
-    std::uniform_int_distribution<std::uint32_t> word;
-    for (signed char type = KFS_Type_S8; type < KFS_Type_Float; ++type) {
-        std::size_t const size = Sizes[static_cast<std::size_t>(type)];
-        TestStream const stream({.dimension = 4, .type = type});
-        for (int round = 0; round < 200; ++round) {
-            std::uint32_t const words[4] = {word(random), word(random), word(random), word(random)};
-            double numbers[4];
-            unsigned char back[16];
-            ASSERT_EQ(0, KFSp_ConvertItemToFloat(stream, 0, KFS_Item_CacheValue, words, numbers));
-            ASSERT_EQ(0, KFSp_ConvertItemFromFloat(stream, 0, KFS_Item_CacheValue, numbers, back));
-            ASSERT_EQ(0, std::memcmp(words, back, 4 * size)) << "type " << int(type);
-            // In place too, where the doubles shrink under the conversion.
-            ASSERT_EQ(0, KFS_ConvertItemFromFloat(4, static_cast<char>(type), numbers, numbers));
-            ASSERT_EQ(0, std::memcmp(words, numbers, 4 * size)) << "type " << int(type);
-        }
     }
 }
 
@@ -219,6 +201,64 @@ TEST_F(Items, CopyingForcesValuesIntoTheLimits)
     EXPECT_EQ(1U, reports.Take().size());
 }
 
+// Doubles are limited in all forms that take them, external values in none, whoever has made the list.
+TEST_F(Items, ADoubleFormLeavesNothingBehindInTheList)
+{
+    KFS_ValueDesc desc;
+    desc.dataType = KFS_Type_Double;
+    double const value = 500.0;
+    T_Time const times[] = {{0, 600}, {10, 600}, {20, 600}, {30, 600}};
+    for (bool const doublesFirst : {false, true}) {
+        SCOPED_TRACE(doublesFirst ? "a list that a double form has made" : "a list that an external form has made");
+        LimitedStream stream(desc);
+        auto const stored = [&](int index) {
+            void const* item = nullptr;
+            EXPECT_EQ(0, SEQ_GetConstAddress(stream.GetKeys(), index, &item));
+            return *KFSp_Numbers(static_cast<KFS_KeyScalar const*>(item));
+        };
+        for (int i = 0; i < 4; ++i) {
+            bool const doubles = (i % 2 == 0) == doublesFirst;
+            ASSERT_EQ(0, doubles ? KFS_InsertKeyF(&stream, &times[i], 0, &value, KFS_Interp_Linear, KFS_Interp_Linear)
+                                 : KFS_InsertKey(&stream, &times[i], 0, &value, KFS_Interp_Linear, KFS_Interp_Linear));
+            EXPECT_EQ(doubles ? 100.0 : 500.0, stored(i));
+            ASSERT_EQ(0, KFS_SetKey(&stream, i, &value, KFS_Interp_None, KFS_Interp_None));
+            EXPECT_EQ(500.0, stored(i));
+            ASSERT_EQ(0, KFS_SetKeyF(&stream, i, &value, KFS_Interp_None, KFS_Interp_None));
+            EXPECT_EQ(100.0, stored(i));
+        }
+    }
+}
+
+TEST_F(Items, DoublesGoIntoACustomStreamThatHasRoom)
+{
+    for (unsigned short const itemSize : {8, 24, 7, 1}) {
+        for (bool const noKeys : {false, true}) {
+            SCOPED_TRACE(testing::Message() << itemSize << (noKeys ? ", constant" : ", keys"));
+            bool const fits = itemSize >= 8;
+            KFS_ValueDesc const desc{1, itemSize, 4711, OwnedValues::Interpolate};
+            KFS_Stream stream(1, 600, noKeys, 0, KFS_InterpMask_All, 0, desc, nullptr, nullptr, false);
+            T_Time const at{10, 600};
+            double const value = 2.5;
+            int const code = fits ? 0 : 7441;
+            EXPECT_EQ(code, KFS_InsertKeyF(&stream, &at, 0, &value, KFS_Interp_Spline, KFS_Interp_Spline));
+            EXPECT_EQ(code, KFS_InsertKeyF(&stream, &at, 1, &value, KFS_Interp_None, KFS_Interp_None));
+            if (fits) {
+                double out[3] = {};
+                ASSERT_EQ(0, KFS_RemoveKey(&stream, 0, out));
+                EXPECT_EQ(2.5, out[0]);
+            } else {
+                EXPECT_EQ(reports.Take(),
+                          (std::vector<Reported>(2, KfsReport(81, "can#{rsquo}t convert to custom value"))));
+            }
+            EXPECT_EQ(1, stream.GetValueDesc()->isCustom);
+            EXPECT_EQ(itemSize, stream.GetValueDesc()->itemSize);
+            EXPECT_EQ(4711, stream.GetValueDesc()->dataType);
+            EXPECT_EQ(OwnedValues::Interpolate, stream.GetInterpFunc());
+            EXPECT_FALSE(stream.IsTemporarilyNonCustom());
+        }
+    }
+}
+
 TEST_F(Items, TheListFollowsTheStreamsFunctions)
 {
     OwnedValues::Reset();
@@ -287,23 +327,21 @@ TEST_F(Items, ACopiedKeyOwnsItsValueAndNoArcTable)
     EXPECT_EQ(1, OwnedValues::Live());
 }
 
-TEST_F(Items, DisposingArcTablesLeavesKeysAndMarksTheirArcs)
+TEST_F(Items, IterationFunctionsSeeToRecordsReadFromAFile)
 {
     TestStream stream({.dimension = 2, .spatial = true});
-    stream.Key(0, {0, 0}).Key(100, {10, 0}).Key(200, {10, 10});
-    ASSERT_EQ(0, stream->UpdateStream());
-    for (int i = 0; i < 3; ++i)
-        if (!stream.Record(i)->remapTable) stream.Record(i)->remapTable = MakeTable();
-    EXPECT_EQ(TestStream::NotStale, stream.ArcStale());
-    ASSERT_EQ(0, KFS_DisposeRemapTables(stream));
-    for (int i = 0; i < 3; ++i) EXPECT_EQ(nullptr, stream.Record(i)->remapTable);
-    EXPECT_EQ((std::array<int, 2>{0, 2}), stream.ArcStale());
-    EXPECT_EQ(0, stream.Pins());
-    TestStream plain;
-    plain.Key(0, {1}).Key(100, {2});
-    ASSERT_EQ(0, plain->UpdateStream());
-    EXPECT_EQ(0, KFS_DisposeRemapTables(plain));
-    EXPECT_EQ(TestStream::NotStale, plain.ArcStale()) << "nothing to do on a stream without a path";
+    stream.Key(0, {1, 2}).Key(100, {3, 4});
+    SEQ_Head** const table = MakeTable();
+    stream.Record(0)->remapTable = table;
+    ASSERT_EQ(0, SEQ_ForEach(stream->GetKeys(), 0, KFSp_SetKeySpatialState, 0));
+    EXPECT_EQ(0, stream.Record(0)->flags & KFS_KeyFlag_SpatialBlock);
+    ASSERT_EQ(0, SEQ_ForEach(stream->GetKeys(), 0, KFSp_KeyClearRemap, 0));
+    EXPECT_EQ(table, stream.Record(0)->remapTable) << "without the block the word is none of its business";
+    ASSERT_EQ(0, SEQ_ForEach(stream->GetKeys(), KFS_StreamFlag_Spatial, KFSp_SetKeySpatialState, 0));
+    EXPECT_NE(0, stream.Record(1)->flags & KFS_KeyFlag_SpatialBlock);
+    ASSERT_EQ(0, SEQ_ForEach(stream->GetKeys(), 0, KFSp_KeyClearRemap, 0));
+    EXPECT_EQ(nullptr, stream.Record(0)->remapTable);
+    EXPECT_EQ(0, SEQ_Dispose(table, 0)) << "forgotten, not disposed";
 }
 
 }  // namespace

@@ -187,35 +187,33 @@ TEST_F(Failures, EveryAllocationMayFail)
         auto const before = scenario.fresh()->Shape(), after = scenario.full()->Shape();
         Q_MemoryCount const empty = Q_MemoryLive(nullptr);
         int failures = FailEveryAllocation(
-            scenario.full,
-            [&](Saved& saved) {
+            scenario.full, AtBoundary([&](Saved& saved) {
                 CKF_File file;
                 file.SetVersion(scenario.major, 0);
                 KFSp_ThrowIf(file.CreateInMemory());
                 int const code = Thrown([&] { saved.Write(&file); });
                 EXPECT_TRUE(code == 0 || file.Commit() != 0) << "a save that failed isn't committed";
                 return code;
-            },
+            }),
             [&](Saved& saved, int, Q_MemoryCount const& live) {
                 EXPECT_EQ(live, Q_MemoryLive(nullptr));
                 reports.Take();
                 EXPECT_EQ(whole, Bytes(scenario, saved));
             });
-        failures += FailEveryAllocation(
-            scenario.fresh,
-            [&](Saved& saved) {
-                CKF_File file;
-                KFSp_ThrowIf(file.Open(whole));
-                return Thrown([&] { saved.Read(&file); });
-            },
-            [&](Saved& saved, int code, Q_MemoryCount const&) {
-                reports.Take();
-                auto const shape = saved.Shape();
-                EXPECT_TRUE(shape == after || (code != 0 && shape == before)) << "one or the other, never a mix";
-                static_cast<void>(KFSp_Boundary([&] { saved.Use(); }));
-                reports.Take();
-                EXPECT_EQ(0, Read(saved, whole)) << "it can be tried again";
-            });
+        failures += FailEveryAllocation(scenario.fresh, AtBoundary([&](Saved& saved) {
+                                            CKF_File file;
+                                            KFSp_ThrowIf(file.Open(whole));
+                                            return Thrown([&] { saved.Read(&file); });
+                                        }),
+                                        [&](Saved& saved, int code, Q_MemoryCount const&) {
+                                            reports.Take();
+                                            auto const shape = saved.Shape();
+                                            EXPECT_TRUE(shape == after || (code != 0 && shape == before))
+                                                << "one or the other, never a mix";
+                                            static_cast<void>(KFSp_Boundary([&] { saved.Use(); }));
+                                            reports.Take();
+                                            EXPECT_EQ(0, Read(saved, whole)) << "it can be tried again";
+                                        });
         EXPECT_LT(1, failures);
         EXPECT_EQ(empty, Q_MemoryLive(nullptr));
     }

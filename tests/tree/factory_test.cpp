@@ -303,7 +303,7 @@ TEST_F(Factory, NoFailedAllocationLeavesAHalfRegisteredKind)
     kinds.Leaf("part", 1, 0.0);
     for (KFS_FactoryFunc const& func : {LeafFunc(0.0), group}) {
         FailEveryAllocation([] { return std::make_unique<Nothing>(); },
-                            [&](Nothing&) { return factory.RegisterFactoryFunc(Name("kind"), func, false), 0; },
+                            AtBoundary([&](Nothing&) { factory.RegisterFactoryFunc(Name("kind"), func, false); }),
                             [&](Nothing&, int code, Q_MemoryCount const& before) {
                                 reports.Take();
                                 if (code != 0) {

@@ -163,17 +163,18 @@ TEST_F(Groups, NoFailedAllocationLeavesAnythingBehindOrASlotEmpty)
     };
     int failures = 0;
     for (auto const& edit : edits) {
-        failures += FailEveryAllocation([] { return std::make_unique<Scene>(); }, [&](Scene& s) { return edit(s), 0; },
-                                        [&](Scene& s, int, Q_MemoryCount const& before) {
-                                            bool const isAsBefore = !s.node->GetEditableStreamNullOK(Name("position"));
-                                            EXPECT_TRUE(!isAsBefore || Q_MemoryLive(nullptr).blocks <= before.blocks);
-                                            EXPECT_TRUE(!isAsBefore || Q_MemoryLive(nullptr).bytes <= before.bytes + 64)
-                                                << "but for a list's vector, which may have grown";
-                                            reports.Take();
-                                            EXPECT_EQ(1u, s.list.GetNumStreams());
-                                            EXPECT_EQ(SceneOrder, NamesOf(*s.node));
-                                            EXPECT_FALSE(s.node->GetEditableStream(Name("transform"))->IsCanonical());
-                                        });
+        failures +=
+            FailEveryAllocation([] { return std::make_unique<Scene>(); }, AtBoundary([&](Scene& s) { edit(s); }),
+                                [&](Scene& s, int, Q_MemoryCount const& before) {
+                                    bool const isAsBefore = !s.node->GetEditableStreamNullOK(Name("position"));
+                                    EXPECT_TRUE(!isAsBefore || Q_MemoryLive(nullptr).blocks <= before.blocks);
+                                    EXPECT_TRUE(!isAsBefore || Q_MemoryLive(nullptr).bytes <= before.bytes + 64)
+                                        << "but for a list's vector, which may have grown";
+                                    reports.Take();
+                                    EXPECT_EQ(1u, s.list.GetNumStreams());
+                                    EXPECT_EQ(SceneOrder, NamesOf(*s.node));
+                                    EXPECT_FALSE(s.node->GetEditableStream(Name("transform"))->IsCanonical());
+                                });
     }
     EXPECT_LT(20, failures);
 }
