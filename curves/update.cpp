@@ -159,22 +159,6 @@ bool HasAutomaticHandles(KFS_KeyScalar const* key)
            (key->inInterp == KFS_Interp_Spline || key->outInterp == KFS_Interp_Spline);
 }
 
-// The marks end at anchors, whose handles may be new now. The float keys on the far side of these hang on them too.
-int WidenOverFloatKeys(Pass const& pass, StaleRange* range)
-{
-    if (range->first > range->last) return 0;
-    KFS_KeyScalar* key = nullptr;
-    for (; range->first > 0; --range->first) {
-        if (int const code = KFSp_GetKey(pass.data, range->first - 1, &key); code != 0) return code;
-        if (!KFSp_Floats(key)) break;
-    }
-    for (; range->last < pass.count - 1; ++range->last) {
-        if (int const code = KFSp_GetKey(pass.data, range->last + 1, &key); code != 0) return code;
-        if (!KFSp_Floats(key)) break;
-    }
-    return 0;
-}
-
 int RepairHandlesAndTimes(Pass const& pass)
 {
     int const code = ForKeys(pass, pass.tangents, [&](KFS_KeyScalar* key) {
@@ -182,9 +166,7 @@ int RepairHandlesAndTimes(Pass const& pass)
         return KFSp_SetDefaultKeyframeTangents(pass.stream, key->time, KFSp_Tangents_Temporal, key);
     });
     if (code != 0 || pass.custom || !pass.stream->IsSpatial()) return code;
-    StaleRange floats = pass.tangents;
-    if (int const floatCode = WidenOverFloatKeys(pass, &floats); floatCode != 0) return floatCode;
-    return KFSp_ComputeFloatTimes(pass.stream, floats.first, floats.last);
+    return KFSp_ComputeFloatTimes(pass.stream, pass.tangents.first, pass.tangents.last);
 }
 
 int Repair(Pass const& pass)

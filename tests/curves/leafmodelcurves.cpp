@@ -128,10 +128,7 @@ void Leaf::Update()
     if (!tangents.IsNone()) {
         for (int i = tangents.first; i <= tangents.last; ++i)
             if (At(i).Has(KFS_KeyFlag_Modifiable) && At(i).HasSpline()) SetDefaultTangents(At(i).time, 1, At(i));
-        int from = tangents.first, to = tangents.last;
-        while (from > 0 && Floats(from - 1)) --from;
-        while (to < last && Floats(to + 1)) ++to;
-        for (int i = from; set.spatial && i <= to; ++i)
+        for (int i = tangents.first; set.spatial && i <= tangents.last; ++i)
             if (Floats(i)) ComputeFloatTime(i);
     }
     stale = arcStale = {};
