@@ -439,7 +439,9 @@ TEST(Sequence, WalksWhatShrinks)
         return index >= refcon ? 42 + index : 0;
     };
     EXPECT_EQ(43, SEQ_ForEachConst(list, 1, stopAt, 0)) << "and end where they are told";
-    auto const remove = [](SEQ_Head** handle, long, int index, void*) { return SEQ_Remove(index, handle, 0, nullptr); };
+    auto const remove = [](SEQ_Head** handle, long, int index, void*) {
+        return index < 2 ? SEQ_Remove(0, handle, 0, nullptr) : 0;
+    };
     EXPECT_EQ(SEQ_Err_BadIndex, SEQ_ForRange(list, 0, 2, 0, remove, nullptr)) << "what was to come is gone";
 }
 
