@@ -211,7 +211,10 @@ void LeafReader::KeepPointer()
 
 void LeafReader::ReadConstant()
 {
-    if (!spatialMismatch_) stream_->IsCustomValuePointer() ? KeepPointer() : ReadValue();
+    if (stream_->IsCustomValuePointer() && !spatialMismatch_)
+        KeepPointer();
+    else if (!spatialMismatch_)
+        ReadValue();
     KFS_KeyScalar* const cache = stream_->GetCache();
     cache->inInterp = record_.cacheInInterp;
     cache->outInterp = record_.cacheOutInterp;
