@@ -369,8 +369,9 @@ void MakeAlike(std::vector<ComponentKeys>& components, std::size_t index, unsign
 }
 
 // The leader to be.
-Leaf MakeLeader(KFS_Stream const& leader, std::vector<KFS_Stream const*> const& followers, MoveNotes& notes)
+Leaf MakeLeader(KFS_Stream const& leader, std::vector<KFS_Stream*> const& places, MoveNotes& notes)
 {
+    std::vector<KFS_Stream const*> const followers(places.begin(), places.end());
     unsigned int const scale = leader.GetTimeScale();
     std::vector<Part> parts;
     for (KFS_Stream const* follower : followers) parts.emplace_back(*follower, scale);
@@ -397,13 +398,13 @@ Leaf MakeLeader(KFS_Stream const& leader, std::vector<KFS_Stream const*> const& 
     return joined;
 }
 
-std::vector<KFS_Stream const*> CheckedFollowers(KFS_Stream& leader)
+std::vector<KFS_Stream*> CheckedFollowers(KFS_Stream& leader)
 {
     CheckLeader(leader);
     if (!leader.AreDimensionsSeparated()) throw DimensionsError("isn't separated");
-    std::vector<KFS_Stream*> const followers = FollowersOf(leader);
+    std::vector<KFS_Stream*> followers = FollowersOf(leader);
     for (KFS_Stream const* follower : followers) CheckContent(*follower);
-    return {followers.begin(), followers.end()};
+    return followers;
 }
 
 // As a follower is that nobody has touched.
@@ -445,15 +446,14 @@ MoveNotes JoinDimensions(KFS_Stream& leader, double tolerance)
 {
     return Told([&] {
         MoveNotes notes;
-        std::vector<KFS_Stream const*> const followers = CheckedFollowers(leader);
-        Leaf const joined = MakeLeader(leader, followers, notes);
+        std::vector<KFS_Stream*> const places = CheckedFollowers(leader);
+        Leaf const joined = MakeLeader(leader, places, notes);
         RefuseBeyond(tolerance, notes);
         std::vector<Leaf> rests;
-        for (KFS_Stream const* follower : followers) rests.push_back(AtRest(*follower));
+        for (KFS_Stream const* place : places) rests.push_back(AtRest(*place));
         leader.swap(*joined);
         leader.SetDimensionsSeparated(false);
         leader.SetHidden(false);
-        std::vector<KFS_Stream*> const places = FollowersOf(leader);
         for (std::size_t d = 0; d < places.size(); ++d) {
             places[d]->swap(*rests[d]);
             places[d]->SetHidden(true);

@@ -42,8 +42,8 @@ using StreamPtr = std::unique_ptr<KFS_Stream, StreamDeleter>;
 struct StreamItem {
     static constexpr int WholeValue = -1;
 
-    std::string
-        path;  // "animation/node/translation", "animation/node/translation/x"; no two items of a scene have the same
+    // "animation/node/translation", "animation/node/translation/x"; no two items of a scene have the same.
+    std::string path;
     std::string animation;
     std::string node;
     std::string place;  // where the file has it: "animations[0].channels[2]", "joint Hips"
