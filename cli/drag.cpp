@@ -195,6 +195,7 @@ int Run(Options const& options)
 Work Prepare(CLI::App& command)
 {
     auto const options = std::make_shared<Options>();
+    options->selection.forSaving = true;
     AddSelection(command, options->selection);
     command.add_option("--at", options->at, "where: seconds like 0.5 or 1/24, or frames like 12f, between two keys")
         ->required()

@@ -19,20 +19,12 @@ struct Options {
     double tolerance = kfshost::AnyError;
 };
 
-// A scene with a tree. What had to be changed for a load would be lost in what is saved, so nobody does that unawares.
+// A scene with a tree, in which leaders have followers.
 Scene Load(Selection const& selection)
 {
-    kfshost::FileInput const input = kfshost::ReadInput(selection.file);
-    if (input.kind != kfshost::FileKind::Project) {
-        return kfshost::TakeScene(
-            kfshost::MakeTree(kfshost::ImportFile(input, {.timeScale = selection.timeScale, .arcTolerance = 0.0})));
-    }
-    if (selection.timeScale != 0) throw UserError("--time-scale", "a project has the times with which it was imported");
-    kfshost::LoadNotes notes;
-    auto tree = kfshost::LoadProject(input, &notes);
-    if (!notes.reports.empty())
-        throw kfshost::ImportError("", notes.reports.front() + " (kfs save-as --repair saves what is left)");
-    return kfshost::TakeScene(std::move(tree));
+    Scene scene = LoadScene(selection);
+    if (scene.tree) return scene;
+    return ReadingFile(selection.file, [&] { return kfshost::TakeScene(kfshost::MakeTree(std::move(scene))); });
 }
 
 std::string TextOf(MoveNotes const& notes, StreamItem const& item)
@@ -73,7 +65,7 @@ std::vector<StreamItem const*> ChooseStreams(Scene const& scene, Options const& 
 
 int Run(Options const& options, Move const& move)
 {
-    Scene const scene = ReadingFile(options.selection.file, [&] { return Load(options.selection); });
+    Scene const scene = Load(options.selection);
     auto const chosen = ChooseStreams(scene, options, move);
     std::vector<std::string> told;
     for (StreamItem const* item : chosen) {
@@ -95,6 +87,7 @@ int Run(Options const& options, Move const& move)
 Work PrepareMove(CLI::App& command, Move const& move)
 {
     auto const options = std::make_shared<Options>();
+    options->selection.forSaving = true;
     command.add_option("FILE", options->selection.file, "a project, or a .gltf, .glb or .bvh file")->required();
     command.add_option("--stream", options->selection.glob, move.what)->required()->type_name("GLOB");
     AddOutput(command, options->output, "the new project file", "PROJECT");

@@ -9,8 +9,8 @@
 // Rates as the library answers them, in units of the value a second: `dimension` doubles, or of a path its one speed.
 // Times are in units of the stream's scale. Throw StoreError.
 void ReadRate(KFS_Stream const& stream, int time, double* rate);  // at a key the rate behind it
-void ReadRateInto(KFS_Stream const& stream, int index,
-                  double* rate);  // with which a key is reached; of the first key 0
+// The rate with which a key is reached; of the first key 0.
+void ReadRateInto(KFS_Stream const& stream, int index, double* rate);
 
 // How fast what is shown of a stream changes, component by component. Answers stand until the next call.
 class Rates {

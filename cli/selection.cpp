@@ -39,7 +39,7 @@ void HoldAsPath(StreamItem& item, Selection const& selection)
         throw UserError(selection.ShownFile() + ": " + item.path,
                         "steps from key to key, so there is no way on which keys could rove");
     }
-    if (!item.stream->IsSpatial())  // a project may hold it as a path already
+    if (!item.stream->IsSpatial() && !item.stream->HasNoKeys())  // a project may hold it as a path already
         item.stream = kfshost::MakePath(item);
     if (selection.roving) kfshost::LetInnerKeysFloat(*item.stream);
 }
@@ -72,6 +72,8 @@ kfshost::Scene ReadScene(Selection const& selection)
     if (selection.timeScale != 0) throw UserError("--time-scale", "a project has the times with which it was imported");
     kfshost::LoadNotes notes;
     kfshost::Scene scene = kfshost::TakeScene(kfshost::LoadProject(input, &notes));
+    if (selection.forSaving && !notes.reports.empty())
+        throw kfshost::ImportError("", notes.reports.front() + " (kfs save-as --repair saves what is left)");
     TellChanges(selection.file, notes);
     return scene;
 }

@@ -13,6 +13,9 @@ struct Selection {
     unsigned int timeScale = 0;
     bool asPaths = false;  // positions are to be held as spatial streams
     bool roving = false;   // and their inner keys are to float; only with asPaths
+    // What was read is to be saved again. What had to be changed for a load would be lost then, so such a project is
+    // refused.
+    bool forSaving = false;
 
     // The file as it is called when something is told of it.
     std::string ShownFile() const;

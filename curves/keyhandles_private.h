@@ -85,7 +85,7 @@ inline void KFSp_FillSlopes(KFS_Stream const* stream, KFS_KeyScalar const* from,
         slopes[i] = (KFSp_Numbers(to)[i] - KFSp_Numbers(from)[i]) / duration;
 }
 
-// A first speed is told as rest from here on.
+// The first speed of a side as getters answer it: as rest where it is all but that.
 inline double KFSp_SettledSpeed(double speed)
 {
     constexpr double least = 1e-10;
