@@ -16,7 +16,9 @@
 
 #include <algorithm>
 #include <cmath>
+#include <filesystem>
 #include <numeric>
+#include <optional>
 
 using kfshost::Rational;
 using kfshost::StreamItem;
@@ -107,17 +109,18 @@ void FindTarget(Options const& options, Drag& drag)
 
 void CheckForm(Options const& options, StreamItem const& item)
 {
+    std::string const place = options.selection.ShownFile() + ": " + item.path;
     if (kfshost::IsSeparated(*item.stream))
-        throw UserError(item.path, "is separated, so one of its dimensions can be dragged, and not the whole");
+        throw UserError(place, "is separated, so one of its dimensions can be dragged, and not the whole");
     bool const isFlat = item.stream->IsSpatial() && item.stream->GetDimension() == 2;
     if (options.path && !isFlat) throw UserError("--path", item.path + " isn't held as a path in two dimensions");
     if (options.path && !options.component.empty())
         throw UserError("--component", "chooses one of several curves, so it can't go with --path");
     if (kfshost::IsRotation(item))
-        throw UserError(item.path, "is a rotation, whose components mean something together only");
+        throw UserError(place, "is a rotation, whose components mean something together only");
     if (!options.path && item.stream->IsSpatial())
-        throw UserError(item.path, isFlat ? "is held as a path, which --path drags"
-                                          : "is held as a path, and only those in two dimensions can be dragged");
+        throw UserError(place, isFlat ? "is held as a path, which --path drags"
+                                      : "is held as a path, and only those in two dimensions can be dragged");
     for (double const value : options.to)
         if (!std::isfinite(value)) throw UserError("--to", "a curve can only be dragged to finite values");
 }
@@ -164,11 +167,18 @@ StreamCurves Sample(Drag const& drag)
     return SampleCurves(*drag.item, all, span, 1200.0 / (span.last - span.first).ToDouble());
 }
 
+bool AreOneFile(std::string const& a, std::string const& b)
+{
+    std::error_code ignored;
+    return a == b || std::filesystem::weakly_canonical(a, ignored) == std::filesystem::weakly_canonical(b, ignored);
+}
+
 int Run(Options const& options)
 {
     RefuseToOverwrite(options.selection.file, options.output);
-    if (!options.plot.empty()) RefuseToOverwrite(options.selection.file, options.plot);
-    if (options.plot == options.output) throw UserError("--plot", "the drawing and the project need two names");
+    RefuseToOverwrite(options.selection.file, options.plot, "--plot");
+    if (!options.plot.empty() && AreOneFile(options.plot, options.output))
+        throw UserError("--plot", "the drawing and the project need two names");
     kfshost::Scene scene = LoadScene(options.selection);
     StreamItem const& item = TheStream(scene, options.selection);
     CheckForm(options, item);
@@ -184,11 +194,14 @@ int Run(Options const& options)
         what = fmt::format("{} dragged to {} at {} s", item.path, fmt::join(options.to, ","),
                            TimeText(Rational(drag.units, static_cast<std::int64_t>(drag.Time().scale))));
     }
+    std::optional<WholeFile> drawing;
     if (!options.plot.empty()) {
         picture.after = Sample(drag);
-        WriteWholeFile(options.plot, DrawDrag(picture));
+        drawing.emplace(options.plot, DrawDrag(picture));
     }
+    // Both files or none, as far as that can be had of two.
     WriteProject(*kfshost::MakeTree(std::move(scene)), options.output, what);
+    if (drawing) drawing->Commit();
     return ExitDone;
 }
 

@@ -38,7 +38,7 @@ Work Prepare(CLI::App& command)
     command
         .add_option("--arc-tolerance", options->arcTolerance,
                     "add keys to linear rotations where the straight way may be so many degrees beside the arc")
-        ->check(CLI::Range(1e-6, 180.0))
+        ->check(NumberCheck(1e-6, 180.0))
         ->type_name("DEGREES");
     return [options] { return Run(*options); };
 }

@@ -65,6 +65,7 @@ std::vector<StreamItem const*> ChooseStreams(Scene const& scene, Options const& 
 
 int Run(Options const& options, Move const& move)
 {
+    RefuseToOverwrite(options.selection.file, options.output);
     Scene const scene = Load(options.selection);
     auto const chosen = ChooseStreams(scene, options, move);
     std::vector<std::string> told;
@@ -94,7 +95,7 @@ Work PrepareMove(CLI::App& command, Move const& move)
     command
         .add_option("--tolerance", options->tolerance,
                     "refuse where a value between keys would be off by more than this, in the stream's units")
-        ->check(CLI::NonNegativeNumber)
+        ->check(NumberCheck(0.0, kfshost::AnyError))
         ->type_name("E");
     AddTimeScale(command, options->selection.timeScale);
     command.footer("Values at keys stay what they are. What between them can't stay is told on the standard error, "

@@ -25,6 +25,21 @@ CLI::Validator TimeScaleCheck()
 
 }  // namespace
 
+CLI::Validator NumberCheck(double least, double most)
+{
+    return CLI::Validator(
+        [least, most](std::string const& text) -> std::string {
+            double number = 0.0;
+            auto const [end, error] = std::from_chars(text.data(), text.data() + text.size(), number);
+            bool const isNumber = error == std::errc() && end == text.data() + text.size();
+            if (isNumber && least <= number && number <= most) return "";
+            return fmt::format("\"{}\" isn't a number {}", text,
+                               std::isinf(most) ? fmt::format("of {} or more", least)
+                                                : fmt::format("from {} to {}", least, most));
+        },
+        "");
+}
+
 void AddTimeScale(CLI::App& command, unsigned int& timeScale)
 {
     command

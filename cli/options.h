@@ -16,6 +16,9 @@ void AddSelection(CLI::App& command, Selection& selection);
 void AddTimeScale(CLI::App& command, unsigned int& timeScale);
 CLI::Option* AddOutput(CLI::App& command, std::string& output, std::string const& what, std::string const& typeName);
 
+// A number within both bounds, which "nan" isn't. An infinite one is none.
+CLI::Validator NumberCheck(double least, double most);
+
 // Does arithmetic that only an option's odd number can take beyond what a fraction holds. Throws UserError then.
 template <class Work>
 auto Fitting(char const* option, Work const& work)

@@ -1,7 +1,6 @@
 #include "cli/output.h"
 
 #include "cli/usererror.h"
-#include "frame/services/filewriter.h"
 
 #include <fmt/format.h>
 
@@ -9,6 +8,7 @@
 #include <cstdio>
 #include <cstring>
 #include <filesystem>
+#include <utility>
 
 std::string Plural(std::size_t count, std::string_view one, std::string_view many)
 {
@@ -32,11 +32,11 @@ std::string Shown(std::string_view text)
     return shown;
 }
 
-void RefuseToOverwrite(std::string const& input, std::string const& output)
+void RefuseToOverwrite(std::string const& input, std::string const& output, char const* option)
 {
     std::error_code ignored;
     if (output != "-" && std::filesystem::equivalent(input, output, ignored))
-        throw UserError("-o", '"' + output + "\" is the file that is read");
+        throw UserError(option, '"' + output + "\" is the file that is read");
 }
 
 void WriteToStandardOutput(std::string_view text, std::string const& done)
@@ -46,15 +46,27 @@ void WriteToStandardOutput(std::string_view text, std::string const& done)
     throw UserError("standard output", "can't be written: " + reason + (done.empty() ? "" : " (" + done + ')'));
 }
 
+WholeFile::WholeFile(std::string fileName, std::string bytes) : fileName_(std::move(fileName)), bytes_(std::move(bytes))
+{
+    if (fileName_ == "-") return;
+    file_.Create(fileName_.c_str(), CKF_Target::FileOrStream);
+    ThrowIfFailed(file_.Append(bytes_.data(), bytes_.size()));
+}
+
+void WholeFile::Commit()
+{
+    if (fileName_ == "-")
+        WriteToStandardOutput(bytes_);
+    else
+        ThrowIfFailed(file_.Commit());
+}
+
+void WholeFile::ThrowIfFailed(int reason) const
+{
+    if (reason != 0) throw UserError(fileName_, std::string("can't be written: ") + std::strerror(reason));
+}
+
 void WriteWholeFile(std::string const& fileName, std::string_view bytes)
 {
-    if (fileName == "-") {
-        WriteToStandardOutput(bytes);
-        return;
-    }
-    CKF_FileWriter file;
-    file.Create(fileName.c_str(), CKF_Target::FileOrStream);
-    file.Append(bytes.data(), bytes.size());
-    if (int const reason = file.Commit())
-        throw UserError(fileName, std::string("can't be written: ") + std::strerror(reason));
+    WholeFile(fileName, std::string(bytes)).Commit();
 }

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "frame/services/filewriter.h"
+
 #include <string>
 #include <string_view>
 
@@ -9,13 +11,27 @@ std::string Plural(std::size_t count, std::string_view one, std::string_view man
 // Text from elsewhere, such as a file's name, as it can be put into a line: control characters stand as "\n" or "\x1b".
 std::string Shown(std::string_view text);
 
-// Throws UserError where a result would be written over the file that it is made from.
-void RefuseToOverwrite(std::string const& input, std::string const& output);
+// Throws UserError, with the option's name, where a result would be written over the file that it is made from.
+void RefuseToOverwrite(std::string const& input, std::string const& output, char const* option = "-o");
 
 // Writes a whole text to the standard output. `done`: what the command has brought about already and the user is to
 // know if that fails. Throws UserError.
 void WriteToStandardOutput(std::string_view text, std::string const& done = "");
 
-// Writes a whole file, or none: an earlier file of that name is replaced only by a complete one. Pipes and devices are
-// written to, and "-" is the standard output. Throws UserError.
+// A whole file, or none: an earlier file of that name is replaced only by a complete one, and not before Commit. Pipes
+// and devices are written to, and "-" is the standard output. Both throw UserError.
+class WholeFile {
+public:
+    WholeFile(std::string fileName, std::string bytes);
+    void Commit();
+
+private:
+    void ThrowIfFailed(int reason) const;
+
+    std::string fileName_;
+    std::string bytes_;  // what goes to the standard output
+    CKF_FileWriter file_;
+};
+
+// The same at once.
 void WriteWholeFile(std::string const& fileName, std::string_view bytes);

@@ -7,7 +7,6 @@
 #include "cli/usererror.h"
 
 #include <fmt/format.h>
-#include <fmt/ranges.h>
 
 #include <algorithm>
 #include <array>
@@ -400,11 +399,12 @@ std::vector<StreamItem const*> StreamsToDraw(DrawingOptions const& options, kfsh
     });
     if (items.empty())
         throw UserError(file, "--from, --to: none of the chosen streams has keys on both sides of a time there");
+    for (std::string const& name : options.components)
+        if (std::ranges::none_of(items,
+                                 [&](StreamItem const* item) { return !ChosenComponents(*item, {name}).empty(); }))
+            throw UserError(file, "--components: none of the chosen streams has a component " + name);
     std::erase_if(items,
                   [&options](StreamItem const* item) { return ChosenComponents(*item, options.components).empty(); });
-    if (items.empty())
-        throw UserError(file, fmt::format("--components: none of the chosen streams has a component {}",
-                                          fmt::join(options.components, " or ")));
     return items;
 }
 

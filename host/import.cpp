@@ -55,6 +55,7 @@ FileInput ReadInput(std::string const& fileName)
 
 std::string ShownFileName(std::string const& fileName)
 {
+    if (fileName.empty()) return "\"\"";
     return fileName == "-" ? "standard input" : CleanName(fileName);
 }
 
