@@ -169,8 +169,11 @@ StreamCurves Sample(Drag const& drag)
 
 bool AreOneFile(std::string const& a, std::string const& b)
 {
-    std::error_code ignored;
-    return a == b || std::filesystem::weakly_canonical(a, ignored) == std::filesystem::weakly_canonical(b, ignored);
+    auto const place = [](std::string const& name) {
+        std::error_code ignored;
+        return std::filesystem::weakly_canonical(std::filesystem::absolute(name, ignored), ignored);
+    };
+    return a == b || place(a) == place(b);
 }
 
 int Run(Options const& options)
