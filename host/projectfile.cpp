@@ -192,9 +192,12 @@ void WriteFacts(CKF_File* file, ChannelFacts const& facts)
 
 void WriteProject(CKF_File* file, SceneGroup const& tree)
 {
+    // Before the tree: a follower that is asked for its default makes its leader real, which then isn't in the file.
+    std::vector<ChannelFacts> facts;
+    ForEachChannel(tree, [&facts](Channel const& channel) { facts.push_back(DescriptionOf(channel)); });
     WriteTimes(file, tree.times);
     tree.Write(file);
-    ForEachChannel(tree, [file](Channel const& channel) { WriteFacts(file, DescriptionOf(channel)); });
+    for (ChannelFacts const& one : facts) WriteFacts(file, one);
 }
 
 void CheckTree(SceneGroup const& tree, std::string const& fileName)

@@ -30,6 +30,8 @@ public:
     // Reads from keys and overrides; ends in KFS_GetValueNoExpr.
     virtual void EvalNoExprValue(KFS_Stream const* stream, int time, int flags, void* value, unsigned char* atKey,
                                  KFS_ParamBag const* bag, KFS_InterpFunc* interpFunc, long refcon) = 0;
+    // The same in doubles: as many as the dimension of the stream that the caller asked for, whatever a resolved target
+    // has, since that is what the caller's buffer holds.
     virtual void EvalExprValueF(KFS_Stream const* stream, int time, int flags, double* value,
                                 KFS_ParamBag const* bag) = 0;
     // Ends in KFS_GetValueFNoExpr.

@@ -78,13 +78,18 @@ void ExpectExact(int code, T_Time& result, Wide value, Wide scale, std::vector<W
 {
     T_Time const given = std::exchange(result, Untouched);
     if (scale != 0) scales.push_back(scale / Gcd(value, scale));
-    for (Wide const chosen : scales)
-        if (scale != 0 && value * chosen % scale == 0 && FitsIn(value * chosen / scale, chosen)) {
+    for (Wide const chosen : scales) {
+        if (scale == 0) break;
+        Wide const divisor = Gcd(value, scale);
+        Wide units = 0;
+        bool const isWhole = chosen % (scale / divisor) == 0;
+        if (isWhole && !__builtin_mul_overflow(value / divisor, chosen / (scale / divisor), &units) &&
+            FitsIn(units, chosen)) {
             ASSERT_EQ(0, code);
-            ASSERT_TRUE(IsSame(given, {static_cast<int>(value * chosen / scale), static_cast<unsigned>(chosen)}))
-                << "gave " << given;
+            ASSERT_TRUE(IsSame(given, {static_cast<int>(units), static_cast<unsigned>(chosen)})) << "gave " << given;
             return;
         }
+    }
     ASSERT_EQ(scale == 0 ? T_Err_Scale : T_Err_Overflow, code);
     ASSERT_TRUE(IsSame(Untouched, given)) << "gave " << given;
 }

@@ -152,30 +152,7 @@ TEST(Memory, ThreadsThatMeetNewLabelsAgreeOnThem)
     EXPECT_EQ(before, Q_MemoryLive(nullptr));
 }
 
-// ---- bytes and pointers
-
-TEST(ByteOrder, PutsTheMostSignificantByteFirstOfEveryBitPatternAtAnyAlignment)
-{
-    Dice dice(1);
-    alignas(8) unsigned char bytes[24];
-    for (int i = 0; i < 2000; ++i) {
-        std::uint64_t const bits =
-            i % 2 ? dice.Bits() : 0x7FF0000000000001u + dice.Bits() % 100;  // signalling NaNs too
-        unsigned char* const place = bytes + i % 8;
-        std::memcpy(place, &bits, 8);
-        unsigned char wanted[8];
-        for (int k = 0; k < 8; ++k) wanted[k] = static_cast<unsigned char>(bits >> (56 - 8 * k));
-        double number;
-        std::memcpy(&number, place, 8);
-        Q_FpLongSwap(&number);
-        ASSERT_EQ(0, std::memcmp(wanted, &number, 8)) << std::hex << bits;
-        Q_FpLongSwap(&number);
-        ASSERT_EQ(0, std::memcmp(&bits, &number, 8)) << std::hex << bits;
-        unsigned short const word = Q_ShortSwap(static_cast<unsigned short>(bits));
-        unsigned int const longWord = Q_LongSwap(static_cast<unsigned int>(bits));
-        ASSERT_EQ(0, std::memcmp(wanted + 6, &word, 2) | std::memcmp(wanted + 4, &longWord, 4)) << std::hex << bits;
-    }
-}
+// ---- pointers
 
 TEST(PointerValues, AddressesComeBackAndAreTakenForNoNumber)
 {
