@@ -18,9 +18,10 @@ trap 'rm -rf "$folder"' EXIT
 (cd "$include" && find . -name '*.h' | sort | sed 's/.*/#include "&"/') >"$folder/all.cpp"
 "$compiler" -std=c++20 -I"$include" -fsyntax-only -fdump-lang-class="$folder/classes" "$folder/all.cpp" || exit 1
 
+# What the small host makes of the templates is its own affair.
 # A class, and its functions with those of its base in front. What is pure shows its name in the classes that derive.
 found=$(awk '
-    /^Vtable for (KFS|FX|Q|CKF|hearth)/ && !/kfshost::/ {  # a host may make classes of the templates inside = 1; print $3; next }
+    /^Vtable for (KFS|FX|Q|CKF|hearth)/ && !/kfshost::/ { inside = 1; print $3; next }
     inside && /^$/ { inside = 0 }
     inside && /^[0-9]+ / && !/\(& _ZTI/ && !/\)[-0-9]+$/ {
         sub(/^[0-9]+ +(\(int \(\*\)\(\.\.\.\)\))?/, "")
