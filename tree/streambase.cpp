@@ -8,6 +8,7 @@
 #include "tree/streamgroup.h"
 #include "tree/verify_private.h"
 
+#include <cstring>
 #include <exception>
 #include <stdexcept>
 #include <utility>
@@ -273,11 +274,18 @@ void KFS_StreamBase::GetExpressionDependencyIds(std::set<int>&) const {}
 
 void KFS_StreamBase::SetupCanonicalLayout() {}
 
+// Of a stream that nobody describes the record is asked for again at each question, by readers side by side too: as long
+// as it says nothing it isn't written.
 void KFS_StreamBase::FillInParamDef() const
 {
     FX_ParamDef def{};
     def.paramType = FX_Param_NotFilledIn;
-    FX_ParamDef_Copy(def, &paramDef_);
+    FX_ParamDef const& now = paramDef_;
+    bool const isBlank = now.paramType == def.paramType && now.paramFlags == 0 && now.reservedA == 0 &&
+                         now.reservedWord == 0 && now.reservedB == 0 &&
+                         std::memcmp(now.name, def.name, sizeof def.name) == 0 &&
+                         std::memcmp(&now.value, &def.value, sizeof def.value) == 0;
+    if (!isBlank) FX_ParamDef_Copy(def, &paramDef_);
 }
 
 void KFS_StreamBase::FillInDisplayName() const {}
