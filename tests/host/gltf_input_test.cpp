@@ -74,20 +74,6 @@ TEST_F(GltfInput, NamesMakePathsOfWhichNoTwoAreAlike)
     EXPECT_EQ("animations[0].channels[1]", scene.streams[1].place);
 }
 
-// What has nothing to do with keys can be as wrong or as unknown as it likes.
-TEST_F(GltfInput, OnlyAnimationMatters)
-{
-    GltfFile file;
-    file.document["images"] = {{{"uri", "gone.png"}}, {{"bufferView", 77}}, 5};
-    file.document["materials"] = "none";
-    file.document["meshes"] = {{{"primitives", -3}}};
-    file.document["extensionsRequired"] = {"KHR_materials_unlit", "KHR_draco_mesh_compression"};
-    file.document["animations"][0]["channels"].push_back({{"sampler", 9}, {"target", {{"path", "translation"}}}});
-    file.document["animations"][0]["channels"].push_back(
-        {{"sampler", 9}, {"target", {{"node", 0}, {"path", "pointer"}}}});
-    EXPECT_EQ(1U, Import(file).streams.size());
-}
-
 TEST_F(GltfInput, StridesAndOffsetsAreFollowed)
 {
     GltfFile file;
@@ -102,27 +88,22 @@ TEST_F(GltfInput, StridesAndOffsetsAreFollowed)
 
 TEST_F(GltfInput, NormalizedIntegersBecomeFractions)
 {
-    struct Row {
-        int componentType;
-        std::string bytes;  // of one quaternion
-        std::vector<double> values;
-    };
-    Row const rows[] = {
+    std::tuple<int, std::string, std::vector<double>> const rows[] = {
+        // the bytes of one quaternion
         {5120, {"\x7F\x81\x80\x01", 4}, {1.0, -1.0, -1.0, 1.0 / 127}},
         {5121, {"\xFF\x00\x01\x80", 4}, {1.0, 0.0, 1.0 / 255, 128.0 / 255}},
         {5122, {"\xFF\x7F\x01\x80\x00\x80\x01\x00", 8}, {1.0, -1.0, -1.0, 1.0 / 32767}},
         {5123, {"\xFF\xFF\x00\x00\x01\x00\x00\x80", 8}, {1.0, 0.0, 1.0 / 65535, 32768.0 / 65535}},
     };
-    for (Row const& row : rows) {
+    for (auto const& [type, bytes, values] : rows) {
         GltfFile file;
         file.data.resize(12);
-        for (int key = 0; key < 3; ++key) file.data += row.bytes;
+        for (int key = 0; key < 3; ++key) file.data += bytes;
         file.document["buffers"][0]["byteLength"] = file.data.size();
         file.document["bufferViews"][1]["byteLength"] = file.data.size() - 12;
-        file.document["accessors"][1].update(
-            {{"componentType", row.componentType}, {"normalized", true}, {"type", "VEC4"}});
+        file.document["accessors"][1].update({{"componentType", type}, {"normalized", true}, {"type", "VEC4"}});
         file.document["animations"][0]["channels"][0]["target"]["path"] = "rotation";
-        EXPECT_EQ(row.values, Values(Import(file), Rational(1, 2))) << row.componentType;
+        EXPECT_EQ(values, Values(Import(file), Rational(1, 2))) << type;
     }
 }
 
@@ -142,20 +123,11 @@ TEST_F(GltfInput, SparseAccessorsReplaceElements)
     accessor.erase("bufferView");  // then the others are zero
     EXPECT_EQ((std::vector<double>{70, 80, 90}), Values(Import(file), Rational(1, 1)));
     EXPECT_EQ((std::vector<double>{0, 0, 0}), Values(Import(file), Rational(1, 2)));
-    accessor["sparse"]["count"] = 4;
-    EXPECT_EQ("accessors[1]: replaces 4 elements of 3", ErrorOf("file.gltf", file.Text()));
-    accessor["sparse"]["count"] = 1;
-    file.data[48] = 3;
-    EXPECT_EQ("accessors[1]: replaces element 3 of 3", ErrorOf("file.gltf", file.Text()));
-    accessor["sparse"]["indices"]["componentType"] = 5126;
-    EXPECT_EQ("accessors[1]: has sparse indices of type 5126", ErrorOf("file.gltf", file.Text()));
-    accessor["sparse"]["values"] = 5;
-    EXPECT_EQ("accessors[1].sparse.values: isn't an object", ErrorOf("file.gltf", file.Text()));
 }
 
-// One thing of a good file replaced, and the whole line that says what is wrong with it.
+// One thing of a good file replaced or added, and the whole line that says what is wrong with it. What has nothing to do
+// with keys can be as wrong or as unknown as it likes.
 constexpr char const* Replaced = R"(
-/asset/version "1.0" | asset.version: is "1.0"; versions 2.x are supported
 /asset 7 | asset: isn't an object
 /extensionsRequired ["EXT_meshopt_compression"] | extensionsRequired: needs EXT_meshopt_compression, which isn't supported
 /accessors/0/count 1000000 | accessors[0]: says it has 1000000 elements, more than its bufferView of 12 bytes holds
@@ -192,11 +164,20 @@ constexpr char const* Replaced = R"(
 /animations/0/channels/0/target {} | animations[0].channels[0].target.path: is missing
 /animations/0/channels 5 | animations[0].channels: isn't a list
 /accessors/0 {"componentType": 5126, "count": 1000000000, "type": "SCALAR"} | accessors[0]: has 1000000000 elements and no data for them
+/accessors/1/sparse {"count": 4, "indices": {"bufferView": 0, "componentType": 5121}, "values": {"bufferView": 1}} | accessors[1]: replaces 4 elements of 3
+/accessors/1/sparse {"count": 1, "indices": {"bufferView": 0, "componentType": 5121, "byteOffset": 7}, "values": {"bufferView": 1}} | accessors[1]: replaces element 63 of 3
+/accessors/1/sparse {"count": 1, "indices": {"bufferView": 0, "componentType": 5126}, "values": {"bufferView": 1}} | accessors[1]: has sparse indices of type 5126
+/accessors/1/sparse {"count": 1, "indices": {"bufferView": 0, "componentType": 5121}, "values": 5} | accessors[1].sparse.values: isn't an object
+/images [{"uri": "gone.png"}, {"bufferView": 77}, 5] | fine
+/materials "none" | fine
+/meshes [{"primitives": -3}] | fine
+/extensionsRequired ["KHR_materials_unlit", "KHR_draco_mesh_compression"] | fine
+/animations/0/channels/- {"sampler": 9, "target": {"path": "translation"}} | fine
+/animations/0/channels/- {"sampler": 9, "target": {"node": 0, "path": "pointer"}} | fine
 )";
 
 TEST_F(GltfInput, SaysWhatIsWrongAndWhere)
 {
-    ASSERT_EQ("", ErrorOf("good.gltf", GltfFile().Text()));
     std::istringstream rows(Replaced);
     int count = 0;
     for (std::string row; std::getline(rows, row); ++count) {
@@ -204,9 +185,10 @@ TEST_F(GltfInput, SaysWhatIsWrongAndWhere)
         std::size_t const blank = row.find(' '), bar = row.find(" | ");
         GltfFile file;
         file.document[json::json_pointer(row.substr(0, blank))] = json::parse(row.substr(blank, bar - blank));
-        EXPECT_EQ(row.substr(bar + 3), ErrorOf("file.gltf", file.Text()));
+        std::string const error = ErrorOf("file.gltf", file.Text());
+        EXPECT_EQ(row.substr(bar + 3), error.empty() ? "fine" : error);
     }
-    EXPECT_GT(count, 36);
+    EXPECT_GT(count, 45);
     constexpr float nan = std::numeric_limits<float>::quiet_NaN(), infinity = std::numeric_limits<float>::infinity();
     using Row = std::tuple<std::size_t, std::vector<float>, char const*>;  // floats from a byte on
     for (auto const& [offset, numbers, error] :
@@ -231,8 +213,6 @@ TEST_F(GltfInput, SaysWhatIsWrongWithTheContainerAndTheText)
     };
     auto const word = GltfFile::Word;
     std::pair<std::string, std::string> const binaries[] = {
-        {good, ""},
-        {with(0, "gltf"), "header: this isn't a binary glTF file"},
         {"", "header: this isn't a binary glTF file"},
         {good.substr(0, 8), "header: the file ends after 8 bytes"},
         {with(4, word(1)), "header: is of version 1; version 2 is supported"},
@@ -246,15 +226,11 @@ TEST_F(GltfInput, SaysWhatIsWrongWithTheContainerAndTheText)
     for (auto const& [bytes, error] : binaries) EXPECT_EQ(error, ErrorOf("a.glb", bytes));
     std::pair<std::string, char const*> const texts[] = {
         {"{\n  oops}", "line 2, column 3: this isn't JSON"},
-        {"{\"asset\":", "line 1, column 10: the JSON text ends too early"},
         {std::string(100000, '['), "the JSON is nested more than 64 deep"},
         {"{\"asset\":1e999}", "the JSON has a number that is out of range"},
         {"[]", "isn't an object"},
         {"{\"a\": [1, -Infinity]}", "line 1, column 12: \"-Infinity\" isn't a number that JSON has"}};
     for (auto const& [text, error] : texts) EXPECT_EQ(error, ErrorOf("a.gltf", text));
-    EXPECT_EQ("begins neither as a project nor as glTF or BVH, and its name doesn't end in .gltf, .glb or .bvh",
-              ErrorOf("a.fbx", "Kaydara"));
-    EXPECT_EQ("can't be opened: No such file or directory", ErrorOfFile(folder_.Path("none.glb")));
     folder_.Write("folder.gltf/inside", "");
     EXPECT_EQ("can't be read: Is a directory", ErrorOfFile(folder_.Path("folder.gltf")));
 }

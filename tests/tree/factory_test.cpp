@@ -19,13 +19,21 @@ protected:
     TestKinds kinds;
 };
 
+template <class Leaf = TestLeaf>
 KFS_FactoryFunc LeafFunc(double value, int* calls = nullptr)
 {
     return [=](KFS_MatchName const& name, KFS_StreamFactory* factory, bool constant, unsigned int timeScale,
                bool canonical) {
         if (calls) ++*calls;
         EXPECT_TRUE(constant) << "each new stream starts out constant";
-        return new TestLeaf(name, factory, constant, timeScale, canonical, 1, value);
+        return new Leaf(name, factory, constant, timeScale, canonical, 1, value);
+    };
+}
+
+KFS_FactoryFunc GroupFunc(std::vector<KFS_MatchName> const& children)
+{
+    return [=](KFS_MatchName const& name, KFS_StreamFactory* factory, bool, unsigned int, bool canonical) {
+        return new TestNamedGroup(name, factory, canonical, children);
     };
 }
 
@@ -103,8 +111,7 @@ TEST_F(Factory, AKindRegisteredAsAnObjectIsClonedFromIt)
     EXPECT_TRUE(object->IsCanonical());
     {
         Q_ScAutoPtr<KFS_StreamBase> const made(factory.CreateStream(Name("glow"), true, 30, true, false));
-        EXPECT_FALSE(made->IsCanonical());
-        EXPECT_EQ(30u, made->GetAsLeaf()->GetTimeScale());
+        EXPECT_TRUE(!made->IsCanonical() && made->GetAsLeaf()->GetTimeScale() == 30u);
         EXPECT_EQ(7.0, static_cast<TestLeaf*>(made.get())->ValueAt(0));
         EXPECT_EQ(Q_MBToUTF16String("Glow"), made->GetDisplayName());
         object->SetSMDataPath(std::string("later data"));
@@ -126,75 +133,61 @@ TEST_F(Factory, ABatchUnregistersBackwardsAndOnlyWhatItRegistered)
         using TestLeaf::TestLeaf;
         ~Witness() override { gone.push_back(NameOf(this)); }
     };
-    auto const make = [](KFS_MatchName const& name, KFS_StreamFactory* f, bool constant, unsigned int timeScale,
-                         bool canonical) { return new Witness(name, f, constant, timeScale, canonical, 1, 5.0); };
     kinds.Leaf("taken", 1, 0.0);
     {
         KFS_ScRegisterStreams batch(&factory);
         for (char const* const name : {"one", "taken", "two"}) {
-            batch.Register(Name(name), make, false);
+            batch.Register(Name(name), LeafFunc<Witness>(5.0), false);
             EXPECT_TRUE(batch.IsRegistered(Name(name)));
         }
         EXPECT_FALSE(batch.IsRegistered(Name("three")));
-        {
-            Q_ScAutoPtr<KFS_StreamBase> const made(batch.CreateStream(Name("two")));
-            EXPECT_TRUE(made->GetAsLeaf()->HasKeys());
-        }
-        EXPECT_EQ(Names{"two"}, gone);
-        gone.clear();
+        EXPECT_TRUE(Q_ScAutoPtr<KFS_StreamBase>(batch.CreateStream(Name("two")))->GetAsLeaf()->HasKeys());
+        EXPECT_EQ(Names{"two"}, std::exchange(gone, {}));
         batch.UnregisterAll();
         EXPECT_EQ((Names{"two", "one"}), gone);
         EXPECT_NE(nullptr, factory.GetCanonicalStream(Name("taken")));
         batch.UnregisterAll();
         EXPECT_EQ(2u, gone.size()) << "the batch is empty";
-        batch.Register(Name("left"), make, false);
+        batch.Register(Name("left"), LeafFunc<Witness>(5.0), false);
     }
     EXPECT_NE(nullptr, factory.GetCanonicalStream(Name("left"))) << "the end of the scope unregisters nothing";
     EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("left")));
 }
 
 // outer { shared, inner { shared, deep }, own }: which kinds go with which group.
-TEST_F(Factory, DataFileGroupsGoWithTheirChildren)
+TEST_F(Factory, DataFileGroupsGoWithTheirChildrenAndTextStreamsAreASet)
 {
-    struct Row {
+    Names const all{"deep", "inner", "outer", "own", "shared"};
+    struct {
         char const* why;
-        std::vector<char const*> containers;
-        std::function<void(KFS_StreamFactory&)> act;
-        Names left;
+        Names containers, left;
+    } const rows[] = {
+        {"both, in either order", {"outer", "inner"}, {}},
+        {"the inner one", {"inner"}, {"outer", "own"}},
+        {"the outer one, whose subgroup goes as a kind", {"outer"}, {"deep"}},
+        {"all the way down", {}, {}},
+        {"an unknown one, which stays in the set", {"nobody"}, all},
+        {"a leaf", {"own"}, all},
     };
-    auto const unregisterAll = [](KFS_StreamFactory& f) { f.UnRegisterDataFileContainers(); };
-    Row const rows[] = {
-        {"both, in either order", {"outer", "inner"}, unregisterAll, {}},
-        {"the inner one", {"inner"}, unregisterAll, {"outer", "own"}},
-        {"the outer one, whose subgroup goes as a kind", {"outer"}, unregisterAll, {"deep"}},
-        {"all the way down", {}, [](KFS_StreamFactory& f) { f.UnregisterCanonicalMatchName(Name("outer"), {}); }, {}},
-        {"an unknown one, which stays in the set",
-         {"nobody"},
-         unregisterAll,
-         {"deep", "inner", "outer", "own", "shared"}},
-        {"a leaf", {"own"}, unregisterAll, {"deep", "inner", "outer", "own", "shared"}},
-    };
-    for (Row const& row : rows) {
+    for (auto const& row : rows) {
         SCOPED_TRACE(row.why);
         TestKinds local;
         for (char const* const name : {"shared", "deep", "own"}) local.Leaf(name, 1, 0.0);
         local.Named("inner", {Name("shared"), Name("deep")});
         local.Named("outer", {Name("shared"), Name("inner"), Name("own")});
-        for (char const* const name : row.containers) factory.RegisterDataFileContainer(Name(name));
+        for (std::string const& name : row.containers) factory.RegisterDataFileContainer(Name(name.c_str()));
         EXPECT_LE(row.containers.size(), factory.GetDataFileMatchNames().size());
-        row.act(factory);
+        if (row.containers.empty())
+            factory.UnregisterCanonicalMatchName(Name("outer"), {});
+        else
+            factory.UnRegisterDataFileContainers();
         Names left;
-        for (char const* const name : {"deep", "inner", "outer", "own", "shared"})
-            if (factory.GetCanonicalInstance(Name(name))) left.push_back(name);
+        for (std::string const& name : all)
+            if (factory.GetCanonicalInstance(Name(name.c_str()))) left.push_back(name);
         EXPECT_EQ(row.left, left);
     }
-}
-
-TEST_F(Factory, DataFileTextStreamsAreASet)
-{
     for (int i = 0; i < 2; ++i) factory.RegisterDataFileTextStream(Name("caption"));
-    EXPECT_TRUE(factory.IsDataFileTextStream(Name("caption")));
-    EXPECT_FALSE(factory.IsDataFileTextStream(Name("title")));
+    EXPECT_TRUE(factory.IsDataFileTextStream(Name("caption")) && !factory.IsDataFileTextStream(Name("title")));
     factory.UnRegisterDataFileTextStreams();
     EXPECT_FALSE(factory.IsDataFileTextStream(Name("caption")));
 }
@@ -298,19 +291,15 @@ TEST_F(Factory, TheDevelopmentSwitchMakesEverythingRealAtOnce)
 TEST_F(Factory, NoFailedAllocationLeavesAHalfRegisteredKind)
 {
     struct Nothing {};
-    KFS_FactoryFunc const group = [](KFS_MatchName const& name, KFS_StreamFactory* f, bool, unsigned int,
-                                     bool canonical) { return new TestNamedGroup(name, f, canonical, {Name("part")}); };
     kinds.Leaf("part", 1, 0.0);
-    for (KFS_FactoryFunc const& func : {LeafFunc(0.0), group}) {
+    for (KFS_FactoryFunc const& func : {LeafFunc(0.0), GroupFunc({Name("part")})}) {
         FailEveryAllocation([] { return std::make_unique<Nothing>(); },
                             AtBoundary([&](Nothing&) { factory.RegisterFactoryFunc(Name("kind"), func, false); }),
                             [&](Nothing&, int code, Q_MemoryCount const& before) {
                                 reports.Take();
-                                if (code != 0) {
-                                    EXPECT_EQ(before, Q_MemoryLive(nullptr));
-                                    EXPECT_EQ(nullptr, factory.GetCanonicalInstance(Name("kind")));
-                                    EXPECT_EQ(nullptr, factory.GetCanonicalStream(Name("kind")));
-                                }
+                                EXPECT_TRUE(code == 0 || before == Q_MemoryLive(nullptr));
+                                EXPECT_EQ(code == 0, factory.GetCanonicalInstance(Name("kind")) != nullptr);
+                                EXPECT_EQ(code == 0, factory.GetCanonicalStream(Name("kind")) != nullptr);
                                 factory.UnregisterFactoryFunc_NullOK(Name("kind"), true);
                             });
         EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("kind")));
@@ -319,21 +308,16 @@ TEST_F(Factory, NoFailedAllocationLeavesAHalfRegisteredKind)
 
 TEST_F(Factory, ALayoutOfUnknownKindsIsRefusedWithItsGroup)
 {
-    bool defer = false;
-    auto const make = [](KFS_MatchName const& name, KFS_StreamFactory* f, bool, unsigned int, bool canonical) {
-        return new TestNamedGroup(name, f, canonical, {Name("early"), Name("late")});
-    };
-    auto const tryIt = [&] { factory.RegisterFactoryFunc(Name("group"), make, defer); };
+    std::vector<KFS_MatchName> const children{Name("early"), Name("late")};
     kinds.Leaf("early", 1, 0.0);
-    ExpectBroken(reports, "UI layout has an unregistered child", tryIt);
+    ExpectBroken(reports, "UI layout has an unregistered child",
+                 [&] { return factory.RegisterFactoryFunc(Name("group"), GroupFunc(children), false); });
     EXPECT_EQ(nullptr, factory.GetCanonicalStream(Name("group")));
-    defer = true;
-    tryIt();
+    kinds.Deferred<TestNamedGroup>("group", children);
     ExpectBroken(reports, "UI layout has an unregistered child", [&] { factory.SetupCanonicalStream(Name("group")); });
     kinds.Leaf("late", 1, 0.0);
     factory.SetupCanonicalStream(Name("group"));
     EXPECT_EQ("late", NameOf(factory.GetCanonicalStream(Name("group"))->GetAsGroup()->GetStream(1)));
-    EXPECT_TRUE(factory.UnregisterFactoryFunc(Name("group")));
 }
 
 }  // namespace

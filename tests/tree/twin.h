@@ -2,8 +2,10 @@
 
 #include "tests/support/groups.h"
 
+#include <algorithm>
 #include <functional>
 #include <memory>
+#include <numeric>
 #include <optional>
 
 // A tree of streams as plainly as it can be told: each group is a vector, each edit is its list of steps, and each
@@ -26,8 +28,7 @@ inline std::vector<TwinKind> const TwinKinds{
 };
 inline TwinKind const& KindOf(std::string const& name)
 {
-    return *std::find_if(
-        TwinKinds.begin(), TwinKinds.end(), [&](TwinKind const& k) { return k.name == name; });
+    return *std::ranges::find(TwinKinds, name, &TwinKind::name);
 }
 
 // Edits, as a script says them. Each number is taken modulo what there is.
@@ -102,7 +103,7 @@ protected:
     {
         log.push_back(line);
         std::string const what = line.substr(0, line.find(' '));
-        if (std::find(Moments.begin(), Moments.end(), what) == Moments.end()) return;
+        if (std::ranges::count(Moments, what) == 0) return;
         log.back() += " in " + Show(Self().Root(), nullptr, false);
         if (what != moment_) return;
         moment_.clear();
@@ -217,25 +218,7 @@ public:
     TwinTree(TwinTree const&) = delete;
     TwinTree& operator=(TwinTree const&) = delete;
 
-    // What a file says of a node: its kinds, flags and names.
-    void Save(Twin const* node, std::string const& indent, std::vector<std::string>* lines, bool marked) const
-    {
-        auto const add = [&](char const* id, std::string const& data) {
-            lines->push_back(indent + "  " + id + " " + data);
-        };
-        lines->push_back(indent + "LIST " + (node->Shape() == 'l' ? "kfbs" : "kfgp"));
-        add("kfsb", std::to_string(node->flags & ~Unsaved));
-        add("kfsn", marked ? "-_0_/-" : node->name);
-        if (node->Shape() == 'l') return;
-        for (Twin const* const child : node->children) {
-            if (!child || !IsWritten(node, child)) continue;
-            add("kfmn", child->kind);
-            Save(child, indent + "  ", lines, node->Shape() == 'n' || child->name == child->kind);
-        }
-        add("kfmn", "ZQVM Group End");
-    }
-
-    // Makes `to`, which is as new, what a load of `from` makes of it.
+    // Makes `to`, which is as new, what a load of a file of `from` makes of it.
     void Load(Twin const* from, Twin* to)
     {
         to->flags = (from->flags & ~Unsaved) | (to->flags & Unsaved);
@@ -317,14 +300,12 @@ private:
     {
         if (node->Shape() == 'l') return node->keyed || node->value != KindOf(node->kind).value;
         if (node->Shape() == 'i') return !node->children.empty();
-        return std::any_of(node->children.begin(), node->children.end(),
-                           [](Twin const* c) { return c && IsModified(c); });
+        return std::ranges::any_of(node->children, [](Twin const* c) { return c && IsModified(c); });
     }
     static bool IsAnimated(Twin const* node)
     {
-        return node->keyed ||
-               std::any_of(
-                   node->children.begin(), node->children.end(), [](Twin const* c) { return c && IsAnimated(c); });
+        return node->keyed || std::ranges::any_of(
+                                  node->children, [](Twin const* c) { return c && IsAnimated(c); });
     }
     static bool IsWritten(Twin const* group, Twin const* child)
     {
@@ -415,23 +396,19 @@ private:
     }
     static std::size_t PlaceOf(Twin const* group, Twin const* child)
     {
-        return static_cast<std::size_t>(std::find(group->children.begin(), group->children.end(), child) -
-                                        group->children.begin());
+        return static_cast<std::size_t>(std::ranges::find(group->children, child) - group->children.begin());
     }
     static bool IsIn(Twin const* group, Twin const* child) { return PlaceOf(group, child) < group->children.size(); }
     static bool CanStore(Twin const* group, Twin const* child)
     {
-        return std::find(group->Layout().begin(), group->Layout().end(), child->kind) != group->Layout().end();
+        return std::ranges::count(group->Layout(), child->kind) > 0;
     }
     // The slots of a named group in the order of their names.
     static std::vector<std::size_t> Sorted(Twin const* group)
     {
-        std::vector<std::pair<KFS_MatchName, std::size_t>> order;
-        for (std::size_t i = 0; i < group->children.size(); ++i)
-            order.emplace_back(::Name(group->Layout()[i].c_str()), i);
-        std::sort(order.begin(), order.end());
-        std::vector<std::size_t> slots;
-        for (auto const& [name, i] : order) slots.push_back(i);
+        std::vector<std::size_t> slots(group->children.size());
+        std::iota(slots.begin(), slots.end(), 0U);
+        std::ranges::sort(slots, std::less<>(), [&](std::size_t i) { return ::Name(group->Layout()[i].c_str()); });
         return slots;
     }
     // Where a child stands in the eyes of those who hear of its removal.
@@ -620,7 +597,7 @@ private:
     {
         Twin* old = nullptr;
         OrDelete(made, [&] {
-            auto const found = std::find(group->Layout().begin(), group->Layout().end(), made->kind);
+            auto const found = std::ranges::find(group->Layout(), made->kind);
             if (!CanStore(group, made)) throw Broken{"invalid name for storing in this named group"};
             old = SwapSlot(group, static_cast<std::size_t>(found - group->Layout().begin()), made);
         });
