@@ -40,11 +40,17 @@ public:
 };
 
 // A leaf whose value is a vector, and which counts how often it is asked for one.
-class Valued : public TestLeaf {
+class Valued : public KFS_Stream {
 public:
-    Valued(KFS_MatchName const& name, KFS_StreamFactory* factory, bool constant, unsigned int timeScale, bool canonical)
-        : TestLeaf(name, factory, constant, timeScale, canonical, 1, 0.0)
+    explicit Valued(bool constant, short dimension = 1, bool spatial = false)
+        : KFS_Stream(dimension, 600, constant, spatial, KFS_InterpMask_All, spatial ? 4 : 0,
+                     {0, 0, KFS_Type_Double, nullptr}, nullptr, nullptr, false)
     {}
+    void Key(int seconds, double value, char interp)
+    {
+        T_Time const at{seconds, 1};
+        EXPECT_EQ(0, KFS_InsertKeyF(this, &at, 1, &value, interp, interp));
+    }
     M_Vector4T<double> GetVector4Ex(KFS_EvalData const& eval) const override
     {
         ++reads;
@@ -57,23 +63,6 @@ public:
         return GetVector4Ex({a, 0, bag}) == GetVector4Ex({b, 0, bag});
     }
     static inline int reads = 0;
-};
-
-class SpatialValued : public KFS_Stream {
-public:
-    SpatialValued(short dimension, bool spatial, KFS_ValueDesc const& desc)
-        : KFS_Stream(dimension, 600, false, spatial, KFS_InterpMask_All, spatial ? 4 : 0, desc, nullptr, nullptr, false)
-    {}
-    M_Vector4T<double> GetVector4Ex(KFS_EvalData const& eval) const override
-    {
-        M_Vector4T<double> vector{};
-        KFSp_ThrowIf(KFS_GetValueFPlus(this, &eval.time, eval.flags, vector.v, nullptr, eval.bag));
-        return vector;
-    }
-    bool SameValueAtTimes(T_Time const& a, T_Time const& b, KFS_ParamBag const* bag) const override
-    {
-        return GetVector4Ex({a, 0, bag}) == GetVector4Ex({b, 0, bag});
-    }
 };
 
 class Identity : public SceneTest {
@@ -102,7 +91,7 @@ public:
     explicit RandomLeaf(Dice& dice)
         : dice_(dice),
           spatial_(dice.Below(3) == 0),
-          stream_(static_cast<short>(spatial_ ? 2 + dice.Below(2) : 1 + dice.Below(3)), spatial_, Doubles())
+          stream_(false, static_cast<short>(spatial_ ? 2 + dice.Below(2) : 1 + dice.Below(3)), spatial_)
     {
         for (int keys = 1 + dice.Below(7); keys > 0; --keys) Insert(RandomTime());
         for (int edits = dice.Below(6); edits > 0; --edits) Edit(dice_.Below(Count()));
@@ -161,12 +150,6 @@ public:
     }
 
 private:
-    static KFS_ValueDesc Doubles()
-    {
-        KFS_ValueDesc desc;
-        desc.dataType = KFS_Type_Double;
-        return desc;
-    }
     double Value() { return dice_.Below(3) == 0 ? dice_.Between(-9, 9) : dice_.Below(3); }
     char Interp()
     {
@@ -176,7 +159,7 @@ private:
 
     Dice& dice_;
     bool spatial_;
-    SpatialValued stream_;
+    Valued stream_;
 };
 
 TEST_F(Identity, DiffersWhereAValueDiffersAndIgnoresKeysFarAway)
@@ -232,13 +215,10 @@ TEST_F(Identity, FollowsTheSpanOnlyWhereSomethingMoves)
           Row{"line", KFS_Interp_Linear, 5, 200, false}, Row{"flat line", KFS_Interp_Linear, 0, 200, true},
           Row{"curve", KFS_Interp_Spline, 5, 200, false}, Row{"flat curve", KFS_Interp_Spline, 0, 200, true}}) {
         SCOPED_TRACE(row.what);
-        auto const kind = Name("opacity");
-        Valued leaf(kind, nullptr, false, 600, false);
-        double const values[] = {0, row.second};
+        Valued leaf(false);
+        double const speed = 0;
         for (int i : {0, 1}) {
-            T_Time const at{600 * i, 600};
-            ASSERT_EQ(0, KFS_InsertKeyF(&leaf, &at, 1, values + i, row.interp, row.interp));
-            double const speed = 0;
+            leaf.Key(i, i * row.second, row.interp);
             ASSERT_EQ(0, KFS_SetKeyVelocityF(&leaf, i, &speed, &speed));
         }
         Render render({100, 600}, {100, 600});
@@ -254,16 +234,11 @@ TEST_F(Identity, FollowsTheSpanOnlyWhereSomethingMoves)
 TEST_F(Identity, LooksBeyondTheSpanForAutomaticHandles)
 {
     for (bool const automatic : {false, true}) {
-        Valued leaf(Name("opacity"), nullptr, false, 600, false);
+        Valued leaf(false);
+        double const speed = 1;
         for (int i = 0; i < 4; ++i) {
-            T_Time const at{600 * i, 600};
-            double const value = i * i;
-            ASSERT_EQ(0, KFS_InsertKeyF(&leaf, &at, 1, &value, KFS_Interp_Spline, KFS_Interp_Spline));
-            double const speed = 1;
-            if (automatic)
-                ASSERT_EQ(0, KFS_SetKeyModifiable(&leaf, 1, i));
-            else
-                ASSERT_EQ(0, KFS_SetKeyVelocityF(&leaf, i, &speed, &speed));
+            leaf.Key(i, i * i, KFS_Interp_Spline);
+            ASSERT_EQ(0, automatic ? KFS_SetKeyModifiable(&leaf, 1, i) : KFS_SetKeyVelocityF(&leaf, i, &speed, &speed));
         }
         Render const render({700, 600}, {100, 600});
         Guid const guid = Of(leaf, render);
@@ -290,15 +265,15 @@ TEST_F(Identity, SamplesExpressions)
           Row{"x", 5, true, 1}, Row{"cacheCompareSamplesPerSecond = 10; x", 100, false, 1000},
           Row{"cacheCompareSamplesPerSecond=0", 100, false, 4}, Row{"cacheCompareSamplesPerSecond", 5, false, 5}}) {
         SCOPED_TRACE(row.text);
-        Valued leaf(Name("opacity"), nullptr, true, 600, false);
-        leaf.InsertDefaultKey({0, 1});
+        Valued leaf(true);
+        leaf.Key(0, 0, KFS_Interp_Linear);
         KFS_SetStreamExpression(&leaf, Text(row.text));
         Valued::reads = 0;
         Of(leaf, Render({1, 1}, {row.seconds, 1}), row.filtered ? &everything : nullptr);
         EXPECT_EQ(row.samples, Valued::reads);
     }
-    Valued leaf(Name("opacity"), nullptr, true, 600, false);
-    leaf.InsertDefaultKey({0, 1});
+    Valued leaf(true);
+    leaf.Key(0, 0, KFS_Interp_Linear);
     KFS_SetStreamExpression(&leaf, Text("cacheCompareSamplesPerSecond = -1"));
     Valued::reads = 0;
     Guid const guid = Of(leaf, Render({1, 1}, {5, 1}));
@@ -316,13 +291,9 @@ TEST_F(Identity, SamplesExpressions)
 // With a getter the keys are those of the getter, the values those of the stream with the bag.
 TEST_F(Identity, FollowsTheSourceOfAnOverride)
 {
-    Valued leaf(Name("opacity"), nullptr, false, 600, false), getter(Name("opacity"), nullptr, false, 600, false);
-    for (int i : {0, 1, 2}) {
-        T_Time const at{600 * i, 600};
-        double const value = i;
-        ASSERT_EQ(0, KFS_InsertKeyF(&getter, &at, 1, &value, KFS_Interp_Linear, KFS_Interp_Linear));
-    }
-    leaf.InsertDefaultKey({0, 1});
+    Valued leaf(false), getter(false);
+    for (int i : {0, 1, 2}) getter.Key(i, i, KFS_Interp_Linear);
+    leaf.Key(0, 0, KFS_Interp_Linear);
     Render render({100, 600}, {100, 600});
     render.bag.AddOverride(&leaf, boost::make_shared<KFS_StreamOverride>(
                                       &leaf, KFS_OverrideValue(std::vector<double>{0}), &getter, T_Time{1, 1},

@@ -51,7 +51,7 @@ TEST_F(Attributes, DimensionsShareTheFourComponentsOfTheMultiplier)
     EXPECT_EQ(0.5, now[0]);
 }
 
-// A mark reaches back by a short.
+// A mark reaches back by a short; of a clone all keys are marked.
 TEST_F(Attributes, ALongStreamIsMarkedFromEndToEnd)
 {
     TestStream stream(Spatial2D);
@@ -61,6 +61,9 @@ TEST_F(Attributes, ALongStreamIsMarkedFromEndToEnd)
     EXPECT_EQ(0, KFS_SetStreamSParametrize(stream, 1));
     EXPECT_EQ((std::array{0, 69999}), stream.Stale());
     EXPECT_EQ((std::array{0, 69999}), stream.ArcStale());
+    std::unique_ptr<KFS_Stream> const clone(stream->CloneLeaf({true, false}));
+    for (int const* const range : {clone->GetInvalidKeyIndex(), clone->GetArcInvalidKeyIndex()})
+        EXPECT_EQ((std::pair{0, 69999}), (std::pair{range[0], range[1]}));
 }
 
 }  // namespace

@@ -55,6 +55,13 @@ TEST_F(Cache, WhatIsAskedForIsAllThatIsDone)
     KFS_GetValueFNoExpr(stream, 100, 1, &value, &atKey, nullptr);
     EXPECT_EQ(6.0, value);
     EXPECT_EQ(1, atKey);
+    double const overriding = 42.0;
+    KFS_GetValueFNoExpr(stream, 100, 0, &value, &atKey, &overriding);
+    EXPECT_EQ((std::pair{42.0, 1}), (std::pair{value, int{atKey}})) << "an override takes the place of the keys";
+    stream->ValidateCacheAtTime({50, 600});
+    EXPECT_EQ(50, stream->GetCache()->time);
+    stream->ForceInterpolateAtTime({20, 600});
+    EXPECT_EQ(20, stream->GetCache()->time);
     stream.At1(40);
     atKey = 7;
     KFSp_UpdateCacheToTime(stream, stream->GetKeyData(), 100, {.wantsValue = false, .atKey = &atKey});
@@ -80,18 +87,30 @@ TEST_F(Cache, FailedInterpolationLeavesItEmptyAndUnpinned)
     EXPECT_EQ(31.0, value) << "the caller's function with the caller's word";
 }
 
-TEST_F(Cache, CustomValuesAreNeverShared)
+TEST_F(Cache, CustomValuesAreNeverSharedNorArcTables)
 {
     OwnedValues::Scope const owned;
-    auto const stream = OwnedValues::MakeStream(false);
-    OwnedValues::InsertKey(stream.get(), 0, 5.0);
-    EXPECT_EQ(5.0, OwnedValues::Read(stream.get(), 0));
+    auto const stream = OwnedValues::MakeStream(false, true);
+    OwnedValues::InsertKey(stream.get(), 30, 5.0);
+    EXPECT_EQ(5.0, OwnedValues::Read(stream.get(), 30));
+    void* item = nullptr;
+    ASSERT_EQ(0, SEQ_GetAddress(stream->GetKeys(), 0, 0, &item));
+    auto* const key = static_cast<KFS_KeyScalar*>(item);
+    key->arcLength = 12.5;
+    ASSERT_EQ(0, SEQ_New(0, 8, 4, 1, &key->remapTable));
     {
         KFS_StreamKeyData const copy(*stream->GetKeyData(), stream.get());
-        EXPECT_NE(nullptr, copy.keys);
         EXPECT_EQ(4, OwnedValues::Live());
     }
-    EXPECT_EQ(5.0, OwnedValues::Read(stream.get(), 0)) << "the copy's end took nothing of the stream's";
+    SEQ_Head** copies = nullptr;
+    ASSERT_EQ(0, SEQ_Duplicate(stream->GetKeys(), 0, &copies));
+    void const* copied = nullptr;
+    ASSERT_EQ(0, SEQ_GetConstAddress(copies, 0, &copied));
+    auto const* const copiedKey = static_cast<KFS_KeyScalar const*>(copied);
+    EXPECT_EQ((std::pair{30, 12.5}), (std::pair{copiedKey->time, copiedKey->arcLength}));
+    EXPECT_EQ(nullptr, copiedKey->remapTable);
+    EXPECT_EQ(0, SEQ_Dispose(copies, 0));
+    EXPECT_EQ(5.0, OwnedValues::Read(stream.get(), 30)) << "the copy's end took nothing of the stream's";
 }
 
 TEST_F(Cache, AKeyThatCannotBeCopiedLeavesItEmpty)

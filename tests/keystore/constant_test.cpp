@@ -8,28 +8,6 @@ namespace {
 
 class Constants : public StreamTest {};
 
-TEST_F(Constants, KeysGoAndTheLastReadValueStays)
-{
-    for (bool const spatial : {false, true}) {
-        SCOPED_TRACE(spatial);
-        TestStream stream({.dimension = 2, .spatial = spatial});
-        stream.Key(0, {0.0, 0.0}).Key(100, {10.0, 20.0}).Key(200, {0.0, 40.0});
-        std::vector<double> const read = stream.At(50);
-        Q_MemoryCount const before = Q_MemoryLive(nullptr);
-        EXPECT_EQ(0, stream->SetConstant(1, 0));
-        EXPECT_LT(Q_MemoryLive(nullptr).blocks, before.blocks);
-        EXPECT_EQ(nullptr, stream->GetKeys());
-        EXPECT_EQ(TestStream::NotStale, stream.Stale());
-        EXPECT_EQ(TestStream::NotStale, stream.ArcStale());
-        for (int const time : {-5, 50, 999}) EXPECT_EQ(read, stream.At(time));
-        // And back again: the value is a key like any other, as if it had been set.
-        EXPECT_EQ(0, stream->SetConstant(0, 1));
-        EXPECT_EQ(1, stream.Count());
-        stream.Key(stream.Times()[0] + 100, {0.0, 0.0});
-        EXPECT_EQ(read, stream.At(stream.Times()[0]));
-    }
-}
-
 TEST_F(Constants, AFailureIsTheResultAndIsHeardAllTheSame)
 {
     HeardRoot root;

@@ -18,11 +18,10 @@ TEST_F(Edit, TheMaskDecidesAboutCodes)
         unsigned short mask;
         int code;
         bool allowed;
-    };
-    Row const rows[] = {{0, 0, true},       {0, 1, false},      {0x7, 1, true},  {0x7, 2, true},    {0x7, 3, true},
-                        {0x7, 4, false},    {0x7, -1, false},   {0xF, -1, true}, {0xF, -128, true}, {0xF, 4, true},
-                        {0x4, 1, false},    {0x4, 3, true},     {0x8, 1, false}, {0x8, -5, true},   {0x7, 127, false},
-                        {0xFFFF, 16, true}, {0xFFFF, 17, false}};
+    } const rows[] = {{0, 0, true},       {0, 1, false},      {0x7, 1, true},  {0x7, 2, true},    {0x7, 3, true},
+                      {0x7, 4, false},    {0x7, -1, false},   {0xF, -1, true}, {0xF, -128, true}, {0xF, 4, true},
+                      {0x4, 1, false},    {0x4, 3, true},     {0x8, 1, false}, {0x8, -5, true},   {0x7, 127, false},
+                      {0xFFFF, 16, true}, {0xFFFF, 17, false}};
     for (Row const& row : rows) {
         SCOPED_TRACE(testing::Message() << "mask " << row.mask << " code " << row.code);
         TestStream const stream({.interpMask = row.mask});

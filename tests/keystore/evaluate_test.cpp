@@ -94,8 +94,7 @@ TEST_F(Evaluate, TheStagesGoInTheirOrder)
         double value;
         int atKey;    // 9: untouched
         double rate;  // of an expression, as long as it is switched on, whether it has a value or not
-    };
-    Row const rows[] = {
+    } const rows[] = {
         {"no expression", [] {}, 0, 0, 2.0, 1, 6.0},
         {"an expression answers, and no key stands there", [&] { info.SetExpression(Text("x")); }, 0, 0, 1100.0, 0,
          600.0},
@@ -212,25 +211,6 @@ TEST_F(Evaluate, WithoutAStateThatSaysHowThereIsACodeAndNoCrash)
     EXPECT_EQ(-1.0, value);
     EXPECT_EQ(0, KFS_GetValuePlus(stream, &at, 0, &value, nullptr, nullptr, nullptr, 0)) << "the project has a context";
     EXPECT_EQ(1.0, value);
-}
-
-TEST_F(Evaluate, AnOverridesValueTakesThePlaceOfTheKeysAndForcedOnesStandInTheCache)
-{
-    TestStream stream;
-    stream.Key(0, {1.0}).Key(100, {2.0});
-    double const overriding = 42.0;
-    double value = 0.0;
-    unsigned char atKey = 0;
-    KFS_GetValueFNoExpr(stream, 100, 0, &value, &atKey, &overriding);
-    EXPECT_EQ(42.0, value);
-    EXPECT_EQ(1, atKey);
-    EXPECT_EQ(2.0, stream.At1(100));
-    Q_MemoryCount const before = Q_MemoryLive(nullptr);
-    stream->ValidateCacheAtTime({50, 600});
-    EXPECT_EQ(50, stream->GetCache()->time);
-    stream->ForceInterpolateAtTime({20, 600});
-    EXPECT_EQ(20, stream->GetCache()->time);
-    EXPECT_EQ(before, Q_MemoryLive(nullptr));
 }
 
 TEST_F(Evaluate, SamplesComeInOneHandle)

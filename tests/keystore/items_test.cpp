@@ -18,24 +18,6 @@ namespace {
 
 class Items : public StreamTest {};
 
-TEST_F(Items, DataSizeFollowsTheDescription)
-{
-    struct Row {
-        bool custom;
-        unsigned char spatial;
-        short dimension;
-        int size;
-    };
-    Row const rows[] = {{false, 1, 2, 48}, {false, 0, 2, 80}, {false, 1, 3, 72}, {false, 0, 1, 40},
-                        {false, 0, 0, 0},  {true, 1, 3, 13},  {true, 0, 1, 13}};
-    for (Row const& row : rows) {
-        KFS_ValueDesc desc;
-        desc.isCustom = row.custom ? 1 : 0;
-        desc.itemSize = 13;
-        EXPECT_EQ(row.size, KFS_GetKeyScalarDataSize(&desc, row.spatial, row.dimension));
-    }
-}
-
 // Element bits that a number becomes, and the number that those bits give back.
 struct Conversion {
     signed char type;
@@ -109,12 +91,9 @@ TEST_F(Items, TheKindSaysHowManyElementsMove)
 {
     struct Row {
         short kind;
-        int plain;
-        int spatial;
-        int passingForPlain;
-    };
-    Row const rows[] = {{KFS_Item_CacheWhole, 10, 6, 2}, {KFS_Item_CacheValue, 2, 2, 2}, {KFS_Item_KeyWhole, 10, 6, 2},
-                        {KFS_Item_KeyValue, 2, 2, 2},    {KFS_Item_Component, 1, 1, 1},  {77, 0, 0, 0}};
+        int plain, spatial, passingForPlain;
+    } const rows[] = {{KFS_Item_CacheWhole, 10, 6, 2}, {KFS_Item_CacheValue, 2, 2, 2}, {KFS_Item_KeyWhole, 10, 6, 2},
+                      {KFS_Item_KeyValue, 2, 2, 2},    {KFS_Item_Component, 1, 1, 1},  {77, 0, 0, 0}};
     TestStream const plain({.dimension = 2});
     TestStream const spatial({.dimension = 2, .spatial = true});
     TestStream custom({.dimension = 2});
@@ -179,25 +158,21 @@ TEST_F(Items, CopyingForcesValuesIntoTheLimits)
     struct Row {
         KFS_CopyItemFunc function;
         short kind;
-        double from;
-        double to;
+        double from, to;
         int code;
-    };
-    Row const rows[] = {
+    } const rows[] = {
         {KFSp_FakeCopyItemFunc, KFS_Item_KeyValue, 120.0, 100.0, 0},
         {KFSp_FakeCopyItemFunc, KFS_Item_Component, 120.0, 120.0, 0},
         {KFSp_FakeCopyItemFunc, KFS_Item_KeyValue, -1.0, -1.0, 4711},
         {KFSp_FakeCopyItemFuncNoLimits, KFS_Item_KeyValue, 120.0, 120.0, 0},
         {KFSp_ConvertItemToFloat, KFS_Item_KeyValue, 120.0, 120.0, 0},
+        {KFSp_FakeCopyItemFunc, KFS_Item_KeyValue, 2000.0, 2000.0, Q_Err_Exception},
     };
     for (Row const& row : rows) {
         double to = 0.0;
         EXPECT_EQ(row.code, row.function(&stream, 0, row.kind, &row.from, &to));
         EXPECT_EQ(row.to, to);
     }
-    double const tooMuch = 2000.0;
-    double to = 0.0;
-    EXPECT_EQ(Q_Err_Exception, KFSp_FakeCopyItemFunc(&stream, 0, KFS_Item_KeyValue, &tooMuch, &to));
     EXPECT_EQ(1U, reports.Take().size());
 }
 
@@ -291,57 +266,6 @@ TEST_F(Items, KeysSortByWrappedDifference)
         EXPECT_EQ(order, KFSp_SortKeyItemFunc(nullptr, nullptr, &a, &b));
         EXPECT_EQ(order, KFSp_SortKeyItemDiskFunc(nullptr, nullptr, &a, &b));
     }
-}
-
-SEQ_Head** MakeTable()
-{
-    SEQ_Head** table = nullptr;
-    EXPECT_EQ(0, SEQ_New(0, 8, 4, 1, &table));
-    return table;
-}
-
-TEST_F(Items, ACopiedKeyOwnsItsValueAndNoArcTable)
-{
-    OwnedValues::Scope const owned;
-    auto const stream = OwnedValues::MakeStream(false, true);
-    OwnedValues::InsertKey(stream.get(), 30, 5.0);
-    void* item = nullptr;
-    ASSERT_EQ(0, SEQ_GetAddress(stream->GetKeys(), 0, 0, &item));
-    auto* const key = static_cast<KFS_KeyScalar*>(item);
-    key->spFlags = 3;
-    key->arcLength = 12.5;
-    key->remapTable = MakeTable();
-    SEQ_Head** copies = nullptr;
-    ASSERT_EQ(0, SEQ_Duplicate(stream->GetKeys(), 0, &copies));
-    EXPECT_EQ(2, OwnedValues::Live());
-    void const* copied = nullptr;
-    ASSERT_EQ(0, SEQ_GetConstAddress(copies, 0, &copied));
-    auto const* const copy = static_cast<KFS_KeyScalar const*>(copied);
-    EXPECT_EQ(nullptr, copy->remapTable);
-    EXPECT_NE(nullptr, key->remapTable);
-    EXPECT_EQ(30, copy->time);
-    EXPECT_EQ(KFS_Interp_Hold, copy->outInterp);
-    EXPECT_EQ(3U, copy->spFlags);
-    EXPECT_EQ(12.5, copy->arcLength);
-    EXPECT_EQ(0, SEQ_Dispose(copies, 0));
-    EXPECT_EQ(1, OwnedValues::Live());
-}
-
-TEST_F(Items, IterationFunctionsSeeToRecordsReadFromAFile)
-{
-    TestStream stream({.dimension = 2, .spatial = true});
-    stream.Key(0, {1, 2}).Key(100, {3, 4});
-    SEQ_Head** const table = MakeTable();
-    stream.Record(0)->remapTable = table;
-    ASSERT_EQ(0, SEQ_ForEach(stream->GetKeys(), 0, KFSp_SetKeySpatialState, 0));
-    EXPECT_EQ(0, stream.Record(0)->flags & KFS_KeyFlag_SpatialBlock);
-    ASSERT_EQ(0, SEQ_ForEach(stream->GetKeys(), 0, KFSp_KeyClearRemap, 0));
-    EXPECT_EQ(table, stream.Record(0)->remapTable) << "without the block the word is none of its business";
-    ASSERT_EQ(0, SEQ_ForEach(stream->GetKeys(), KFS_StreamFlag_Spatial, KFSp_SetKeySpatialState, 0));
-    EXPECT_NE(0, stream.Record(1)->flags & KFS_KeyFlag_SpatialBlock);
-    ASSERT_EQ(0, SEQ_ForEach(stream->GetKeys(), 0, KFSp_KeyClearRemap, 0));
-    EXPECT_EQ(nullptr, stream.Record(0)->remapTable);
-    EXPECT_EQ(0, SEQ_Dispose(table, 0)) << "forgotten, not disposed";
 }
 
 }  // namespace

@@ -39,16 +39,6 @@ TEST_F(Lookup, NullTimeIsTheOriginAndAnswersMayBeNull)
     EXPECT_EQ(0, KFS_IndexToTime(stream, -1, &time));
     EXPECT_EQ(10, time.value);
     EXPECT_EQ(0, stream.Pins());
-    // And any scale will do for a time.
-    TestStream slope;
-    slope.Key(0, {0.0}).Key(600, {6.0});
-    double number = 77.0;
-    for (T_Time const at : {T_Time{1, 2}, T_Time{300, 600}, T_Time{15, 30}}) {
-        ASSERT_EQ(0, KFS_GetValueFPlus(slope, &at, 0, &number, nullptr, nullptr));
-        EXPECT_DOUBLE_EQ(3.0, number);
-    }
-    ASSERT_EQ(0, KFS_GetValueFPlus(slope, nullptr, 0, &number, nullptr, nullptr));
-    EXPECT_EQ(0.0, number);
 }
 
 TEST_F(Lookup, ATimeThatDoesNotFitIsRefusedWithoutAReport)
@@ -89,16 +79,13 @@ TEST_F(Lookup, TheRecordSaysWhereItsValueIs)
     key->remapTable = nullptr;
 }
 
-struct CopyCall {
-    KFS_Stream const* stream;
-    long refcon;
-    short kind;
-};
-CopyCall lastCopy;
+long lastRefcon;
+short lastKind;
 
 int RememberingCopy(KFS_Stream const* stream, long refcon, short kind, void const* source, void* destination)
 {
-    lastCopy = {stream, refcon, kind};
+    lastRefcon = refcon;
+    lastKind = kind;
     std::memcpy(destination, source, stream->GetValueDesc()->itemSize);
     return refcon < 0 ? 4711 : 0;
 }
@@ -111,24 +98,21 @@ TEST_F(Lookup, ACustomValueGoesThroughTheClientsFunctionAndNeverAsDoubles)
             KFS_Stream stream(1, 600, noKeys, 0, KFS_InterpMask_Hold, 0, desc, nullptr, nullptr, false);
             long const stored = 0x1122334455667788;
             ASSERT_EQ(0, KFS_InsertKey(&stream, nullptr, 1, &stored, KFS_Interp_Hold, KFS_Interp_Hold));
-            stream.SetCopyItemFunc(RememberingCopy);
-            long value = 0;
-            char in = 77;
-            EXPECT_EQ(word < 0 ? 4711 : 0, KFS_GetKey(&stream, 0, &value, &in, nullptr));
-            EXPECT_EQ(stored, value);
-            EXPECT_EQ(KFS_Interp_Hold, in) << "also where the copy fails";
-            EXPECT_EQ(&stream, lastCopy.stream);
-            EXPECT_EQ(word, lastCopy.refcon);
-            EXPECT_EQ(noKeys ? KFS_Item_CacheValue : KFS_Item_KeyValue, lastCopy.kind);
-            stream.SetCopyItemFunc(nullptr);
-            value = 0;
-            EXPECT_EQ(0, KFS_GetKey(&stream, 0, &value, nullptr, nullptr)) << "the bytes, without a function";
-            EXPECT_EQ(stored, value);
+            for (KFS_CopyItemFunc const function : {KFS_CopyItemFunc(RememberingCopy), KFS_CopyItemFunc(nullptr)}) {
+                stream.SetCopyItemFunc(function);  // without one the bytes are copied
+                long value = 0;
+                char in = 77;
+                EXPECT_EQ(function && word < 0 ? 4711 : 0, KFS_GetKey(&stream, 0, &value, &in, nullptr));
+                EXPECT_EQ(stored, value);
+                EXPECT_EQ(KFS_Interp_Hold, in) << "also where the copy fails";
+            }
+            EXPECT_EQ(word, lastRefcon);
+            EXPECT_EQ(noKeys ? KFS_Item_CacheValue : KFS_Item_KeyValue, lastKind);
             double number = 77.0;
             EXPECT_EQ(7441, KFS_GetKeyF(&stream, 99, &number, nullptr, nullptr)) << "before the index is looked at";
             EXPECT_EQ(77.0, number);
             EXPECT_REPORT(reports, 115, "can#{rsquo}t compute floating point value(s) for a custom value");
-            EXPECT_EQ(0, KFS_GetKeyF(&stream, 0, nullptr, &in, nullptr)) << "the codes are no value";
+            EXPECT_EQ(0, KFS_GetKeyF(&stream, 0, nullptr, nullptr, nullptr)) << "the codes are no value";
         }
     }
 }
@@ -156,38 +140,35 @@ struct Visitor {
     long Word() { return reinterpret_cast<long>(this); }
 };
 
-class KeyWalk : public StreamTest {
-protected:
-    KeyWalk() { stream.Key(10, {1.0}).Key(20, {2.0}).Key(30, {3.0}); }
-    TestStream stream;
-};
-
-TEST_F(KeyWalk, WalksTheKeysOfARangeOfIndices)
+// Ranges of times are the twin's matter.
+TEST_F(Lookup, WalksTheKeysOfARangeOfIndices)
 {
+    TestStream stream, constant({.noKeys = true});
+    stream.Key(10, {1.0}).Key(20, {2.0}).Key(30, {3.0});
+    constant.Key(15, {1.0});
     struct Row {
+        KFS_Stream* stream;
         int first, last, code;
         std::vector<int> times;
         int lastIndex;
-    };
-    Row const rows[] = {
-        {0, 2, 0, {10, 20, 30}, 2},
-        {2, 0, 0, {30, 20, 10}, 0},
-        {1, 1, 0, {20}, 1},
-        {0, 3, SEQ_Err_BadIndex, {}, KFS_INVALID_INDEX},
-        {-1, 1, SEQ_Err_BadIndex, {}, KFS_INVALID_INDEX},
+    } const rows[] = {
+        {stream, 0, 2, 0, {10, 20, 30}, 2},
+        {stream, 2, 0, 0, {30, 20, 10}, 0},
+        {stream, 1, 1, 0, {20}, 1},
+        {stream, 0, 3, SEQ_Err_BadIndex, {}, KFS_INVALID_INDEX},
+        {stream, -1, 1, SEQ_Err_BadIndex, {}, KFS_INVALID_INDEX},
+        {constant, 5, 9, 0, {15}, 0},
     };
     for (Row const& row : rows) {
         SCOPED_TRACE(testing::Message() << row.first << " to " << row.last);
         Visitor visitor;
         int lastIndex = 77;
-        EXPECT_EQ(row.code, KFS_ForIndexRange(stream, row.first, row.last, visitor.Word(), Visitor::Visit, &lastIndex));
+        EXPECT_EQ(row.code,
+                  KFS_ForIndexRange(row.stream, row.first, row.last, visitor.Word(), Visitor::Visit, &lastIndex));
         EXPECT_EQ(row.times, visitor.times);
         EXPECT_EQ(row.lastIndex, lastIndex);
+        if (row.stream == constant) EXPECT_EQ(std::vector{KFS_INVALID_INDEX}, visitor.indices);
     }
-}
-
-TEST_F(KeyWalk, TheFunctionEndsTheWalk)
-{
     for (auto const& [answer, code] : {std::pair{4711, 4711}, {-1, 815}, {-2, static_cast<int>(Q_Err_Exception)}}) {
         SCOPED_TRACE(code);
         Visitor visitor;
@@ -203,22 +184,6 @@ TEST_F(KeyWalk, TheFunctionEndsTheWalk)
         EXPECT_EQ(0, stream.Pins());
         EXPECT_EQ(answer == -2 ? 2u : 0u, reports.Take().size());
     }
-}
-
-TEST_F(KeyWalk, AConstantIsOneKeyWithoutAnIndex)
-{
-    TestStream constant({.noKeys = true});
-    constant.Key(15, {1.0});
-    Visitor visitor;
-    T_Time lastTime{77, 77};
-    T_Time const early{-99, 600};
-    EXPECT_EQ(0, KFS_ForRange(constant, &early, &early, visitor.Word(), Visitor::Visit, &lastTime));
-    EXPECT_EQ(15, lastTime.value);
-    int lastIndex = 77;
-    EXPECT_EQ(0, KFS_ForIndexRange(constant, 5, 9, visitor.Word(), Visitor::Visit, &lastIndex));
-    EXPECT_EQ(0, lastIndex);
-    EXPECT_EQ((std::vector{15, 15}), visitor.times);
-    EXPECT_EQ((std::vector{KFS_INVALID_INDEX, KFS_INVALID_INDEX}), visitor.indices);
 }
 
 // ---- what a look-up brings up to date
@@ -292,23 +257,6 @@ TEST_F(Updates, AFailedUpdateIsTheResultWhereNoKeyStandsAndIsOverAfterIt)
         }
         EXPECT_GT(failures, 0);
     }
-}
-
-TEST_F(Updates, ARenderAsksItsOwnKeys)
-{
-    TestStream constant({.noKeys = true});
-    constant.Key(5, {1.0});
-    {
-        Q_ScSetCurrentRenderContext const current(kfshost::MakeRenderContext(true));
-        int index = 77;
-        T_Time const at = constant.Time(99);
-        EXPECT_EQ(0, KFS_GetKeyIndex(constant, &at, &index, nullptr));
-        EXPECT_EQ(99, constant->GetCache()->time);
-        EXPECT_EQ(3, At(300));
-        EXPECT_FALSE(IsStale());
-    }
-    EXPECT_EQ(5, constant->GetCache()->time);
-    EXPECT_TRUE(IsStale());
 }
 
 }  // namespace

@@ -20,8 +20,7 @@ TEST_F(Queries, AnimatedMeansKeysOrAnExpressionThatRuns)
         unsigned flags;
         char const* error;
         bool active, any;
-    };
-    Row const rows[] = {
+    } const rows[] = {
         {"nothing", "", 0, "", false, false},
         {"an expression", "time", 0, "", true, true},
         {"switched off", "time", KFS_ExprFlag_Disabled, "", false, true},
@@ -91,9 +90,8 @@ TEST_F(Queries, SameHoldSameValue)
     struct Row {
         int a, b;
         bool same;
-    };
-    Row const rows[] = {{10, 19, true},  {19, 20, false}, {5, 10, true}, {-99, 5, true},
-                        {30, 999, true}, {5, 25, false},  {20, 20, true}};
+    } const rows[] = {{10, 19, true},  {19, 20, false}, {5, 10, true}, {-99, 5, true},
+                      {30, 999, true}, {5, 25, false},  {20, 20, true}};
     TestStream curve;
     curve.Key(10, {1.0}).Key(20, {1.0});
     for (Row const& row : rows) {
@@ -170,8 +168,7 @@ TEST_F(Queries, LimitsComeFromTheParameterRecord)
         int kind;
         double min, max, uiMin, uiMax;
         int precision;
-    };
-    Row const rows[] = {
+    } const rows[] = {
         {FX_Param_INT_SLIDER, -5.0, 6.0, -2.0, 3.0, 0},  {FX_Param_FIXED_SLIDER, -1.5, 1.5, -1.0, 0.5, 2},
         {FX_Param_FIXED_ANGLE, -1.0, 2.0, -1.0, 2.0, 0}, {FX_Param_BOOL, 0.0, 1.0, 0.0, 1.0, 0},
         {FX_Param_CHOICE, 1.0, 5.0, 1.0, 5.0, 0},        {FX_Param_FLOAT_SLIDER, -0.5, 8.25, 0.0, 1.0, 3},
@@ -216,29 +213,22 @@ TEST_F(Queries, ALegalValueLiesWithinTheLimitsThatThereAre)
 {
     constexpr double nan = std::numeric_limits<double>::quiet_NaN();
     constexpr double infinity = std::numeric_limits<double>::infinity();
-    for (bool const hasMin : {false, true}) {
-        for (bool const hasMax : {false, true}) {
-            SCOPED_TRACE(testing::Message() << hasMin << hasMax);
-            LimitedStream stream(5, hasMin, hasMax);
-            stream.SetParamDef(MakeDef(FX_Param_FLOAT_SLIDER));
-            std::vector<double> const values{-7.0, 2.0, 8.25, 99.0, infinity};
-            std::vector<double> const legal{hasMin ? -0.5 : -7.0, 2.0, 8.25, hasMax ? 8.25 : 99.0,
-                                            hasMax ? 8.25 : infinity};
-            std::vector<double> result = values;
-            stream.LegalizeValue(result.data());
-            EXPECT_EQ(legal, result);
-            std::vector<double> nans(5, nan);
-            stream.LegalizeValue(nans.data());
-            for (double const number : nans)
-                EXPECT_TRUE(hasMin || hasMax ? number == (hasMin ? -0.5 : 8.25) : std::isnan(number))
-                    << "a NaN is a limit";
-            stream.DisableLegalizeValue(true);
-            stream.DisableLegalizeValue(true);
-            stream.DisableLegalizeValue(false);
-            result = values;
-            stream.LegalizeValue(result.data());
-            EXPECT_EQ(values, result) << "disabled twice, enabled once";
-        }
+    for (int const limits : {0, 1, 2, 3}) {
+        SCOPED_TRACE(limits);
+        bool const hasMin = limits & 1, hasMax = limits & 2;
+        LimitedStream stream(5, hasMin, hasMax);
+        stream.SetParamDef(MakeDef(FX_Param_FLOAT_SLIDER));
+        auto const legalized = [&](std::vector<double> values) {
+            stream.LegalizeValue(values.data());
+            return values;
+        };
+        std::vector<double> const values{-7.0, 2.0, 8.25, 99.0, infinity};
+        EXPECT_EQ((std::vector{hasMin ? -0.5 : -7.0, 2.0, 8.25, hasMax ? 8.25 : 99.0, hasMax ? 8.25 : infinity}),
+                  legalized(values));
+        for (double const number : legalized(std::vector<double>(5, nan)))
+            EXPECT_TRUE(limits != 0 ? number == (hasMin ? -0.5 : 8.25) : std::isnan(number)) << "a NaN is a limit";
+        for (bool const disable : {true, true, false}) stream.DisableLegalizeValue(disable);
+        EXPECT_EQ(values, legalized(values)) << "disabled twice, enabled once";
     }
 }
 
@@ -252,8 +242,7 @@ TEST_F(Queries, UnitsAndComponentsHaveNames)
         unsigned short displayFlags;
         char const* units;
         std::vector<char const*> components;
-    };
-    Row const rows[] = {
+    } const rows[] = {
         {FX_Param_FIXED_ANGLE, 1, 0, 0, "degrees", {"", ""}},
         {FX_Param_POINT_2D, 2, 0, 0, "pixels", {"X", "Y", "Z", "", ""}},
         {FX_Param_POINT_3D, 3, 0, 0, "pixels", {"X", "Y", "Z", ""}},

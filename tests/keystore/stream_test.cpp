@@ -42,8 +42,7 @@ TEST_F(Streams, ConstructionSetsWhatItsArgumentsAskFor)
         unsigned short spInterpMask;
         unsigned short flags;
         unsigned short spInterp;
-    };
-    Row const rows[] = {
+    } const rows[] = {
         {1, false, 8, 0, 0},
         {2, true, 0, 0x2 | 0x4 | 0x8, 0},
         {3, true, 8, 0x2 | 0x4 | 0x8, 3},
@@ -70,10 +69,11 @@ TEST_F(Streams, ConstructionRefusesWhatCannotBe)
         int code;
         short dimension;
         KFS_ValueDesc desc;
-    } const rows[] = {{7433, 1, Plain(10)},    {7433, 1, Plain(127)}, {7433, -1, doubles},
-                      {0, 818, doubles},       {7433, 820, doubles},  // a record of 32808 bytes
-                      {7433, 1, Custom(40000)}};
-    for (Row const& row : rows) EXPECT_EQ(row.code, ConstructionCode(row.dimension, false, 7, 0, row.desc));
+        bool spatial = false;
+    } const rows[] = {{7433, 1, Plain(10)},     {7433, 1, Plain(127)},       {7433, -1, doubles},
+                      {0, 818, doubles},        {7433, 820, doubles},  // a record of 32808 bytes
+                      {0, 1361, doubles, true}, {7433, 1363, doubles, true}, {7433, 1, Custom(40000)}};
+    for (Row const& row : rows) EXPECT_EQ(row.code, ConstructionCode(row.dimension, row.spatial, 7, 0, row.desc));
     EXPECT_NO_REPORT(reports);
     // Automatic tangents are code 3, whose permit is the hold bit of the temporal mask.
     EXPECT_EQ(7431, ConstructionCode(2, true, KFS_InterpMask_Linear | KFS_InterpMask_Spline, 8, doubles));
