@@ -14,6 +14,7 @@
 
 #include <boost/make_shared.hpp>
 
+#include <map>
 #include <memory>
 #include <random>
 #include <vector>
@@ -42,6 +43,10 @@ KFS_MatchName LeafName()
 KFS_MatchName RootName()
 {
     return {"Bench Overridden Root", true};
+}
+KFS_MatchName TopName()
+{
+    return {"Bench Overridden Top", true};
 }
 
 // A leaf with a vector, as identities want one.
@@ -73,6 +78,22 @@ public:
     }
 };
 
+// Of groups like that.
+class Top final : public KFS_IndexedStreamGroup {
+public:
+    Top(KFS_MatchName const& name, KFS_StreamFactory* factory, bool canonical)
+        : KFS_IndexedStreamGroup(&name, factory, canonical)
+    {}
+    KFS_StreamBase* CloneStream(KFS_CloneStreamParams const&) const override
+    {
+        return new Top(TopName(), GetFactory(), false);
+    }
+    void FillCanonicalLayout(KFS_CanonicalLayout* layout) override
+    {
+        layout->push_back(GetFactory()->GetCanonicalStream(RootName()));
+    }
+};
+
 void Register()
 {
     Library();
@@ -89,14 +110,25 @@ void Register()
             return new Root(name, of, canonical);
         },
         false);
+    factory->RegisterFactoryFunc(
+        TopName(),
+        [](KFS_MatchName const& name, KFS_StreamFactory* of, bool, unsigned int, bool canonical) {
+            return new Top(name, of, canonical);
+        },
+        false);
+}
+
+void RegisterOnce()
+{
+    static bool const registered = (Register(), true);
+    benchmark::DoNotOptimize(registered);
 }
 
 // Streams of one tree, and a bag that names the last few of them.
 struct Fixture {
     explicit Fixture(int streams, int named)
     {
-        static bool const registered = (Register(), true);
-        benchmark::DoNotOptimize(registered);
+        RegisterOnce();
         root = std::make_unique<Root>(RootName(), Get_VX_StreamFactory(), false);
         std::mt19937 random(42);
         std::uniform_real_distribution<double> value(-100.0, 100.0);
@@ -154,14 +186,26 @@ void UnnamedYardstick(benchmark::State& state)
 BENCHMARK(UnnamedOurs)->Name("read_bag_of_others/ours");
 BENCHMARK(UnnamedYardstick)->Name("read_bag_of_others/yardstick");
 
-// Overridden: the keys are followed all the same, and the number is another one.
+// Overridden: the keys are followed all the same, and the number is another one. Beside a read and a look-up in a map of
+// as many identifiers.
 void NamedOurs(benchmark::State& state)
 {
     Read(state, Bagged().leaves.back(), &Bagged().bag);
 }
 void NamedYardstick(benchmark::State& state)
 {
-    Read(state, Bagged().leaves.back(), nullptr);
+    std::map<u16str, double> numbers;
+    Fixture const& fixture = Bagged();
+    for (std::size_t n = 0; n < 16; ++n) numbers[fixture.leaves[1 + n]->GetStreamCapsuleData().id] = 1.0;
+    Leaf const* const leaf = fixture.leaves.back();
+    double value = 0.0;
+    std::size_t i = 0;
+    for (auto _ : state) {
+        T_Time const at{fixture.times[i++ % Asked], Scale};
+        benchmark::DoNotOptimize(KFS_GetValueFPlus(leaf, &at, 0, &value, nullptr, nullptr));
+        benchmark::DoNotOptimize(value);
+        benchmark::DoNotOptimize(numbers.find(leaf->GetStreamCapsuleData().id));
+    }
 }
 BENCHMARK(NamedOurs)->Name("read_overridden/ours");
 BENCHMARK(NamedYardstick)->Name("read_overridden/yardstick");
@@ -223,6 +267,91 @@ void IdentityYardstick(benchmark::State& state)
         benchmark::DoNotOptimize(whole.GetGuid());
     }
 }
+// ---- the identity of a big tree at a moment: constants, but for one leaf in a hundred that has keys
+
+struct BigTree {
+    BigTree()
+    {
+        RegisterOnce();
+        top = std::make_unique<Top>(TopName(), Get_VX_StreamFactory(), false);
+        for (int g = 0; g < 1000; ++g) {
+            Q_ScAutoPtr<KFS_StreamBase> made(new Root(RootName(), Get_VX_StreamFactory(), false));
+            auto* const group = static_cast<Root*>(made.get());
+            top->AppendStream(&made);
+            for (int i = 0; i < 99; ++i) Append(group, i == g % 99);
+        }
+    }
+    void Append(Root* group, bool animated)
+    {
+        Q_ScAutoPtr<KFS_StreamBase> made(new Leaf(LeafName(), Get_VX_StreamFactory(), !animated, Scale, false));
+        auto* const leaf = static_cast<Leaf*>(made.get());
+        group->AppendStream(&made);
+        for (int key = 0; key < (animated ? 5 : 1); ++key) {
+            T_Time const at{key * 30 * Gap, Scale};
+            double const number = 7.0 * static_cast<double>(leaves.size() % 13) + key;
+            Must(KFS_InsertKeyF(leaf, &at, 1, &number, KFS_Interp_Spline, KFS_Interp_Spline));
+        }
+        leaves.push_back(leaf);
+        if (animated) edited.push_back(leaf);
+    }
+
+    std::unique_ptr<Top> top;
+    std::vector<Leaf*> leaves;
+    std::vector<Leaf*> edited;
+};
+
+BigTree const& Big()
+{
+    static BigTree const* const tree = new BigTree;
+    return *tree;
+}
+
+void EditOne()
+{
+    static int turn = 0;
+    double const number = ++turn;
+    std::vector<Leaf*> const& edited = Big().edited;
+    Must(KFS_SetKeyF(edited[static_cast<std::size_t>(turn) % edited.size()], 1, &number, 0, 0));
+}
+
+void BigIdentityOurs(benchmark::State& state)
+{
+    BigTree const& tree = Big();
+    Frame const frame;
+    for (auto _ : state) {
+        EditOne();
+        benchmark::DoNotOptimize(tree.top->GetRenderGuid(frame, nullptr));
+    }
+}
+// The same bytes in one pass, and the reads.
+void BigIdentityYardstick(benchmark::State& state)
+{
+    BigTree const& tree = Big();
+    constexpr std::size_t NameBytes = 21;
+    constexpr std::size_t KeysOfSpan = 2;
+    std::vector<unsigned char> const bytes(
+        tree.leaves.size() * (NameBytes + 8 + 16) + tree.edited.size() * (KeysOfSpan * KeyBytes - 8), 7);
+    for (auto _ : state) {
+        EditOne();
+        double value = 0.0;
+        for (Leaf const* const leaf : tree.leaves) {
+            T_Time const at{50 * Gap + Gap / 2, Scale};
+            benchmark::DoNotOptimize(KFS_GetValueFPlus(leaf, &at, 0, &value, nullptr, nullptr));
+            benchmark::DoNotOptimize(value);
+        }
+        for (Leaf const* const leaf : tree.edited) {
+            T_Time const at{30 * Gap, Scale};
+            benchmark::DoNotOptimize(KFS_GetValueFPlus(leaf, &at, 0, &value, nullptr, nullptr));
+            benchmark::DoNotOptimize(value);
+        }
+        IdentityHash hash;
+        hash.Mix(bytes.data(), bytes.size());
+        benchmark::DoNotOptimize(hash.GetGuid());
+    }
+}
+BENCHMARK(BigIdentityOurs)->Name("identity_of_100000_nodes/ours");
+BENCHMARK(BigIdentityYardstick)->Name("identity_of_100000_nodes/yardstick");
+
 BENCHMARK(IdentityOurs)->Name("identity_of_100_leaves/ours");
 BENCHMARK(IdentityYardstick)->Name("identity_of_100_leaves/yardstick");
 

@@ -31,5 +31,6 @@ extern Command const SaveAsCommand;
 extern Command const DragCommand;
 extern Command const DumpCommand;
 extern Command const DiffCommand;
+extern Command const IdentityCommand;
 extern Command const SeparateCommand;
 extern Command const JoinCommand;

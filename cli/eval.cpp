@@ -2,9 +2,10 @@
 #include "cli/errors.h"
 #include "cli/options.h"
 #include "cli/output.h"
+#include "cli/overridewords.h"
 #include "cli/rates.h"
+#include "cli/sampletimes.h"
 #include "cli/table.h"
-#include "host/framegrid.h"
 #include "host/rotations.h"
 
 #include <fmt/format.h>
@@ -19,63 +20,27 @@ using kfshost::StreamItem;
 namespace {
 
 // More than anybody reads.
-constexpr std::int64_t MaxSamples = 1'000'000;
 constexpr std::size_t MaxNumbers = 50'000'000;
 
 enum class Format { Table, Csv, Json };
 
 struct Options {
     Selection selection;
-    std::string from;   // empty: the frame at or before the first key
-    std::string to;     // empty: the frame at or after the last key
-    std::string fps;    // empty: the rate of the keys
+    SampleWords times;
+    OverrideWords overrides;
     bool raw = false;   // the stored components of rotations, not normalised
     bool rate = false;  // rates of change in place of values
     std::string euler;  // rotations as angles about the axes in this order; empty: as quaternions
     Format format = Format::Table;
 };
 
-// The frame at or before a time.
-std::int64_t FrameBefore(Rational const& seconds, Rational const& fps)
-{
-    Rational const frames = seconds * fps;
-    std::int64_t const quotient = frames.Numerator() / frames.Denominator();
-    return frames < Rational(quotient, 1) ? quotient - 1 : quotient;
-}
-
-// Whole frames from the one at or before the first key to the one at or after the last, so that both poses are in. What
-// is asked for begins at the time that is asked for.
-std::vector<Rational> SampleTimes(Options const& options, Rational const& fps, std::optional<TimeSpan> const& span)
-{
-    TimeSpan const keys = span.value_or(TimeSpan{});
-    Rational const from = options.from.empty()
-                              ? Fitting("--fps", [&] { return Rational(FrameBefore(keys.first, fps), 1) / fps; })
-                              : ParseTime(options.from, "--from", fps);
-    Rational const to = options.to.empty() ? std::max(keys.last, from) : ParseTime(options.to, "--to", fps);
-    if (options.to.empty() && span && from > keys.last) {
-        throw UserError("--from", TimeText(from) + " s is after the last key, " + TimeText(keys.last) +
-                                      " s; --to says how far to go then");
-    }
-    if (to < from) throw UserError("--to", TimeText(to) + " s is before --from, " + TimeText(from) + " s");
-    Rational const length = Fitting(
-        options.from.empty() ? "--to" : "--from", [&] { return to - from; });
-    Rational const steps = Fitting("--fps", [&] { return length * fps; });
-    bool const isBetween = options.to.empty() && steps.Denominator() != 1;
-    std::int64_t const last = FrameBefore(length, fps) + (isBetween ? 1 : 0);
-    if (last >= MaxSamples) {
-        throw UserError("--fps", fmt::format("asks for more than {} times from {} s to {} s", MaxSamples,
-                                             TimeText(from), TimeText(to)));
-    }
-    std::vector<Rational> times;
-    for (std::int64_t i = 0; i <= last; ++i)
-        times.push_back(Fitting("--fps", [&] { return from + Rational(i, 1) / fps; }));
-    return times;
-}
-
 // What is printed of a stream: its components, or what they mean where they are a rotation's, or their rates.
 class Shown {
 public:
-    Shown(StreamItem const& item, Options const& options) : item_(&item), components_(item.components)
+    Shown(StreamItem const& item, Options const& options, KFS_ParamBag const* bag)
+        : item_(&item),
+          bag_(bag),
+          components_(item.components)
     {
         isRotation_ = kfshost::IsRotation(item) && !options.raw;
         if (options.rate) {
@@ -99,7 +64,7 @@ public:
     std::vector<double> const& Read(Rational const& time)
     {
         if (rates_) return rates_->At(time.ToUnits(item_->stream->GetTimeScale()));
-        kfshost::ReadAt(*item_->stream, time, stored_.data());
+        kfshost::ReadAt(*item_->stream, time, stored_.data(), bag_);
         if (isRotation_) kfshost::Normalise(stored_.data());
         if (order_)
             kfshost::ToEuler(stored_.data(), *order_, row_.data());
@@ -110,6 +75,7 @@ public:
 
 private:
     StreamItem const* item_;
+    KFS_ParamBag const* bag_;
     std::vector<std::string> components_;
     bool isRotation_ = false;
     std::optional<kfshost::EulerOrder> order_;
@@ -135,25 +101,6 @@ void TryAll(Evaluation& evaluation)
         if (stream.HasKeys())
             for (Rational const& time : evaluation.times) stream.Read(time);
 }
-
-// Text on its way to the standard output, in large pieces.
-class Output {
-public:
-    void Add(std::string_view text)
-    {
-        text_ += text;
-        constexpr std::size_t piece = 1 << 16;
-        if (text_.size() >= piece) Flush();
-    }
-    void Flush()
-    {
-        WriteToStandardOutput(text_);
-        text_.clear();
-    }
-
-private:
-    std::string text_;
-};
 
 std::vector<std::string> TableRow(Evaluation const& evaluation, std::size_t index, Shown& stream)
 {
@@ -186,17 +133,6 @@ void WriteTables(Evaluation& evaluation, Output& output)
     }
 }
 
-std::string CsvCell(std::string const& text)
-{
-    if (text.find_first_of(",\"") == std::string::npos) return text;
-    std::string quoted = "\"";
-    for (char const c : text) {
-        quoted += c;
-        if (c == '"') quoted += c;
-    }
-    return quoted + '"';
-}
-
 void WriteCsv(Evaluation& evaluation, Output& output)
 {
     output.Add("frame,seconds");
@@ -215,11 +151,7 @@ void WriteCsv(Evaluation& evaluation, Output& output)
     }
 }
 
-std::string Quoted(std::string_view text)
-{
-    return nlohmann::json(text).dump();
-}
-
+// A fraction as JSON.
 std::string Pair(Rational const& number)
 {
     return fmt::format("[{},{}]", number.Numerator(), number.Denominator());
@@ -270,26 +202,10 @@ void TellRounding(Evaluation const& evaluation, std::optional<TimeSpan> const& s
     }
 }
 
-// Keys that aren't on the frames at which values are shown, where nobody asked for those frames.
-void TellStrangers(kfshost::FrameGrid const& grid, Selection const& selection)
-{
-    if (grid.offGrid == 0) return;
-    TellAbout(selection.file,
-              fmt::format("{} of {} aren't frames of {} a second, but up to {:.2g} of a frame beside "
-                          "them; --fps asks for another rate",
-                          grid.offGrid, Plural(grid.times, "key time", "key times"), grid.rate.ToString(), grid.worst));
-}
-
-// The rate of the keys.
-Rational FindFps(Options const& options, std::vector<StreamItem const*> const& items)
-{
-    kfshost::FrameGrid const grid = kfshost::FindFrameGrid(items);
-    TellStrangers(grid, options.selection);
-    return grid.rate;
-}
-
 void CheckOptions(Options const& options)
 {
+    if (options.rate && options.overrides.Any())
+        throw UserError("--rate", "tells the rates of keys, so it can't go with overrides");
     if (options.euler.empty()) return;
     if (options.rate)
         throw UserError("--rate", "tells the rates of a rotation's components, so it can't go with --euler");
@@ -301,13 +217,15 @@ void CheckOptions(Options const& options)
 int Run(Options const& options)
 {
     CheckOptions(options);
-    auto const asked = options.fps.empty() ? std::nullopt : std::optional(ParseFps(options.fps));
-    kfshost::Scene const scene = LoadScene(options.selection);
+    auto const asked = AskedFps(options.times);
+    kfshost::Scene const scene =
+        options.overrides.Any() ? LoadSceneInTree(options.selection) : LoadScene(options.selection);
+    Overrides const overrides(scene, options.selection, options.overrides);
     auto const items = SelectStreams(scene, options.selection);
     auto const span = SpanOf(items);
-    Rational const fps = asked ? *asked : FindFps(options, items);
-    Evaluation evaluation{fps, SampleTimes(options, fps, span), {}};
-    for (StreamItem const* item : items) evaluation.streams.emplace_back(*item, options);
+    Rational const fps = asked ? *asked : FindFps(items, options.selection);
+    Evaluation evaluation{fps, SampleTimes(options.times, fps, span), {}};
+    for (StreamItem const* item : items) evaluation.streams.emplace_back(*item, options, overrides.Bag());
     TryAll(evaluation);
     TellRounding(evaluation, span, options.selection);
     Output output;
@@ -329,13 +247,8 @@ Work Prepare(CLI::App& command)
 {
     auto const options = std::make_shared<Options>();
     AddSelection(command, options->selection);
-    command
-        .add_option("--from", options->from,
-                    "first time: seconds like 0.5 or 1/24, or frames like 12f (default: the frame of the first key)")
-        ->type_name("TIME");
-    command.add_option("--to", options->to, "last time (default: the frame of the last key)")->type_name("TIME");
-    command.add_option("--fps", options->fps, "samples a second, like 24 or 30000/1001 (default: the keys' rate)")
-        ->type_name("RATE");
+    AddSampleWords(command, options->times);
+    AddOverrideWords(command, options->overrides);
     command.add_flag("--raw", options->raw, "rotations as they are stored, of any length (default: of length 1)");
     command.add_flag("--rate", options->rate,
                      "how fast values change, in their units a second: behind a key, at the last key before it");

@@ -9,8 +9,9 @@
 
 namespace {
 
-constexpr Command const* Commands[] = {&InfoCommand, &EvalCommand,   &DiffCommand,     &PlotCommand, &ImportCommand,
-                                       &DragCommand, &SaveAsCommand, &SeparateCommand, &JoinCommand, &DumpCommand};
+constexpr Command const* Commands[] = {&InfoCommand,     &EvalCommand,   &DiffCommand, &IdentityCommand,
+                                       &PlotCommand,     &ImportCommand, &DragCommand, &SaveAsCommand,
+                                       &SeparateCommand, &JoinCommand,   &DumpCommand};
 
 // One line as for any other error, with a hint. What stands where a command should is told by its name.
 std::string TellUsageError(CLI::App const* app, CLI::Error const& error)
@@ -44,9 +45,9 @@ int Run(int argc, char** argv)
         "  kfs import walk.glb -o walk.kfs\n"
         "  kfs drag walk.kfs --stream '*/Hips/translation' --component y --at 12f --to 90 -o higher.kfs\n"
         "\n"
-        "Exit codes: 0 done; 1 diff or dump found something, or a project had to be changed so that it could be\n"
-        "loaded, which lines on the standard error tell; 2 failed. What failed, a command line that isn't\n"
-        "understood included, is one line on the standard error, and nothing is written then.");
+        "Exit codes: 0 done; 1 diff, dump or identity found something, or a project had to be changed so that it\n"
+        "could be loaded, which lines on the standard error tell; 2 failed. What failed, a command line\n"
+        "that isn't understood included, is one line on the standard error, and nothing is written then.");
     try {
         app.parse(argc, argv);
     } catch (CLI::ParseError const& error) {

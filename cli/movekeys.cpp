@@ -19,14 +19,6 @@ struct Options {
     double tolerance = kfshost::AnyError;
 };
 
-// A scene with a tree, in which leaders have followers.
-Scene Load(Selection const& selection)
-{
-    Scene scene = LoadScene(selection);
-    if (scene.tree) return scene;
-    return ReadingFile(selection.file, [&] { return kfshost::TakeScene(kfshost::MakeTree(std::move(scene))); });
-}
-
 std::string TextOf(MoveNotes const& notes, StreamItem const& item)
 {
     std::vector<std::string> parts;
@@ -66,7 +58,7 @@ std::vector<StreamItem const*> ChooseStreams(Scene const& scene, Options const& 
 int Run(Options const& options, Move const& move)
 {
     RefuseToOverwrite(options.selection.file, options.output);
-    Scene const scene = Load(options.selection);
+    Scene const scene = LoadSceneInTree(options.selection);
     auto const chosen = ChooseStreams(scene, options, move);
     std::vector<std::string> told;
     for (StreamItem const* item : chosen) {

@@ -3,6 +3,7 @@
 #include "cli/usererror.h"
 
 #include <fmt/format.h>
+#include <nlohmann/json.hpp>
 
 #include <cerrno>
 #include <cstdio>
@@ -44,6 +45,35 @@ void WriteToStandardOutput(std::string_view text, std::string const& done)
     if (std::fwrite(text.data(), 1, text.size(), stdout) == text.size() && std::fflush(stdout) == 0) return;
     std::string const reason = std::strerror(errno);
     throw UserError("standard output", "can't be written: " + reason + (done.empty() ? "" : " (" + done + ')'));
+}
+
+void Output::Add(std::string_view text)
+{
+    text_ += text;
+    constexpr std::size_t piece = 1 << 16;
+    if (text_.size() >= piece) Flush();
+}
+
+void Output::Flush()
+{
+    WriteToStandardOutput(text_);
+    text_.clear();
+}
+
+std::string CsvCell(std::string const& text)
+{
+    if (text.find_first_of(",\"\n\r") == std::string::npos) return text;
+    std::string quoted = "\"";
+    for (char const c : text) {
+        quoted += c;
+        if (c == '"') quoted += c;
+    }
+    return quoted + '"';
+}
+
+std::string Quoted(std::string_view text)
+{
+    return nlohmann::json(text).dump();
 }
 
 WholeFile::WholeFile(std::string fileName, std::string bytes) : fileName_(std::move(fileName)), bytes_(std::move(bytes))

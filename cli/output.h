@@ -18,6 +18,20 @@ void RefuseToOverwrite(std::string const& input, std::string const& output, char
 // know if that fails. Throws UserError.
 void WriteToStandardOutput(std::string_view text, std::string const& done = "");
 
+// Text on its way to the standard output, in large pieces, so that what is long isn't held in memory.
+class Output {
+public:
+    void Add(std::string_view text);
+    void Flush();
+
+private:
+    std::string text_;
+};
+
+// A text as a cell of CSV, and as JSON.
+std::string CsvCell(std::string const& text);
+std::string Quoted(std::string_view text);
+
 // A whole file, or none: an earlier file of that name is replaced only by a complete one, and not before Commit. Pipes
 // and devices are written to, and "-" is the standard output. Both throw UserError.
 class WholeFile {

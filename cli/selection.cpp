@@ -17,11 +17,6 @@ using kfshost::StreamItem;
 
 namespace {
 
-bool Matches(StreamItem const& item, Selection const& selection)
-{
-    return fnmatch(selection.glob.c_str(), item.path.c_str(), 0) == 0;
-}
-
 void HoldAsPath(StreamItem& item, Selection const& selection)
 {
     if (kfshost::IsSeparated(*item.stream)) {  // a path has no use for dimensions of their own
@@ -50,7 +45,7 @@ void HoldAsPaths(kfshost::Scene& scene, Selection const& selection)
     std::size_t const selected = SelectStreams(scene, selection).size();
     bool any = false;
     for (StreamItem& item : scene.streams) {
-        if (Matches(item, selection) && kfshost::IsPosition(item)) {
+        if (MatchesPath(item, selection.glob) && kfshost::IsPosition(item)) {
             HoldAsPath(item, selection);
             any = true;
         }
@@ -85,11 +80,16 @@ std::string Selection::ShownFile() const
     return kfshost::ShownFileName(file);
 }
 
+bool MatchesPath(StreamItem const& item, std::string const& pattern)
+{
+    return item.path == pattern || fnmatch(pattern.c_str(), item.path.c_str(), 0) == 0;
+}
+
 std::vector<StreamItem const*> SelectStreams(kfshost::Scene const& scene, Selection const& selection)
 {
     std::vector<StreamItem const*> items;
     for (StreamItem const& item : scene.streams)
-        if (Matches(item, selection)) items.push_back(&item);
+        if (MatchesPath(item, selection.glob)) items.push_back(&item);
     if (scene.streams.empty()) throw UserError(selection.ShownFile(), "nothing is animated");
     if (items.empty()) {
         throw UserError(selection.ShownFile(),
@@ -108,6 +108,13 @@ kfshost::Scene LoadScene(Selection const& selection)
         if (selection.asPaths) HoldAsPaths(scene, selection);
         return scene;
     });
+}
+
+kfshost::Scene LoadSceneInTree(Selection const& selection)
+{
+    kfshost::Scene scene = LoadScene(selection);
+    if (scene.tree && !selection.asPaths) return scene;
+    return ReadingFile(selection.file, [&] { return kfshost::TakeScene(kfshost::MakeTree(std::move(scene))); });
 }
 
 std::optional<TimeSpan> SpanOf(std::vector<StreamItem const*> const& items)

@@ -24,6 +24,11 @@ struct Selection {
 // The scene of a selection's file, with paths where the selection asks for them. Throws UserError and what loading
 // throws.
 kfshost::Scene LoadScene(Selection const& selection);
+// The same with all of its streams in a tree, where leaders have followers and streams can be told apart.
+kfshost::Scene LoadSceneInTree(Selection const& selection);
+
+// Whether an item has this path, or one that the pattern matches.
+bool MatchesPath(kfshost::StreamItem const& item, std::string const& pattern);
 
 // The streams whose paths the pattern matches, in the scene's order. Throws UserError when there are none.
 std::vector<kfshost::StreamItem const*> SelectStreams(kfshost::Scene const& scene, Selection const& selection);

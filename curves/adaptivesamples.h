@@ -65,13 +65,29 @@ using KFS_AdaptiveSplitFunc = int(void* refCon, CRV_Curve* curve, SEQ_Head*** pi
                                                               int* count, int* nextIndex,
                                                               KFS_AdaptiveSampleStreamCache* cache);
 
+// What a step does that isn't one inside a segment: finds the segment of x, or that there is none, and answers as the
+// step. For KFS_IterateAdaptiveSampleStream alone.
+[[nodiscard]] KFS_API int KFS_EnterAdaptiveSampleSegment(double x, double step, double* samples, int count,
+                                                         int* nextIndex, KFS_AdaptiveSampleStreamCache* cache,
+                                                         double* slope, double* value);
+
 // The value and the slope at x, which must not fall from call to call; either may be null. Before the first sample and
 // behind the last one their values hold, with slope 0. `step` is what x grows by from here on, and stays the same within
 // a segment. Takes no lock and allocates nothing. Always 0.
-[[nodiscard]] KFS_API int KFS_IterateAdaptiveSampleStream(double x, double step, KFS_AdaptiveSampleStream* stream,
-                                                          double* samples, int count, int* nextIndex,
-                                                          KFS_AdaptiveSampleStreamCache* cache, double* slope,
-                                                          double* value);
+//
+// Inline, since callers do it for each sample of sound: inside a segment it is an addition.
+[[nodiscard]] KFS_API inline int KFS_IterateAdaptiveSampleStream(double x, double step, KFS_AdaptiveSampleStream*,
+                                                                 double* samples, int count, int* nextIndex,
+                                                                 KFS_AdaptiveSampleStreamCache* cache, double* slope,
+                                                                 double* value)
+{
+    if (!(cache->inSegment && cache->x0 <= x && cache->x1 > x)) [[unlikely]]
+        return KFS_EnterAdaptiveSampleSegment(x, step, samples, count, nextIndex, cache, slope, value);
+    cache->value += cache->step;
+    if (slope) *slope = cache->slope;
+    if (value) *value = cache->value;
+    return 0;
+}
 
 // Ends a walk.
 [[nodiscard]] KFS_API int KFS_CompleteIterateAdaptiveSampleStream(KFS_AdaptiveSampleStream* stream);

@@ -34,6 +34,9 @@ int AnswerStill(KFS_AdaptiveSampleStreamCache* cache, double held, double* slope
     return Answer(0.0, held, slope, value);
 }
 
+// Callers that look the function up, or take its address, find it here.
+[[gnu::used]] auto* const theStep = &KFS_IterateAdaptiveSampleStream;
+
 }  // namespace
 
 int KFS_InitIterateAdaptiveSampleStream(KFS_AdaptiveSampleStream* stream, double** samples, int* count, int* nextIndex,
@@ -59,13 +62,9 @@ int KFS_InitIterateAdaptiveSampleStream(KFS_AdaptiveSampleStream* stream, double
     return 0;
 }
 
-int KFS_IterateAdaptiveSampleStream(double x, double step, KFS_AdaptiveSampleStream*, double* samples, int count,
-                                    int* nextIndex, KFS_AdaptiveSampleStreamCache* cache, double* slope, double* value)
+int KFS_EnterAdaptiveSampleSegment(double x, double step, double* samples, int count, int* nextIndex,
+                                   KFS_AdaptiveSampleStreamCache* cache, double* slope, double* value)
 {
-    if (cache->inSegment && cache->x0 <= x && cache->x1 > x) [[likely]] {
-        cache->value += cache->step;
-        return Answer(cache->slope, cache->value, slope, value);
-    }
     CloseIfEmpty(cache);
     for (;;) {
         if (cache->x0 > x) return AnswerStill(cache, cache->y0, slope, value);

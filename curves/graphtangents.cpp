@@ -1,6 +1,5 @@
 // Temporal handles as graph tangents, what curve editors draw. Apart from speeds and influences: the limits differ.
 #include "curves/keyhandles_private.h"
-#include "curves/neighbours_private.h"
 #include "curves/tangents.h"
 #include "keystore/pins_private.h"
 
@@ -13,29 +12,6 @@ namespace {
 constexpr double MinInfluence = 0.0001;  // of a handle that is set as a graph tangent on a plain stream
 constexpr double MaxInfluence = 1.0;
 constexpr double NoDuration = 1e-12;
-
-// The seconds to a key's neighbours, 0 where there is none.
-struct Durations {
-    bool hasPrev = false;
-    bool hasNext = false;
-    double prev = 0.0;
-    double next = 0.0;
-
-    double operator[](KFSp_Side side) const { return side == KFSp_Side::In ? prev : next; }
-};
-
-int GetDurations(KFS_Stream const* stream, int index, KFS_KeyScalar const* key, Durations* durations)
-{
-    if (stream->HasNoKeys()) return 0;
-    KFS_KeyScalar* prev = nullptr;
-    KFS_KeyScalar* next = nullptr;
-    if (int const code = KFSp_GetNeighborsFromIndex(stream, index, 0, &prev, &next, nullptr, nullptr)) return code;
-    durations->hasPrev = prev != nullptr;
-    durations->hasNext = next != nullptr;
-    if (prev) durations->prev = KFSp_Seconds(key->time, prev->time, stream->GetTimeScale());
-    if (next) durations->next = KFSp_Seconds(next->time, key->time, stream->GetTimeScale());
-    return 0;
-}
 
 // A side's graph tangent as a caller gives it.
 struct Given {
@@ -108,8 +84,8 @@ int SetTangents(KFS_Stream* stream, int index, Given const& in, Given const& out
     KFSp_FirstError error;
     {
         KFSp_ScKey const key(stream->GetKeys(), index, error);
-        Durations durations;
-        if (error.None()) error.Keep(GetDurations(stream, index, key.get(), &durations));
+        KFSp_Durations durations;
+        if (error.None()) error.Keep(KFSp_GetDurations(stream, index, key.get(), &durations));
         if (error.None()) {
             bool const spatial = stream->IsSpatial();
             bool const nonDecreasing = spatial && (stream->GetKFSFlags() & KFS_StreamFlag_NonDecreasing) != 0;
@@ -134,17 +110,12 @@ int SetTangents(KFS_Stream* stream, int index, Given const& in, Given const& out
     return error.Code();
 }
 
-void ReadTangent(KFS_Stream const* stream, KFS_KeyScalar const* key, KFSp_Side side, double duration, double* x,
-                 double* y)
+void ReadTangent(KFS_Stream const* stream, KFSp_SideTangent const& tangent, double* x, double* y)
 {
-    KFSp_Handles<double const> const handles = KFSp_GetHandles(stream, key, side);
-    double const direction = side == KFSp_Side::In ? -1.0 : 1.0;
     int const count = KFSp_HandleArraySize(stream);
     for (int i = 0; i < count; ++i) {
-        bool const stored = i < handles.count;
-        double const dx = stored ? direction * handles.influence[i] * duration : 0.0;
-        if (x) x[i] = dx;
-        if (y) y[i] = stored ? handles.speed[i] * dx : 0.0;
+        if (x) x[i] = tangent.X(i);
+        if (y) y[i] = tangent.Y(i);
     }
 }
 
@@ -166,10 +137,10 @@ int GetKeyTangents(KFS_Stream const* stream, int index, double* inX, double* inY
     if (int const code = stream->UpdateStreamIfStaleTangents(index)) return code;
     KFS_KeyScalar* key = nullptr;
     if (int const code = KFSp_GetHandleKey(stream, stream->GetKeyData(), index, &key)) return code;
-    Durations durations;
-    if (int const code = GetDurations(stream, index, key, &durations)) return code;
-    ReadTangent(stream, key, KFSp_Side::In, durations.prev, inX, inY);
-    ReadTangent(stream, key, KFSp_Side::Out, durations.next, outX, outY);
+    KFSp_Durations durations;
+    if (int const code = KFSp_GetDurations(stream, index, key, &durations)) return code;
+    ReadTangent(stream, {stream, key, KFSp_Side::In, durations}, inX, inY);
+    ReadTangent(stream, {stream, key, KFSp_Side::Out, durations}, outX, outY);
     return 0;
 }
 

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "curves/neighbours_private.h"
 #include "frame/boundary_private.h"
 #include "frame/report_private.h"
 #include "keystore/cache_private.h"
@@ -75,6 +76,50 @@ struct KFSp_Refusal {
     if (index < 0) return SEQ_Err_BadIndex;
     return KFSp_GetKey(data, index, key);
 }
+
+// The seconds to a key's neighbours, 0 where there is none.
+struct KFSp_Durations {
+    bool hasPrev = false;
+    bool hasNext = false;
+    double prev = 0.0;
+    double next = 0.0;
+
+    double operator[](KFSp_Side side) const { return side == KFSp_Side::In ? prev : next; }
+};
+
+[[nodiscard]] inline int KFSp_GetDurations(KFS_Stream const* stream, int index, KFS_KeyScalar const* key,
+                                           KFSp_Durations* durations)
+{
+    if (stream->HasNoKeys()) return 0;
+    KFS_KeyScalar* prev = nullptr;
+    KFS_KeyScalar* next = nullptr;
+    if (int const code = KFSp_GetNeighborsFromIndex(stream, index, 0, &prev, &next, nullptr, nullptr)) return code;
+    durations->hasPrev = prev != nullptr;
+    durations->hasNext = next != nullptr;
+    if (prev) durations->prev = KFSp_Seconds(key->time, prev->time, stream->GetTimeScale());
+    if (next) durations->next = KFSp_Seconds(next->time, key->time, stream->GetTimeScale());
+    return 0;
+}
+
+// A side's handles as graph tangents: offsets from the key in seconds and in value. Components without a handle of their own
+// have none.
+class KFSp_SideTangent {
+public:
+    KFSp_SideTangent(KFS_Stream const* stream, KFS_KeyScalar const* key, KFSp_Side side,
+                     KFSp_Durations const& durations)
+        : handles_(KFSp_GetHandles(stream, key, side)),
+          direction_(side == KFSp_Side::In ? -1.0 : 1.0),
+          duration_(durations[side])
+    {}
+
+    double X(int i) const { return i < handles_.count ? direction_ * handles_.influence[i] * duration_ : 0.0; }
+    double Y(int i) const { return i < handles_.count ? handles_.speed[i] * X(i) : 0.0; }
+
+private:
+    KFSp_Handles<double const> handles_;
+    double direction_;
+    double duration_;
+};
 
 // The slopes of the straight line from key to key, one for each component of a plain value.
 inline void KFSp_FillSlopes(KFS_Stream const* stream, KFS_KeyScalar const* from, KFS_KeyScalar const* to,

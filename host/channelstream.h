@@ -32,6 +32,8 @@ public:
     KFS_StreamBase* CloneStream(KFS_CloneStreamParams const& params) const override;
     // True: a leaf that is real belongs to an animation, and is saved with what is known of it, at whatever value.
     bool IsStaticValueModified() const override { return true; }
+    // Nothing is read of a leaf without a value.
+    bool AffectsRendering(KFS_RenderOptionsBase const&) const override { return GetKeyCount() != 0; }
     bool HasMinValue() const override;
     bool HasMaxValue() const override;
     bool IsSeparationLeader() const override;

@@ -84,10 +84,10 @@ Rational KeyTime(KFS_Stream const& stream, int index)
     return {time.value, time.scale};
 }
 
-void ReadAt(KFS_Stream const& stream, Rational const& seconds, double* values)
+void ReadAt(KFS_Stream const& stream, Rational const& seconds, double* values, KFS_ParamBag const* bag)
 {
     T_Time const time{seconds.ToUnits(stream.GetTimeScale()), stream.GetTimeScale()};
-    ThrowIfFailed(KFS_GetValueFPlus(&stream, &time, 0, values, nullptr, nullptr));
+    ThrowIfFailed(KFS_GetValueFPlus(&stream, &time, 0, values, nullptr, bag));
 }
 
 }  // namespace kfshost

@@ -84,7 +84,7 @@ Rational KeyTime(KFS_Stream const& stream, int index);
 
 // The value of a stream at a time in seconds, into `dimension` doubles. Times beyond what the stream's 32-bit time line
 // holds are held at its ends, where a stream's value is constant anyway. Throws StoreError, with KFS_Err_NoKeys for a
-// stream without keys. Threads: as KFS_GetValueFPlus.
-void ReadAt(KFS_Stream const& stream, Rational const& seconds, double* values);
+// stream without keys. `bag`: overrides, may be null. Threads: as KFS_GetValueFPlus.
+void ReadAt(KFS_Stream const& stream, Rational const& seconds, double* values, KFS_ParamBag const* bag = nullptr);
 
 }  // namespace kfshost

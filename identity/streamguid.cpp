@@ -1,9 +1,9 @@
 // The render identity of a leaf: its value over the span, or the keys that shape it there. What can't change the span
 // stays out, since every needless change throws a rendered frame away.
 
+#include "curves/keyhandles_private.h"
 #include "curves/neighbours_private.h"
 #include "curves/spacetangents.h"
-#include "curves/tangents.h"
 #include "frame/boundary_private.h"
 #include "frame/services/reports.h"
 #include "identity/mixin_private.h"
@@ -23,6 +23,8 @@
 #include <array>
 #include <climits>
 #include <cmath>
+#include <cstring>
+#include <numeric>
 
 using hearth::utility::Guid;
 
@@ -46,7 +48,8 @@ using Numbers = boost::container::small_vector<double, 4>;
 struct Asked {
     KFS_Stream const* stream;
     KFS_Stream const* source;
-    T_TimeSpan span;  // on the source's time line
+    KFS_StreamKeyData const* data;  // the source's
+    T_TimeSpan span;                // on the source's time line
     KFS_ParamBag const* bag;
     bool filtered;
 };
@@ -82,66 +85,99 @@ bool IsLive(Numbers const& tangent)
         [](double number) { return number > -HandleEpsilon && number < HandleEpsilon; });
 }
 
-void MixInNumbers(KFSp_IdentityHash& hash, Numbers const& numbers, std::size_t count)
-{
-    hash.Mix(numbers.data(), count * sizeof(double));
-}
+// Gathers the many small numbers that describe a key, so that the hash is fed seldom: how its bytes are cut makes no
+// difference to it. Fed before a stream mixes in its value, and in the end.
+class Gathered {
+public:
+    explicit Gathered(KFSp_IdentityHash& hash) : hash_(hash) {}
 
-void MixInReduced(KFSp_IdentityHash& hash, T_Time const& time)
+    KFSp_IdentityHash& Fed()
+    {
+        hash_.Mix(bytes_.data(), size_);
+        size_ = 0;
+        return hash_;
+    }
+    template <class Number>
+    void Put(Number number)
+    {
+        if (bytes_.size() - size_ < sizeof number) Fed();
+        std::memcpy(bytes_.data() + size_, &number, sizeof number);
+        size_ += sizeof number;
+    }
+    void Put(T_Time const& time)
+    {
+        Put(time.value);
+        Put(time.scale);
+    }
+
+private:
+    KFSp_IdentityHash& hash_;
+    std::size_t size_ = 0;
+    std::array<unsigned char, 512> bytes_;
+};
+
+// From one time to another, in lowest terms. Most keys have the scale of what is rendered.
+T_Time Distance(T_Time const& from, T_Time const& to)
 {
+    std::int64_t const units = std::int64_t{to.value} - from.value;
+    std::int64_t const size = units < 0 ? -units : units;
+    if (from.scale == to.scale && from.scale != 0 && size <= INT_MAX) {
+        unsigned int const divisor = std::gcd(static_cast<unsigned int>(size), from.scale);
+        int const value = static_cast<int>(size / divisor);
+        return {units < 0 ? -value : value, from.scale / divisor};
+    }
+    T_Time const distance = to - from;
     T_Time reduced{};
-    KFSp_ThrowIf(T_ReduceTime(&time, &reduced, nullptr));
-    hash.MixNumber(reduced.value);
-    hash.MixNumber(reduced.scale);
+    KFSp_ThrowIf(T_ReduceTime(&distance, &reduced, nullptr));
+    return reduced;
 }
 
 // One side of a key: how it is left or reached, and the handles that go with it.
-void MixInSide(KFSp_IdentityHash& hash, KFS_Stream const* stream, int index, bool in)
+void PutSide(Gathered& gathered, Asked const& asked, Key const& key, KFSp_Side side, KFSp_Durations const& durations)
 {
-    KFS_Stream const* const seen = KFSp_Seen(stream);
+    KFS_Stream const* const seen = asked.data->stream;
     bool const spatial = HasSpaceTangents(seen);
-    std::size_t const dimension = static_cast<std::size_t>(std::max<short>(seen->GetDimension(), 0));
-    std::size_t const handles = spatial ? 1 : dimension;
-
-    char inInterp = KFS_Interp_None;
-    char outInterp = KFS_Interp_None;
-    KFSp_ThrowIf(KFS_GetKeyF(stream, index, nullptr, &inInterp, &outInterp));
-    char const interp = in ? inInterp : outInterp;
-    hash.MixNumber(interp);
+    int const dimension = std::max<short>(seen->GetDimension(), 0);
+    char const interp = side == KFSp_Side::In ? key.record->inInterp : key.record->outInterp;
+    gathered.Put(interp);
     if (interp == KFS_Interp_Spline) {
-        Numbers x(dimension, 0.0);
-        Numbers y(dimension, 0.0);
-        KFSp_ThrowIf(in ? KFS_GetKeyTangentsF(stream, index, x.data(), y.data(), nullptr, nullptr)
-                        : KFS_GetKeyTangentsF(stream, index, nullptr, nullptr, x.data(), y.data()));
-        MixInNumbers(hash, x, handles);
-        MixInNumbers(hash, y, handles);
+        KFSp_SideTangent const tangent(seen, key.record, side, durations);
+        int const count = spatial ? 1 : dimension;
+        for (int i = 0; i < count; ++i) gathered.Put(tangent.X(i));
+        for (int i = 0; i < count; ++i) gathered.Put(tangent.Y(i));
     }
     if (!spatial) return;
-    SpaceTangents const tangents(stream, index);
-    Numbers const& tangent = in ? tangents.in : tangents.out;
-    if (IsLive(tangent)) MixInNumbers(hash, tangent, dimension);
+    SpaceTangents const tangents(asked.source, key.index);
+    Numbers const& tangent = side == KFSp_Side::In ? tangents.in : tangents.out;
+    if (!IsLive(tangent)) return;
+    for (int i = 0; i < dimension; ++i) gathered.Put(tangent[static_cast<std::size_t>(i)]);
 }
 
-// The keys from `first` to `last` that are mixed in.
+// The keys from `first` to `last` that are mixed in, and when the span is over.
 struct Range {
     int first;
     int last;
+    T_Time end;
 };
 
 // A key's value, the sides that face the range, and its place in the span unless it is alone. With `valueOnly` it is a
-// neighbour of the range.
-void MixInKey(KFSp_IdentityHash& hash, Asked const& asked, int index, Range const& range, bool valueOnly)
+// neighbour of the range. The stream is up to date, so records are looked at without asking for that key by key.
+void MixInKey(Gathered& gathered, Asked const& asked, int index, Range const& range, bool valueOnly)
 {
-    T_Time time{};
-    KFSp_ThrowIf(KFS_IndexToTime(asked.source, index, &time));
-    asked.stream->MixInValueAtTime(hash, time, asked.bag);
-    if (!valueOnly) {
-        if (index != range.first) MixInSide(hash, asked.source, index, true);
-        if (index != range.last) MixInSide(hash, asked.source, index, false);
-    }
+    Key key{index, nullptr};
+    KFSp_ThrowIf(KFSp_GetConstKey(asked.data, index, &key.record));
+    T_Time const time{key.record->time, asked.data->stream->GetTimeScale()};
+    asked.stream->MixInValueAtTime(gathered.Fed(), time, asked.bag);
     if (range.first == range.last) return;
-    MixInReduced(hash, time - asked.span.start);
-    MixInReduced(hash, asked.span.start + asked.span.duration - time);
+    if (!valueOnly) {
+        KFSp_ThrowIf(KFSp_GetConstKey(asked.data, index, &key.record));  // the host's value may have come by an edit
+        KFSp_Durations durations;
+        KFSp_ThrowIf(KFSp_GetDurations(asked.data->stream, index, key.record, &durations));
+        if (index != range.first) PutSide(gathered, asked, key, KFSp_Side::In, durations);
+        if (index != range.last) PutSide(gathered, asked, key, KFSp_Side::Out, durations);
+    }
+    gathered.Put(Distance(asked.span.start, time));
+    gathered.Put(Distance(time, range.end));
 }
 
 // Whether the key's handles follow from its neighbours.
@@ -203,16 +239,20 @@ void MixInKeys(KFSp_IdentityHash& hash, Asked const& asked)
     KFSp_ThrowIf(
         asked.source->UpdateStream());  // float keys move, and handles change, when they are brought up to date
     Key const first = FindKey(asked.source, asked.span.start, true);
-    Key const last = FindKey(asked.source, asked.span.start + asked.span.duration, false);
-    Range range{first.index, last.index};
+    T_Time const end = asked.span.start + asked.span.duration;
+    Key const last = FindKey(asked.source, end, false);
+    Range range{first.index, last.index, end};
     if (last.index == first.index + 1 && IsFlat(asked, first, last)) range.last = first.index;
-    for (int index = range.first; index <= range.last; ++index) MixInKey(hash, asked, index, range, false);
-    if (range.first >= range.last) return;
-
-    // An automatic handle follows the neighbour beyond.
-    if (first.index > 0 && IsModifiable(asked.source, first)) MixInKey(hash, asked, first.index - 1, range, true);
-    if (last.index + 1 < KFSp_ItemCount(asked.source->GetKeyData()) && IsModifiable(asked.source, last))
-        MixInKey(hash, asked, last.index + 1, range, true);
+    Gathered gathered(hash);
+    for (int index = range.first; index <= range.last; ++index) MixInKey(gathered, asked, index, range, false);
+    if (range.first < range.last) {
+        // An automatic handle follows the neighbour beyond.
+        if (first.index > 0 && IsModifiable(asked.source, first))
+            MixInKey(gathered, asked, first.index - 1, range, true);
+        if (last.index + 1 < KFSp_ItemCount(asked.data) && IsModifiable(asked.source, last))
+            MixInKey(gathered, asked, last.index + 1, range, true);
+    }
+    gathered.Fed();
 }
 
 // What the author of an expression asks for, as a number of samples a second.
@@ -271,12 +311,13 @@ Guid KFS_Stream::GetRenderGuid(KFS_RenderOptionsBase const& options, GetRenderGu
     KFSp_IdentityHash hash;
     KFSp_MixInMatchName(hash, GetMatchName());
     T_TimeSpan const span = T_NormalizeSpan({*options.GetTimeSpanStart(), *options.GetTimeSpanDuration()});
-    Asked asked{this, this, span, options.GetParamBag(), filter != nullptr};
+    Asked asked{this, this, nullptr, span, options.GetParamBag(), filter != nullptr};
     KFS_StreamOverride const* streamOverride = nullptr;
     if (asked.bag->GetStreamOverride(this, &streamOverride))
         static_cast<void>(streamOverride->GetValueGetterStream(&asked.source, &asked.span));
 
     KFS_StreamKeyData const* const data = asked.source->GetKeyData();
+    asked.data = data;
     if (data->stream->HasActiveExpression()) {
         MixInSamples(hash, asked);
     } else if (data->stream->HasNoKeys() || KFSp_ItemCount(data) < 2) {
@@ -310,8 +351,9 @@ void KFS_Stream::MixInValueAtTime(KFSp_IdentityHash& hash, T_Time const& time, K
     int const count = GetEffectiveDimension();
     M_Vector4T<double> const vector = GetVector4Ex(KFS_EvalData{time, 0, bag});
     hash.Mix(vector.v, sizeof(double) * static_cast<std::size_t>(std::clamp(count, 0, VectorSize)));
+    if (count <= VectorSize) return;
     KFS_Stream const* const seen = KFSp_Seen(this);
-    if (count <= VectorSize || seen->IsCustom()) return;
+    if (seen->IsCustom()) return;
     // What a vector has no room for changes the picture all the same.
     Numbers values(static_cast<std::size_t>(std::max<int>(count, seen->GetDimension())), 0.0);
     KFSp_ThrowIf(KFS_GetValueFPlus(this, &time, 0, values.data(), nullptr, bag));

@@ -1,15 +1,26 @@
 #include "overrides/parambag.h"
 
+#include "tree/capsulehash_private.h"
 #include "tree/streambase.h"
 
 #include <algorithm>
-#include <iterator>
+#include <cstring>
 #include <utility>
 
 using hearth::utility::Guid;
 
-KFS_ParamBag::KFS_ParamBag(KFS_ParamBag const& source) : overrides_(source.overrides_), hashes_(source.hashes_)
+namespace {
+
+bool Same(u16str const& a, u16str const& b)
 {
+    return a.size() == b.size() && std::memcmp(a.data(), b.data(), a.size() * sizeof(unsigned short)) == 0;
+}
+
+}  // namespace
+
+KFS_ParamBag::KFS_ParamBag(KFS_ParamBag const& source) : overrides_(source.overrides_)
+{
+    FillIndex();
     boost::mutex::scoped_lock const hold(source.lock_);
     guid_ = source.guid_;
     dirty_ = source.dirty_.load();
@@ -18,8 +29,14 @@ KFS_ParamBag::KFS_ParamBag(KFS_ParamBag const& source) : overrides_(source.overr
 KFS_ParamBag::KFS_ParamBag(KFS_ParamBag const& a, KFS_ParamBag const& b) : overrides_(a.overrides_)
 {
     overrides_.insert(b.overrides_.begin(), b.overrides_.end());
-    hashes_.reserve(a.hashes_.size() + b.hashes_.size());
-    std::set_union(a.hashes_.begin(), a.hashes_.end(), b.hashes_.begin(), b.hashes_.end(), std::back_inserter(hashes_));
+    FillIndex();
+}
+
+void KFS_ParamBag::FillIndex()
+{
+    index_.reserve(overrides_.size());
+    for (Overrides::value_type const& entry : overrides_) index_.push_back({KFSp_CapsuleHash(entry.first), &entry});
+    std::ranges::sort(index_, {}, &Named::hash);
 }
 
 // What can run out of memory comes first: a GUID must never stand beside a content that isn't its own.
@@ -32,7 +49,7 @@ KFS_ParamBag& KFS_ParamBag::operator=(KFS_ParamBag const& source)
 KFS_ParamBag& KFS_ParamBag::operator=(KFS_ParamBag&& source) noexcept
 {
     overrides_.swap(source.overrides_);
-    hashes_.swap(source.hashes_);
+    index_.swap(source.index_);
     std::swap(guid_, source.guid_);
     dirty_ = source.dirty_.exchange(dirty_);
     return *this;
@@ -70,26 +87,32 @@ void KFS_ParamBag::ComputeGuid() const
 
 void KFS_ParamBag::AddOverride(KFS_StreamBase const* stream, boost::shared_ptr<KFS_StreamOverride> streamOverride)
 {
-    unsigned int const hash = stream->GetStreamCapsuleHash();
-    auto const place = std::lower_bound(hashes_.begin(), hashes_.end(), hash);
-    if (place == hashes_.end() || *place != hash) hashes_.insert(place, hash);
-    overrides_[stream->GetStreamCapsuleData().id] = std::move(streamOverride);
+    u16str const& id = stream->GetStreamCapsuleData().id;
+    index_.reserve(overrides_.size() + 1);  // so that nothing fails once the entry is made
+    auto const [place, isNew] = overrides_.try_emplace(id);
+    place->second = std::move(streamOverride);
+    unsigned int const hash = KFSp_CapsuleHash(id);
+    if (isNew) index_.insert(std::ranges::upper_bound(index_, hash, {}, &Named::hash), {hash, &*place});
     SetDirty();
 }
 
 void KFS_ParamBag::Clear()
 {
     overrides_.clear();
-    hashes_.clear();
+    index_.clear();
     SetDirty();
 }
 
 KFS_StreamOverride const* KFS_ParamBag::Find(KFS_StreamBase const* stream) const
 {
-    if (hashes_.empty()) return nullptr;
-    if (!std::binary_search(hashes_.begin(), hashes_.end(), stream->GetStreamCapsuleHash())) return nullptr;
-    auto const place = overrides_.find(stream->GetStreamCapsuleData().id);
-    return place == overrides_.end() ? nullptr : place->second.get();
+    if (index_.empty()) return nullptr;
+    unsigned int const hash = stream->GetStreamCapsuleHash();
+    auto named = std::ranges::lower_bound(index_, hash, {}, &Named::hash);
+    if (named == index_.end() || named->hash != hash) return nullptr;
+    u16str const& id = stream->GetStreamCapsuleData().id;
+    for (; named != index_.end() && named->hash == hash; ++named)
+        if (Same(named->entry->first, id)) return named->entry->second.get();
+    return nullptr;
 }
 
 bool KFS_ParamBag::StreamOverridden(KFS_StreamBase const* stream, T_Time const& time, KFS_OverrideValue* value) const

@@ -64,13 +64,21 @@ public:
                                                                                      bool effectsOnly) const;
 
 private:
+    using Overrides = std::map<u16str, boost::shared_ptr<KFS_StreamOverride>>;
+    // An override by the hash of its stream's identifier.
+    struct Named {
+        unsigned int hash;
+        Overrides::value_type const* entry;
+    };
+
     KFS_StreamOverride const* Find(KFS_StreamBase const* stream) const;
+    void FillIndex();
     void ComputeGuid() const;
 
-    std::map<u16str, boost::shared_ptr<KFS_StreamOverride>> overrides_;
-    // Sorted: KFS_StreamBase::GetStreamCapsuleHash of each stream that is named, perhaps of more. Nearly all streams that
-    // are read aren't named, and are told so by this.
-    std::vector<unsigned int> hashes_;
+    Overrides overrides_;
+    // All of them, sorted by hash: nearly all streams that are read aren't named, and are told so by this; of one that is
+    // a single identifier is compared.
+    std::vector<Named> index_;
     mutable hearth::utility::Guid guid_;
     mutable boost::mutex lock_;  // guards guid_ and the way of dirty_ to false
     mutable std::atomic<bool> dirty_{true};

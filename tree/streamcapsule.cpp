@@ -1,7 +1,7 @@
+#include "tree/capsulehash_private.h"
 #include "tree/streambase.h"
 #include "tree/streamgroup.h"
 
-#include <algorithm>
 #include <utility>
 
 namespace {
@@ -46,15 +46,10 @@ KFS_StreamCapsuleData const& KFS_StreamBase::GetStreamCapsuleData() const
     return capsuleData_;
 }
 
-// FNV-1a, over units instead of bytes.
 unsigned int KFS_StreamBase::ComputeCapsuleHash() const
 {
-    constexpr unsigned int Basis = 0x811c9dc5;
-    constexpr unsigned int Prime = 0x01000193;
     u16str const& id = GetStreamCapsuleData().id;
-    unsigned int hash = Basis;
-    for (unsigned short const unit : id) hash = (hash ^ unit) * Prime;
-    hash = std::max(hash, 1U);
+    unsigned int const hash = KFSp_CapsuleHash(id);
     // An empty identifier is looked up anew each time, as it may have become another by then.
     if (!id.empty()) capsuleHash_.store(hash, std::memory_order_release);
     return hash;

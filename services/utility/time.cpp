@@ -90,6 +90,7 @@ bool MakeScaleCommon(T_TimeSpan* span) noexcept
 {
     T_Time& start = span->start;
     T_Time& duration = span->duration;
+    if (start.scale == duration.scale) return true;
     unsigned int const divisor = std::gcd(start.scale, duration.scale);
     std::int64_t const startFactor = duration.scale / divisor;
     std::int64_t const durationFactor = start.scale / divisor;

@@ -28,6 +28,9 @@ std::map<std::string, std::string> Inputs()
             {"dragged", RunKfs({"drag", Sample, "--stream", "*/translation", "--component", "y", "--at", "1.1", "--to",
                                 "-2.5", "-o", "-"})
                             .output},
+            {"was.csv", RunKfs({"identity", Sample, "--step", "1/4", "--format", "csv"}).output},
+            {"was.json",
+             RunKfs({"identity", Sample, "--stream", "*", "--step", "1/4", "--to", "2", "--format", "json"}).output},
             {"half", project.substr(0, project.size() / 2)},
             {"cut3", project.substr(0, 3)},
             {"cut30", project.substr(0, 30)},

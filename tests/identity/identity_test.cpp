@@ -1,5 +1,6 @@
 #include "curves/spacetangents.h"
 #include "curves/tangents.h"
+#include "host/identities.h"
 #include "identity/renderoptions.h"
 #include "keystore/keyflags.h"
 #include "keystore/lookup.h"
@@ -111,7 +112,11 @@ public:
         double a[3] = {Value(), Value(), Value()};
         double b[3] = {Value(), Value(), Value()};
         switch (dice_.Below(spatial_ ? 6 : 5)) {
-        case 0: static_cast<void>(KFS_SetKeyF(&stream_, index, a, Interp(), Interp())); break;
+        case 0: {
+            char const in = Interp(), out = Interp();
+            static_cast<void>(KFS_SetKeyF(&stream_, index, a, in, out));
+            break;
+        }
         case 1: static_cast<void>(KFS_SetKeyVelocityF(&stream_, index, a, b)); break;
         case 2: {
             double const influence[3] = {dice_.Between(0.01, 1), dice_.Between(0.01, 1), dice_.Between(0.01, 1)};
@@ -131,7 +136,8 @@ public:
     {
         double const value[3] = {Value(), Value(), Value()};
         T_Time const at{time, 600};
-        EXPECT_EQ(0, KFS_InsertKeyF(&stream_, &at, 1, value, Interp(), Interp()));
+        char const in = Interp(), out = Interp();  // drawn in this order by every compiler
+        EXPECT_EQ(0, KFS_InsertKeyF(&stream_, &at, 1, value, in, out));
     }
     void Remove(int index) { EXPECT_EQ(0, KFS_RemoveKey(&stream_, index, nullptr)); }
 
@@ -162,15 +168,21 @@ private:
     Valued stream_;
 };
 
+constexpr int Kept = 1000;  // identities that must never become others
+
 TEST_F(Identity, DiffersWhereAValueDiffersAndIgnoresKeysFarAway)
 {
     int differing = 0, far = 0;
+    hearth::utility::MixHashGuidT<hearth::utility::Murmur3MixerState> all;
     for (int round = 0; round < Rounds(4000); ++round) {
         SCOPED_TRACE(testing::Message() << "round " << round);
         Dice dice(static_cast<std::uint64_t>(round));
         RandomLeaf leaf(dice);
-        Render const render({50 * dice.Below(110), 600}, {dice.Below(3) == 0 ? 0 : 50 * (1 + dice.Below(20)), 600});
+        int const start = 50 * dice.Below(110);
+        int const duration = dice.Below(3) == 0 ? 0 : 50 * (1 + dice.Below(20));
+        Render const render({start, 600}, {duration, 600});
         Guid const guid = Of(leaf.Get(), render);
+        if (round < Kept) all.Mix(guid.GuidToBytes().data(), 16);
         EXPECT_EQ(guid, Of(leaf.Get(), render));
         std::vector<double> const samples = leaf.Samples(render);
 
@@ -196,6 +208,8 @@ TEST_F(Identity, DiffersWhereAValueDiffersAndIgnoresKeysFarAway)
         }
         if (HasFailure()) return;
     }
+    // Caches of rendered frames outlive versions of this library, and are shared by machines.
+    EXPECT_EQ("b59aa59508dd2df34cd18888bdca2c5a", kfshost::TextOf(all.GetGuid()));
     EXPECT_GT(differing, 500);
     EXPECT_GT(far, 100);
 }
