@@ -130,6 +130,12 @@ void RefuseBeyond(double tolerance, MoveNotes const& notes)
                                       notes.worstError, notes.worstTime.ToString(), tolerance));
 }
 
+// Neither side may have one, also where it rests: what moves would replace it.
+void RefuseExpression(KFS_Stream const& stream)
+{
+    if (stream.HasExpression()) throw DimensionsError("has an expression, which has no form on the other side");
+}
+
 void CheckLeader(KFS_Stream const& leader)
 {
     if (leader.IsSeparationFollower()) throw DimensionsError("is one dimension of a stream, not the whole");
@@ -137,11 +143,11 @@ void CheckLeader(KFS_Stream const& leader)
         throw DimensionsError("isn't of a kind whose dimensions can be separated");
     KFS_StreamGroup const* const parent = leader.GetParent();
     if (!parent || !parent->IsNamedGroup()) throw DimensionsError("has no place in a group, where followers would be");
+    RefuseExpression(leader);
 }
 
 void CheckContent(KFS_Stream const& stream)
 {
-    if (stream.HasExpression()) throw DimensionsError("has an expression, which has no form on the other side");
     bool const hasValue = stream.HasKeys() ? stream.GetKeyCount() > 0 : stream.GetCache()->time != KFS_INVALID_INDEX;
     if (!hasValue) throw DimensionsError("has neither keys nor a value");
 }
@@ -155,6 +161,7 @@ std::vector<KFS_Stream*> FollowersOf(KFS_Stream& leader)
                              return follower && follower->IsSeparationFollower() && follower->GetDimension() == 1;
                          });
     if (!isWhole) throw DimensionsError("has no followers in its group");
+    for (KFS_Stream const* follower : followers) RefuseExpression(*follower);
     return followers;
 }
 

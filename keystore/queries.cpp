@@ -5,6 +5,7 @@
 #include "keystore/edit.h"
 #include "keystore/keylist_private.h"
 #include "keystore/lookup.h"
+#include "keystore/renderstates_private.h"
 #include "keystore/stream.h"
 #include "tree/streamgroup.h"
 
@@ -39,8 +40,9 @@ bool KFS_Stream::IsModified() const
 bool KFS_Stream::IsAnimated(bool evenIfDisabled) const
 {
     if (!IsCanonical() && GetParent() && AreDimensionsSeparated()) return IsAnyFollowerAnimated(this);
-    if (HasKeys()) return true;
-    return evenIfDisabled ? HasExpression() : HasActiveExpression();
+    KFS_Stream const* const seen = KFSp_Seen(this);  // a render's answers don't move with the main thread's edits
+    if (seen->HasKeys()) return true;
+    return evenIfDisabled ? seen->HasExpression() : seen->HasActiveExpression();
 }
 
 bool KFS_Stream::CanBeAnimated() const
@@ -56,7 +58,8 @@ bool KFS_Stream::IsHoldOnly() const
 bool KFS_Stream::SameValueAtTimes(T_Time const& a, T_Time const& b, KFS_ParamBag const*) const
 {
     if (!IsAnimated(false) || a == b) return true;
-    if (GetInterpMask() != KFS_InterpMask_Hold || HasActiveExpression()) return false;
+    KFS_Stream const* const seen = KFSp_Seen(this);
+    if (seen->GetInterpMask() != KFS_InterpMask_Hold || seen->HasActiveExpression()) return false;
     return HoldingKey(this, a) == HoldingKey(this, b);
 }
 

@@ -224,7 +224,8 @@ KFS_StreamIDPath KFS_StreamGroup::GetLeafSeparationPath(KFS_StreamIDPath const& 
     KFS_StreamID const tail = result.RemoveTail();
     unsigned int const index =
         static_cast<unsigned int>(dimension) + parent->GetIndexInUILayout(tail.GetMatchName()) + 1;
-    result.AddTail(KFS_StreamID(index, parent->GetStream(index)->GetMatchName()));
+    // From the layout, since a child may have been renamed or taken out.
+    result.AddTail(KFS_StreamID(index, parent->GetLayout()->at(index)->GetMatchName()));
     return result;
 }
 

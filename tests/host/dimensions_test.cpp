@@ -9,6 +9,7 @@
 #include "keystore/evaluate.h"
 #include "keystore/keyflags.h"
 #include "keystore/lookup.h"
+#include "overrides/streamexpression.h"
 #include "tests/host/hosttest.h"
 
 #include <cmath>
@@ -248,6 +249,12 @@ TEST_F(Dimensions, ARefusalLeavesAllAsItWas)
     EXPECT_EQ(2, path.GetKeyCount());
     kfshost::SeparateDimensions(path);
     EXPECT_EQ("is separated already", refusal([&] { kfshost::SeparateDimensions(path); }));
+    for (KFS_Stream* const side : {&path, path.GetSeparationFollower(1)}) {
+        KFS_SetStreamExpression(side, Q_AsciiToUTF16String("value"));
+        EXPECT_EQ("has an expression, which has no form on the other side",
+                  refusal([&] { kfshost::JoinDimensions(path); }));
+        KFS_SetStreamExpression(side, u16str());
+    }
     KFS_Stream& line = NewLeader(1, StreamForm::Curves);
     FillIn(line, 2);
     EXPECT_EQ("isn't of a kind whose dimensions can be separated", refusal([&] { kfshost::SeparateDimensions(line); }));

@@ -443,6 +443,9 @@ TEST_F(Separation, FollowersStandBehindTheirLeader)
         path.AddTail(Name("P"));
         KFS_StreamIDPath const found = root->GetLeafSeparationPath(path, d);
         EXPECT_EQ(follower, root->FindStream(found));
+        follower->SetMatchName(Name("renamed"));
+        EXPECT_EQ(found, root->GetLeafSeparationPath(path, d));
+        follower->SetMatchName(found.GetTail().GetMatchName());
         EXPECT_FALSE(root->AreLeafDimensionsSeparated(path));
     }
     std::vector<KFS_Stream*> followers{leader};

@@ -96,7 +96,9 @@ protected:
             codes += KFS_GetZeroVelocityPoints(stream, index, 0, &count, times, nullptr);
             samples.insert(samples.end(), {1.0 * count, 1.0 * times[0].value, 1.0 * times[1].value});
         }
-        samples.push_back(codes);
+        T_Time const beside{index * 60 + 20, 600};
+        samples.insert(samples.end(), {1.0 * codes, 1.0 * stream->SameValueAtTimes(time, beside, nullptr),
+                                       1.0 * stream->IsAnimated(true), 1.0 * stream->IsAnimated(false)});
         // The others have no path. What a stream is made of is the main thread's to look at.
         if (stream != spatial.get()) return;
         double tangents[6] = {};
