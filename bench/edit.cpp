@@ -102,6 +102,86 @@ BENCHMARK(InsertYardstick)
     ->ArgNames({"keys", "random"})
     ->ArgsProduct({{1000, 10000, 30000}, {0, 1}});
 
+// All keys at once, handles included, into a new stream, and the same arrays into records side by side.
+struct Arrays {
+    explicit Arrays(int count)
+        : times(TimesInOrder(count)),
+          values(times.begin(), times.end()),
+          thirds(times.size(), 1.0 / 3.0),
+          codes(times.size(), KFS_Interp_Spline)
+    {}
+    std::vector<int> times;
+    std::vector<double> values, thirds;
+    std::vector<char> codes;
+};
+
+void BulkOurs(benchmark::State& state)
+{
+    Arrays const a(static_cast<int>(state.range(0)));
+    for (auto _ : state) {
+        std::unique_ptr<KFS_Stream> const stream = MakeStream({}, KFS_Interp_Spline);
+        KFS_NewKeys const keys{static_cast<int>(a.times.size()),
+                               a.times.data(),
+                               Scale,
+                               a.values.data(),
+                               a.codes.data(),
+                               a.codes.data(),
+                               a.values.data(),
+                               a.thirds.data(),
+                               a.values.data(),
+                               a.thirds.data()};
+        Must(KFS_InsertKeys(stream.get(), &keys, 0));
+    }
+    PerKey(state);
+}
+
+void BulkYardstick(benchmark::State& state)
+{
+    Arrays const a(static_cast<int>(state.range(0)));
+    for (auto _ : state) {
+        std::vector<int> times;
+        std::vector<Record> records;
+        times.reserve(a.times.size());
+        records.reserve(a.times.size());
+        for (std::size_t i = 0; i < a.times.size(); ++i) {
+            times.push_back(a.times[i]);
+            records.push_back({a.times[i], {a.values[i], a.values[i], a.thirds[i], a.values[i], a.thirds[i]}});
+        }
+        benchmark::DoNotOptimize(times.data());
+        benchmark::DoNotOptimize(records.data());
+    }
+    PerKey(state);
+}
+BENCHMARK(BulkOurs)->Name("insert_many/ours")->Arg(1000)->Arg(100000);
+BENCHMARK(BulkYardstick)->Name("insert_many/yardstick")->Arg(1000)->Arg(100000);
+
+// A key put behind all others and taken away again.
+void AppendAndRemoveOurs(benchmark::State& state)
+{
+    std::unique_ptr<KFS_Stream> const stream = MakeStream(TimesInOrder(1000), KFS_Interp_Linear);
+    T_Time const at{10000, Scale};
+    double const value = 1.0;
+    for (auto _ : state) {
+        benchmark::DoNotOptimize(KFS_InsertKey(stream.get(), &at, 0, &value, KFS_Interp_Linear, KFS_Interp_Linear));
+        benchmark::DoNotOptimize(KFS_RemoveKey(stream.get(), 1000, nullptr));
+    }
+}
+void AppendAndRemoveYardstick(benchmark::State& state)
+{
+    std::vector<int> times = TimesInOrder(1000);
+    std::vector<Record> records(times.size());
+    for (auto _ : state) {
+        times.push_back(10000);
+        records.push_back({10000, {1.0}});
+        benchmark::DoNotOptimize(records.data());
+        benchmark::ClobberMemory();
+        times.pop_back();
+        records.pop_back();
+    }
+}
+BENCHMARK(AppendAndRemoveOurs)->Name("append_then_remove/ours");
+BENCHMARK(AppendAndRemoveYardstick)->Name("append_then_remove/yardstick");
+
 // One edit in the middle and the read beside it, which repairs the neighbourhood. The yardstick is the same on a stream
 // of ten keys: the cost must not grow with the number of keys.
 void EditAndRead(benchmark::State& state, int keys)

@@ -2,6 +2,7 @@
 #include "curves/keyhandles_private.h"
 #include "curves/segment_private.h"
 #include "curves/tangents.h"
+#include "keystore/curvehooks_private.h"
 #include "keystore/items_private.h"
 #include "keystore/pins_private.h"
 
@@ -74,7 +75,7 @@ int SetKeyInfluence(KFS_Stream* stream, int index, double const* in, double cons
         return code;
     KFSp_FirstError error;
     if (stream->HasKeys()) error.Keep(SetInfluences(stream, index, in, out));
-    return KFSp_FinishHandleEdit(stream, error);
+    return KFSp_ForgetCachedValue(stream, error);
 }
 
 int GetKeyInfluence(KFS_Stream const* stream, int index, double* in, double* out)
@@ -96,9 +97,14 @@ int GetKeyInfluence(KFS_Stream const* stream, int index, double* in, double* out
 
 }  // namespace
 
+int KFSp_SetKeyInfluences(KFS_Stream* stream, int index, double const* in, double const* out)
+{
+    return KFSp_Boundary([&] { return SetKeyInfluence(stream, index, in, out); });
+}
+
 int KFS_SetKeyInfluence(KFS_Stream* stream, int index, double const* inInfluence, double const* outInfluence)
 {
-    return KFSp_Boundary([&] { return SetKeyInfluence(stream, index, inInfluence, outInfluence); });
+    return KFSp_TellOfHandleEdit(stream, KFSp_SetKeyInfluences(stream, index, inInfluence, outInfluence));
 }
 
 int KFS_GetKeyInfluence(KFS_Stream const* stream, int index, double* inInfluence, double* outInfluence)

@@ -146,9 +146,16 @@ inline KFS_KeyScalar* KFSp_BorrowCache(KFS_StreamKeyData const* data, KFS_KeySca
 
 // The end of every setter: the cached value may be of the curve as it was, and whoever listens is told once nothing
 // failed.
-[[nodiscard]] inline int KFSp_FinishHandleEdit(KFS_Stream* stream, KFSp_FirstError& error)
+[[nodiscard]] inline int KFSp_ForgetCachedValue(KFS_Stream* stream, KFSp_FirstError& error)
 {
     if (stream->HasKeys()) error.Keep(KFSp_ClearCache(stream));
-    if (error.None()) error.Keep(KFSp_Boundary([stream] { stream->NotifyValueChanged(); }));
     return error.Code();
+}
+[[nodiscard]] inline int KFSp_TellOfHandleEdit(KFS_Stream* stream, int code)
+{
+    return code != 0 ? code : KFSp_Boundary([stream] { stream->NotifyValueChanged(); });
+}
+[[nodiscard]] inline int KFSp_FinishHandleEdit(KFS_Stream* stream, KFSp_FirstError& error)
+{
+    return KFSp_TellOfHandleEdit(stream, KFSp_ForgetCachedValue(stream, error));
 }

@@ -5,10 +5,6 @@
 
 // The one place that turns two keys into the control points of a segment.
 
-// Where a linear side has its handle, as a fraction of the segment, and the influence that a new key gets. Files and
-// renders depend on this literal: it isn't one sixth as a double.
-inline constexpr double KFSp_OneSixth = 0.16666666667;
-
 // Storage for a segment's four control points and the curve that points to them. 2 coordinates are a temporal segment;
 // the path of a spatial stream has the stream's dimension, 4 at most. The points aren't set here.
 struct KFSp_SegmentCurve {

@@ -162,10 +162,10 @@ bool CanStoreSpeeds(KFS_Stream const* stream)
            copy != &KFSp_FakeCopyItemFuncNoLimits;
 }
 
-int SetPlainSpeeds(KFS_Stream* stream, KFS_KeyScalar* key, void const* in, void const* out)
+int SetPlainSpeeds(KFS_Stream* stream, KFS_KeyScalar* key, void const* in, void const* out, KFS_CopyItemFunc own)
 {
     if (!CanStoreSpeeds(stream)) return 0;
-    KFS_CopyItemFunc const copy = stream->GetCopyItemFunc() ? stream->GetCopyItemFunc() : &KFSp_ConvertItemToFloat;
+    KFS_CopyItemFunc const copy = own ? own : &KFSp_ConvertItemToFloat;
     bool const continuous = (key->flags & KFS_KeyFlag_Continuous) != 0;
     void const* const inSource = in || !continuous ? in : out;
     void const* const outSource = out || !continuous ? out : in;
@@ -177,7 +177,7 @@ int SetPlainSpeeds(KFS_Stream* stream, KFS_KeyScalar* key, void const* in, void 
     return error.Code();
 }
 
-int SetSpeeds(KFS_Stream* stream, int index, void const* in, void const* out)
+int SetSpeeds(KFS_Stream* stream, int index, void const* in, void const* out, KFS_CopyItemFunc copy)
 {
     KFSp_FirstError error;
     {
@@ -185,7 +185,7 @@ int SetSpeeds(KFS_Stream* stream, int index, void const* in, void const* out)
         if (error.None()) {
             error.Keep(stream->IsSpatial() ? SetSpatialSpeeds(stream, index, key.get(), static_cast<double const*>(in),
                                                               static_cast<double const*>(out))
-                                           : SetPlainSpeeds(stream, key.get(), in, out));
+                                           : SetPlainSpeeds(stream, key.get(), in, out, copy));
         }
         if (error.None()) key->flags &= static_cast<unsigned short>(~KFS_KeyFlag_Modifiable);
     }
@@ -200,7 +200,7 @@ int CheckVelocityAccess(KFS_Stream const* stream)
 
 int SetVelocity(KFS_Stream* stream, int index, void const* in, void const* out)
 {
-    return stream->HasNoKeys() ? 0 : SetSpeeds(stream, index, in, out);
+    return stream->HasNoKeys() ? 0 : SetSpeeds(stream, index, in, out, stream->GetCopyItemFunc());
 }
 
 int GetVelocity(KFS_Stream const* stream, int index, bool zeroAtEnds, double* inVelocity, double* outVelocity)
@@ -231,23 +231,30 @@ int KFS_SetKeyVelocity(KFS_Stream* stream, int index, void const* inVelocity, vo
     });
 }
 
-int KFS_SetKeyVelocityF(KFS_Stream* stream, int index, double const* inVelocity, double const* outVelocity)
+// Listeners hear of it when the stream is itself again, so they aren't told in here.
+int KFSp_SetKeySpeeds(KFS_Stream* stream, int index, double const* in, double const* out)
 {
     return KFSp_Boundary([&] {
-        if (int const code = KFSp_CheckStream(KFSp_Op_SetKeyVelocityF, stream, KFSp_Row_AlterKey)) return code;
         if (int const code = CheckVelocityAccess(stream)) return code;
         KFSp_FirstError error;
         // A cached custom value must be disposed while the stream still says what it is.
         if (stream->HasKeys()) error.Keep(KFSp_ClearCache(stream));
-        {
+        if (stream->HasKeys() && KFSp_HasHandleRuns(stream)) {  // doubles already
+            error.Keep(SetSpeeds(stream, index, in, out, KFSp_FakeCopyItemFuncNoLimits));
+        } else {
             KFSp_ScDoubleValues doubles(stream, KFSp_FakeCopyItemFuncNoLimits);
             error.Keep(doubles.Code());
-            if (error.None()) error.Keep(SetVelocity(stream, index, inVelocity, outVelocity));
+            if (error.None()) error.Keep(SetVelocity(stream, index, in, out));
             error.Keep(doubles.Restore());
         }
-        // Listeners hear of it when the stream is itself again.
-        return KFSp_FinishHandleEdit(stream, error);
+        return KFSp_ForgetCachedValue(stream, error);
     });
+}
+
+int KFS_SetKeyVelocityF(KFS_Stream* stream, int index, double const* inVelocity, double const* outVelocity)
+{
+    if (int const code = KFSp_CheckStream(KFSp_Op_SetKeyVelocityF, stream, KFSp_Row_AlterKey)) return code;
+    return KFSp_TellOfHandleEdit(stream, KFSp_SetKeySpeeds(stream, index, inVelocity, outVelocity));
 }
 
 int KFS_GetKeyVelocityF(KFS_Stream const* stream, int index, unsigned char zeroAtEnds, double* inVelocity,

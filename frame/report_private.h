@@ -85,6 +85,7 @@ enum KFSp_Op : short {
     KFSp_Op_GetFloat = 115,
     KFSp_Op_GetAccuracy = 117,
     KFSp_Op_GetMultiplier = 118,
+    KFSp_Op_InsertKeys = 119,
 };
 
 // Stands for this library in the ids of its reports, and in those of its memory.

@@ -13,5 +13,7 @@ boost::thread_specific_ptr<int>& KFSp_GetTimeToIndexCheck();
 boost::thread_specific_ptr<bool>& KFSp_GetNotifyParentsCheck();
 // This thread's pause flag of the main listener manager; null until first used.
 boost::thread_specific_ptr<bool>& KFSp_GetMainListenerPauseState();
+// Ends a thread's flag, whoever takes it away (tree/listener.cpp, which knows where the flag stands).
+void KFSp_FreeMainListenerPauseState(bool* state);
 // Guards the lazy fill of canonical groups.
 hearth::threads::RecursiveMutex& KFSp_GetCanonicalLock();

@@ -103,12 +103,13 @@ private:
     std::unique_ptr<KFS_Stream> BuildStream(ChannelSet const& channels) const
     {
         StreamBuilder builder(channels.kind, static_cast<int>(channels.columns.size()), scene_.timeScale);
-        std::vector<double> value(channels.columns.size());
+        std::vector<double> values;
+        values.reserve(motion_.frames * channels.columns.size());
         for (std::size_t frame = 0; frame < motion_.frames; ++frame) {
             double const* const row = motion_.numbers.data() + frame * motion_.channelCount;
-            std::ranges::transform(channels.columns, value.begin(), [&](std::size_t column) { return row[column]; });
-            builder.Append(times_[frame], value.data(), KFS_Interp_Linear, KFS_Interp_Linear);
+            for (std::size_t const column : channels.columns) values.push_back(row[column]);
         }
+        builder.Append(std::span(times_).first(motion_.frames), values, KFS_Interp_Linear);
         return builder.Take();
     }
 

@@ -231,7 +231,6 @@ private:
                 AppendArcs(builder, times, values);
             else
                 AppendKeys(builder, channel, times, values);
-            if (isSpline) SetTangents(builder, times.size(), values);
             channel.item.stream = builder.Take();
         } catch (StoreError const& error) {
             throw ImportError(channel.item.place, error.what());
@@ -256,12 +255,24 @@ private:
     static void AppendKeys(StreamBuilder& builder, Channel const& channel, std::vector<int> const& times,
                            Values const& values)
     {
-        bool const isSpline = channel.item.interpolation == SourceInterpolation::CubicSpline;
-        std::size_t const stride = values.dimension * (isSpline ? 3 : 1);
-        std::size_t const offset = isSpline ? values.dimension : 0;
         KFS_Interp const code = CodeOf(channel.item.interpolation);
-        for (std::size_t i = 0; i < times.size(); ++i)
-            builder.Append(times[i], values.numbers.data() + i * stride + offset, code, code);
+        if (channel.item.interpolation != SourceInterpolation::CubicSpline)
+            return builder.Append(times, values.numbers, code);
+        // A Hermite segment is the Bezier segment with handles at its thirds, whose slopes are the tangents.
+        std::vector<double> const in = ThirdOf(values, 0), middle = ThirdOf(values, 1), out = ThirdOf(values, 2);
+        std::vector<double> const thirds(middle.size(), 1.0 / 3.0);
+        builder.Append(times, middle, code, {in.data(), thirds.data(), out.data(), thirds.data()});
+    }
+
+    // The tangents in, the values or the tangents out of all keys of a spline.
+    static std::vector<double> ThirdOf(Values const& values, std::size_t which)
+    {
+        std::size_t const each = values.dimension;
+        std::vector<double> third;
+        third.reserve(values.numbers.size() / 3);
+        for (std::size_t at = which * each; at + each <= values.numbers.size(); at += 3 * each)
+            third.insert(third.end(), &values.numbers[at], &values.numbers[at] + each);
+        return third;
     }
 
     void AppendArcs(StreamBuilder& builder, std::vector<int> const& times, Values const& values) const
@@ -273,17 +284,6 @@ private:
         }
         for (RotationKey const& key : WithArcKeys(keys, arcTolerance_))
             builder.Append(key.time, key.value, KFS_Interp_Linear, KFS_Interp_Linear);
-    }
-
-    // A Hermite segment is the Bezier segment with handles at its thirds, whose slopes are the tangents.
-    static void SetTangents(StreamBuilder& builder, std::size_t keys, Values const& values)
-    {
-        std::vector<double> const thirds(values.dimension, 1.0 / 3.0);
-        for (std::size_t i = 0; i < keys; ++i) {
-            double const* const in = values.numbers.data() + i * values.dimension * 3;
-            double const* const out = in + values.dimension * 2;
-            builder.SetHandles(static_cast<int>(i), {in, thirds.data(), out, thirds.data()});
-        }
     }
 
     GltfDocument document_;

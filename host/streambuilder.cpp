@@ -8,6 +8,7 @@
 #include "keystore/edit.h"
 
 #include <cmath>
+#include <vector>
 
 namespace kfshost {
 
@@ -54,6 +55,23 @@ void StreamBuilder::Append(int time, double const* value, KFS_Interp inInterp, K
 {
     T_Time const at{time, stream_->GetTimeScale()};
     ThrowIfFailed(KFS_InsertKey(stream_.get(), &at, false, value, inInterp, outInterp));
+}
+
+void StreamBuilder::Append(std::span<int const> times, std::span<double const> values, KFS_Interp code,
+                           KeyHandles const& handles)
+{
+    std::vector<char> const codes(times.size(), code);
+    KFS_NewKeys const keys{static_cast<int>(times.size()),
+                           times.data(),
+                           stream_->GetTimeScale(),
+                           values.data(),
+                           codes.data(),
+                           codes.data(),
+                           handles.inSpeed,
+                           handles.inInfluence,
+                           handles.outSpeed,
+                           handles.outInfluence};
+    ThrowIfFailed(KFS_InsertKeys(stream_.get(), &keys, false));
 }
 
 void StreamBuilder::SetHandles(int index, KeyHandles const& handles)

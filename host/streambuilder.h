@@ -9,12 +9,12 @@
 namespace kfshost {
 
 // The four numbers of a key's handles, for each component: speeds in value units a second, influences as fractions of
-// the segment on that side.
+// the segment on that side. Of several keys one key's numbers behind the other's.
 struct KeyHandles {
-    double const* inSpeed;
-    double const* inInfluence;
-    double const* outSpeed;
-    double const* outInfluence;
+    double const* inSpeed = nullptr;
+    double const* inInfluence = nullptr;
+    double const* outSpeed = nullptr;
+    double const* outInfluence = nullptr;
 };
 
 // Makes one stream of doubles, key after key. All of it throws StoreError.
@@ -31,6 +31,9 @@ public:
     // Keys come in the order of their times, `value` with `dimension` doubles. The codes are those of KFS_Interp for
     // the segments on both sides.
     void Append(int time, double const* value, KFS_Interp inInterp, KFS_Interp outInterp);
+    // Many keys, all of them or none, with the same code on every side. The handles are those of all of them.
+    void Append(std::span<int const> times, std::span<double const> values, KFS_Interp code,
+                KeyHandles const& handles = {});
     // The handles of a key that stands already; they matter on sides that are KFS_Interp_Spline. On a path they are
     // single numbers, and a speed is distance along the path a second.
     void SetHandles(int index, KeyHandles const& handles);

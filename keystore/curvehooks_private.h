@@ -70,6 +70,10 @@ inline constexpr char KFSp_Tangents_Spatial = 2;
 // kernel. When the kernel can't split the path the neighbours' tangents stay as absolute positions.
 [[nodiscard]] int KFSp_SubdivideSpline(KFS_Stream* stream, int time, char mode, KFS_KeyScalar* key);
 
+// KFS_SetKeyVelocityF and KFS_SetKeyInfluence without the notification.
+[[nodiscard]] int KFSp_SetKeySpeeds(KFS_Stream* stream, int index, double const* in, double const* out);
+[[nodiscard]] int KFSp_SetKeyInfluences(KFS_Stream* stream, int index, double const* in, double const* out);
+
 // The speed of a key's in side becomes that of its out side. The stream's results of reading and setting velocities come
 // through.
 [[nodiscard]] int KFSp_EqualizeSides(KFS_Stream* stream, int index);

@@ -9,6 +9,7 @@
 #include "keystore/items_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/pins_private.h"
+#include "keystore/plainkeys_private.h"
 #include "keystore/savedrecords_private.h"
 #include "keystore/valuedata_private.h"
 
@@ -208,14 +209,6 @@ int EditDoubles(KFS_Stream* stream, bool describe, Edit&& edit)
     return error.Code();
 }
 
-// Listeners hear of it when the stream is itself again.
-template <class Edit>
-int WithDoubles(KFS_Stream* stream, double const* value, Edit&& edit)
-{
-    int const code = KFSp_Boundary([&] { return EditDoubles(stream, value != nullptr, edit); });
-    return code != 0 ? code : Notify(stream);
-}
-
 // A range of stale keys ends at the last key.
 void PullIn(int* range, int keyCount)
 {
@@ -257,6 +250,7 @@ namespace {
 // The removed key is handed out of the cache record, which a listener may write by reading; so they are told last.
 int RemoveKey(KFS_Stream* stream, int index, void* value)
 {
+    if (!value && KFSp_RemoveLastPlainKey(stream, index)) return Notify(stream);
     KFS_StreamKeyData const* const data = stream->GetKeyData();
     if (KFSp_HasNoValue(stream, data)) return KFSp_ReportErr(KFSp_Op_RemoveKey, KFS_Err_NoKeys, KFSp_Row_RemoveKey);
     KFSp_FirstError error;
@@ -277,13 +271,35 @@ int RemoveKey(KFS_Stream* stream, int index, void* value)
     return error.Code();
 }
 
+bool HoldsDoubles(KFS_Stream const* stream)
+{
+    return (stream->GetValueDesc()->dataType & 0xFF) == KFS_Type_Double;
+}
+
 }  // namespace
+
+// Listeners hear of it when the stream is itself again, so they aren't told in here.
+int KFSp_InsertKeyF(KFS_Stream* stream, T_Time const* time, bool replace, double const* value, char inInterp,
+                    char outInterp)
+{
+    return KFSp_Boundary([&] {
+        // Values of a class with limits are forced into them on their way into the list.
+        if (!stream->IsFloatBased() && KFSp_AppendPlainKey(stream, time, value, inInterp, outInterp)) return 0;
+        return EditDoubles(
+            stream, value != nullptr, [&] { return InsertKey(stream, time, replace, value, inInterp, outInterp); });
+    });
+}
 
 int KFS_InsertKey(KFS_Stream* stream, T_Time const* time, unsigned char replace, void const* value, char inInterp,
                   char outInterp)
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_InsertKey, stream, KFSp_Row_InsertKey)) return code;
-    int const code = KFSp_Boundary([&] { return InsertKey(stream, time, replace != 0, value, inInterp, outInterp); });
+    int const code = KFSp_Boundary([&] {
+        if (HoldsDoubles(stream) &&
+            KFSp_AppendPlainKey(stream, time, static_cast<double const*>(value), inInterp, outInterp))
+            return 0;
+        return InsertKey(stream, time, replace != 0, value, inInterp, outInterp);
+    });
     return code != 0 ? code : Notify(stream);
 }
 
@@ -291,8 +307,8 @@ int KFS_InsertKeyF(KFS_Stream* stream, T_Time const* time, unsigned char replace
                    char outInterp)
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_InsertKeyF, stream, KFSp_Row_AlterKey)) return code;
-    return WithDoubles(stream, value,
-                       [&] { return InsertKey(stream, time, replace != 0, value, inInterp, outInterp); });
+    int const code = KFSp_InsertKeyF(stream, time, replace != 0, value, inInterp, outInterp);
+    return code != 0 ? code : Notify(stream);
 }
 
 int KFS_SetKey(KFS_Stream* stream, int index, void const* value, char inInterp, char outInterp)
@@ -305,7 +321,10 @@ int KFS_SetKey(KFS_Stream* stream, int index, void const* value, char inInterp, 
 int KFS_SetKeyF(KFS_Stream* stream, int index, double const* value, char inInterp, char outInterp)
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_SetKeyF, stream, KFSp_Row_AlterKey)) return code;
-    return WithDoubles(stream, value, [&] { return SetKey(stream, index, value, inInterp, outInterp); });
+    int const code = KFSp_Boundary([&] {
+        return EditDoubles(stream, value != nullptr, [&] { return SetKey(stream, index, value, inInterp, outInterp); });
+    });
+    return code != 0 ? code : Notify(stream);
 }
 
 int KFS_RemoveKey(KFS_Stream* stream, int index, void* value)

@@ -41,6 +41,36 @@
 [[nodiscard]] KFS_API int KFS_InsertKeyF(KFS_Stream* stream, T_Time const* time, unsigned char replace,
                                          double const* value, char inInterp, char outInterp);
 
+// Keys for KFS_InsertKeys: `count` elements an array, or that many times `dimension` numbers, key by key.
+struct KFS_NewKeys {
+    int count = 0;
+    int const* times = nullptr;  // in units of 1/timeScale seconds; not null, in any order
+    unsigned int timeScale = 0;
+    double const* values = nullptr;   // null: each key takes the value that the stream has there
+    char const* inInterps = nullptr;  // null: as codes of 0
+    char const* outInterps = nullptr;
+    // The handles, which matter on sides that are splines; of a spatial stream one number a key. Null: as the insertion
+    // has made them.
+    double const* inSpeeds = nullptr;
+    double const* inInfluences = nullptr;
+    double const* outSpeeds = nullptr;
+    double const* outInfluences = nullptr;
+};
+
+// Puts many keys into a stream, or none. What comes of it is what comes of one key after the other in the order of the
+// arrays: KFS_InsertKeyF, then KFS_SetKeyVelocityF and KFS_SetKeyInfluence with what is given of the two. So a time that
+// is given twice, or at which a key stands, is changed as by KFS_SetKey if `replace` is set and refused if not; and a
+// spline side without handles of its own gets those that follow from the keys that are there when its turn comes.
+// Listeners are told once, at the end; without a key nothing is done and nobody told.
+//
+// Whatever fails leaves the stream as it was before the first key, apart from the list's handle and the addresses of
+// keys, which are to be asked for again. Operation 119 for the damaged stream, else those of the functions above.
+// Cost: on a stream of numbers that isn't spatial, with values, codes and unique times, some nanoseconds a key where
+// they ascend from the last key on, and one pass over the list elsewhere; spline sides want all four arrays of handles
+// for that, or keys in the order of time behind all others. In all other cases that of the single calls, and of a copy
+// of the keys.
+[[nodiscard]] KFS_API int KFS_InsertKeys(KFS_Stream* stream, KFS_NewKeys const* keys, unsigned char replace);
+
 // Changes a key's value, unless `value` is null, and codes. A key without a spline side is no longer continuous.
 // Operation 27. A bad index answers the list service's code.
 [[nodiscard]] KFS_API int KFS_SetKey(KFS_Stream* stream, int index, void const* value, char inInterp, char outInterp);

@@ -27,6 +27,10 @@ struct KFSp_PutKey {
 };
 [[nodiscard]] int KFSp_PutKeyFromCache(KFS_Stream* stream, KFSp_PutKey const& how, int* index);
 
+// KFS_InsertKeyF on a stream that is known to be whole, without the notification.
+[[nodiscard]] int KFSp_InsertKeyF(KFS_Stream* stream, T_Time const* time, bool replace, double const* value,
+                                  char inInterp, char outInterp);
+
 // Takes a key out of the list, into the cache record with `keepInCache`. This is KFS_Stream::RemoveKey without the
 // notification.
 [[nodiscard]] int KFSp_TakeKeyOut(KFS_Stream* stream, int index, bool keepInCache);

@@ -89,6 +89,17 @@ void KFS_KeyTimes::Retimed(int index, int time) noexcept
     }
 }
 
+void KFS_KeyTimes::Appended(std::span<int const> times) noexcept
+{
+    try {
+        times_.insert(times_.end(), times.begin(), times.end());
+        mirrors_ = true;
+        Changed();
+    } catch (std::bad_alloc const&) {
+        Drop();
+    }
+}
+
 // By the difference with wrap-around, as the list sorts. The sign of the difference is turned into a step or none,
 // because a branch on it would be mispredicted every other time.
 int KFS_KeyTimes::Search(int time) const noexcept

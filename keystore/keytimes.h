@@ -4,6 +4,7 @@
 #include "frame/services/memory.h"
 #include "frame/services/sequence.h"
 
+#include <span>
 #include <vector>
 
 // The times of a key list's records, packed side by side so that a search touches a few cache lines instead of one a
@@ -24,6 +25,14 @@ public:
     void Inserted(int index, int time) noexcept;
     void Removed(int index) noexcept;
     void Retimed(int index, int time) noexcept;
+    // Keys behind all others, whose times ascend as numbers from the last one's on; of an empty list any list of times.
+    void Appended(std::span<int const> times) noexcept;
+    // Whether they ascend as numbers, from the first to the last, without wrap-around.
+    bool Ascends() const noexcept { return ordered_; }
+    // A key behind all others. False, and nothing done, where that isn't plain to see or takes memory.
+    bool Append(int time) noexcept;
+    // The last of several keys goes.
+    void RemovedLast() noexcept;
 
     // The number of keys before `time`: the index of the first key at or after it. Reads mostly walk along the time
     // line, so the last answer and the one after it are tried first where the last search found them right. That never
@@ -57,4 +66,23 @@ inline int KFS_KeyTimes::LowerBound(int time) const noexcept
         }
     }
     return Search(time);
+}
+
+[[gnu::always_inline]] inline bool KFS_KeyTimes::Append(int time) noexcept
+{
+    bool const follows = ordered_ && times_.size() < times_.capacity() && times_.back() < time &&
+                         static_cast<unsigned int>(time) - static_cast<unsigned int>(times_.front()) < 1U << 31;
+    if (!follows) return false;
+    times_.push_back(time);
+    walking_ = false;
+    return true;
+}
+
+inline void KFS_KeyTimes::RemovedLast() noexcept
+{
+    if (!ordered_)
+        Removed(static_cast<int>(times_.size()) - 1);
+    else
+        times_.pop_back();
+    walking_ = false;
 }

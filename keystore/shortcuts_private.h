@@ -35,6 +35,34 @@ struct KFSp_ItemPair {
 #endif
 }
 
+// Room for `count` items behind the last one of a list of plain bytes, where there is some already; null where items have
+// to go in through the operations. What is written there isn't the list's before KFSp_TakeRoom.
+[[gnu::always_inline]] inline unsigned char* KFSp_GetRoom([[maybe_unused]] SEQ_Head** list, [[maybe_unused]] int count)
+{
+#ifdef KFS_FOREIGN_SERVICES
+    return nullptr;
+#else
+    SEQ_Head const& head = **list;
+    return head.capacity - head.count >= count && !head.copy && !head.dispose ? SEQp_Item(head, head.count) : nullptr;
+#endif
+}
+[[gnu::always_inline]] inline void KFSp_TakeRoom(SEQ_Head** list, int count)
+{
+    (*list)->count += count;
+}
+
+// Takes away the last item of a list of plain bytes. False where that has to be asked for.
+[[gnu::always_inline]] inline bool KFSp_DropLastItem([[maybe_unused]] SEQ_Head** list)
+{
+#ifdef KFS_FOREIGN_SERVICES
+    return false;
+#else
+    if ((*list)->dispose) return false;
+    --(*list)->count;
+    return true;
+#endif
+}
+
 // What CRV_EvaluateYFromX answers at the share `u` of a segment, whose handles lie at the influences `out` and `in` from
 // its ends and have the heights y1 and y2. False, and `value` untouched, where the curve has to be built and asked.
 [[gnu::always_inline]] inline bool KFSp_SolveUnitSegment([[maybe_unused]] double out, [[maybe_unused]] double in,

@@ -20,7 +20,7 @@ static boost::thread_specific_ptr<int> S_TimeToIndex_reentrancy_check;
 static KFSp_MatchNamePool S_KFS_MatchNamePool;
 
 static boost::thread_specific_ptr<bool> S_KFS_NotifyParents_reentrancy_check;
-static boost::thread_specific_ptr<bool> S_KFS_MainListenerManagerPauseState;
+static boost::thread_specific_ptr<bool> S_KFS_MainListenerManagerPauseState(KFSp_FreeMainListenerPauseState);
 static hearth::threads::RecursiveMutex S_canonical_lock;
 
 boost::thread_specific_ptr<int>& KFSp_GetTimeToIndexCheck()

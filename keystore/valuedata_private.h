@@ -8,6 +8,10 @@
 
 // The one place that computes where a record's value data lies and what its runs are.
 
+// Where a linear side has its handle, as a fraction of the segment, and the influence that a new key gets. Files and
+// renders depend on this literal: it isn't one sixth as a double.
+inline constexpr double KFSp_OneSixth = 0.16666666667;
+
 inline bool KFSp_HasSpatialBlock(KFS_KeyScalar const* key)
 {
     return (key->flags & KFS_KeyFlag_SpatialBlock) != 0;

@@ -11,16 +11,29 @@
 
 static KFS_StreamListenerManager* S_KFS_MainListenerManager = nullptr;
 
+// Where this thread's pause flag stands, once it has one: each edit asks, and looking the flag up costs more than the
+// edit at the end of a list.
+static thread_local bool* knownPause = nullptr;
+
 namespace {
 
 bool& ThisThreadsPause()
 {
-    boost::thread_specific_ptr<bool>& state = KFSp_GetMainListenerPauseState();
-    if (!state.get()) state.reset(new bool(false));
-    return *state;
+    if (!knownPause) [[unlikely]] {
+        boost::thread_specific_ptr<bool>& state = KFSp_GetMainListenerPauseState();
+        if (!state.get()) state.reset(new bool(false));
+        knownPause = state.get();
+    }
+    return *knownPause;
 }
 
 }  // namespace
+
+void KFSp_FreeMainListenerPauseState(bool* state)
+{
+    knownPause = nullptr;
+    delete state;
+}
 
 KFS_StreamListener::~KFS_StreamListener() = default;
 

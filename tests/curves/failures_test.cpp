@@ -86,6 +86,17 @@ double const* Out()
     return out;
 }
 
+// Behind the keys of a stream, among them, and on its curve.
+KFS_NewKeys Batch(int which)
+{
+    static int const times[] = {1600, 1700, 1800, 100, 700, 400};
+    static double const values[] = {1, 2, 3, 4, 5, 6};
+    static char const codes[] = {1, 2, 1};
+    return {
+        3,     times + (which == 0 ? 0 : 3), 600, which == 2 ? nullptr : values, codes, codes, values, values, values,
+        values};
+}
+
 int Never(KFS_Stream*, long, int, KFS_KeyScalar*)
 {
     return 0;
@@ -99,6 +110,9 @@ std::vector<Row> const& Rows()
         {CALL(KFS_InsertKey(s, &Time, 1, Out(), 0, 0)), Tells, 17, InsertInto},
         {CALL(KFS_InsertKey(s, &Time, 1, nullptr, 2, 2)), Tells, 17, InsertInto},
         {CALL(KFS_InsertKeyF(s, &Time, 1, Out(), 2, 2)), Tells, 94, Alter},
+        {CALL(KFS_InsertKeys(s, std::array{Batch(0)}.data(), 1)), Tells, 119, InsertInto},
+        {CALL(KFS_InsertKeys(s, std::array{Batch(1)}.data(), 1)), Tells, 119, InsertInto},
+        {CALL(KFS_InsertKeys(s, std::array{Batch(2)}.data(), 1)), Tells | KeyedOnly, 119, InsertInto},
         {CALL(KFS_SetKey(s, i, Out(), 2, 2)), TakesIndex | Tells, 27, Alter, 27, Alter},
         {CALL(KFS_SetKeyF(s, i, Out(), 2, 2)), TakesIndex | Tells, 92, Alter, 27, Alter},
         {CALL(KFS_RemoveKey(s, i, number)), TakesIndex | Tells, 18, RemoveFrom, 18, RemoveFrom},

@@ -311,6 +311,23 @@ Done Leaf::InsertKey(int time, bool replace, Numbers const* value, int in, int o
     return done;
 }
 
+Done Leaf::InsertKeys(std::vector<Key> const& batch, bool replace, bool values, bool handles)
+{
+    Leaf const before = *this;
+    Done all{0, {}, batch.empty() ? 0 : 1};
+    for (Key const& key : batch) {
+        Done done = InsertKey(key.time, replace, values ? &key.value : nullptr, key.in, key.out);
+        int const index = set.constant ? 0 : Find(key.time);
+        if (done.code == 0 && handles) done = SetKeyVelocity(index, &key.inSpeed, &key.outSpeed);
+        if (done.code == 0 && handles) done = SetKeyInfluence(index, &key.inInfluence, &key.outInfluence);
+        all.reports.insert(all.reports.end(), done.reports.begin(), done.reports.end());
+        if (done.code == 0) continue;
+        *this = before;
+        return {done.code, all.reports, 0};
+    }
+    return all;
+}
+
 Done Leaf::SetKey(int index, Numbers const* value, int in, int out)
 {
     Done done;

@@ -76,6 +76,8 @@ public:
     // Edits, as the functions of the same names. Times are in this stream's scale.
     Done InsertKey(int time, bool replace, Numbers const* value, int in, int out);
     Done SetKey(int index, Numbers const* value, int in, int out);
+    // The handles of each key count if `handles` is set.
+    Done InsertKeys(std::vector<Key> const& batch, bool replace, bool values, bool handles);
     Done RemoveKey(int index, Numbers* value);
     Done CopyKey(Leaf& source, int index, bool replace, int const* time, int* newIndex);
     Done CopyKeys(Leaf& source);

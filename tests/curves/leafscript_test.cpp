@@ -373,6 +373,37 @@ void Insert(Turn& t, Numbers const* value, bool replaces, char in, char out)
                       : KFS_InsertKeyF(t.s, &t.at, replace, Data(value), in, out));
 }
 
+// Up to four keys: behind all others or anywhere, in order or not, with times that meet.
+void InsertMany(Turn& t)
+{
+    bool const values = t.n.a % 5 != 0 || t.leaf.set.constant, handles = t.n.c % 3 != 0, behind = t.n.b % 2 != 0;
+    int const start = behind && t.leaf.Count() > 0 ? t.leaf.keys.back().time + 1 : t.at.value;
+    int const step = t.n.d % 3 == 0 ? -t.world.GetRow().grid : t.world.GetRow().grid * (t.n.d % 4);
+    std::vector<leafmodel::Key> batch(static_cast<std::size_t>(t.n.a % 5));
+    std::vector<int> times;
+    std::string ins, outs;
+    Numbers all[5];
+    for (int i = 0; leafmodel::Key & key : batch) {
+        key.time = start + i * step - (i == 3 ? 2 * step + 1 : 0);
+        key.in = Turn::Code(t.n.d + i), key.out = Turn::Code(t.n.d / 7 + i / 2);
+        key.value = Scaled(t.value, 1.0, i);
+        key.inSpeed = Scaled(t.HandleRoom(), 0.01, i), key.outSpeed = Scaled(t.HandleRoom(), -0.5, t.n.c % 9);
+        key.inInfluence = Scaled(t.HandleRoom(), 0.001, 0.3 * i), key.outInfluence = Scaled(t.HandleRoom(), 0.005, 0);
+        Numbers const* const parts[] = {&key.value, &key.inSpeed, &key.inInfluence, &key.outSpeed, &key.outInfluence};
+        for (std::size_t p = 0; p < 5; ++p) all[p].insert(all[p].end(), parts[p]->begin(), parts[p]->end());
+        times.push_back(key.time), ins.push_back(static_cast<char>(key.in)), outs.push_back(static_cast<char>(key.out));
+        ++i;
+    }
+    KFS_NewKeys keys{static_cast<int>(batch.size()),   times.data(), t.at.scale,
+                     values ? all[0].data() : nullptr, ins.data(),   outs.data()};
+    if (handles) {
+        keys.inSpeeds = all[1].data(), keys.inInfluences = all[2].data();
+        keys.outSpeeds = all[3].data(), keys.outInfluences = all[4].data();
+    }
+    bool const replace = t.n.c % 4 != 0;
+    t.Compare(t.leaf.InsertKeys(batch, replace, values, handles), KFS_InsertKeys(t.s, &keys, replace));
+}
+
 void Flags(Turn& t, unsigned short mask)
 {
     auto const flags = static_cast<unsigned short>(t.n.d % 3 == 0 ? 0 : t.n.d % 3 == 1 ? mask : t.n.c);
@@ -430,6 +461,7 @@ struct Op {
 
 Op const Ops[] = {
     {"insert", 12, 12, [](Turn& t) { Insert(t, &t.value, t.n.a % 8 != 0, t.in, t.out); }},
+    {"insert many", 6, 4, InsertMany},
     {"insert on the curve", 6, 6,
      [](Turn& t) {
          if (!t.leaf.set.constant) Insert(t, nullptr, true, t.n.a % 2 ? '\0' : t.in, t.n.a % 3 ? '\0' : t.out);
@@ -444,9 +476,11 @@ Op const Ops[] = {
     {"remove", 5, 4,
      [](Turn& t) {
          Numbers expected = t.Room(), actual = t.Room();
-         Done const done = t.leaf.RemoveKey(t.index, &expected);
-         t.Compare(done, KFS_RemoveKey(t.s, t.index, actual.data()));
-         if (done.code == 0) t.world.SameTyped("removed value", expected, actual);
+         bool const wanted = t.n.c % 2 == 0;
+         int const index = t.n.c % 4 == 1 && t.leaf.Count() > 0 ? t.leaf.Count() - 1 : t.index;
+         Done const done = t.leaf.RemoveKey(index, &expected);
+         t.Compare(done, KFS_RemoveKey(t.s, index, wanted ? actual.data() : nullptr));
+         if (done.code == 0 && wanted) t.world.SameTyped("removed value", expected, actual);
      }},
     {"copy a key", 3, 3,
      [](Turn& t) {

@@ -1,8 +1,12 @@
 #include "keystore/edit.h"
 
 #include "keystore/edit_private.h"
+#include "tests/support/dice.h"
 #include "tests/support/listening.h"
 #include "tests/support/streams.h"
+
+#include <numeric>
+#include <string>
 
 namespace {
 
@@ -47,6 +51,86 @@ TEST_F(Edit, ATimeIsTakenInTheStreamsScale)
     EXPECT_REPORT(reports, 17,
                   "attempt to insert a key value into a time stream at a time position not representable in the "
                   "stream time scale.");
+}
+
+// ---- the short ways of plain streams
+
+int CopyBytes(void*, SEQ_Head const* const* list, void const* source, void* destination)
+{
+    std::memcpy(destination, source, static_cast<std::size_t>((*list)->itemSize));
+    return 0;
+}
+int DisposeNothing(void*, SEQ_Head**, void*)
+{
+    return 0;
+}
+
+// A list with item functions of its own keeps edits from going the short ways: then both must leave the same bytes.
+TEST_F(Edit, TheShortWaysLeaveWhatTheGeneralOneLeaves)
+{
+    SEQ_Funcs const slow{CopyBytes, DisposeNothing, nullptr};
+    for (int seed = 0; seed < Rounds(60); ++seed) {
+        SCOPED_TRACE(testing::Message() << "seed " << seed);
+        Dice dice(static_cast<std::uint64_t>(seed));
+        StreamOptions const options{.dimension = static_cast<short>(1 + seed % 3),
+                                    .type = seed % 4 == 3 ? KFS_Type_Float : KFS_Type_Double};
+        TestStream quick(options), general(options);
+        HeardRoot quickRoot, generalRoot;
+        quickRoot.Store(quick), generalRoot.Store(general);
+        ValueListener listener;
+        auto const both = [&](auto&& edit) {
+            ASSERT_EQ(edit(quick), edit(general));
+            int const told = listener.Take();
+            EXPECT_TRUE(told == 0 || told == 2);
+            ASSERT_EQ(quick.Times(), general.Times());
+            ASSERT_EQ(quick.Bytes(), general.Bytes());
+            EXPECT_EQ(quick.Stale(), general.Stale());
+            EXPECT_EQ(quick.ArcStale(), general.ArcStale());
+            EXPECT_EQ(reports.Take().size() % 2, 0U);
+        };
+        int const origin = seed % 5 == 4 ? 2147483000 : -50;
+        auto const code = [&] { return static_cast<char>(1 + dice.Below(3)); };
+        for (int step = 0; step < 60; ++step) {
+            if (general->GetKeys()) EXPECT_EQ(0, SEQ_SetFuncs(general->GetKeys(), 3, &slow));
+            int const what = dice.Below(10);
+            int const last = general.Count() > 0 ? general.Times().back() : origin;
+            bool const behind = dice.Below(3) != 0;
+            auto const next = [&](int from) {
+                return static_cast<int>(static_cast<unsigned>(behind ? last : origin) +
+                                        static_cast<unsigned>(from + dice.Below(behind ? 9 : 300)));
+            };
+            double const value[] = {dice.Wild(3), dice.Wild(3), dice.Wild(3)};
+            char const in = code(), out = code();
+            if (what < 4) {
+                T_Time const at = quick.Time(next(1));
+                both([&](TestStream& s) {
+                    return what == 0 ? KFS_InsertKeyF(s, &at, 1, value, in, out)
+                                     : KFS_InsertKey(s, &at, 0, value, in, out);
+                });
+            } else if (what < 6) {
+                int const index = behind ? general.Count() - 1 : dice.Below(9) - 1;
+                both([&](TestStream& s) { return KFS_RemoveKey(s, index, nullptr); });
+            } else if (what < 8) {
+                int const count = dice.Below(6);
+                std::vector<int> times;
+                for (int i = 0; i < count; ++i) times.push_back(next(behind ? 10 * i + 1 : 0));
+                std::vector<double> numbers(90);
+                for (double& number : numbers) number = dice.Wild(1);
+                std::string const codes{in, in, out, out, in, in};
+                KFS_NewKeys keys{count, times.data(), 600, numbers.data(), codes.data(), codes.data() + 1};
+                if (dice.Below(2)) keys.inSpeeds = &numbers[18], keys.inInfluences = &numbers[36];
+                if (dice.Below(4)) keys.outSpeeds = &numbers[54], keys.outInfluences = &numbers[72];
+                bool const replace = dice.Below(2) != 0;
+                both([&](TestStream& s) { return KFS_InsertKeys(s, &keys, replace); });
+            } else if (general.Count() > 0) {
+                int const at = general.Times()[static_cast<std::size_t>(dice.Below(general.Count()))] + what - 8;
+                both([&](TestStream& s) {
+                    std::vector<double> const read = s.At(at);
+                    return std::accumulate(read.begin(), read.end(), 0.0);
+                });
+            }
+        }
+    }
 }
 
 // ---- insertion from the cache record, the way in for everybody
