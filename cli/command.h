@@ -34,3 +34,4 @@ extern Command const DiffCommand;
 extern Command const IdentityCommand;
 extern Command const SeparateCommand;
 extern Command const JoinCommand;
+extern Command const SetCommand;

@@ -10,6 +10,7 @@
 #include <algorithm>
 #include <cmath>
 #include <cstdint>
+#include <optional>
 
 using kfshost::ThrowIfFailed;
 
@@ -34,6 +35,15 @@ public:
         curves_.components.resize(components.size());
     }
 
+    // The value that an expression computes has neither keys nor handles.
+    StreamCurves RunExpression()
+    {
+        double const wanted = (static_cast<double>(last_) - first_) / scale_ * pointsPerSecond_;
+        std::int64_t const pieces = std::clamp(static_cast<std::int64_t>(wanted), std::int64_t{96}, std::int64_t{4000});
+        AddPieces(first_, last_, pieces, NoKey);
+        return std::move(curves_);
+    }
+
     StreamCurves Run()
     {
         int const keys = kfshost::KeyCount(stream_);
@@ -46,6 +56,8 @@ public:
     }
 
 private:
+    static constexpr int NoKey = -1;
+
     double Seconds(std::int64_t units) const { return static_cast<double>(units) / scale_; }
 
     int KeyUnits(int index) const
@@ -129,7 +141,7 @@ private:
     // A part of the segment behind a key. Where it ends in the next one the rate is the one before that.
     void AddPieces(int from, int to, std::int64_t pieces, int index)
     {
-        int const end = KeyUnits(index + 1);
+        std::optional<int> const end = index == NoKey ? std::nullopt : std::optional(KeyUnits(index + 1));
         std::int64_t const length = std::int64_t{to} - from;
         pieces = std::min(pieces, length);
         for (std::int64_t i = 0; i <= pieces; ++i) {
@@ -156,6 +168,11 @@ private:
     StreamCurves curves_;
 };
 
+StreamCurves Run(Sampler sampler, KFS_Stream const& stream)
+{
+    return stream.HasActiveExpression() ? sampler.RunExpression() : sampler.Run();
+}
+
 // Each component by the keys of its own stream.
 StreamCurves SampleSeparated(KFS_Stream const& leader, std::vector<std::size_t> const& components, TimeSpan const& part,
                              double pointsPerSecond)
@@ -163,7 +180,8 @@ StreamCurves SampleSeparated(KFS_Stream const& leader, std::vector<std::size_t> 
     std::vector<KFS_Stream const*> const followers = kfshost::MoversOf(leader);
     StreamCurves curves;
     for (std::size_t c = 0; c < components.size(); ++c) {
-        StreamCurves one = Sampler(*followers[components[c]], false, {0}, part, pointsPerSecond).Run();
+        StreamCurves one =
+            Run({*followers[components[c]], false, {0}, part, pointsPerSecond}, *followers[components[c]]);
         curves.components.push_back(std::move(one.components.front()));
         for (Handle const& handle : one.handles) curves.handles.push_back({c, handle.key, handle.end});
     }
@@ -176,5 +194,5 @@ StreamCurves SampleCurves(kfshost::StreamItem const& item, std::vector<std::size
                           TimeSpan const& part, double pointsPerSecond)
 {
     if (kfshost::IsSeparated(*item.stream)) return SampleSeparated(*item.stream, components, part, pointsPerSecond);
-    return Sampler(*item.stream, kfshost::IsRotation(item), components, part, pointsPerSecond).Run();
+    return Run({*item.stream, kfshost::IsRotation(item), components, part, pointsPerSecond}, *item.stream);
 }

@@ -1,5 +1,6 @@
 #include "cli/command.h"
 #include "cli/errors.h"
+#include "cli/expressions.h"
 #include "cli/options.h"
 #include "cli/output.h"
 #include "cli/overridewords.h"
@@ -7,6 +8,7 @@
 #include "cli/sampletimes.h"
 #include "cli/table.h"
 #include "host/rotations.h"
+#include "host/storeerror.h"
 
 #include <fmt/format.h>
 #include <nlohmann/json.hpp>
@@ -57,7 +59,11 @@ public:
 
     StreamItem const& Item() const { return *item_; }
     std::vector<std::string> const& Components() const { return components_; }
-    bool HasKeys() const { return kfshost::HasKeys(*item_->stream); }
+    // Keys, or an expression that hasn't failed.
+    bool HasValues() const
+    {
+        return !FailureOf(*item_) && (kfshost::HasKeys(*item_->stream) || HasActiveExpression(*item_));
+    }
     bool AreRates() const { return rates_.has_value(); }
 
     // Valid until the next call.
@@ -90,16 +96,31 @@ struct Evaluation {
     std::vector<Shown> streams;
 };
 
+// A stream whose expression fails, at whatever time, has no values; without keys there is nothing to fall back to either.
+// Answers whether any has failed.
+bool TryStream(Evaluation const& evaluation, Shown& stream, Selection const& selection)
+try {
+    if (stream.HasValues())
+        for (Rational const& time : evaluation.times) stream.Read(time);
+    return TellFailedExpressions(selection);
+} catch (kfshost::StoreError const&) {
+    bool const anyFailed = TellFailedExpressions(selection);
+    if (!FailureOf(stream.Item())) throw;
+    return anyFailed;
+}
+
 // Reads everything once: a failed command writes nothing, and what is written isn't held in memory.
-void TryAll(Evaluation& evaluation)
+void TryAll(Evaluation& evaluation, Selection const& selection)
 {
     std::size_t numbers = 0;
     for (Shown const& stream : evaluation.streams) numbers += stream.Components().size() * evaluation.times.size();
     if (numbers > MaxNumbers)
         throw UserError("--fps", fmt::format("asks for {} numbers, more than {}", numbers, MaxNumbers));
-    for (Shown& stream : evaluation.streams)
-        if (stream.HasKeys())
-            for (Rational const& time : evaluation.times) stream.Read(time);
+    // Once one has failed, so may others that read it, which went well before.
+    for (bool again = true; again;) {
+        again = false;
+        for (Shown& stream : evaluation.streams) again = TryStream(evaluation, stream, selection) || again;
+    }
 }
 
 std::vector<std::string> TableRow(Evaluation const& evaluation, std::size_t index, Shown& stream)
@@ -126,10 +147,10 @@ void WriteTables(Evaluation& evaluation, Output& output)
     for (Shown& stream : evaluation.streams) {
         output.Add((isFirst ? "" : "\n") + stream.Item().path + '\n');
         isFirst = false;
-        if (stream.HasKeys())
+        if (stream.HasValues())
             WriteTable(evaluation, stream, output);
         else
-            output.Add("no keys\n");
+            output.Add(FailureOf(stream.Item()) ? "no value\n" : "no keys\n");
     }
 }
 
@@ -142,7 +163,7 @@ void WriteCsv(Evaluation& evaluation, Output& output)
     for (Rational const& time : evaluation.times) {
         output.Add(fmt::format("{},{}", (time * evaluation.fps).ToString(), time.ToDouble()));
         for (Shown& stream : evaluation.streams) {
-            if (!stream.HasKeys())
+            if (!stream.HasValues())
                 output.Add(std::string(stream.Components().size(), ','));
             else
                 for (double const number : stream.Read(time)) output.Add(fmt::format(",{}", number));
@@ -163,9 +184,14 @@ void WriteJsonStream(Evaluation const& evaluation, Shown& stream, Output& output
                            Quoted(stream.Item().path), Quoted(NameOf(stream.Item().kind)),
                            Quoted(NameOf(stream.Item().interpolation)), nlohmann::json(stream.Components()).dump(),
                            stream.AreRates() ? "rates" : "values"));
-    for (std::size_t i = 0; stream.HasKeys() && i < evaluation.times.size(); ++i)
+    bool const hasValues = stream.HasValues();
+    for (std::size_t i = 0; hasValues && i < evaluation.times.size(); ++i)
         output.Add((i == 0 ? "" : ",") + nlohmann::json(stream.Read(evaluation.times[i])).dump());
-    output.Add("]}");
+    output.Add("]");
+    if (auto const failure = FailureOf(stream.Item()))
+        output.Add(fmt::format(R"(,"error":{{"line":{},"text":{}}})",
+                               failure->line > 0 ? std::to_string(failure->line) : "null", Quoted(failure->text)));
+    output.Add("}");
 }
 
 void WriteJson(Evaluation& evaluation, Output& output)
@@ -226,7 +252,7 @@ int Run(Options const& options)
     Rational const fps = asked ? *asked : FindFps(items, options.selection);
     Evaluation evaluation{fps, SampleTimes(options.times, fps, span), {}};
     for (StreamItem const* item : items) evaluation.streams.emplace_back(*item, options, overrides.Bag());
-    TryAll(evaluation);
+    TryAll(evaluation, options.selection);
     TellRounding(evaluation, span, options.selection);
     Output output;
     switch (options.format) {
@@ -247,6 +273,7 @@ Work Prepare(CLI::App& command)
 {
     auto const options = std::make_shared<Options>();
     AddSelection(command, options->selection);
+    AddNoExpressions(command, options->selection);
     AddSampleWords(command, options->times);
     AddOverrideWords(command, options->overrides);
     command.add_flag("--raw", options->raw, "rotations as they are stored, of any length (default: of length 1)");

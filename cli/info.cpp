@@ -109,40 +109,49 @@ std::string SeparationOf(StreamItem const& item)
     return item.stream->IsSeparationLeader() ? "no" : "-";
 }
 
-std::vector<std::string> RowOf(StreamItem const& item)
+// What computes the value; its first line says enough to know it again.
+std::string ExpressionOf(KFS_Stream const& stream)
+{
+    constexpr std::size_t most = 40;
+    if (!stream.HasExpression()) return "-";
+    std::string const text = Q_UTF16ToMBString(stream.GetExpression());
+    std::string line = Shown(text.substr(0, text.find('\n')));
+    if (line.size() > most) line = Shown(text.substr(0, most));
+    return line + (line.size() < text.size() ? " ..." : "") + (stream.HasEnabledExpression() ? "" : " (off)");
+}
+
+std::vector<std::string> RowOf(StreamItem const& item, bool withExpression)
 {
     auto const span = SpanOf({&item});
-    return {item.path,
-            std::string(NameOf(item.kind)),
-            std::to_string(item.stream->GetDimension()),
-            Joined(item.components),
-            UnitsOf(*item.stream),
-            LimitsOf(*item.stream),
-            DefaultOf(*item.stream),
-            SeparationOf(item),
-            item.stream->HasNoKeys() ? "-" : std::to_string(kfshost::KeyCount(*item.stream)),
-            span ? SecondsText(span->first) : "-",
-            span ? SecondsText(span->last) : "-",
-            Interpolation(item)};
+    std::vector<std::string> row{item.path,
+                                 std::string(NameOf(item.kind)),
+                                 std::to_string(item.stream->GetDimension()),
+                                 Joined(item.components),
+                                 UnitsOf(*item.stream),
+                                 LimitsOf(*item.stream),
+                                 DefaultOf(*item.stream),
+                                 SeparationOf(item),
+                                 item.stream->HasNoKeys() ? "-" : std::to_string(kfshost::KeyCount(*item.stream)),
+                                 span ? SecondsText(span->first) : "-",
+                                 span ? SecondsText(span->last) : "-",
+                                 Interpolation(item)};
+    if (withExpression) row.push_back(ExpressionOf(*item.stream));
+    return row;
 }
 
 int Run(Selection const& selection)
 {
     kfshost::Scene const scene = LoadScene(selection);
     auto const items = SelectStreams(scene, selection);
-    Table table({{"stream", Align::Left},
-                 {"kind", Align::Left},
-                 {"dimension", Align::Right},
-                 {"components", Align::Left},
-                 {"units", Align::Left},
-                 {"limits", Align::Left},
-                 {"default", Align::Left},
-                 {"separated", Align::Left},
-                 {"keys", Align::Right},
-                 {"first", Align::Right},
-                 {"last", Align::Right},
-                 {"interpolation", Align::Left}});
-    for (StreamItem const* item : items) table.AddRow(RowOf(*item));
+    bool const anyExpression =
+        std::ranges::any_of(items, [](StreamItem const* item) { return item->stream->HasExpression(); });
+    std::vector<Column> columns{
+        {"stream", Align::Left}, {"kind", Align::Left},   {"dimension", Align::Right}, {"components", Align::Left},
+        {"units", Align::Left},  {"limits", Align::Left}, {"default", Align::Left},    {"separated", Align::Left},
+        {"keys", Align::Right},  {"first", Align::Right}, {"last", Align::Right},      {"interpolation", Align::Left}};
+    if (anyExpression) columns.push_back({"expression", Align::Left});
+    Table table(std::move(columns));
+    for (StreamItem const* item : items) table.AddRow(RowOf(*item, anyExpression));
     WriteToStandardOutput(Summary(scene, items) + '\n' + table.ToText());
     return ExitDone;
 }

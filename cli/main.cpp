@@ -1,5 +1,6 @@
 #include "cli/command.h"
 #include "cli/errors.h"
+#include "cli/expressions.h"
 #include "cli/output.h"
 #include "cli/signals.h"
 #include "host/session.h"
@@ -11,7 +12,7 @@ namespace {
 
 constexpr Command const* Commands[] = {&InfoCommand,     &EvalCommand,   &DiffCommand, &IdentityCommand,
                                        &PlotCommand,     &ImportCommand, &DragCommand, &SaveAsCommand,
-                                       &SeparateCommand, &JoinCommand,   &DumpCommand};
+                                       &SeparateCommand, &JoinCommand,   &SetCommand,  &DumpCommand};
 
 // One line as for any other error, with a hint. What stands where a command should is told by its name.
 std::string TellUsageError(CLI::App const* app, CLI::Error const& error)
@@ -47,7 +48,8 @@ int Run(int argc, char** argv)
         "\n"
         "Exit codes: 0 done; 1 diff, dump or identity found something, or a project had to be changed so that it\n"
         "could be loaded, which lines on the standard error tell; 2 failed. What failed, a command line\n"
-        "that isn't understood included, is one line on the standard error, and nothing is written then.");
+        "that isn't understood included, is one line on the standard error, and nothing is written then; but\n"
+        "where only expressions of streams have failed, a line each, the other streams are answered.");
     try {
         app.parse(argc, argv);
     } catch (CLI::ParseError const& error) {
@@ -66,6 +68,6 @@ int main(int argc, char** argv)
         TellOfSignals();
         kfshost::Session const session;
         ListenToReports();
-        return Run(argc, argv);
+        return EndWithExpressions(Run(argc, argv));
     });
 }

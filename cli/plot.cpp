@@ -1,5 +1,6 @@
 #include "cli/command.h"
 #include "cli/drawing.h"
+#include "cli/expressions.h"
 #include "cli/options.h"
 #include "cli/output.h"
 #include "cli/usererror.h"
@@ -64,6 +65,7 @@ int Run(Options const& options, bool formGiven)
     ReadPart(options, drawing);
     std::string const svg =
         Fitting("--fps", [&] { return options.motion ? DrawMotions(drawing, scene) : DrawValues(drawing, scene); });
+    static_cast<void>(TellFailedExpressions(drawing.selection));
     WriteWholeFile(options.output, svg);
     return ExitDone;
 }
@@ -72,6 +74,7 @@ Work Prepare(CLI::App& command)
 {
     auto const options = std::make_shared<Options>();
     AddSelection(command, options->drawing.selection);
+    AddNoExpressions(command, options->drawing.selection);
     AddOutput(command, options->output, "the drawing; - for the standard output", "SVG");
     command.add_flag(
         "--motion", options->motion,

@@ -1,10 +1,13 @@
 #include "cli/selection.h"
 
 #include "cli/errors.h"
+#include "cli/expressions.h"
 #include "host/dimensions.h"
 #include "host/import.h"
 #include "host/paths.h"
 #include "host/projectfile.h"
+#include "host/storeerror.h"
+#include "overrides/streamexpression.h"
 
 #include <fmt/format.h>
 
@@ -33,6 +36,11 @@ void HoldAsPath(StreamItem& item, Selection const& selection)
     if (selection.roving && item.interpolation == kfshost::SourceInterpolation::Step) {
         throw UserError(selection.ShownFile() + ": " + item.path,
                         "steps from key to key, so there is no way on which keys could rove");
+    }
+    if (HasActiveExpression(item)) {
+        throw UserError(
+            selection.ShownFile() + ": " + item.path,
+            "has an expression, which no path through its keys stands for (--no-expressions takes the keys)");
     }
     if (!item.stream->IsSpatial() && !item.stream->HasNoKeys())  // a project may hold it as a path already
         item.stream = kfshost::MakePath(item);
@@ -73,6 +81,15 @@ kfshost::Scene ReadScene(Selection const& selection)
     return scene;
 }
 
+// In memory alone: a command that saves doesn't have the option.
+void SwitchExpressionsOff(kfshost::Scene& scene)
+{
+    for (StreamItem& item : scene.streams) {
+        if (!item.stream->HasExpression()) continue;
+        kfshost::ThrowIfFailed(KFS_SetStreamExprFlags(item.stream.get(), KFS_ExprFlag_Disabled, KFS_ExprFlag_Disabled));
+    }
+}
+
 }  // namespace
 
 std::string Selection::ShownFile() const
@@ -105,6 +122,7 @@ kfshost::Scene LoadScene(Selection const& selection)
         throw UserError("--rove", "only paths have keys that can float: add --as spatial");
     return ReadingFile(selection.file, [&] {
         kfshost::Scene scene = ReadScene(selection);
+        if (selection.noExpressions) SwitchExpressionsOff(scene);
         if (selection.asPaths) HoldAsPaths(scene, selection);
         return scene;
     });

@@ -11,8 +11,9 @@ struct Selection {
     std::string file;
     std::string glob = "*";
     unsigned int timeScale = 0;
-    bool asPaths = false;  // positions are to be held as spatial streams
-    bool roving = false;   // and their inner keys are to float; only with asPaths
+    bool asPaths = false;        // positions are to be held as spatial streams
+    bool roving = false;         // and their inner keys are to float; only with asPaths
+    bool noExpressions = false;  // what the keys say
     // What was read is to be saved again. What had to be changed for a load would be lost then, so such a project is
     // refused.
     bool forSaving = false;

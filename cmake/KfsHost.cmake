@@ -4,6 +4,8 @@
 find_package(TinyGLTF REQUIRED)
 find_package(nlohmann_json REQUIRED)
 find_package(fmt REQUIRED)
+# Expressions. The build as C++, whose errors unwind the frames that they leave (host/expressionlua_private.h).
+pkg_check_modules(KFS_LUA REQUIRED IMPORTED_TARGET lua5.4-c++)
 
 kfs_sources(hostSources host)
 if(hostSources)
@@ -17,7 +19,7 @@ if(hostSources)
     # In this build the host doesn't say where the library comes from: programs take libkfs, unit tests the objects.
     target_link_libraries(kfs_host
         PUBLIC kfs_services $<INSTALL_INTERFACE:kfs::kfs>
-        PRIVATE TinyGLTF::TinyGLTF nlohmann_json::nlohmann_json fmt::fmt)
+        PRIVATE TinyGLTF::TinyGLTF nlohmann_json::nlohmann_json fmt::fmt PkgConfig::KFS_LUA)
 endif()
 
 kfs_sources(cliSources cli)

@@ -68,10 +68,9 @@ kfs_library_code(kfs_foreign_objects)
 target_compile_definitions(kfs_foreign_objects PRIVATE KFS_FOREIGN_SERVICES)
 target_link_libraries(kfs_foreign_objects PUBLIC kfs_services Boost::headers PRIVATE Boost::thread Threads::Threads)
 list(JOIN shortcutSources "|" shortcutObjects)
-add_executable(test_foreign tests/foreign/list.cpp tests/foreign/services_test.cpp host/session.cpp host/kinds.cpp
-    host/channelread.cpp host/channelstream.cpp host/names.cpp
+add_executable(test_foreign tests/foreign/list.cpp tests/foreign/services_test.cpp
     "$<FILTER:$<TARGET_OBJECTS:kfs_objects>,EXCLUDE,/(${shortcutObjects})\\.o>" $<TARGET_OBJECTS:kfs_foreign_objects>)
-target_link_libraries(test_foreign PRIVATE kfs_test_base kfs_services Boost::thread Threads::Threads ${CMAKE_DL_LIBS})
+target_link_libraries(test_foreign PRIVATE kfs_test_base kfs_host kfs_services Boost::thread Threads::Threads ${CMAKE_DL_LIBS})
 kfs_precompile_test(test_foreign)
 gtest_discover_tests(test_foreign DISCOVERY_MODE PRE_TEST DISCOVERY_TIMEOUT 120 TEST_PREFIX "foreign."
     PROPERTIES LABELS foreign TIMEOUT 600)

@@ -114,13 +114,21 @@ ChannelStream::ChannelStream(StreamKind kind, short dimension, unsigned int time
                         Doubles(), &MatchNameOf(kind), factory, canonical),
       kind_(kind)
 {
+    lives_.fetch_add(1, std::memory_order_relaxed);
     if (constant) PutDefault(*this);
 }
 
 ChannelStream::ChannelStream(ChannelStream const& source, KFS_CloneStreamParams const& params)
     : KFS_DerivedStream(source, params),
       kind_(source.kind_)
-{}
+{
+    lives_.fetch_add(1, std::memory_order_relaxed);
+}
+
+ChannelStream::~ChannelStream()
+{
+    lives_.fetch_add(1, std::memory_order_relaxed);
+}
 
 KFS_StreamBase* ChannelStream::CloneStream(KFS_CloneStreamParams const& params) const
 {

@@ -3,6 +3,8 @@
 #include "host/scene.h"
 #include "keystore/derivedstream.h"
 
+#include <atomic>
+#include <cstdint>
 #include <memory>
 #include <vector>
 
@@ -27,7 +29,12 @@ public:
                   KFS_StreamFactory* factory, bool canonical);
     ChannelStream(ChannelStream const& source, KFS_CloneStreamParams const& params);
 
+    ~ChannelStream() override;
+
     StreamKind GetKind() const { return kind_; }
+
+    // Changes whenever a leaf of this class comes or goes, so that who remembers some knows when to look again. Any thread.
+    static std::uint64_t LivesStamp() { return lives_.load(std::memory_order_relaxed); }
 
     KFS_StreamBase* CloneStream(KFS_CloneStreamParams const& params) const override;
     // True: a leaf that is real belongs to an animation, and is saved with what is known of it, at whatever value.
@@ -51,6 +58,7 @@ public:
 
 private:
     StreamKind kind_;
+    static inline std::atomic<std::uint64_t> lives_{0};
 };
 
 // The match name of a kind, and that of one of its followers. Files have their texts: they never change.

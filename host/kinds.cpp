@@ -4,6 +4,7 @@
 #include "frame/services/strings.h"
 #include "host/channelstream.h"
 #include "host/names.h"
+#include "keystore/expstate.h"
 
 #include <utility>
 
@@ -142,7 +143,8 @@ SceneGroup::SceneGroup(KFS_StreamFactory* factory, bool canonical)
 
 SceneGroup::SceneGroup(SceneGroup const& source, KFS_CloneStreamParams const& params)
     : KFS_IndexedStreamGroup(source, params),
-      times(source.times)
+      times(source.times),
+      frameRate(source.frameRate)
 {}
 
 KFS_StreamBase* SceneGroup::CloneStream(KFS_CloneStreamParams const& params) const
@@ -158,6 +160,21 @@ void SceneGroup::FillCanonicalLayout(KFS_CanonicalLayout* layout)
 void SceneGroup::FillInDisplayName() const
 {
     pSetDisplayName(Q_AsciiToUTF16String("Scene"));
+}
+
+int SceneGroup::EvaluateExpression(KFS_Stream const* stream, T_Time const* time, double* values, void**,
+                                   KFS_ParamBag const* bag)
+try {
+    Q_RenderContext const* const context = Q_RenderContext::PeekCurrent();
+    auto* const state = context ? dynamic_cast<KFS_ExpState*>(context->PeekState(KFS_ExpState::S_StateName)) : nullptr;
+    if (!state || !stream->HasEnabledExpression()) return 1;
+    unsigned int const scale = stream->GetKeyData()->stream->GetTimeScale();
+    int at = 0;
+    if (int const code = time ? T_ShortConvTime(time->value, time->scale, scale, &at) : 0) return code;
+    state->EvalExprValueF(stream, at, 0, values, bag);
+    return 0;
+} catch (int code) {
+    return code;
 }
 
 AnimationGroup& SceneGroup::AppendAnimation(std::string const& name)

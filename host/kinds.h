@@ -7,6 +7,8 @@
 
 #include <array>
 #include <memory>
+#include <mutex>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -21,6 +23,8 @@
 // Names of animations and nodes are display names: they need not differ.
 
 namespace kfshost {
+
+class StreamPaths;
 
 inline constexpr StreamKind AllStreamKinds[] = {StreamKind::Translation, StreamKind::Rotation, StreamKind::Scale,
                                                 StreamKind::Weights, StreamKind::Angles};
@@ -82,6 +86,9 @@ public:
     void FillCanonicalLayout(KFS_CanonicalLayout* layout) override;
     void FillInDisplayName() const override;
     unsigned int GetPreferredTimeScale() const override { return times.scale; }
+    // By the expression engine of the current render context; 1 without one.
+    int EvaluateExpression(KFS_Stream const* stream, T_Time const* time, double* values, void** customValue,
+                           KFS_ParamBag const* bag) override;
 
     AnimationGroup& AppendAnimation(std::string const& name);
 
@@ -92,6 +99,21 @@ public:
         double worstError = 0.0;
     };
     Times times;
+    // Frames a second, where expressions count them (PrepareExpressions).
+    std::optional<Rational> frameRate;
+
+    // The paths of its streams, for whoever looks streams up by them. `renew` may replace what is kept.
+    template <class Renew>
+    std::shared_ptr<StreamPaths const> KeepPaths(Renew const& renew) const
+    {
+        std::lock_guard const guard(pathsLock_);
+        renew(paths_);
+        return paths_;
+    }
+
+private:
+    mutable std::mutex pathsLock_;
+    mutable std::shared_ptr<StreamPaths const> paths_;
 };
 
 // The text of a node's display name, fit to be shown.

@@ -4,6 +4,7 @@
 #include "frame/frame.h"
 #include "frame/services/chunkfile.h"
 #include "frame/services/reports.h"
+#include "host/expression.h"
 #include "host/import.h"
 #include "host/names.h"
 #include "host/storeerror.h"
@@ -165,6 +166,16 @@ void MakeFollowersReal(KFS_Stream const& stream)
     if (stream.AreDimensionsSeparated()) stream.GetSeparationFollowers(followers);
 }
 
+// A tree without expressions is spared the look at all of its keys.
+void PrepareUsedExpressions(SceneGroup& tree)
+{
+    bool anyUsed = false;
+    ForEachChannel(tree, [&anyUsed](Channel const& channel) {
+        for (KFS_Stream const* mover : MoversOf(StreamOf(channel))) anyUsed = anyUsed || mover->HasExpression();
+    });
+    if (anyUsed) PrepareExpressions(tree);
+}
+
 // ---- writing
 
 void WriteTimes(CKF_File* file, SceneGroup::Times const& times)
@@ -273,6 +284,7 @@ public:
             Fail(code);
         }
         ForEachChannel(*tree_, [this](Channel const& channel) { CheckChannel(channel); });
+        PrepareUsedExpressions(*tree_);
         return std::move(tree_);
     }
 
@@ -398,6 +410,35 @@ private:
     std::unordered_map<std::string, std::size_t> leaves_;
 };
 
+// Hands the streams of a tree to `visit` as the items of its scene, followers behind their leader.
+template <class Visit>
+void ForEachItem(SceneGroup const& tree, Visit const& visit)
+{
+    UniqueNames paths;
+    ForEachChannel(tree, [&](Channel const& channel) {
+        ChannelFacts const facts = DescriptionOf(channel);
+        auto const add = [&](KFS_Stream const* stream, int component) {
+            StreamItem item;
+            item.animation = DisplayNameOf(channel.animation);
+            item.node = DisplayNameOf(channel.node);
+            item.kind = channel.kind;
+            item.interpolation = facts.interpolation;
+            item.component = component;
+            item.components = facts.components;
+            if (IsFollower(item)) item.components = {facts.components[static_cast<std::size_t>(component)]};
+            item.path = paths.Make(PathOf(item));
+            item.place = item.path;
+            item.stream = StreamPtr(const_cast<KFS_Stream*>(stream), StreamDeleter(false));
+            visit(std::move(item));
+        };
+        KFS_Stream const& stream = StreamOf(channel);
+        add(&stream, StreamItem::WholeValue);
+        if (!IsSeparated(stream)) return;
+        int component = 0;
+        for (KFS_Stream const* const follower : MoversOf(stream)) add(follower, component++);
+    });
+}
+
 // A stream as its holder's own. One that has a place in a tree leaves it.
 std::unique_ptr<KFS_Stream> TakeOut(StreamPtr stream)
 {
@@ -429,6 +470,7 @@ std::unique_ptr<SceneGroup> MakeTree(Scene scene)
         node->PutChannel(item.kind, TakeOut(std::move(item.stream)));
         node->SetFacts(item.kind, {item.interpolation, std::move(item.components)});
     }
+    PrepareUsedExpressions(*tree);
     return tree;
 }
 
@@ -439,31 +481,16 @@ Scene TakeScene(std::unique_ptr<SceneGroup> tree)
     scene.timeScale = tree->times.scale;
     scene.exactTimes = tree->times.exact;
     scene.worstTimeError = tree->times.worstError;
-    UniqueNames paths;
-    ForEachChannel(*tree, [&](Channel const& channel) {
-        ChannelFacts const facts = DescriptionOf(channel);
-        auto const add = [&](KFS_Stream const* stream, int component) {
-            StreamItem item;
-            item.animation = DisplayNameOf(channel.animation);
-            item.node = DisplayNameOf(channel.node);
-            item.kind = channel.kind;
-            item.interpolation = facts.interpolation;
-            item.component = component;
-            item.components = facts.components;
-            if (IsFollower(item)) item.components = {facts.components[static_cast<std::size_t>(component)]};
-            item.path = paths.Make(PathOf(item));
-            item.place = item.path;
-            item.stream = StreamPtr(const_cast<KFS_Stream*>(stream), StreamDeleter(false));
-            scene.streams.push_back(std::move(item));
-        };
-        KFS_Stream const& stream = StreamOf(channel);
-        add(&stream, StreamItem::WholeValue);
-        if (!IsSeparated(stream)) return;
-        int component = 0;
-        for (KFS_Stream const* const follower : MoversOf(stream)) add(follower, component++);
-    });
+    ForEachItem(*tree, [&scene](StreamItem item) { scene.streams.push_back(std::move(item)); });
     scene.tree = std::move(tree);
     return scene;
+}
+
+std::vector<ListedStream> ListStreams(SceneGroup const& tree)
+{
+    std::vector<ListedStream> streams;
+    ForEachItem(tree, [&streams](StreamItem item) { streams.push_back({item.path, item.stream.get()}); });
+    return streams;
 }
 
 void SaveProject(SceneGroup const& tree, std::string const& fileName, CKF_IoHook* hook)

@@ -30,6 +30,13 @@ std::unique_ptr<SceneGroup> MakeTree(Scene scene);
 // they had.
 Scene TakeScene(std::unique_ptr<SceneGroup> tree);
 
+// The streams of a tree by the paths that they have in its scene, in the tree's order.
+struct ListedStream {
+    std::string path;
+    KFS_Stream const* stream;
+};
+std::vector<ListedStream> ListStreams(SceneGroup const& tree);
+
 // Replaces the file by a complete new one or leaves it as it is. The hook is for tests, and may be null. Throws
 // ProjectError, for what LoadProject wouldn't take too.
 void SaveProject(SceneGroup const& tree, std::string const& fileName, CKF_IoHook* hook = nullptr);

@@ -1,12 +1,14 @@
 #include "host/session.h"
 
 #include "frame/frame.h"
+#include "host/expressionengine_private.h"
 #include "keystore/cachestate.h"
 #include "keystore/evaluate.h"
 #include "overrides/parambag.h"
 
 #include <boost/make_shared.hpp>
 
+#include <cstring>
 #include <stdexcept>
 #include <string>
 #include <vector>
@@ -15,10 +17,13 @@ namespace kfshost {
 
 namespace {
 
-// What a host without an expression engine answers.
-class NoExprContext final : public KFS_ExprContext {
+class ExprContext final : public KFS_ExprContext {
 public:
-    bool CanEvaluate() const override { return false; }
+    explicit ExprContext(bool canEvaluate) : canEvaluate_(canEvaluate) {}
+    bool CanEvaluate() const override { return canEvaluate_; }
+
+private:
+    bool canEvaluate_;
 };
 
 // Layers and paths have no meaning here: nothing to fix up, nothing that depends on a place, and no identity of their
@@ -85,14 +90,46 @@ void AddStates(Q_RenderContext& context)
 
 }  // namespace
 
-void ExpState::EvalExprValue(KFS_Stream const*, int, int, void*, KFS_ParamBag const*)
+namespace {
+
+// The numbers of a value as the caller's buffer holds them: by way of the stream's own conversion, unless it holds doubles.
+void PutExternal(KFS_Stream const* stream, int time, double const* numbers, std::size_t count, void* value)
 {
-    throw static_cast<int>(KFS_Err_ExprNoValue);
+    KFS_Stream const& seen = *stream->GetKeyData()->stream;
+    M_Vector4T<double> vector{};
+    if (seen.GetValueDesc()->dataType == KFS_Type_Double) {
+        std::memcpy(value, numbers, count * sizeof *numbers);
+    } else if (count <= 4) {
+        for (std::size_t i = 0; i < count; ++i) vector[static_cast<int>(i)] = numbers[i];
+        KFS_PostCacheVector4Value(&seen, 0, vector, nullptr, value);
+    } else {
+        KFS_GetValueNoExpr(stream, time, false, value, nullptr, numbers, nullptr, 0);
+    }
 }
 
-void ExpState::EvalExprValueF(KFS_Stream const*, int, int, double*, KFS_ParamBag const*)
+}  // namespace
+
+ExpState::ExpState()
+    : canRun_(boost::make_shared<ExprContext>(true)),
+      canNotRun_(boost::make_shared<ExprContext>(false))
+{}
+
+ExpState::~ExpState() = default;
+
+void ExpState::EvalExprValue(KFS_Stream const* stream, int time, int flags, void* value, KFS_ParamBag const* bag)
 {
-    throw static_cast<int>(KFS_Err_ExprNoValue);
+    KFS_Stream const& seen = *stream->GetKeyData()->stream;
+    if (seen.IsCustom()) throw static_cast<int>(KFS_Err_ExprNoValue);  // an expression gives numbers
+    ExpressionEngine::Numbers numbers(static_cast<std::size_t>(seen.GetDimension()));
+    EvalExprValueF(stream, time, flags, numbers.data(), bag);
+    PutExternal(stream, time, numbers.data(), numbers.size(), value);
+}
+
+void ExpState::EvalExprValueF(KFS_Stream const* stream, int time, int flags, double* value, KFS_ParamBag const* bag)
+{
+    if (bag && Overridden(stream, time, bag).Source()) throw static_cast<int>(KFS_Err_ExprNoValue);
+    if (!engine_) engine_ = std::make_unique<ExpressionEngine>(*this);
+    engine_->Evaluate(stream, time, flags, value, bag);
 }
 
 void ExpState::EvalNoExprValue(KFS_Stream const* stream, int time, int, void* value, unsigned char* atKey,
@@ -111,10 +148,15 @@ void ExpState::EvalNoExprValueF(KFS_Stream const* stream, int time, int, double*
 
 void ExpState::ResolveExprTarget(KFS_Stream const**, int*, KFS_ParamBag const*, KFS_ParamBag*) {}
 
-boost::shared_ptr<KFS_ExprContext> ExpState::GetExprContext(KFS_Stream const*)
+// A stream that was told of an error counts as without an expression.
+boost::shared_ptr<KFS_ExprContext> ExpState::GetExprContext(KFS_Stream const* stream)
 {
-    static boost::shared_ptr<KFS_ExprContext> const context = boost::make_shared<NoExprContext>();
-    return context;
+    return stream->GetKeyData()->stream->HasExpressionError() ? canNotRun_ : canRun_;
+}
+
+std::vector<ExpressionError> ExpState::TakeErrors()
+{
+    return engine_ ? engine_->TakeErrors() : std::vector<ExpressionError>();
 }
 
 Project::Project()

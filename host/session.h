@@ -1,17 +1,26 @@
 #pragma once
 
 #include "frame/project.h"
+#include "host/expression.h"
 #include "host/kinds.h"
 #include "keystore/expstate.h"
 
 #include <boost/shared_ptr.hpp>
 
+#include <memory>
+#include <vector>
+
 namespace kfshost {
 
-// How this host's renders read streams: from the keys alone. There is no expression engine here, so no expression can
-// run.
+class ExpressionEngine;
+
+// How this host's renders read streams: expressions (host/expression.h), what a bag overrides, and the keys. An override holds
+// in place of an expression as of the keys.
 class ExpState final : public KFS_ExpState {
 public:
+    ExpState();
+    ~ExpState() override;
+
     void EvalExprValue(KFS_Stream const* stream, int time, int flags, void* value, KFS_ParamBag const* bag) override;
     void EvalNoExprValue(KFS_Stream const* stream, int time, int flags, void* value, unsigned char* atKey,
                          KFS_ParamBag const* bag, KFS_InterpFunc* interpFunc, long refcon) override;
@@ -21,6 +30,15 @@ public:
     void ResolveExprTarget(KFS_Stream const** stream, int* time, KFS_ParamBag const* bag,
                            KFS_ParamBag* newBag) override;
     boost::shared_ptr<KFS_ExprContext> GetExprContext(KFS_Stream const* stream) override;
+
+    // The expressions that failed since this was last asked.
+    std::vector<ExpressionError> TakeErrors();
+
+private:
+    // Made with the first expression. This state's own references to what it answers, so that renders share no count.
+    std::unique_ptr<ExpressionEngine> engine_;
+    boost::shared_ptr<KFS_ExprContext> canRun_;
+    boost::shared_ptr<KFS_ExprContext> canNotRun_;
 };
 
 // A project with a context and a render context that is ready for reads.

@@ -1,0 +1,316 @@
+// A read of an expression, from the stream's text to its value, and what becomes of those that fail.
+
+#include "host/expressionengine_private.h"
+
+#include "frame/errors.h"
+#include "frame/services/strings.h"
+#include "host/names.h"
+#include "keystore/evaluate.h"
+
+#include <algorithm>
+#include <cmath>
+#include <limits>
+#include <utility>
+
+namespace kfshost {
+
+namespace {
+
+// Of a read inside an expression; what it says stands in the engine.
+constexpr int NestedFailure = KFS_Err_LegacyMismatch;
+// What a read costs beside the instructions of Lua.
+constexpr double StepsOfRead = 50.0;
+
+bool MayLoop(std::string_view text)
+{
+    constexpr std::string_view words[] = {"for", "while", "repeat", "goto", "function"};
+    return std::ranges::any_of(words, [text](std::string_view word) { return HasWord(text, word); });
+}
+
+// The function and its arguments lie on the stack, but for the value, which is made in here: that takes memory, and there may
+// be none.
+int CallWithVector(lua_State* lua)
+{
+    auto const& numbers = *static_cast<ExpressionEngine::Numbers const*>(lua_touserdata(lua, 4));
+    lua_pop(lua, 1);
+    PushNumbers(lua, numbers.data(), numbers.size());
+    lua_call(lua, 3, 1);
+    return 1;
+}
+
+std::string SentenceOf(int code)
+{
+    return code == KFS_Err_NoKeys ? "it has neither keys nor a value" : "error " + std::to_string(code);
+}
+
+}  // namespace
+
+// One more expression runs. What can't run for long isn't slowed down by counting.
+class ExpressionEngine::ScRun {
+public:
+    ScRun(ExpressionEngine& engine, Run const& run) : engine_(engine), counted_(engine.lua_->CountsInstructions())
+    {
+        engine_.runs_[engine_.depth_++] = run;
+        if (run.compiled->mayLoop) engine_.lua_->CountInstructions(true);
+    }
+    ~ScRun()
+    {
+        engine_.lua_->CountInstructions(counted_);
+        --engine_.depth_;
+    }
+    ScRun(ScRun const&) = delete;
+    ScRun& operator=(ScRun const&) = delete;
+
+private:
+    ExpressionEngine& engine_;
+    bool counted_;
+};
+
+ExpressionEngine::ExpressionEngine(KFS_ExpState& state) : state_(state), lua_(std::make_shared<LuaState>(this)) {}
+
+int ExpressionEngine::UnitsOf(double seconds, KFS_Stream const& seen)
+{
+    using Limits = std::numeric_limits<int>;
+    double const units = std::round(seconds * seen.GetTimeScale());
+    return static_cast<int>(
+        std::clamp(units, static_cast<double>(Limits::min() + 1), static_cast<double>(Limits::max())));
+}
+
+void ExpressionEngine::Evaluate(KFS_Stream const* stream, int time, int flags, double* values, KFS_ParamBag const* bag)
+{
+    if (depth_ == 0) lua_->BeginRead();
+    if (depth_ > 0) CheckPlace(stream, time);
+    KFS_Stream const& seen = *stream->GetKeyData()->stream;
+    CompiledExpression& compiled = CompiledFor(seen);
+    std::optional<ExpressionFault> fault = compiled.fault;
+    if (!fault) {
+        ScRun const running(*this, {stream, &seen, time, flags, bag, &compiled});
+        fault = RunCompiled(values);
+    }
+    if (fault) [[unlikely]]
+        Fail(stream, std::move(*fault));
+}
+
+// By the text, which may have changed while the cache was another context's or another record's at this address.
+CompiledExpression& ExpressionEngine::CompiledFor(KFS_Stream const& seen)
+{
+    using Held = std::shared_ptr<CompiledExpression>;
+    KFS_ExprInfo const& info = seen.GetExprInfo();
+    boost::any* const cache = info.GetExpressionCacheImpl();
+    if (Held* const held = boost::any_cast<Held>(cache);
+        held && (*held)->lua == lua_ && (*held)->text == info.GetExpression())
+        return **held;
+    auto const made = std::make_shared<CompiledExpression>(lua_);
+    std::string const text = Q_UTF16ToMBString(info.GetExpression());
+    made->text = info.GetExpression();
+    made->usesValue = HasWord(text, "value");
+    made->usesFrame = HasWord(text, "frame");
+    made->mayLoop = MayLoop(text);
+    made->function = lua_->Compile(text, made->fault);
+    *cache = made;
+    return *made;
+}
+
+// ---- one run
+
+std::optional<ExpressionFault> ExpressionEngine::RunCompiled(double* values)
+{
+    Run const& run = Current();
+    lua_State* const lua = lua_->Get();
+    if (!lua_->Spend(run.compiled->mayLoop ? LuaState::CountInterval : StepsOfRead))
+        return ExpressionFault{"runs for too long", -1, true};
+    if (lua_checkstack(lua, LUA_MINSTACK) == 0) return lua_->FaultOfMemory();
+    Numbers keys;
+    if (run.compiled->usesValue) {
+        keys.resize(run.Dimension());
+        try {
+            state_.EvalNoExprValueF(run.stream, run.time, run.flags, keys.data(), nullptr, run.bag);
+        } catch (int code) {
+            return ExpressionFault{"value: " + SentenceOf(code)};
+        }
+    }
+    std::optional<double> frame;
+    if (run.compiled->usesFrame && !(frame = FrameOf(run)))
+        return ExpressionFault{"frame: nobody has looked for the rate of the project's keys"};
+    bool const isVector = keys.size() > 1;
+    if (isVector) lua_pushcfunction(lua, CallWithVector);
+    lua_rawgeti(lua, LUA_REGISTRYINDEX, run.compiled->function);
+    lua_pushnumber(lua, run.Seconds());
+    if (frame)
+        lua_pushnumber(lua, *frame);
+    else
+        lua_pushnil(lua);
+    if (isVector)
+        lua_pushlightuserdata(lua, &keys);
+    else if (!keys.empty())
+        lua_pushnumber(lua, keys.front());
+    else
+        lua_pushnil(lua);
+    int const status = lua_pcall(lua, isVector ? 4 : 3, 1, 0);
+    if (status == LUA_OK) return TakeResult(values);
+    ExpressionFault fault = lua_->FaultOf(status);
+    fault.isCircle = innerFault_ && innerFault_->isCircle && innerFault_->text == fault.text;
+    return fault;
+}
+
+// Takes the result from the stack.
+std::optional<ExpressionFault> ExpressionEngine::TakeResult(double* values)
+{
+    lua_State* const lua = lua_->Get();
+    std::size_t const dimension = Current().Dimension();
+    std::string fault;
+    if (dimension == 1 && lua_type(lua, -1) == LUA_TNUMBER) {
+        *values = lua_tonumber(lua, -1);
+    } else if (dimension > 1 && lua_istable(lua, -1)) {
+        std::size_t const count = lua_rawlen(lua, -1);
+        if (count != dimension) fault = "gives a table of " + std::to_string(count) + " in place of ";
+        for (std::size_t i = 0; i < dimension && fault.empty(); ++i) {
+            if (lua_rawgeti(lua, -1, static_cast<lua_Integer>(i) + 1) == LUA_TNUMBER)
+                values[i] = lua_tonumber(lua, -1);
+            else
+                fault = "gives a table with a " + std::string(luaL_typename(lua, -1)) + " in place of ";
+            lua_pop(lua, 1);
+        }
+    } else {
+        fault = std::string("gives a ") + luaL_typename(lua, -1) + " in place of ";
+    }
+    lua_pop(lua, 1);
+    if (!fault.empty()) {
+        return ExpressionFault{fault +
+                               (dimension == 1 ? "a number" : "a table of " + std::to_string(dimension) + " numbers")};
+    }
+    if (!std::all_of(values, values + dimension, [](double number) { return std::isfinite(number); }))
+        return ExpressionFault{"gives a number that isn't finite"};
+    return std::nullopt;
+}
+
+// A stream that stands in no scene has no keys to go by but its own; its frames are 1/24 s. One rounding: whole frames come out
+// as whole numbers.
+std::optional<double> ExpressionEngine::FrameOf(Run const& run) const
+{
+    SceneGroup const* const scene = SceneOf(*run.stream);
+    std::optional<Rational> const rate = scene ? scene->frameRate : Rational(24, 1);
+    if (!rate) return std::nullopt;
+    return static_cast<double>(run.time) * static_cast<double>(rate->Numerator()) /
+           (static_cast<double>(run.seen->GetTimeScale()) * static_cast<double>(rate->Denominator()));
+}
+
+// ---- what goes wrong
+
+// Fails a read that comes back to itself, or seems to have no end. It isn't recorded here: it is the line that asked which is
+// to be told.
+void ExpressionEngine::CheckPlace(KFS_Stream const* stream, int time)
+{
+    constexpr std::size_t shown = 4;
+    innerFault_.reset();
+    for (std::size_t i = 0; i < depth_ && !innerFault_; ++i)
+        if (runs_[i].stream == stream && runs_[i].time == time)
+            innerFault_ = ExpressionFault{"reads itself: " + Chain(i, stream), -1, false, true};
+    if (!innerFault_ && depth_ == MaxDepth) {
+        innerFault_ = ExpressionFault{"reads through more than " + std::to_string(MaxDepth) + " expressions: ... -> " +
+                                          Chain(depth_ - shown, stream),
+                                      -1, true};
+    }
+    if (innerFault_) throw int{NestedFailure};
+}
+
+std::string ExpressionEngine::Chain(std::size_t from, KFS_Stream const* last) const
+{
+    std::string chain;
+    for (std::size_t i = from; i < depth_; ++i) chain += PathOfStream(*runs_[i].stream) + " -> ";
+    return chain + PathOfStream(*last);
+}
+
+void ExpressionEngine::Fail(KFS_Stream const* stream, ExpressionFault fault)
+{
+    bool const isOutermost = depth_ == 0;
+    if (isOutermost || !fault.isLimit) Record(stream, fault);
+    if (isOutermost) throw static_cast<int>(KFS_Err_ExprNoValue);
+    innerFault_ = std::move(fault);
+    throw int{NestedFailure};
+}
+
+void ExpressionEngine::Record(KFS_Stream const* stream, ExpressionFault const& fault)
+{
+    if (stream->ExpressionErrorsAreQuiet()) return;
+    if (state_.detectingErrors) {
+        ++state_.errorCount;
+        return;
+    }
+    if (!failed_.insert(stream).second) return;
+    errors_.push_back({stream, PathOfStream(*stream), fault.FullText(), fault.text, fault.line});
+}
+
+std::vector<ExpressionError> ExpressionEngine::TakeErrors()
+{
+    failed_.clear();
+    return std::exchange(errors_, {});
+}
+
+std::string ExpressionEngine::PathOfStream(KFS_Stream const& stream) const
+{
+    SceneGroup const* const scene = SceneOf(stream);
+    std::shared_ptr<StreamPaths const> const paths = scene ? PathsOf(*scene) : nullptr;
+    std::string const* const path = paths ? paths->PathOf(&stream) : nullptr;
+    return path ? *path : CleanName(Q_UTF16ToMBString(stream.GetDisplayName()));
+}
+
+// ---- what expressions ask for
+
+StreamPaths const* ExpressionEngine::PathsOfCurrent()
+{
+    SceneGroup const* const scene = SceneOf(*Current().stream);
+    if (!scene) return nullptr;
+    if (scene != scene_ || !paths_ || !paths_->IsCurrent()) {
+        paths_ = PathsOf(*scene);
+        scene_ = scene;
+    }
+    return paths_.get();
+}
+
+void ExpressionEngine::NoteDependency(int id)
+{
+    if (Current().compiled->dependencies.insert(id).second) Current().stream->GetExprInfo().AddDependency(id);
+}
+
+void ExpressionEngine::ReadStream(lua_State* lua, std::string_view path, double const* seconds, Numbers& values)
+{
+    lua_->Charge(lua, StepsOfRead);
+    StreamPaths const* const paths = PathsOfCurrent();
+    StreamPaths::Entry const entry = paths ? paths->Find(path) : StreamPaths::Entry{};
+    std::string const quoted = '"' + CleanName(path) + '"';
+    if (!entry.stream || SceneOf(*entry.stream) != scene_) luaL_error(lua, "there is no stream %s", quoted.c_str());
+    NoteDependency(entry.id);
+    KFS_Stream const& seen = *entry.stream->GetKeyData()->stream;
+    if (seen.HasExpressionError() && seen.HasEnabledExpression())
+        luaL_error(lua, "the expression of %s is in error", quoted.c_str());
+    Run const run = Current();
+    T_Time const at =
+        seconds ? T_Time{UnitsOf(*seconds, seen), seen.GetTimeScale()} : T_Time{run.time, run.seen->GetTimeScale()};
+    values.assign(static_cast<std::size_t>(std::max<int>(seen.GetDimension(), 0)), 0.0);
+    innerFault_.reset();
+    int const code = KFS_GetValueFPlus(entry.stream, &at, run.flags, values.data(), nullptr, run.bag);
+    if (innerFault_) {
+        std::string const why = innerFault_->text;
+        if (innerFault_->isLimit) lua_->Exhaust();
+        bool const saysItAll = innerFault_->isLimit || innerFault_->isCircle;
+        if (!saysItAll) luaL_error(lua, "stream %s has no value: %s", quoted.c_str(), innerFault_->FullText().c_str());
+        luaL_error(lua, "%s", why.c_str());
+    }
+    if (code != 0) luaL_error(lua, "stream %s has no value: %s", quoted.c_str(), SentenceOf(code).c_str());
+}
+
+void ExpressionEngine::ReadKeys(lua_State* lua, int time, double* values)
+{
+    lua_->Charge(lua, StepsOfRead);
+    Run const& run = Current();
+    int failed = 0;
+    try {
+        state_.EvalNoExprValueF(run.stream, time, run.flags, values, nullptr, run.bag);
+    } catch (int code) {
+        failed = code;
+    }
+    if (failed != 0) luaL_error(lua, "the stream's keys: %s", SentenceOf(failed).c_str());
+}
+
+}  // namespace kfshost

@@ -1,0 +1,248 @@
+// A Lua in which expressions can do nothing but compute, and that no expression can make run for ever or eat all memory.
+
+#include "host/expressionlua_private.h"
+
+#include <algorithm>
+#include <cstdlib>
+#include <new>
+
+namespace kfshost {
+
+namespace {
+
+constexpr std::string_view ChunkName = "=expression";
+constexpr std::string_view Place = "expression:";
+constexpr std::size_t MostShown = 1000;  // of an error's text
+
+bool IsNameChar(char c)
+{
+    return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') || c == '_';
+}
+
+// Runs work that may raise errors; answers the status, with the error object on the stack where it isn't LUA_OK.
+template <class Work>
+int Protected(lua_State* lua, Work const& work)
+{
+    lua_pushcfunction(lua, [](lua_State* inside) {
+        (*static_cast<Work const*>(lua_touserdata(inside, 1)))(inside);
+        return 0;
+    });
+    lua_pushlightuserdata(lua, const_cast<Work*>(&work));
+    return lua_pcall(lua, 1, 0, 0);
+}
+
+// All that expressions can name. The libraries' own tables stay out of reach, and so does everything that opens a way to
+// them, keeps something from one read to the next, or answers differently from one run to the next.
+void MakeSandbox(lua_State* lua)
+{
+    lua_newtable(lua);
+    AddMathFunctions(lua);
+    AddBasicFunctions(lua);  // after it: a type is what Lua calls so, not the kind of a number
+    AddStringFunctions(lua);
+    AddTableFunctions(lua);
+    AddVectorFunctions(lua);
+    AddStreamFunctions(lua);
+    MakeReadOnly(lua);
+    lua_rawseti(lua, LUA_REGISTRYINDEX, LUA_RIDX_GLOBALS);
+    lua_pushnil(lua);
+    lua_setfield(lua, LUA_REGISTRYINDEX, LUA_LOADED_TABLE);
+}
+
+int Refuse(lua_State* lua)
+{
+    return luaL_error(lua, "only local variables can be set");
+}
+
+// The text behind a prefix on its first line.
+int Load(lua_State* lua, std::string_view prefix, std::string_view text)
+{
+    std::string const chunk = std::string(prefix) + std::string(text);
+    return luaL_loadbufferx(lua, chunk.data(), chunk.size(), ChunkName.data(), "t");
+}
+
+// An expression, or else statements. What is wrong with a text that is neither is said of what it looks like.
+int LoadEither(lua_State* lua, std::string_view text)
+{
+    int const asExpression = Load(lua, "local time,frame,value=...return ", text);
+    if (asExpression == LUA_OK) return LUA_OK;
+    int const asStatements = Load(lua, "local time,frame,value=...;", text);
+    bool const looksLikeExpression = asStatements != LUA_OK && !HasWord(text, "return");
+    if (looksLikeExpression)
+        lua_pop(lua, 1);
+    else
+        lua_remove(lua, -2);
+    return looksLikeExpression ? asExpression : asStatements;
+}
+
+}  // namespace
+
+std::string ExpressionFault::FullText() const
+{
+    return line > 0 ? "line " + std::to_string(line) + ": " + text : text;
+}
+
+bool HasWord(std::string_view text, std::string_view word)
+{
+    for (std::size_t at = text.find(word); at != std::string_view::npos; at = text.find(word, at + 1)) {
+        std::size_t const end = at + word.size();
+        if ((at == 0 || !IsNameChar(text[at - 1])) && (end == text.size() || !IsNameChar(text[end]))) return true;
+    }
+    return false;
+}
+
+void MakeReadOnly(lua_State* lua)
+{
+    lua_newtable(lua);           // the face
+    lua_createtable(lua, 0, 2);  // its metatable
+    lua_rotate(lua, -3, -1);     // content on top
+    lua_setfield(lua, -2, "__index");
+    lua_pushcfunction(lua, Refuse);
+    lua_setfield(lua, -2, "__newindex");
+    lua_setmetatable(lua, -2);
+}
+
+LuaState::LuaState(ExpressionEngine* engine) : engine_(engine)
+{
+    lua_ = lua_newstate(Allocate, this);
+    if (!lua_) throw std::bad_alloc();
+    *static_cast<LuaState**>(lua_getextraspace(lua_)) = this;
+    if (Protected(lua_, [](lua_State* inside) { MakeSandbox(inside); }) == LUA_OK) return;
+    lua_close(lua_);
+    throw std::bad_alloc();
+}
+
+LuaState::~LuaState()
+{
+    lua_close(lua_);
+}
+
+void* LuaState::Allocate(void* owner, void* block, std::size_t oldSize, std::size_t newSize)
+{
+    LuaState& state = *static_cast<LuaState*>(owner);
+    if (!block) oldSize = 0;  // it is the kind of what is to be made
+    if (newSize == 0) {
+        std::free(block);
+        state.used_ -= oldSize;
+        return nullptr;
+    }
+    if (newSize > oldSize) {
+        std::size_t const more = newSize - oldSize;
+        if (more > MaxMemory || state.used_ + more > state.usedBefore_ + MaxMemory ||
+            state.allocated_ + newSize > MaxAllocated)
+            return nullptr;
+        state.allocated_ += newSize;
+    }
+    void* const grown = std::realloc(block, newSize);
+    if (grown) state.used_ += newSize - oldSize;
+    return grown;
+}
+
+void LuaState::BeginRead()
+{
+    usedBefore_ = used_;
+    allocated_ = 0;
+    steps_ = 0.0;
+    isExhausted_ = false;
+}
+
+bool LuaState::Spend(double steps)
+{
+    steps_ += steps;
+    if (!(steps_ <= MaxSteps)) isExhausted_ = true;
+    return !isExhausted_;
+}
+
+double LuaState::StepsOfInterval() const
+{
+    constexpr double oneStep = 1 << 12;
+    double const held = used_ > usedBefore_ ? static_cast<double>(used_ - usedBefore_) : 0.0;
+    return CountInterval * (1.0 + held / oneStep);
+}
+
+namespace {
+
+constexpr char const* TooLong = "runs for too long";
+
+}  // namespace
+
+void LuaState::Charge(lua_State* lua, double steps)
+{
+    if (!Spend(steps)) luaL_error(lua, TooLong);
+}
+
+void LuaState::Count(lua_State* lua, lua_Debug* record)
+{
+    LuaState& state = Of(lua);
+    if (state.Spend(state.StepsOfInterval())) return;
+    lua_getinfo(lua, "l", record);
+    lua_pushfstring(lua, "%s%d: %s", Place.data(), record->currentline, TooLong);
+    lua_error(lua);
+}
+
+void LuaState::CountInstructions(bool on)
+{
+    if (on == countsInstructions_) return;
+    lua_sethook(lua_, on ? Count : nullptr, on ? LUA_MASKCOUNT : 0, on ? CountInterval : 0);
+    countsInstructions_ = on;
+}
+
+int LuaState::Compile(std::string_view text, std::optional<ExpressionFault>& fault)
+{
+    int function = LUA_NOREF;
+    if (text.size() > MaxText) {
+        fault = ExpressionFault{"is longer than " + std::to_string(MaxText) + " bytes"};
+        return function;
+    }
+    if (HasWord(text, "_ENV")) {  // what is assigned to it would stay from one read to the next
+        fault = ExpressionFault{"_ENV can't be used"};
+        return function;
+    }
+    int status = LUA_OK;
+    auto const load = [&](lua_State* inside) {
+        status = LoadEither(inside, text);
+        if (status == LUA_OK)
+            function = luaL_ref(inside, LUA_REGISTRYINDEX);
+        else
+            lua_error(inside);
+    };
+    if (lua_checkstack(lua_, LUA_MINSTACK) == 0)
+        fault = FaultOfMemory();
+    else if (int const outcome = Protected(lua_, load); outcome != LUA_OK)
+        fault = FaultOf(status == LUA_OK ? outcome : status);
+    return function;
+}
+
+void LuaState::Release(int function)
+{
+    luaL_unref(lua_, LUA_REGISTRYINDEX, function);  // into a free place of the registry: nothing is allocated
+}
+
+ExpressionFault LuaState::FaultOfMemory()
+{
+    isExhausted_ = true;
+    return {"needs too much memory", -1, true};
+}
+
+ExpressionFault LuaState::FaultOf(int status)
+{
+    ExpressionFault fault;
+    if (status == LUA_ERRMEM || status < 0) {  // below 0: something else than an error of Lua was thrown
+        fault = FaultOfMemory();
+    } else if (lua_type(lua_, -1) == LUA_TSTRING) {
+        std::size_t length = 0;
+        char const* const text = lua_tolstring(lua_, -1, &length);
+        fault.text.assign(text, std::min(length, MostShown));
+        if (fault.text.starts_with(Place)) {
+            std::size_t const end = fault.text.find(": ", Place.size());
+            fault.line = std::atoi(fault.text.c_str() + Place.size());
+            fault.text.erase(0, end == std::string::npos ? 0 : end + 2);
+        }
+    } else {
+        fault.text = std::string("error with a ") + luaL_typename(lua_, -1) + " in place of a text";
+    }
+    fault.isLimit = isExhausted_;
+    lua_pop(lua_, 1);
+    return fault;
+}
+
+}  // namespace kfshost
