@@ -63,7 +63,7 @@ std::string Summary(kfshost::Scene const& scene, std::vector<StreamItem const*> 
 // What goes on between keys. Of a path the file's word is about its route; its keys tell whether they float.
 std::string Interpolation(StreamItem const& item)
 {
-    std::string const name(NameOf(item.interpolation));
+    std::string name(NameOf(item.interpolation));
     if (!item.stream->IsSpatial() || kfshost::IsSeparated(*item.stream)) return name;
     std::size_t const floating = kfshost::FloatKeyCount(*item.stream);
     return name + (floating == 0 ? " path" : fmt::format(" path, {}", Plural(floating, "float key", "float keys")));

@@ -101,4 +101,35 @@ TEST_F(KeyTimesTest, AListOutOfOrderHasNoMemory)
     }
 }
 
+// A list in order that an edit stretches around the circle: what was known of its order goes with the edit.
+TEST_F(KeyTimesTest, AnEditThatEndsTheOrderEndsTheMemory)
+{
+    KFS_KeyScalar key{};
+    for (int const time : {0, 10, 20}) {
+        key.time = time;
+        ASSERT_EQ(0, SEQ_Insert(&key, (*list_)->count, list_));
+    }
+    constexpr int Far = INT_MIN + 10;
+    using Edit = void (*)(KFS_KeyTimes&);
+    for (auto const& [edit, after] :
+         {std::pair<Edit, std::vector<int>>{[](KFS_KeyTimes& times) { times.Inserted(3, Far); }, {0, 10, 20, Far}},
+          {[](KFS_KeyTimes& times) { times.Retimed(2, Far); }, {0, 10, Far}}}) {
+        KFS_KeyTimes times;
+        ASSERT_TRUE(times.Build(list_));
+        for (int const before : {11, 12}) ASSERT_EQ(2, times.LowerBound(before));
+        edit(times);
+        for (int const time : {-5, 5, 15, 25, INT_MAX, Far - 1, Far, Far + 1}) {
+            // As the list itself searches, by halves and differences.
+            std::size_t base = 0;
+            auto const isBefore = [&](std::size_t i) {
+                return static_cast<int>(static_cast<unsigned>(after[i]) - static_cast<unsigned>(time)) < 0;
+            };
+            for (std::size_t count = after.size(); count > 1; count -= count / 2)
+                if (isBefore(base + count / 2 - 1)) base += count / 2;
+            EXPECT_EQ(static_cast<int>(base) + isBefore(base), times.LowerBound(time))
+                << "at " << time << " of " << after.size();
+        }
+    }
+}
+
 }  // namespace
