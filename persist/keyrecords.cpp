@@ -11,6 +11,7 @@
 #include "persist/leafchunks_private.h"
 
 #include <algorithm>
+#include <cstdint>
 #include <cstring>
 #include <vector>
 
@@ -44,6 +45,50 @@ struct Layout {
     int memoryHead;
     int data;
 };
+
+// Whether the two records hold the same in the same places, so that they differ in the order of bytes alone. They are
+// turned over in one pass then, item by item where lists may be asked for items only.
+bool DiffersInByteOrderOnly(Layout const& layout)
+{
+    return KFSp_HasShortcuts && !layout.spatial && !layout.custom && layout.data % 8 == 0;
+}
+
+void TurnRecord(unsigned char* to, unsigned char const* from, int numbers, int sixthBits)
+{
+    std::uint32_t time;
+    std::memcpy(&time, from, sizeof time);
+    time = __builtin_bswap32(time);
+    std::memcpy(to, &time, sizeof time);
+    to[4] = from[4];
+    to[5] = from[5];
+    to[6] = static_cast<unsigned char>(from[7] & sixthBits);
+    to[7] = from[6];
+    for (int i = 1; i <= numbers; ++i) {
+        std::uint64_t number;
+        std::memcpy(&number, from + 8 * i, sizeof number);
+        number = __builtin_bswap64(number);
+        std::memcpy(to + 8 * i, &number, sizeof number);
+    }
+}
+
+// Turns the records of one list over into the other, which is empty. False, and nothing done but that there is room,
+// where that list wants its items through its operations. `sixthBits`: what is wanted of the flags' low byte, which has that place in memory.
+bool TurnRecords(Layout const& layout, SEQ_Head const* const* from, SEQ_Head** to, int sixthBits)
+{
+    int const count = (*from)->count;
+    KFSp_ThrowIf(SEQ_ReserveSpace(count, to));
+    unsigned char* place = KFSp_GetRoom(to, count);
+    if (!place) return false;
+    unsigned char const* source = (*from)->items;
+    int const numbers = layout.data / 8;
+    for (int i = 0; i < count; ++i, place += (*to)->stride, source += (*from)->stride)
+        if (numbers == 5)  // the most: one dimension, without a loop
+            TurnRecord(place, source, 5, sixthBits);
+        else
+            TurnRecord(place, source, numbers, sixthBits);
+    KFSp_TakeRoom(to, count);
+    return true;
+}
 
 // A client's bytes are in the client's own order.
 void SwapData(Layout const& layout, void* data)
@@ -109,14 +154,12 @@ void FromDiskRecord(Layout const& layout, void const* record, int recordSize, vo
     KFSp_ThrowIf(KFSp_SetKeySpatialState(nullptr, layout.spatial ? 1 : 0, 0, key));
 }
 
-// A new key list of the stream, with `count` zeroed items, in the place of the one that it may have had.
-SEQ_Head** MakeKeyList(KFS_Stream* stream, int count)
+// A new key list of the stream, in the place of the one that it may have had.
+SEQ_Head** MakeKeyList(KFS_Stream* stream)
 {
     KFSp_DropKeyList(stream);
     KFSp_ThrowIf(KFSp_CreateKeyList(stream));
-    SEQ_Head** const keys = stream->GetKeys();
-    KFSp_ThrowIf(SEQ_SetNumItems(count, keys, 0));
-    return keys;
+    return stream->GetKeys();
 }
 
 void CheckDiskSize(KFS_Stream const* stream, Layout const& layout, int diskSize)
@@ -167,6 +210,7 @@ void KFSp_ConvertToKeyDiskList(KFS_Stream const* stream, SEQ_Head** list)
     if (!keys) return;
     Layout const layout(stream);
     int const count = (*keys)->count;
+    if (DiffersInByteOrderOnly(layout) && (*list)->count == 0 && TurnRecords(layout, keys, list, 0xFF)) return;
     KFSp_ThrowIf(SEQ_SetNumItems(count, list, 0));
     KFSp_FirstError error;
     KFSp_ScPin const pin(list, error);
@@ -186,8 +230,12 @@ void KFSp_ConvertFromKeyDiskList(KFS_Stream* stream, SEQ_Head** list)
     int const count = (*list)->count;
     int const diskSize = SEQ_GetItemSize(list);
     CheckDiskSize(stream, layout, diskSize);
-    SEQ_Head** const keys = MakeKeyList(stream, count);
+    SEQ_Head** const keys = MakeKeyList(stream);
     int const keySize = SEQ_GetItemSize(keys);
+    bool const same = DiffersInByteOrderOnly(layout) && diskSize == layout.DiskSize() && diskSize == keySize;
+    // The layout is the stream's, whatever a file's flag says, as in FromDiskRecord.
+    if (same && TurnRecords(layout, list, keys, ~KFS_KeyFlag_SpatialBlock)) return stream->SetKeys(keys);
+    KFSp_ThrowIf(SEQ_SetNumItems(count, keys, 0));
     KFSp_FirstError error;
     KFSp_ScPin const diskPin(list, error);
     KFSp_ScPin const pin(keys, error);

@@ -11,8 +11,12 @@
 
 namespace {
 
-// Ends the children of a group in a file.
-constexpr char const* EndOfGroupText = "ZQVM Group End";
+// Ends the children of a group in a file. Asked of each child, so it is hashed once.
+KFS_MatchName const& EndOfGroup()
+{
+    static KFS_MatchName const name("ZQVM Group End", true);
+    return name;
+}
 
 constexpr int NameId = CKF_Id("kfmn");
 constexpr int NameSize = 40;
@@ -47,12 +51,12 @@ void KFS_MatchName::Write(CKF_File* file) const
 
 void KFS_MatchName::WriteEndOfGroupMarker(CKF_File* file)
 {
-    KFS_MatchName(EndOfGroupText, true).Write(file);
+    EndOfGroup().Write(file);
 }
 
 bool KFS_MatchName::IsEndOfGroupMarker() const
 {
-    return *this == KFS_MatchName(EndOfGroupText, true);
+    return *this == EndOfGroup();
 }
 
 void KFS_StreamID::Read(CKF_File* file, CKF_ChunkInfo const* parent)

@@ -24,9 +24,12 @@ constexpr unsigned int UnsavedFlags = KFS_BaseFlag_Canonical | KFS_BaseFlag_Show
                                       KFS_BaseFlag_DisplayNameIncludesParent | KFS_BaseFlag_SkipReveal;
 static_assert(UnsavedFlags == 0x1D0EC && ~UnsavedFlags == 0xFFFE2F13);
 
-constexpr char const* NoNameMarker = "-_0_/-";
-
-constexpr char const* UnknownNameText = "$$$/KFS/KFS_StreamBase/Read/UnknownStreamName=Unknown Stream Name";
+// As long as a string keeps its characters in itself, so that it costs a node no more than a comparison.
+u16str const& NoNameMarker()
+{
+    static u16str const marker = Q_AsciiToUTF16String("-_0_/-");
+    return marker;
+}
 
 // Whether a reader gets the node's name from elsewhere: in an indexed group from the canonical stream, in others from
 // the group's type.
@@ -50,8 +53,8 @@ bool TakesNameFromFile(KFS_StreamBase const* node)
 void ReadName(KFS_StreamBase* node, CKF_File* file, CKF_ChunkInfo const* chunk)
 {
     u16str name;
-    bool const found = CKF_ReadString(file, chunk, NameId, &name, Q_ZStringToUTF16String(UnknownNameText), 0);
-    if (found && name != Q_AsciiToUTF16String(NoNameMarker) && TakesNameFromFile(node)) node->SetDisplayName(name);
+    bool const found = CKF_ReadString(file, chunk, NameId, &name, u16str(), 0);
+    if (found && name != NoNameMarker() && TakesNameFromFile(node)) node->SetDisplayName(name);
 }
 
 // Files up to that version have no notion of a follower that isn't active.
@@ -72,7 +75,7 @@ void KFS_StreamBase::Write(CKF_File* file) const
         ScRecursiveLock const guard(lock_);
         name = GetDisplayName();
     }
-    if (IsNameKnownToReaders(this, name)) name = Q_AsciiToUTF16String(NoNameMarker);
+    if (IsNameKnownToReaders(this, name)) name = NoNameMarker();
     KFSp_ThrowIf(CKF_WriteString(file, NameId, name, 0));
 }
 

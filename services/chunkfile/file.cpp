@@ -101,7 +101,7 @@ void CKF_File::Close() noexcept
 std::span<unsigned char const> CKF_File::GetBytes() const noexcept
 {
     if (impl_->reader) return impl_->reader->Bytes();
-    return impl_->committed;
+    return impl_->committed.Bytes();
 }
 
 void CKF_File::SetVersion(int major, int minor) noexcept

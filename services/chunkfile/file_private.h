@@ -7,11 +7,6 @@
 
 inline constexpr int CKFp_AllocationId = 0x190000;
 
-struct CKFp_FreePtr {
-    void operator()(void* block) const noexcept { Q_FreePtr(block); }
-};
-using CKFp_Block = std::unique_ptr<unsigned char, CKFp_FreePtr>;
-
 // Reads a whole regular file into one block. 0 or a recorded failure.
 [[nodiscard]] int CKFp_LoadFile(char const* path, CKFp_Failure& failure, CKFp_Block* block, std::size_t* size);
 

@@ -1,7 +1,7 @@
 #include "frame/services/filewriter.h"
 
 #include "frame/services/memory.h"
-#include "services/chunkfile/sink_private.h"
+#include "services/chunkfile/failure_private.h"
 #include "services/chunkfile/temporaryfile_private.h"
 
 #include <fcntl.h>
@@ -12,6 +12,7 @@
 #include <cstring>
 #include <optional>
 #include <utility>
+#include <vector>
 
 namespace {
 
@@ -97,7 +98,7 @@ private:
     CKFp_TemporaryFile temporary_;
     int stream_ = -1;            // a pipe or a device, instead of the temporary file
     std::uint64_t flushed_ = 0;  // bytes on their way to the disk; what follows is in the buffer
-    CKFp_Buffer buffer_;
+    std::vector<unsigned char, Q_Allocator<unsigned char>> buffer_;
 };
 
 void CKF_FileWriter::Impl::Create(char const* path, CKF_Target kind)

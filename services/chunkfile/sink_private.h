@@ -6,9 +6,48 @@
 #include "frame/services/memory.h"
 #include "services/chunkfile/failure_private.h"
 
-#include <vector>
+#include <cstring>
+#include <memory>
+#include <span>
+#include <utility>
 
-using CKFp_Buffer = std::vector<unsigned char, Q_Allocator<unsigned char>>;
+struct CKFp_FreePtr {
+    void operator()(void* block) const noexcept { Q_FreePtr(block); }
+};
+using CKFp_Block = std::unique_ptr<unsigned char, CKFp_FreePtr>;
+
+// Bytes that come piece by piece. It grows in place where it can: what is written into memory may be a big project, of
+// which doubling would make copies.
+class CKFp_Buffer {
+public:
+    CKFp_Buffer() = default;
+    CKFp_Buffer(CKFp_Buffer&& other) noexcept { *this = std::move(other); }
+    CKFp_Buffer& operator=(CKFp_Buffer&& other) noexcept
+    {
+        bytes_ = std::move(other.bytes_);
+        size_ = std::exchange(other.size_, 0);
+        capacity_ = std::exchange(other.capacity_, 0);
+        return *this;
+    }
+
+    // False when memory is out; nothing has changed then.
+    [[nodiscard]] bool Append(void const* bytes, std::size_t size) noexcept
+    {
+        if (size > capacity_ - size_ && !Grow(size)) return false;
+        std::memcpy(bytes_.get() + size_, bytes, size);
+        size_ += size;
+        return true;
+    }
+    unsigned char* Data() noexcept { return bytes_.get(); }
+    std::span<unsigned char const> Bytes() const noexcept { return {bytes_.get(), size_}; }
+
+private:
+    [[nodiscard]] bool Grow(std::size_t size) noexcept;
+
+    CKFp_Block bytes_;
+    std::size_t size_ = 0;
+    std::size_t capacity_ = 0;
+};
 
 // All operations return 0 or a code, and have recorded the failure.
 class CKFp_Sink : public Q_MemTrackedObject {

@@ -22,10 +22,11 @@ int MakeList(CKFp_Bytes items, short itemSize, int count, SEQ_Head*** list)
 {
     SEQ_Head** made = nullptr;
     if (int const code = SEQ_New(0, itemSize, 4, 1, &made)) return code;
-    if (int const code = SEQ_SetNumItems(count, made, 0)) {
+    if (int const code = count > 0 ? SEQp_SetCapacity(**made, count) : 0) {
         static_cast<void>(SEQ_Dispose(made, 0));  // the first error wins
         return code;
     }
+    (*made)->count = count;
     std::size_t const size = static_cast<std::size_t>(itemSize);
     if (itemSize == (*made)->stride) {
         if (count > 0) std::memcpy((*made)->items, items.data(), items.size());

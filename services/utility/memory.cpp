@@ -1,5 +1,6 @@
 #include "frame/services/memory.h"
 
+#include "services/utility/growptr_private.h"
 #include "services/utility/memorylabels_private.h"
 
 #include <cstdlib>
@@ -79,6 +80,18 @@ void Q_FreePtr(void* block) noexcept
     BlockHead* const head = HeadOf(block);
     head->label->Remove(head->size);
     std::free(head);
+}
+
+void* Q_GrowPtr(void* block, std::size_t size) noexcept
+{
+    if (MustFail() || size > std::numeric_limits<std::size_t>::max() - sizeof(BlockHead)) return nullptr;
+    void* const memory = std::realloc(HeadOf(block), size + sizeof(BlockHead));
+    if (!memory) return nullptr;
+    auto* const head = static_cast<BlockHead*>(memory);
+    head->label->Remove(head->size);
+    head->label->Add(size);
+    head->size = size;
+    return head + 1;
 }
 
 char** Q_AllocateHandleClear(int id, char const* label, std::size_t size) noexcept
