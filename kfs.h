@@ -15,6 +15,7 @@
 #include "frame/timehelpers.h"
 #include "identity/renderoptions.h"
 #include "keystore/attributes.h"
+#include "keystore/batchreads.h"
 #include "keystore/cachestate.h"
 #include "keystore/copykeys.h"
 #include "keystore/edit.h"

@@ -38,6 +38,8 @@ target_link_libraries(kfs_services
 
 set(KFS_LIBRARY_FOLDERS frame tree keystore curves persist overrides identity)
 kfs_sources(librarySources ${KFS_LIBRARY_FOLDERS})
+# Nobody looks at floating-point exceptions, and without them in mind the compiler can make vectors of lanes.
+set_source_files_properties("${PROJECT_SOURCE_DIR}/curves/splinelanes.cpp" PROPERTIES COMPILE_OPTIONS -fno-trapping-math)
 add_library(kfs_objects OBJECT ${librarySources})
 kfs_library_code(kfs_objects)
 kfs_precompile(kfs_objects)

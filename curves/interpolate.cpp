@@ -117,21 +117,46 @@ int EvaluateCurved(KFS_Stream const* stream, Segment keys, int time, double* res
     return 0;
 }
 
+[[gnu::noinline]] int InterpolateAny(KFS_Stream const* stream, Segment segment, int time, double* result)
+{
+    switch (KFSp_GetSegmentKind(segment.a->outInterp, segment.b->inInterp)) {
+    case KFSp_SegmentKind::Linear: InterpolateLinear(stream->GetDimension(), segment, time, result); return 0;
+    case KFSp_SegmentKind::Curved: return EvaluateCurved(stream, segment, time, result);
+    // Codes without a shape hold, so that no read answers what the record held before.
+    case KFSp_SegmentKind::Other:
+    case KFSp_SegmentKind::Hold: break;
+    }
+    std::copy_n(KFSp_Numbers(segment.a), std::max<int>(stream->GetDimension(), 0), result);
+    return 0;
+}
+
+// EvaluateCurved with all that is known put in. False, and `result` untouched, where that has to look.
+[[gnu::always_inline]] inline bool EvaluateOneSpline(KFS_Stream const* stream, Segment keys, int time, double* result)
+{
+    KFSp_TemporalRuns<double const> const from = KFSp_GetTemporalRuns(keys.a, 1);
+    KFSp_TemporalRuns<double const> const to = KFSp_GetTemporalRuns(keys.b, 1);
+    KFSp_TemporalEnd const a{*from.value, *from.outSpeed, *from.outInfluence, true};
+    KFSp_TemporalEnd const b{*to.value, *to.inSpeed, *to.inInfluence, true};
+    double const dt = KFSp_Seconds(keys.b->time, keys.a->time, stream->GetTimeScale());
+    return KFSp_SolveSegment(a, b, KFSp_GetTemporalHandles(a, b, dt), Fraction(keys, time), result);
+}
+
 }  // namespace
 
+// What nearly every read asks is first, without a frame: one component, two linear or two spline sides.
 int KFSp_InterpolateBetween(KFS_Stream const* stream, KFS_KeyScalar const* a, KFS_KeyScalar const* b, int time,
                             double* result)
 {
     Segment const segment{a, b};
-    switch (KFSp_GetSegmentKind(a->outInterp, b->inInterp)) {
-    case KFSp_SegmentKind::Linear: InterpolateLinear(stream->GetDimension(), segment, time, result); return 0;
-    case KFSp_SegmentKind::Curved: return EvaluateCurved(stream, segment, time, result);
-    // Codes without a shape hold, so that no read answers what the record held before.
-    case KFSp_SegmentKind::Other: std::copy_n(KFSp_Numbers(a), stream->GetDimension(), result); return 0;
-    case KFSp_SegmentKind::Hold: break;
+    if (stream->GetDimension() == 1 && a->outInterp == b->inInterp) [[likely]] {
+        bool const mayFall = (stream->GetKFSFlags() & KFS_StreamFlag_NonDecreasing) == 0;
+        if (a->outInterp == KFS_Interp_Spline && mayFall && EvaluateOneSpline(stream, segment, time, result)) return 0;
+        if (a->outInterp == KFS_Interp_Linear) {
+            InterpolateLinear(1, segment, time, result);
+            return 0;
+        }
     }
-    std::copy_n(KFSp_Numbers(a), std::max<int>(stream->GetDimension(), 0), result);
-    return 0;
+    return InterpolateAny(stream, segment, time, result);
 }
 
 int KFSp_Interpolate(KFS_Stream const* stream, long, int time, int keyIndex)

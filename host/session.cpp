@@ -109,8 +109,10 @@ void PutExternal(KFS_Stream const* stream, int time, double const* numbers, std:
 
 }  // namespace
 
+// Keys that no bag overrides are read as they are.
 ExpState::ExpState()
-    : canRun_(boost::make_shared<ExprContext>(true)),
+    : KFS_ExpState(KeyReads::Plain),
+      canRun_(boost::make_shared<ExprContext>(true)),
       canNotRun_(boost::make_shared<ExprContext>(false))
 {}
 

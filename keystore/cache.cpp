@@ -10,6 +10,7 @@
 #include "keystore/items_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/pins_private.h"
+#include "keystore/shortread_private.h"
 #include "keystore/valuedata_private.h"
 
 #include <cstring>
@@ -223,5 +224,8 @@ void KFSp_UpdateCacheToTime(KFS_Stream const* stream, KFS_StreamKeyData const* d
 
 void KFSp_UpdateCacheToTime(KFS_Stream const* stream, KFS_StreamKeyData const* data, int time)
 {
-    UpdateCache(stream, data, time, PlainRequest{});
+    if (KFSp_IsPlain(stream) && stream->HasKeys() && KFSp_HasShortKeys(data)) [[likely]]
+        KFSp_ThrowIf(KFSp_BringShort(stream, data, time));
+    else
+        UpdateCache(stream, data, time, PlainRequest{});
 }

@@ -4,6 +4,9 @@
 
 #include <boost/make_shared.hpp>
 
+#include <mutex>
+#include <utility>
+
 // What a render sees in place of a stream: a leaf without a name and a place, with what the stream was when the copy was
 // made. So reads on it need to know nothing of copies, and cost what they cost elsewhere.
 struct KFSp_StandIn {
@@ -25,30 +28,67 @@ void KFS_StreamCacheState::Activate() {}
 
 void KFS_StreamCacheState::Deactivate() {}
 
-KFS_StreamKeyData* KFS_StreamCacheState::GetOverrideKeyData(KFS_Stream const* stream, KFS_StreamKeyData const& source)
+namespace {
+
+// The numbers of streams that renders have asked for. Those given back are given out again, so that a render's table is
+// no longer than there were such streams at a time.
+struct Slots {
+    std::mutex lock;
+    std::vector<unsigned int> free;
+    unsigned int given = 0;
+};
+
+// Never destroyed: streams may end at exit.
+Slots& AllSlots()
 {
-    if (stream == lastStream_) return lastKeyData_;
-    boost::shared_ptr<KFS_StreamKeyData>& entry = keyData_[stream];
-    if (!entry) {
-        boost::shared_ptr<KFSp_StandIn> const standIn = boost::make_shared<KFSp_StandIn>(*stream, source);
-        entry = boost::shared_ptr<KFS_StreamKeyData>(standIn, &standIn->stream.keyData_);
+    static Slots* const slots = new Slots;
+    return *slots;
+}
+
+}  // namespace
+
+std::size_t KFS_StreamCacheState::TakeSlot(KFS_Stream const* stream)
+{
+    Slots& slots = AllSlots();
+    std::lock_guard<std::mutex> const lock(slots.lock);
+    unsigned int slot = stream->renderSlot_.load(std::memory_order_relaxed);
+    if (slot != 0) return slot;
+    if (slots.free.empty()) {
+        slots.free.reserve(slots.given + std::size_t{1});  // so that nobody fails to give one back
+        slot = ++slots.given;
+    } else {
+        slot = slots.free.back();
+        slots.free.pop_back();
     }
-    lastStream_ = stream;
-    lastKeyData_ = entry.get();
-    return lastKeyData_;
+    stream->renderSlot_.store(slot, std::memory_order_relaxed);
+    return slot;
 }
 
-KFS_StreamKeyData* KFS_StreamCacheState::Find(KFS_Stream const* stream) const
+void KFS_StreamCacheState::GiveBackSlot(KFS_Stream const* stream)
 {
-    auto const place = keyData_.find(stream);
-    return place == keyData_.end() ? nullptr : place->second.get();
+    unsigned int const slot = stream->renderSlot_.exchange(0, std::memory_order_relaxed);
+    if (slot == 0) return;
+    Slots& slots = AllSlots();
+    std::lock_guard<std::mutex> const lock(slots.lock);
+    slots.free.push_back(slot);
 }
 
-// Copies are taken out of the map before they end: a client's dispose function runs then, and may read.
+// Making the copy may run a client's copy function, which may read in this render: the table grows only afterwards.
+KFS_StreamKeyData* KFS_StreamCacheState::MakeCopy(KFS_Stream const* stream, KFS_StreamKeyData const& source)
+{
+    std::size_t const slot = TakeSlot(stream);
+    boost::shared_ptr<KFSp_StandIn> const standIn = boost::make_shared<KFSp_StandIn>(*stream, source);
+    Copy copy{stream, boost::shared_ptr<KFS_StreamKeyData>(standIn, &standIn->stream.keyData_)};
+    if (slot >= copies_.size()) copies_.resize(slot + 1);
+    std::swap(copies_[slot], copy);  // what a stream left here that has ended goes at the end of this scope
+    return copies_[slot].data.get();
+}
+
+// Copies are taken out of the table before they end: a client's dispose function runs then, and may read.
 void KFS_StreamCacheState::Forget(KFS_Stream const* stream)
 {
-    if (stream == lastStream_) lastStream_ = nullptr;
-    auto const ending = keyData_.extract(stream);
+    if (!Find(stream)) return;
+    Copy const ending = std::exchange(copies_[stream->renderSlot_.load(std::memory_order_relaxed)], Copy());
 }
 
 void KFS_StreamCacheState::ForgetExpressionCache(KFS_ExprInfo const* info)
@@ -58,10 +98,8 @@ void KFS_StreamCacheState::ForgetExpressionCache(KFS_ExprInfo const* info)
 
 void KFS_StreamCacheState::FreeCacheData()
 {
-    lastStream_ = nullptr;
-    lastKeyData_ = nullptr;
-    decltype(keyData_) endingData;
-    endingData.swap(keyData_);
+    decltype(copies_) endingData;
+    endingData.swap(copies_);
     decltype(expressionCaches_) endingCaches;
     endingCaches.swap(expressionCaches_);
 }

@@ -23,6 +23,21 @@
 [[nodiscard]] int KFSp_InterpolateBetween(KFS_Stream const* stream, KFS_KeyScalar const* a, KFS_KeyScalar const* b,
                                           int time, double* result);
 
+// Segments to be solved side by side: of each one component between two spline sides, on a stream whose curves may fall.
+struct KFSp_SplineLanes {
+    static constexpr int Count = 32;
+
+    // Of the segment: units from key to key and from the first key to the time, and the units of a second.
+    double span[Count], part[Count], scale[Count];
+    // Of the first key, and of the last.
+    double value0[Count], outSpeed[Count], outInfluence[Count];
+    double value3[Count], inSpeed[Count], inInfluence[Count];
+    // What KFSp_InterpolateBetween answers, to the last bit; where `solved` is 0.0 it has to be asked.
+    double result[Count], solved[Count];
+};
+// Solves the first `count` lanes, and may write the results of others.
+void KFSp_SolveSplineLanes(KFSp_SplineLanes* lanes, int count);
+
 // The interpolation function of spatial streams: the position on the path, see curves/spatial_private.h.
 // KFS_Err_Only2D3D (operation 45) where arc-length parametrisation or automatic tangents meet another dimension;
 // KFS_Err_InterpNotAllowed, unreported, for codes other than linear, spline and hold.

@@ -7,6 +7,7 @@
 #include "frame/report_private.h"
 #include "frame/services/memory.h"
 #include "frame/timehelpers.h"
+#include "keystore/batchreads.h"
 #include "keystore/cache_private.h"
 #include "keystore/check_private.h"
 #include "keystore/expstate.h"
@@ -14,10 +15,12 @@
 #include "keystore/keylist_private.h"
 #include "keystore/renderstates_private.h"
 #include "keystore/savedrecords_private.h"
+#include "keystore/shortread_private.h"
 #include "keystore/valuedata_private.h"
 #include "overrides/parambag.h"
 
 #include <algorithm>
+#include <array>
 #include <cstring>
 #include <new>
 #include <utility>
@@ -72,11 +75,6 @@ struct Reading {
     int flags;
     KFS_ParamBag const* bag;
 };
-
-bool AnswersFromFollowers(KFS_Stream const* stream, void const* value)
-{
-    return value && stream->GetParent() && !stream->IsCanonical() && stream->AreDimensionsSeparated();
-}
 
 // What stands in a follower's place may be a group, or a leaf that has no room for its value there.
 bool IsFollower(KFS_Stream const* leaf)
@@ -161,7 +159,7 @@ template <class Form, class ReadKeys>
 int ReadStaged(Reading const& reading, Q_RenderContext const* context, typename Form::Value* value,
                unsigned char* atKey, ReadKeys const& readKeys)
 {
-    if (AnswersFromFollowers(reading.stream, value)) [[unlikely]]
+    if (value && KFSp_AnswersFromFollowers(reading.stream)) [[unlikely]]
         return ReadFollowers(reading, static_cast<double*>(value));
     KFS_ExpState* const state = context ? KFSp_GetRenderStates(context).expState : nullptr;
     if (!state) [[unlikely]]
@@ -190,16 +188,46 @@ bool BringCache(KFS_StreamKeyData const* data, int time, KFSp_CacheRequest reque
     return request.wantsValue && seen->GetDimension() >= 1 && (!request.keyOnly || found);
 }
 
+// KFS_AddTime in the time's own scale; its common case is one addition.
+int Step(T_Time const* step, T_Time* time)
+{
+    int next = 0;
+    if (step->scale != time->scale || time->scale == 0 || __builtin_add_overflow(time->value, step->value, &next))
+        return KFS_AddTime(step, time, 0, time);
+    time->value = next;
+    return 0;
+}
+
+// A few steps along the time line at a time, so that they are read together.
+int ReadSteps(KFS_Stream const* stream, T_Time time, T_Time const* step, int count, int flags, int dimension,
+              double* values)
+{
+    std::array<T_Time, 64> times;
+    for (int done = 0; done < count;) {
+        int number = 0;
+        int steps = 0;  // the code of the step after the last time
+        while (number < static_cast<int>(times.size()) && done + number < count && steps == 0) {
+            times[static_cast<std::size_t>(number++)] = time;
+            if (done + number < count) steps = Step(step, &time);
+        }
+        double* const to = values + static_cast<std::ptrdiff_t>(done) * dimension;
+        if (int const code = KFS_ReadTimes(stream, times.data(), number, flags, to, nullptr)) return code;
+        if (steps != 0) return steps;
+        done += number;
+    }
+    return 0;
+}
+
 int ReadSamples(KFS_Stream const* stream, T_Time time, T_Time const* step, int count, int flags, double* values)
 {
-    bool const separated = stream->GetParent() && stream->AreDimensionsSeparated();
-    std::vector<KFS_Stream const*> followers;
-    if (separated) stream->GetSeparationFollowers(followers);
     int const dimension = KFSp_Seen(stream)->GetDimension();
+    if (!stream->GetParent() || !stream->AreDimensionsSeparated())
+        return ReadSteps(stream, time, step, count, flags, dimension, values);
+    std::vector<KFS_Stream const*> followers;
+    stream->GetSeparationFollowers(followers);
     for (int sample = 0; sample < count; ++sample, values += dimension) {
         KFSp_FirstError error;
-        if (!separated) error.Keep(KFS_GetValueFPlus(stream, &time, flags, values, nullptr, nullptr));
-        for (int d = 0; separated && d < dimension && error.None(); ++d) {
+        for (int d = 0; d < dimension && error.None(); ++d) {
             values[d] = 0.0;
             auto const place = static_cast<std::size_t>(d);
             if (place < followers.size() && IsFollower(followers[place]))
@@ -219,8 +247,18 @@ int KFS_GetValue(KFS_Stream const* stream, T_Time const* time, unsigned char, vo
     return KFS_GetValuePlus(stream, time, 0, value, atKey, bag, nullptr, 0);
 }
 
-int KFS_GetValuePlus(KFS_Stream const* stream, T_Time const* time, int flags, void* value, unsigned char* atKey,
-                     KFS_ParamBag const* bag, KFS_InterpFunc* interpFunc, long refcon)
+namespace {
+
+int CopyExternalOut(KFS_Stream const* seen, void const* from, void* value)
+{
+    KFS_CopyItemFunc const copy = KFSp_OutwardFunc(seen);
+    return copy(KFSp_HandedTo(copy, seen), seen->GetItemRefcon(), KFS_Item_CacheValue, from, value);
+}
+
+// The read stage by stage.
+[[gnu::noinline]] int ReadExternalStaged(KFS_Stream const* stream, T_Time const* time, int flags, void* value,
+                                         unsigned char* atKey, KFS_ParamBag const* bag, KFS_InterpFunc* interpFunc,
+                                         long refcon)
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_GetValue, stream, KFSp_Row_GetValue)) return code;
     return KFSp_Boundary([&] {
@@ -236,14 +274,8 @@ int KFS_GetValuePlus(KFS_Stream const* stream, T_Time const* time, int flags, vo
     });
 }
 
-int KFS_GetValueF(KFS_Stream const* stream, T_Time const* time, unsigned char, double* value, unsigned char* atKey,
-                  KFS_ParamBag const* bag)
-{
-    return KFS_GetValueFPlus(stream, time, 0, value, atKey, bag);
-}
-
-int KFS_GetValueFPlus(KFS_Stream const* stream, T_Time const* time, int flags, double* value, unsigned char* atKey,
-                      KFS_ParamBag const* bag)
+[[gnu::noinline]] int ReadDoublesStaged(KFS_Stream const* stream, T_Time const* time, int flags, double* value,
+                                        unsigned char* atKey, KFS_ParamBag const* bag)
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_GetValue, stream, KFSp_Row_GetValue)) return code;
     return KFSp_Boundary([&] {
@@ -261,6 +293,62 @@ int KFS_GetValueFPlus(KFS_Stream const* stream, T_Time const* time, int flags, d
     });
 }
 
+// The ends of short reads, which may ask the stream's class. Apart, so that what comes before needs no way out for a throw.
+[[gnu::noinline]] int EndExternal(KFS_Stream const* seen, void const* from, void* value)
+{
+    return KFSp_Boundary([&] { return CopyExternalOut(seen, from, value); });
+}
+
+[[gnu::noinline]] int EndDoubles(KFS_Stream const* stream, KFS_Stream const* seen, void const* from, double* value)
+{
+    return KFSp_Boundary([&] { return KFSp_CopyDoublesOut(stream, seen, from, value); });
+}
+
+}  // namespace
+
+bool KFSp_MayAnswerFromFollowers(KFS_Stream const* stream) noexcept
+{
+    try {
+        return KFSp_AnswersFromFollowers(stream);
+    } catch (...) {
+        return true;
+    }
+}
+
+int KFS_GetValuePlus(KFS_Stream const* stream, T_Time const* time, int flags, void* value, unsigned char* atKey,
+                     KFS_ParamBag const* bag, KFS_InterpFunc* interpFunc, long refcon)
+{
+    KFSp_ShortRead read;
+    if (!time || !value || atKey || bag || interpFunc)
+        return ReadExternalStaged(stream, time, flags, value, atKey, bag, interpFunc, refcon);
+    int code = 0;
+    if (!KFSp_IsShortRead(stream, KFSp_PeekRenderContext(), time, flags, &read) || !KFSp_BringShort(read, &code))
+        return ReadExternalStaged(stream, time, flags, value, nullptr, nullptr, nullptr, refcon);
+    if (code != 0) return code;
+    return EndExternal(read.seen, KFSp_ValueData(read.data->cache), value);
+}
+
+int KFS_GetValueF(KFS_Stream const* stream, T_Time const* time, unsigned char, double* value, unsigned char* atKey,
+                  KFS_ParamBag const* bag)
+{
+    return KFS_GetValueFPlus(stream, time, 0, value, atKey, bag);
+}
+
+int KFS_GetValueFPlus(KFS_Stream const* stream, T_Time const* time, int flags, double* value, unsigned char* atKey,
+                      KFS_ParamBag const* bag)
+{
+    KFSp_ShortRead read;
+    if (!time || !value || atKey || bag) [[unlikely]]
+        return ReadDoublesStaged(stream, time, flags, value, atKey, bag);
+    int code = 0;
+    if (!KFSp_IsShortRead(stream, KFSp_PeekRenderContext(), time, flags, &read) || !KFSp_BringShort(read, &code))
+        [[unlikely]]
+        return ReadDoublesStaged(stream, time, flags, value, nullptr, nullptr);
+    if (code != 0) [[unlikely]]
+        return code;
+    return EndDoubles(stream, read.seen, KFSp_ValueData(read.data->cache), value);
+}
+
 void KFS_GetValueNoExpr(KFS_Stream const* stream, int time, unsigned char keyOnly, void* value, unsigned char* atKey,
                         void const* source, KFS_InterpFunc* interpFunc, long refcon)
 {
@@ -268,26 +356,8 @@ void KFS_GetValueNoExpr(KFS_Stream const* stream, int time, unsigned char keyOnl
     KFS_StreamKeyData const* const data = stream->GetKeyData();
     KFS_Stream const* const seen = data->stream;
     if (!BringCache(data, time, {keyOnly != 0, value != nullptr, atKey, interpFunc, refcon})) return;
-    KFS_CopyItemFunc const copy = KFSp_OutwardFunc(seen);
-    void const* const from = source ? source : KFSp_ValueData(data->cache);
-    KFSp_ThrowIf(copy(KFSp_HandedTo(copy, seen), seen->GetItemRefcon(), KFS_Item_CacheValue, from, value));
+    KFSp_ThrowIf(CopyExternalOut(seen, source ? source : KFSp_ValueData(data->cache), value));
 }
-
-namespace {
-
-// What nearly all streams are read for: a few doubles, without a call for some bytes. False where there are more.
-inline bool CopyFewDoubles(int count, void const* from, double* to)
-{
-    switch (count) {
-    case 1: std::memcpy(to, from, sizeof *to); return true;
-    case 2: std::memcpy(to, from, 2 * sizeof *to); return true;
-    case 3: std::memcpy(to, from, 3 * sizeof *to); return true;
-    case 4: std::memcpy(to, from, 4 * sizeof *to); return true;
-    default: return false;
-    }
-}
-
-}  // namespace
 
 void KFS_GetValueFNoExpr(KFS_Stream const* stream, int time, unsigned char keyOnly, double* value, unsigned char* atKey,
                          void const* source)
@@ -297,9 +367,7 @@ void KFS_GetValueFNoExpr(KFS_Stream const* stream, int time, unsigned char keyOn
     KFS_Stream const* const seen = data->stream;
     if (seen->IsCustom()) throw KFSp_RefuseCustomValue(KFSp_Op_GetValuesFRefusal, KFSp_Row_ComputeFloatValues);
     if (!BringCache(data, time, {keyOnly != 0, value != nullptr, atKey})) return;
-    void const* const from = source ? source : KFSp_ValueData(data->cache);
-    if (!stream->IsFloatBased() && CopyFewDoubles(seen->GetDimension(), from, value)) return;
-    KFSp_ThrowIf(KFSp_FakeCopyItemFunc(seen, 0, KFS_Item_CacheValue, from, value));
+    KFSp_ThrowIf(KFSp_CopyDoublesOut(stream, seen, source ? source : KFSp_ValueData(data->cache), value));
 }
 
 namespace {

@@ -34,7 +34,7 @@ public:
     // has, since that is what the caller's buffer holds.
     virtual void EvalExprValueF(KFS_Stream const* stream, int time, int flags, double* value,
                                 KFS_ParamBag const* bag) = 0;
-    // Ends in KFS_GetValueFNoExpr.
+    // Ends in KFS_GetValueFNoExpr. Not called where the state has promised that this is all it does (KeyReads).
     virtual void EvalNoExprValueF(KFS_Stream const* stream, int time, int flags, double* value, unsigned char* atKey,
                                   KFS_ParamBag const* bag) = 0;
     // May replace stream and time, and may fill `newBag` with overrides that hold for the expression.
@@ -47,8 +47,42 @@ public:
     mutable bool detectingErrors = false;
     mutable int errorCount = 0;
 
+    // Whether the state has promised KeyReads::Plain.
+    bool ReadsKeysPlainly() const { return keyReads_ == KeyReads::Plain; }
+
 protected:
-    KFS_ExpState() = default;
+    // What a state says of its EvalNoExprValue and EvalNoExprValueF.
+    enum class KeyReads : unsigned char {
+        Asked,  // they are called for each read
+        // Without a bag they do nothing but call KFS_GetValueNoExpr and KFS_GetValueFNoExpr with what they were given, a
+        // `keyOnly` of 0 and no `source`. So the library needn't call them for such reads, which costs less. A promise of
+        // the class for all that derive from it.
+        Plain,
+    };
+    explicit KFS_ExpState(KeyReads keyReads = KeyReads::Asked) : keyReads_(keyReads) {}
+
+private:
+    KeyReads keyReads_;
+};
+
+// The state of a host that has no expression engine, and whose bags have no say over keys: every read is one of the keys.
+class KFS_API KFS_KeysExpState final : public KFS_ExpState {
+public:
+    KFS_KeysExpState() : KFS_ExpState(KeyReads::Plain) {}
+
+    // No expression has a value: both throw KFS_Err_ExprNoValue.
+    void EvalExprValue(KFS_Stream const* stream, int time, int flags, void* value, KFS_ParamBag const* bag) override;
+    void EvalExprValueF(KFS_Stream const* stream, int time, int flags, double* value, KFS_ParamBag const* bag) override;
+    // The bag isn't looked at.
+    void EvalNoExprValue(KFS_Stream const* stream, int time, int flags, void* value, unsigned char* atKey,
+                         KFS_ParamBag const* bag, KFS_InterpFunc* interpFunc, long refcon) override;
+    void EvalNoExprValueF(KFS_Stream const* stream, int time, int flags, double* value, unsigned char* atKey,
+                          KFS_ParamBag const* bag) override;
+    // Changes nothing.
+    void ResolveExprTarget(KFS_Stream const** stream, int* time, KFS_ParamBag const* bag,
+                           KFS_ParamBag* newBag) override;
+    // Null: no expression can run.
+    boost::shared_ptr<KFS_ExprContext> GetExprContext(KFS_Stream const* stream) override;
 };
 
 // For a scope, expression errors are looked for rather than reported. Scopes nest; the end of the outermost clears the

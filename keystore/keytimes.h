@@ -40,7 +40,18 @@ public:
     int LowerBound(int time) const noexcept;
     int operator[](int index) const noexcept { return times_[static_cast<std::size_t>(index)]; }
 
+    // Whether all times ascend as numbers and lie within Near of zero, so that their order and that of any other such
+    // time is the order of numbers: differences can't wrap around.
+    bool IsNarrow() const noexcept { return narrow_; }
+    static bool IsNear(int time) noexcept
+    {
+        return static_cast<unsigned int>(time) + static_cast<unsigned int>(Near) < 2U * static_cast<unsigned int>(Near);
+    }
+    int const* Data() const noexcept { return times_.data(); }
+
 private:
+    static constexpr int Near = 1 << 30;
+
     int Search(int time) const noexcept;
     void Changed() noexcept;
 
@@ -48,11 +59,12 @@ private:
     int falls_ = 0;  // how many times, as numbers, aren't above the one before
     bool mirrors_ = false;
     bool ordered_ = false;          // ascending also without wrap-around, so that neighbours enclose a time for sure
+    bool narrow_ = false;           // ordered_, and all of them within Near of zero
     mutable bool walking_ = false;  // the last search ended where the one before did, or one key on
     mutable int last_ = 0;
 };
 
-inline int KFS_KeyTimes::LowerBound(int time) const noexcept
+[[gnu::always_inline]] inline int KFS_KeyTimes::LowerBound(int time) const noexcept
 {
     if (walking_) {
         int const* const at = times_.data() + last_;  // there is a key before it and one after it
@@ -74,6 +86,7 @@ inline int KFS_KeyTimes::LowerBound(int time) const noexcept
                          static_cast<unsigned int>(time) - static_cast<unsigned int>(times_.front()) < 1U << 31;
     if (!follows) return false;
     times_.push_back(time);
+    narrow_ = narrow_ && IsNear(time);
     walking_ = false;
     return true;
 }

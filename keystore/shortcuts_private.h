@@ -1,11 +1,12 @@
-// The only place where the library reaches into its own services instead of asking them: the items of a list, and the
-// kernel's solve, which a read can't afford to call. That ties libkfs to these services, and KFS_Birth refuses others.
-// Built with KFS_FOREIGN_SERVICES the library asks for everything, and any services will do: each function here then has
-// nothing to give, and its caller takes the way through the operations, with the same answers.
+// The only place where the library reaches into its own services instead of asking them: the items of a list, the
+// kernel's solve and the thread's render context, which a read can't afford to call. That ties libkfs to these services,
+// and KFS_Birth refuses others. Built with KFS_FOREIGN_SERVICES the library asks for everything, and any services will do:
+// each function here then has nothing to give, and its caller takes the way through the operations, with the same answers.
 //
 // All of it is inlined always: a test links objects of both builds, and must not get one's function for the other.
 #pragma once
 
+#include "frame/services/context.h"
 #include "frame/services/sequence.h"
 
 #ifdef KFS_FOREIGN_SERVICES
@@ -13,8 +14,19 @@ inline constexpr bool KFSp_HasShortcuts = false;
 #else
 #include "services/curvekernel/solve_private.h"
 #include "services/sequence/list_private.h"
+#include "services/utility/context_private.h"
 inline constexpr bool KFSp_HasShortcuts = true;
 #endif
+
+// Q_RenderContext::PeekCurrent.
+[[gnu::always_inline]] inline Q_RenderContext const* KFSp_PeekRenderContext()
+{
+#ifdef KFS_FOREIGN_SERVICES
+    return Q_RenderContext::PeekCurrent();
+#else
+    return Qp_currentRenderContext;
+#endif
+}
 
 // Two neighbours of a list, read-only, without a call: there is an item at `index` and one after it. A list whose items
 // may move has to be pinned while both are looked at. Null where the list can't be read.
@@ -60,6 +72,17 @@ struct KFSp_ItemPair {
     if ((*list)->dispose) return false;
     --(*list)->count;
     return true;
+#endif
+}
+
+// An item of a list that has one at `index`, read-only, without a call. Null where the list can't be read.
+[[gnu::always_inline]] inline void const* KFSp_GetItem(SEQ_Head const* const* list, int index)
+{
+#ifdef KFS_FOREIGN_SERVICES
+    void const* item = nullptr;
+    return SEQ_GetConstAddress(list, index, &item) == 0 ? item : nullptr;
+#else
+    return SEQp_Item(**list, index);
 #endif
 }
 

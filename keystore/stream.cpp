@@ -127,12 +127,12 @@ KFS_Stream::KFS_Stream(short dimension, unsigned int timeScale, unsigned char no
                        unsigned short interpMask, unsigned short spInterpMask, KFS_ValueDesc const& valueDesc,
                        KFS_MatchName const* matchName, KFS_StreamFactory* factory, bool canonical)
     : KFS_StreamBase(matchName, factory, canonical),
-      stamp_(KFS_StreamValidStamp),
-      dimension_(dimension),
+      multiplier_{1.0, 1.0, 1.0, 1.0},
       spInterpMask_(spInterpMask),
       interpMask_(interpMask),
+      stamp_(KFS_StreamValidStamp),
+      dimension_(dimension),
       timeScale_(timeScale),
-      multiplier_{1.0, 1.0, 1.0, 1.0},
       interpFunc_(KFSp_Interpolate)
 {
     if (noKeys) kfsFlags_ |= KFS_StreamFlag_NoKeys;
@@ -252,6 +252,7 @@ KFS_Stream::~KFS_Stream()
     if (std::exchange(isWhole_, false) && context && context->GetIsTempCloneContext()) {
         if (KFS_StreamCacheState* const state = KFSp_GetRenderStates(context).cacheState) state->Forget(this);
     }
+    KFS_StreamCacheState::GiveBackSlot(this);
     static_cast<void>(KFSp_CheckStream(KFSp_Op_StreamDestroy, this, KFSp_Row_Dispose));
     if (keyData_.cache) static_cast<void>(KFSp_ClearCacheRecord(this, keyData_.cache));
     KFSp_DisposeKeyList(std::exchange(keyData_.keys, nullptr));

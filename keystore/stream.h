@@ -332,7 +332,8 @@ public:
 
 private:
     friend class KFS_StreamCacheState;
-    friend struct KFSp_StandIn;  // makes them
+    friend struct KFSp_StandIn;      // makes them
+    friend struct KFSp_KeyDataDoor;  // reads that have the thread's context at hand
 
     // The stand-in for `original` in a render's copy of its key data.
     explicit KFS_Stream(KFS_Stream const& original, KFS_StreamKeyData const& source);
@@ -341,29 +342,33 @@ private:
     void CopyKeysFrom(KFS_Stream const& source);
     void CopyExpressionFrom(KFS_Stream const& source);
 
+    // What is rarely looked at.
     KFS_Stream const* original_ = this;
+    double accuracy_ = 0.0001;
+    M_Vector4T<double> multiplier_;
+    bool temporarilyNonCustom_ = false;
+    bool expressionErrorsAreQuiet_ = false;
     // While it is made and unmade, a stream has its own key data alone.
     bool isWhole_ = false;
-    unsigned short stamp_;
-    short dimension_;
-    unsigned short kfsFlags_ = 0;
     unsigned short spInterp_ = KFS_SpInterp_None;
     unsigned short spInterpMask_;
     unsigned short interpMask_;
+    unsigned int disabledUpdateCount_ = 0;
+    unsigned int disabledLegalizeCount_ = 0;
+    mutable std::atomic<unsigned int> lastIndexInLayout_{0};  // a guess: reads of a separated leader ask each time
+    // What each read looks at, side by side.
+    KFS_CopyItemFunc copyItemFunc_ = nullptr;
+    // By which renders find their copies; 0 until the first one asks.
+    mutable std::atomic<unsigned int> renderSlot_{0};
+    unsigned short stamp_;
+    short dimension_;
+    unsigned short kfsFlags_ = 0;
     unsigned int timeScale_;
-    double accuracy_ = 0.0001;
-    M_Vector4T<double> multiplier_;
     KFS_ValueDesc valueDesc_;
     KFS_InterpFunc interpFunc_;
-    KFS_CopyItemFunc copyItemFunc_ = nullptr;
     KFS_DisposeItemFunc disposeItemFunc_ = nullptr;
     KFS_ExprInfo exprInfo_;
     KFS_StreamKeyData keyData_{this};
-    bool temporarilyNonCustom_ = false;
-    unsigned int disabledUpdateCount_ = 0;
-    unsigned int disabledLegalizeCount_ = 0;
-    bool expressionErrorsAreQuiet_ = false;
-    mutable std::atomic<unsigned int> lastIndexInLayout_{0};  // a guess: reads of a separated leader ask each time
 };
 
 // Changes what a value of the stream is; the old description goes to `oldDesc` if that isn't null, and a null `newDesc`

@@ -115,23 +115,47 @@ inline bool CRVp_SteepRoot(double a, double b, double u, double& root)
     return CRVp_IsRoot(cubic, target, t);
 }
 
-// The root of cubic(t) = u for the handles a and b of a unit cubic, in all but the rare cases. False where only
-// CRVp_ReachSlow can tell: `t` has no meaning then. A NaN passes no comparison.
-inline bool CRVp_UnitRoot(double a, double b, double u, double& t)
+// Handles from 0 to 1 and a u in the segment. A NaN passes no comparison.
+inline bool CRVp_IsOrdered(double a, double b, double u)
 {
     double const least = CRVp_Min(CRVp_Min(a, b), u);
     double const most = CRVp_Max(a, b);
-    bool const ordered = (least >= 0.0) & (most <= 1.0) & (u < 1.0);
-    if (!ordered) return false;
+    return (least >= 0.0) & (most <= 1.0) & (u < 1.0);
+}
+
+// Both influences one third, up to the rounding of the handles: the coordinate is linear in t.
+inline bool CRVp_IsStraight(CRVp_UnitCubic const& cubic)
+{
+    return std::fabs(cubic.a3) + std::fabs(cubic.a2) <= 4e-15;
+}
+
+// The root of cubic(t) = u for the handles a and b of a unit cubic, in all but the rare cases. False where only
+// CRVp_ReachSlow can tell: `t` has no meaning then.
+inline bool CRVp_UnitRoot(double a, double b, double u, double& t)
+{
+    if (!CRVp_IsOrdered(a, b, u)) return false;
     CRVp_UnitCubic const cubic = CRVp_UnitCubic::FromHandles(a, b);
 
-    // Both influences one third, up to the rounding of the handles: the coordinate is linear in t.
-    if (std::fabs(cubic.a3) + std::fabs(cubic.a2) <= 4e-15) {
+    if (CRVp_IsStraight(cubic)) {
         t = u;
         return true;
     }
     t = CRVp_HalleySteps(cubic, u, u);
     return CRVp_IsRoot(cubic, u, t) || CRVp_SteepRoot(a, b, u, t);
+}
+
+// CRVp_UnitRoot for code that mustn't branch: `isRoot` is 1.0, or 0.0 where CRVp_UnitRoot has to be asked. It finds fewer
+// roots, and the same.
+struct CRVp_UnitAnswer {
+    double t, isRoot;
+};
+inline CRVp_UnitAnswer CRVp_UnitRootInLane(double a, double b, double u)
+{
+    bool const ordered = CRVp_IsOrdered(a, b, u);
+    CRVp_UnitCubic const cubic = CRVp_UnitCubic::FromHandles(a, b);
+    bool const straight = CRVp_IsStraight(cubic);
+    double const stepped = CRVp_HalleySteps(cubic, u, u);
+    return {straight ? u : stepped, ordered & (straight | CRVp_IsRoot(cubic, u, stepped)) ? 1.0 : 0.0};
 }
 
 // An extent of 0 and one that overflows end in a NaN here, and so at CRVp_ReachSlow.

@@ -1,4 +1,4 @@
-#include "frame/services/context.h"
+#include "services/utility/context_private.h"
 
 #include "frame/services/reports.h"
 
@@ -11,29 +11,43 @@
 #include <unordered_set>
 #include <utility>
 
+constinit thread_local Q_RenderContext* Qp_currentRenderContext = nullptr;
+
 namespace {
+
+constinit thread_local Q_Context* currentContext = nullptr;
 
 // One thread's current object: the owner, and beside it the bare pointer, which can be read without the check whether
 // the thread has constructed its owner yet.
-template <class T>
+template <class T, T*& (*Bare)()>
 struct Current {
-    static inline thread_local T* bare = nullptr;
     static inline thread_local boost::shared_ptr<T> owner;
 
     static boost::shared_ptr<T> Set(boost::shared_ptr<T> next) noexcept
     {
-        bare = next.get();
+        Bare() = next.get();
         owner.swap(next);
         return next;
     }
 
     static boost::shared_ptr<T> Get(bool tolerateNone, char const* complaint)
     {
-        if (bare) return owner;
+        if (Bare()) return owner;
         if (!tolerateNone) Q_ReportFailedVerification(0, 0, 0, complaint);
         return {};
     }
 };
+
+Q_Context*& BareContext()
+{
+    return currentContext;
+}
+Q_RenderContext*& BareRenderContext()
+{
+    return Qp_currentRenderContext;
+}
+using CurrentContext = Current<Q_Context, BareContext>;
+using CurrentRenderContext = Current<Q_RenderContext, BareRenderContext>;
 
 constexpr char const* NoContext = "there is no current context";
 constexpr char const* NoRenderContext = "there is no current render context";
@@ -66,12 +80,12 @@ Q_Context::~Q_Context() = default;
 
 bool Q_Context::HasCurrent() noexcept
 {
-    return Current<Q_Context>::bare != nullptr;
+    return currentContext != nullptr;
 }
 
 boost::shared_ptr<Q_Context> Q_Context::GetCurrent(bool tolerateNone)
 {
-    return Current<Q_Context>::Get(tolerateNone, NoContext);
+    return CurrentContext::Get(tolerateNone, NoContext);
 }
 
 boost::shared_ptr<Q_Context const> Q_Context::GetCurrentConst(bool tolerateNone)
@@ -81,7 +95,7 @@ boost::shared_ptr<Q_Context const> Q_Context::GetCurrentConst(bool tolerateNone)
 
 Q_Context* Q_Context::PeekCurrent() noexcept
 {
-    return Current<Q_Context>::bare;
+    return currentContext;
 }
 
 Q_RenderState::~Q_RenderState() = default;
@@ -97,12 +111,12 @@ Q_RenderContext::~Q_RenderContext() = default;
 
 boost::shared_ptr<Q_RenderContext> Q_RenderContext::GetCurrent(bool tolerateNone)
 {
-    return Current<Q_RenderContext>::Get(tolerateNone, NoRenderContext);
+    return CurrentRenderContext::Get(tolerateNone, NoRenderContext);
 }
 
 Q_RenderContext* Q_RenderContext::PeekCurrent() noexcept
 {
-    return Current<Q_RenderContext>::bare;
+    return Qp_currentRenderContext;
 }
 
 boost::shared_ptr<Q_RenderState> Q_RenderContext::GetState(hearth::utility::ImmutableString const& name) const
@@ -143,19 +157,19 @@ void Q_RenderContext::RemoveState(hearth::utility::ImmutableString const& name)
 }
 
 Q_ScSetCurrentContext::Q_ScSetCurrentContext(boost::shared_ptr<Q_Context> context) noexcept
-    : previous_(Current<Q_Context>::Set(std::move(context)))
+    : previous_(CurrentContext::Set(std::move(context)))
 {}
 
 Q_ScSetCurrentContext::~Q_ScSetCurrentContext()
 {
-    Current<Q_Context>::Set(std::move(previous_));
+    CurrentContext::Set(std::move(previous_));
 }
 
 Q_ScSetCurrentRenderContext::Q_ScSetCurrentRenderContext(boost::shared_ptr<Q_RenderContext> context) noexcept
-    : previous_(Current<Q_RenderContext>::Set(std::move(context)))
+    : previous_(CurrentRenderContext::Set(std::move(context)))
 {}
 
 Q_ScSetCurrentRenderContext::~Q_ScSetCurrentRenderContext()
 {
-    Current<Q_RenderContext>::Set(std::move(previous_));
+    CurrentRenderContext::Set(std::move(previous_));
 }
