@@ -11,6 +11,7 @@
 #include <algorithm>
 #include <cstring>
 #include <numeric>
+#include <optional>
 
 namespace {
 
@@ -133,11 +134,7 @@ namespace {
 // A batch in the order of time, and where it goes.
 class Batch {
 public:
-    Batch(KFS_Stream* stream, KFS_NewKeys const& keys)
-        : stream_(stream),
-          keys_(keys),
-          room_(2 * sizeof(int) * static_cast<std::size_t>(keys.count))
-    {}
+    Batch(KFS_Stream* stream, KFS_NewKeys const& keys) : stream_(stream), keys_(keys) {}
 
     // Whether the short way may be gone as far as can be seen without the stream's keys.
     bool Prepare();
@@ -158,7 +155,7 @@ private:
 
     KFS_Stream* stream_;
     KFS_NewKeys const& keys_;
-    KFSp_ScBytes room_;
+    std::optional<KFSp_ScBytes> room_;
     KFS_StreamKeyData* data_ = nullptr;
     int count_ = 0;               // of the stream's keys before
     int const* times_ = nullptr;  // ascending, in the stream's scale
@@ -178,26 +175,35 @@ bool Batch::AreCodesPlain()
     return true;
 }
 
+bool Ascend(std::span<int const> times)
+{
+    bool ascend = true;
+    for (std::size_t i = 1; i < times.size(); ++i) ascend &= times[i - 1] < times[i];
+    return ascend;
+}
+
 // Converted and, if they don't ascend as they stand, sorted. False for times that make no ascending list of numbers.
 bool Batch::SortTimes()
 {
-    auto* const times = static_cast<int*>(room_.get());
-    if (!times) return false;
+    auto const count = static_cast<std::size_t>(keys_.count);
     unsigned int const scale = stream_->GetTimeScale();
-    bool ascend = true;
-    for (int i = 0; i < keys_.count; ++i) {
-        if (T_ShortConvTime(keys_.times[i], keys_.timeScale, scale, &times[i]) != 0) return false;
-        ascend = ascend && (i == 0 || times[i - 1] < times[i]);
-    }
-    times_ = times;
-    if (!ascend) {
-        if (wantsOrder_) return false;
-        int* const order = times + keys_.count;
-        std::iota(order, order + keys_.count, 0);
-        std::sort(order, order + keys_.count, [times](int a, int b) { return times[a] < times[b]; });
-        order_ = order;
-        std::sort(times, times + keys_.count);
-        if (std::adjacent_find(times, times + keys_.count) != times + keys_.count) return false;
+    times_ = keys_.times;
+    if (keys_.timeScale != scale || scale == 0 || !Ascend({times_, count})) {
+        room_.emplace(2 * sizeof(int) * count);
+        auto* const times = static_cast<int*>(room_->get());
+        if (!times) return false;
+        for (std::size_t i = 0; i < count; ++i)
+            if (T_ShortConvTime(keys_.times[i], keys_.timeScale, scale, &times[i]) != 0) return false;
+        times_ = times;
+        if (!Ascend({times, count})) {
+            if (wantsOrder_) return false;
+            int* const order = times + count;
+            std::iota(order, order + count, 0);
+            std::sort(order, order + count, [times](int a, int b) { return times[a] < times[b]; });
+            order_ = order;
+            std::sort(times, times + count);
+            if (!Ascend({times, count})) return false;
+        }
     }
     return times_[0] != KFS_INVALID_INDEX;
 }
@@ -218,7 +224,7 @@ bool Batch::MakeRoom()
     return SEQ_ReserveSpace(count_ + std::max(keys_.count, half), list) == 0;
 }
 
-void Batch::Write(unsigned char* place, int i) const
+[[gnu::always_inline]] inline void Batch::Write(unsigned char* place, int i) const
 {
     int const source = Source(i);
     int const dimension = stream_->GetDimension();
@@ -226,13 +232,20 @@ void Batch::Write(unsigned char* place, int i) const
     WriteKey(place, times_[i], keys_.inInterps[source], keys_.outInterps[source], count_ == 0 && source == 0,
              keys_.values + first, dimension);
     if (!HasAllHandles()) return;
-    KFSp_TemporalRuns<double> const runs(reinterpret_cast<double*>(place + KFS_KeyHeadSize), dimension);
-    for (int c = 0; c < dimension; ++c) {
-        runs.inSpeed[c] = keys_.inSpeeds[first + c];
-        runs.inInfluence[c] = std::clamp(keys_.inInfluences[first + c], 0.0, 1.0);
-        runs.outSpeed[c] = keys_.outSpeeds[first + c];
-        runs.outInfluence[c] = std::clamp(keys_.outInfluences[first + c], 0.0, 1.0);
-    }
+    auto* const numbers = reinterpret_cast<double*>(place + KFS_KeyHeadSize);
+    auto const fill = [&](int size) {
+        KFSp_TemporalRuns<double> const runs(numbers, size);
+        for (int c = 0; c < size; ++c) {
+            runs.inSpeed[c] = keys_.inSpeeds[first + c];
+            runs.inInfluence[c] = std::clamp(keys_.inInfluences[first + c], 0.0, 1.0);
+            runs.outSpeed[c] = keys_.outSpeeds[first + c];
+            runs.outInfluence[c] = std::clamp(keys_.outInfluences[first + c], 0.0, 1.0);
+        }
+    };
+    if (dimension == 1)
+        fill(1);
+    else
+        fill(dimension);
 }
 
 // Among the keys that are there: from the last one down, each block moves once to where it ends up.

@@ -42,6 +42,14 @@ std::size_t FindSurrogateBytes(CKFp_Bytes bytes, std::size_t index) noexcept
     return index;
 }
 
+// Characters that are the same in both forms, as nearly all names are. NUL isn't counted among them.
+template <class Units>
+bool IsPlainAscii(Units const& text) noexcept
+{
+    return std::all_of(
+        text.begin(), text.end(), [](unsigned unit) { return unit - 1 < 0x7F; });
+}
+
 u16str FromLatin1(CKFp_Bytes bytes)
 {
     return u16str(bytes.begin(), bytes.end());
@@ -51,6 +59,7 @@ u16str FromLatin1(CKFp_Bytes bytes)
 
 std::string CKFp_ToUtf8(u16str const& text)
 {
+    if (IsPlainAscii(text)) return std::string(text.begin(), text.end());
     std::size_t at = FindLoneSurrogate(text, 0);
     if (at == text.size()) return Q_UTF16ToMBString(text);
     std::string bytes;
@@ -66,6 +75,7 @@ std::string CKFp_ToUtf8(u16str const& text)
 
 u16str CKFp_FromUtf8(CKFp_Bytes bytes)
 {
+    if (IsPlainAscii(bytes)) return FromLatin1(bytes);
     u16str text;
     for (std::size_t from = 0;;) {
         std::size_t const at = FindSurrogateBytes(bytes, from);

@@ -5,6 +5,7 @@ namespace {
 
 int WriteAtom(CKFp_Writer& writer, int id, void const* data, std::size_t size)
 {
+    if (size <= CKFp_Writer::MostBytesOfSmallAtom) return writer.WriteSmallAtom(id, data, size);
     if (int const code = writer.BeginAtom(id, size)) return code;
     if (int const code = writer.Append(data, size)) return code;
     return writer.EndAtom(size);
@@ -15,7 +16,7 @@ int WriteText(CKF_File* file, int id, u16str const& text, unsigned long maxLengt
     return CKFp_WithWriter(
         file,
         [&](CKFp_Writer& writer) {
-            std::string const bytes = CKFp_ToUtf8(CKFp_CutText(text, maxLength));
+            std::string const bytes = maxLength == 0 ? CKFp_ToUtf8(text) : CKFp_ToUtf8(CKFp_CutText(text, maxLength));
             return WriteAtom(writer, id, bytes.data(), bytes.size());
         });
 }

@@ -1,5 +1,7 @@
 #include "services/chunkfile/writer_private.h"
 
+#include <cstring>
+
 int CKFp_Writer::CheckRoom(std::uint64_t size)
 {
     std::uint64_t const present = sink_->Size();
@@ -35,6 +37,18 @@ int CKFp_Writer::BeginAtom(int id, std::uint64_t size)
     unsigned char header[CKFp_HeaderSize];
     CKFp_PutHeader(header, id, static_cast<std::uint32_t>(size));
     return Append(header, sizeof header);
+}
+
+int CKFp_Writer::WriteSmallAtom(int id, void const* data, std::size_t size)
+{
+    if (!CKFp_IsAtomId(id)) return failure_.SetBadAtomId(id, sink_->Size());
+    std::size_t const padded = CKFp_HeaderSize + size + (size & 1);
+    if (int const code = CheckRoom(padded)) return code;
+    unsigned char piece[CKFp_HeaderSize + MostBytesOfSmallAtom + 1];
+    CKFp_PutHeader(piece, id, static_cast<std::uint32_t>(size));
+    if (size > 0) std::memcpy(piece + CKFp_HeaderSize, data, size);
+    piece[CKFp_HeaderSize + size] = 0;
+    return Append(piece, padded);
 }
 
 int CKFp_Writer::EndAtom(std::uint64_t size)

@@ -25,6 +25,9 @@ public:
     [[nodiscard]] int BeginAtom(int id, std::uint64_t size);
     [[nodiscard]] int Append(void const* bytes, std::size_t size) { return size == 0 ? 0 : sink_->Append(bytes, size); }
     [[nodiscard]] int EndAtom(std::uint64_t size);
+    // One that goes to the sink in one piece: a tree has a dozen a leaf.
+    static constexpr std::size_t MostBytesOfSmallAtom = 256;
+    [[nodiscard]] int WriteSmallAtom(int id, void const* data, std::size_t size);
 
     [[nodiscard]] int BeginList(int listType, CKF_ChunkInfo* chunk);
     [[nodiscard]] int EndList(CKF_ChunkInfo* chunk);

@@ -7,6 +7,7 @@ namespace {
 
 constexpr int ListChunkId = CKF_Id("seql");
 constexpr std::size_t HeadSize = 8;  // item size, count
+constexpr std::size_t MostBytesBehindHead = 1 << 12;
 
 int WriteItems(CKFp_Writer& writer, SEQ_Head const& head)
 {
@@ -21,12 +22,17 @@ int WriteItems(CKFp_Writer& writer, SEQ_Head const& head)
 int MakeList(CKFp_Bytes items, short itemSize, int count, SEQ_Head*** list)
 {
     SEQ_Head** made = nullptr;
-    if (int const code = SEQ_New(0, itemSize, 4, 1, &made)) return code;
-    if (int const code = count > 0 ? SEQp_SetCapacity(**made, count) : 0) {
-        static_cast<void>(SEQ_Dispose(made, 0));  // the first error wins
-        return code;
+    // Short ones in one block: what is read is mostly looked at once and disposed.
+    if (count > 0 && items.size() <= MostBytesBehindHead) {
+        if (int const code = SEQp_NewInOneBlock(itemSize, count, &made)) return code;
+    } else {
+        if (int const code = SEQ_New(0, itemSize, 4, 1, &made)) return code;
+        if (int const code = count > 0 ? SEQp_SetCapacity(**made, count) : 0) {
+            static_cast<void>(SEQ_Dispose(made, 0));  // the first error wins
+            return code;
+        }
+        (*made)->count = count;
     }
-    (*made)->count = count;
     std::size_t const size = static_cast<std::size_t>(itemSize);
     if (itemSize == (*made)->stride) {
         if (count > 0) std::memcpy((*made)->items, items.data(), items.size());
