@@ -88,6 +88,13 @@ int KFSp_DisposeRemapTable(KFS_KeyScalar* key)
 
 int KFSp_DisposeRemapTables(SEQ_Head** keys)
 {
+    // Most lists have no table, and each list ends here: a look at each record's flags is all that it may cost.
+    if (KFSp_HasShortcuts && keys && *keys) {
+        unsigned char* item = (*keys)->items;
+        for (int i = 0; i < (*keys)->count; ++i, item += (*keys)->stride)
+            if (int const code = KFSp_DisposeRemapTable(reinterpret_cast<KFS_KeyScalar*>(item))) return code;
+        return 0;
+    }
     return SEQ_ForEach(keys, 0, DisposeRemapTableOfItem, 0);
 }
 

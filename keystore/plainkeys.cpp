@@ -152,6 +152,7 @@ private:
     bool Merge();
     int Source(int i) const { return order_ ? order_[i] : i; }
     void Write(unsigned char* place, int i) const;
+    void WriteNumbers(unsigned char* place, std::size_t stride) const;
 
     KFS_Stream* stream_;
     KFS_NewKeys const& keys_;
@@ -163,8 +164,18 @@ private:
     bool wantsOrder_ = false;     // handles follow from who came before
 };
 
+// Whether all bytes are one.
+bool AreAlike(char const* bytes, int count)
+{
+    return std::memcmp(bytes, bytes + 1, static_cast<std::size_t>(count) - 1) == 0;
+}
+
 bool Batch::AreCodesPlain()
 {
+    if (AreAlike(keys_.inInterps, keys_.count) && AreAlike(keys_.outInterps, keys_.count)) {
+        wantsOrder_ = !HasAllHandles() && HasSplineSide(*keys_.inInterps, *keys_.outInterps);
+        return CanTake(stream_, *keys_.inInterps, *keys_.outInterps);
+    }
     for (int i = 0; i < keys_.count; ++i) {
         char const in = keys_.inInterps[i];
         char const out = keys_.outInterps[i];
@@ -177,9 +188,9 @@ bool Batch::AreCodesPlain()
 
 bool Ascend(std::span<int const> times)
 {
-    bool ascend = true;
-    for (std::size_t i = 1; i < times.size(); ++i) ascend &= times[i - 1] < times[i];
-    return ascend;
+    int falls = 0;  // counted without a way out, several at a time
+    for (std::size_t i = 1; i < times.size(); ++i) falls |= times[i - 1] < times[i] ? 0 : 1;
+    return falls == 0;
 }
 
 // Converted and, if they don't ascend as they stand, sorted. False for times that make no ascending list of numbers.
@@ -224,6 +235,11 @@ bool Batch::MakeRoom()
     return SEQ_ReserveSpace(count_ + std::max(keys_.count, half), list) == 0;
 }
 
+double LimitToUnit(double influence)
+{
+    return influence < 0.0 ? 0.0 : influence > 1.0 ? 1.0 : influence;
+}
+
 [[gnu::always_inline]] inline void Batch::Write(unsigned char* place, int i) const
 {
     int const source = Source(i);
@@ -237,15 +253,39 @@ bool Batch::MakeRoom()
         KFSp_TemporalRuns<double> const runs(numbers, size);
         for (int c = 0; c < size; ++c) {
             runs.inSpeed[c] = keys_.inSpeeds[first + c];
-            runs.inInfluence[c] = std::clamp(keys_.inInfluences[first + c], 0.0, 1.0);
+            runs.inInfluence[c] = LimitToUnit(keys_.inInfluences[first + c]);
             runs.outSpeed[c] = keys_.outSpeeds[first + c];
-            runs.outInfluence[c] = std::clamp(keys_.outInfluences[first + c], 0.0, 1.0);
+            runs.outInfluence[c] = LimitToUnit(keys_.outInfluences[first + c]);
         }
     };
     if (dimension == 1)
         fill(1);
     else
         fill(dimension);
+}
+
+// What Write does for each key of the commonest batch, of one number and four of handles a key, as it stands.
+void Batch::WriteNumbers(unsigned char* place, std::size_t stride) const
+{
+    KFS_NewKeys const keys = keys_;  // whose pointers stay in registers
+    int const* const times = times_;
+    bool const isFirst = count_ == 0;
+    for (int i = 0; i < keys.count; ++i, place += stride) {
+        char const in = keys.inInterps[i];
+        char const out = keys.outInterps[i];
+        unsigned short const flags = HasSplineSide(in, out) && !(isFirst && i == 0) ? KFS_KeyFlag_Continuous : 0;
+        auto* const key = reinterpret_cast<KFS_KeyScalar*>(place);
+        key->time = times[i];
+        key->inInterp = static_cast<signed char>(in);
+        key->outInterp = static_cast<signed char>(out);
+        key->flags = flags;
+        auto* const numbers = reinterpret_cast<double*>(place + KFS_KeyHeadSize);
+        numbers[0] = keys.values[i];
+        numbers[1] = keys.inSpeeds[i];
+        numbers[2] = LimitToUnit(keys.inInfluences[i]);
+        numbers[3] = keys.outSpeeds[i];
+        numbers[4] = LimitToUnit(keys.outInfluences[i]);
+    }
 }
 
 // Among the keys that are there: from the last one down, each block moves once to where it ends up.
@@ -298,7 +338,10 @@ bool Batch::Insert()
     if (!behind) return Merge();
     unsigned char* place = KFSp_GetRoom(data_->keys, keys_.count);
     auto const stride = static_cast<std::size_t>((*data_->keys)->stride);
-    for (int i = 0; i < keys_.count; ++i, place += stride) Write(place, i);
+    if (stream_->GetDimension() == 1 && HasAllHandles() && !order_)
+        WriteNumbers(place, stride);
+    else
+        for (int i = 0; i < keys_.count; ++i, place += stride) Write(place, i);
     KFSp_TakeRoom(data_->keys, keys_.count);
     data_->times.Appended({times_, static_cast<std::size_t>(keys_.count)});
     MarkInserted(data_, count_, count_ + keys_.count - 1, count_ + keys_.count);
