@@ -1,9 +1,11 @@
 // Reads of plain streams through the public door, beside a bare search and a bare solve over the same segments.
 
+#include "bench/barecurve.h"
 #include "bench/common.h"
 #include "curves/derivatives.h"
 #include "curves/tangents.h"
-#include "frame/services/curvekernel.h"
+#include "frame/services/memory.h"
+#include "keystore/batchreads.h"
 #include "keystore/edit.h"
 #include "keystore/evaluate.h"
 
@@ -24,23 +26,20 @@ constexpr int Asked = 4096;
 
 enum class Order { Random, Frames };
 
-// One stream, the times at which it is asked, and its segments as bare curves in one array.
+// One stream, the times at which it is asked, and the segments of its first component as a bare curve.
 struct Fixture {
-    struct Segment {
-        double p0[2], p1[2], p2[2], p3[2];
-    };
-
-    Fixture(int keys, short dimension, char interp) : count(keys)
+    Fixture(int keys, short dimension, char interp, unsigned int seed = 42) : count(keys)
     {
         Library();
         KFS_ValueDesc desc;
         desc.dataType = KFS_Type_Double;
         stream =
             std::make_unique<KFS_Stream>(dimension, Scale, 0, 0, KFS_InterpMask_All, 0, desc, nullptr, nullptr, false);
-        std::mt19937 random(42);
+        std::mt19937 random(seed);
         std::uniform_real_distribution<double> value(-100.0, 100.0), influence(0.0, 1.0), speed(-300.0, 300.0);
         std::vector<double> v(static_cast<std::size_t>(dimension)), in(v), out(v), inInf(v), outInf(v);
-        std::vector<std::vector<double>> values, outSpeeds, inSpeeds, outInfluences, inInfluences;
+        double const dt = static_cast<double>(Gap) / Scale;
+        double before[2] = {}, influenceBefore = 0.0;  // the last key's value and handle
         for (int i = 0; i < keys; ++i) {
             T_Time const at{i * Gap, Scale};
             for (short d = 0; d < dimension; ++d) {
@@ -51,18 +50,11 @@ struct Fixture {
             Must(KFS_InsertKeyF(stream.get(), &at, 1, v.data(), interp, interp));
             Must(KFS_SetKeyVelocityF(stream.get(), i, in.data(), out.data()));
             Must(KFS_SetKeyInfluence(stream.get(), i, inInf.data(), outInf.data()));
-            values.push_back(v), outSpeeds.push_back(out), inSpeeds.push_back(in);
-            outInfluences.push_back(outInf), inInfluences.push_back(inInf);
-            times.push_back(at.value);
-        }
-        double const dt = static_cast<double>(Gap) / Scale;
-        for (std::size_t i = 0; i + 1 < static_cast<std::size_t>(keys); ++i) {
-            double const g = outInfluences[i][0] * dt;
-            double const h = -inInfluences[i + 1][0] * dt;
-            segments.push_back({{0.0, values[i][0]},
-                                {g, values[i][0] + g * outSpeeds[i][0]},
-                                {dt + h, values[i + 1][0] + h * inSpeeds[i + 1][0]},
-                                {dt, values[i + 1][0]}});
+            bare.times.push_back(at.value);
+            double const heights[4] = {before[0], before[1], v[0] - inInf[0] * dt * in[0], v[0]};
+            if (i > 0) bare.segments.push_back(BareSegment::Make(heights, influenceBefore, inInf[0], Gap));
+            before[0] = v[0], before[1] = v[0] + outInf[0] * dt * out[0];
+            influenceBefore = outInf[0];
         }
     }
 
@@ -81,8 +73,7 @@ struct Fixture {
 
     int count;
     std::unique_ptr<KFS_Stream> stream;
-    std::vector<int> times;
-    std::vector<Segment> segments;
+    BareCurve bare;
 };
 
 Fixture const& Get(int keys, short dimension, char interp)
@@ -119,66 +110,181 @@ void ReadRate(benchmark::State& state, Fixture const& fixture, Order order)
     }
 }
 
+// `solve` takes the curve, the segment and the time.
 template <class Solve>
 void Bare(benchmark::State& state, Fixture const& fixture, Order order, Solve&& solve)
 {
     std::vector<int> const asked = fixture.Times(order);
-    std::size_t i = 0;
+    std::size_t i = 0, at = 0;
     for (auto _ : state) {
         int const time = asked[i++ % Asked];
-        int const next = Search(fixture.times, time);
-        double value = 0.0;
-        solve(fixture, next - 1, static_cast<double>(time - fixture.times[static_cast<std::size_t>(next - 1)]) / Scale,
-              &value);
-        benchmark::DoNotOptimize(value);
+        at = order == Order::Random ? fixture.bare.Find(time) : fixture.bare.Walk(at, time);
+        benchmark::DoNotOptimize(solve(fixture.bare, at, time));
     }
 }
 
-void SolveCurve(Fixture const& fixture, int segment, double x, double* y)
+double SolveSpline(BareCurve const& curve, std::size_t at, int time)
 {
-    Fixture::Segment& s = const_cast<Fixture::Segment&>(fixture.segments[static_cast<std::size_t>(segment)]);
-    CRV_Curve const curve{2, s.p0, s.p1, s.p2, s.p3};
-    static_cast<void>(CRV_EvaluateYFromX(&curve, y, x));
+    return curve.Spline(at, time);
 }
 
-void SolveLine(Fixture const& fixture, int segment, double x, double* y)
+template <char Interp, Order order>
+void Ours(benchmark::State& state)
 {
-    Fixture::Segment const& s = fixture.segments[static_cast<std::size_t>(segment)];
-    *y = s.p0[1] + (s.p3[1] - s.p0[1]) * (x / s.p3[0]);
+    Read(state, Get(static_cast<int>(state.range(0)), 1, Interp), order);
 }
+template <char Interp, Order order>
+void Yardstick(benchmark::State& state)
+{
+    Bare(
+        state, Get(static_cast<int>(state.range(0)), 1, Interp), order,
+        [](BareCurve const& curve, std::size_t at, int time) {
+            if constexpr (Interp == KFS_Interp_Spline) return curve.Spline(at, time);
+            if constexpr (Interp == KFS_Interp_Linear) return curve.Line(at, time);
+            return curve.Held(at);
+        });
+}
+#define READS(topic, interp, order)                                                                                    \
+    BENCHMARK(Ours<interp, order>)->Name(topic "/ours")->Arg(8)->Arg(1000)->Arg(30000);                                \
+    BENCHMARK(Yardstick<interp, order>)->Name(topic "/yardstick")->Arg(8)->Arg(1000)->Arg(30000)
+READS("read_spline_random", KFS_Interp_Spline, Order::Random);
+READS("read_spline_24_a_second", KFS_Interp_Spline, Order::Frames);
+READS("read_linear_random", KFS_Interp_Linear, Order::Random);
+READS("read_linear_24_a_second", KFS_Interp_Linear, Order::Frames);
+READS("read_hold_random", KFS_Interp_Hold, Order::Random);
+READS("read_hold_24_a_second", KFS_Interp_Hold, Order::Frames);
+#undef READS
 
-void SplineOurs(benchmark::State& state)
+// An array of times on one stream, beside the bare curve asked one by one.
+template <Order order>
+void TimesOurs(benchmark::State& state)
 {
-    Read(state, Get(static_cast<int>(state.range(0)), 1, KFS_Interp_Spline), Order::Random);
+    Fixture const& fixture = Get(static_cast<int>(state.range(0)), 1, KFS_Interp_Spline);
+    std::vector<T_Time> times;
+    for (int const time : fixture.Times(order)) times.push_back({time, Scale});
+    std::vector<double> values(times.size());
+    for (auto _ : state) {
+        benchmark::DoNotOptimize(KFS_ReadTimes(fixture.stream.get(), times.data(), Asked, 0, values.data(), nullptr));
+        benchmark::ClobberMemory();
+    }
 }
-void SplineYardstick(benchmark::State& state)
+template <Order order>
+void TimesYardstick(benchmark::State& state)
 {
-    Bare(state, Get(static_cast<int>(state.range(0)), 1, KFS_Interp_Spline), Order::Random, SolveCurve);
+    Fixture const& fixture = Get(static_cast<int>(state.range(0)), 1, KFS_Interp_Spline);
+    std::vector<int> const times = fixture.Times(order);
+    std::vector<double> values(times.size());
+    for (auto _ : state) {
+        std::size_t at = 0;
+        for (std::size_t i = 0; i < times.size(); ++i) {
+            at = order == Order::Random ? fixture.bare.Find(times[i]) : fixture.bare.Walk(at, times[i]);
+            values[i] = fixture.bare.Spline(at, times[i]);
+        }
+        benchmark::ClobberMemory();
+    }
 }
-BENCHMARK(SplineOurs)->Name("read_spline_random/ours")->Arg(8)->Arg(1000)->Arg(30000);
-BENCHMARK(SplineYardstick)->Name("read_spline_random/yardstick")->Arg(8)->Arg(1000)->Arg(30000);
+BENCHMARK(TimesOurs<Order::Random>)->Name("array_of_times_random/ours")->Arg(1000);
+BENCHMARK(TimesYardstick<Order::Random>)->Name("array_of_times_random/yardstick")->Arg(1000);
+BENCHMARK(TimesOurs<Order::Frames>)->Name("array_of_times_24_a_second/ours")->Arg(1000);
+BENCHMARK(TimesYardstick<Order::Frames>)->Name("array_of_times_24_a_second/yardstick")->Arg(1000);
 
-void FramesOurs(benchmark::State& state)
+// Equal steps, as KFS_GetValuesFPlus takes them.
+void StepsOurs(benchmark::State& state)
 {
-    Read(state, Get(static_cast<int>(state.range(0)), 1, KFS_Interp_Spline), Order::Frames);
+    Fixture const& fixture = Get(1000, 1, KFS_Interp_Spline);
+    T_Time const start{1, Scale}, step{25, Scale};
+    for (auto _ : state) {
+        char** values = nullptr;
+        Must(KFS_GetValuesFPlus(fixture.stream.get(), &start, &step, 3000, 0, &values));
+        benchmark::ClobberMemory();
+        Q_FreeHandle(values);
+    }
 }
-void FramesYardstick(benchmark::State& state)
+void StepsYardstick(benchmark::State& state)
 {
-    Bare(state, Get(static_cast<int>(state.range(0)), 1, KFS_Interp_Spline), Order::Frames, SolveCurve);
+    Fixture const& fixture = Get(1000, 1, KFS_Interp_Spline);
+    std::vector<double> values(3000);
+    for (auto _ : state) {
+        std::size_t at = 0;
+        for (int i = 0; i < 3000; ++i) {
+            at = fixture.bare.Walk(at, 1 + i * 25);
+            values[static_cast<std::size_t>(i)] = fixture.bare.Spline(at, 1 + i * 25);
+        }
+        benchmark::ClobberMemory();
+    }
 }
-BENCHMARK(FramesOurs)->Name("read_spline_24_a_second/ours")->Arg(8)->Arg(1000)->Arg(30000);
-BENCHMARK(FramesYardstick)->Name("read_spline_24_a_second/yardstick")->Arg(8)->Arg(1000)->Arg(30000);
+BENCHMARK(StepsOurs)->Name("array_of_steps/ours");
+BENCHMARK(StepsYardstick)->Name("array_of_steps/yardstick");
 
-void LinearOurs(benchmark::State& state)
+// A frame of an application: many streams at one time, then the next frame. The yardstick asks bare curves that lie apart
+// as the streams do.
+std::vector<std::unique_ptr<Fixture>> const& Panel()
 {
-    Read(state, Get(static_cast<int>(state.range(0)), 1, KFS_Interp_Linear), Order::Random);
+    static std::vector<std::unique_ptr<Fixture>> const panel = [] {
+        std::vector<std::unique_ptr<Fixture>> made;
+        for (unsigned int i = 0; i < 10000; ++i)
+            made.push_back(std::make_unique<Fixture>(10, static_cast<short>(1), char{KFS_Interp_Spline}, 100 + i));
+        return made;
+    }();
+    return panel;
 }
-void LinearYardstick(benchmark::State& state)
+std::vector<KFS_Stream const*> PanelStreams()
 {
-    Bare(state, Get(static_cast<int>(state.range(0)), 1, KFS_Interp_Linear), Order::Random, SolveLine);
+    std::vector<KFS_Stream const*> streams;
+    for (std::unique_ptr<Fixture> const& fixture : Panel()) streams.push_back(fixture->stream.get());
+    return streams;
 }
-BENCHMARK(LinearOurs)->Name("read_linear_random/ours")->Arg(8)->Arg(1000)->Arg(30000);
-BENCHMARK(LinearYardstick)->Name("read_linear_random/yardstick")->Arg(8)->Arg(1000)->Arg(30000);
+int PanelTime(int frame)
+{
+    return 1 + frame % 35 * 25;
+}
+void PanelBatch(benchmark::State& state)
+{
+    std::vector<KFS_Stream const*> const streams = PanelStreams();
+    std::vector<double> values(streams.size());
+    int frame = 0;
+    for (auto _ : state) {
+        T_Time const at{PanelTime(frame++), Scale};
+        Must(KFS_ReadStreams(streams.data(), static_cast<int>(streams.size()), &at, 0, values.data(), 1, nullptr));
+        benchmark::ClobberMemory();
+    }
+}
+void ReadPanel(benchmark::State& state)
+{
+    std::vector<KFS_Stream const*> const streams = PanelStreams();
+    std::vector<double> values(streams.size());
+    int frame = 0;
+    for (auto _ : state) {
+        T_Time const at{PanelTime(frame++), Scale};
+        for (std::size_t i = 0; i < streams.size(); ++i)
+            benchmark::DoNotOptimize(KFS_GetValueFPlus(streams[i], &at, 0, &values[i], nullptr, nullptr));
+    }
+}
+void PanelYardstick(benchmark::State& state)
+{
+    std::vector<std::unique_ptr<Fixture>> const& panel = Panel();
+    std::vector<double> values(panel.size());
+    int frame = 0;
+    for (auto _ : state) {
+        int const time = PanelTime(frame++);
+        for (std::size_t i = 0; i < panel.size(); ++i)
+            values[i] = panel[i]->bare.Spline(panel[i]->bare.Find(time), time);
+        benchmark::ClobberMemory();
+    }
+}
+void RenderPanel(benchmark::State& state)
+{
+    static boost::shared_ptr<Q_RenderContext> const render = kfshost::MakeRenderContext(true);
+    Q_ScSetCurrentRenderContext const current(render);
+    ReadPanel(state);
+}
+BENCHMARK(PanelBatch)->Name("one_time_10000_streams_batch/ours");
+BENCHMARK(PanelYardstick)->Name("one_time_10000_streams_batch/yardstick");
+BENCHMARK(ReadPanel)->Name("one_time_10000_streams_loop/ours");
+BENCHMARK(PanelYardstick)->Name("one_time_10000_streams_loop/yardstick");
+// What a render's copies cost more than the streams themselves.
+BENCHMARK(RenderPanel)->Name("render_copy_among_10000/ours");
+BENCHMARK(ReadPanel)->Name("render_copy_among_10000/yardstick");
 
 template <char Interp, Order order>
 void RateOurs(benchmark::State& state)
@@ -205,8 +311,14 @@ void Spline3Yardstick(benchmark::State& state)
 {
     Bare(
         state, Get(static_cast<int>(state.range(0)), 3, KFS_Interp_Spline), Order::Random,
-        [](Fixture const& fixture, int segment, double x, double* y) {
-            for (int d = 0; d < 3; ++d) SolveCurve(fixture, (segment + d * 7) % (fixture.count - 1), x, y);
+        [](BareCurve const& curve, std::size_t at, int time) {
+            double sum = 0.0;
+            double const share = curve.Share(at, time);
+            for (std::size_t d = 0; d < 3; ++d) {
+                BareSegment const& segment = curve.segments[(at + d * 7) % curve.segments.size()];
+                sum += segment.Y(segment.Parameter(share));
+            }
+            return sum;
         });
 }
 BENCHMARK(Spline3Ours)->Name("read_spline_3_components/ours")->Arg(1000);
@@ -216,7 +328,7 @@ BENCHMARK(Spline3Yardstick)->Name("read_spline_3_components/yardstick")->Arg(100
 void RepeatOurs(benchmark::State& state)
 {
     Fixture const& fixture = Get(1000, 1, KFS_Interp_Spline);
-    T_Time const at{fixture.times[500] + 33, Scale};
+    T_Time const at{fixture.bare.times[500] + 33, Scale};
     double value = 0.0;
     for (auto _ : state) {
         benchmark::DoNotOptimize(KFS_GetValueFPlus(fixture.stream.get(), &at, 0, &value, nullptr, nullptr));
@@ -226,10 +338,10 @@ void RepeatOurs(benchmark::State& state)
 void RepeatYardstick(benchmark::State& state)
 {
     Fixture const& fixture = Get(1000, 1, KFS_Interp_Spline);
-    int time = fixture.times[500] + 33;
+    int time = fixture.bare.times[500] + 33;
     for (auto _ : state) {
         benchmark::DoNotOptimize(time);
-        benchmark::DoNotOptimize(Search(fixture.times, time));
+        benchmark::DoNotOptimize(fixture.bare.Find(time));
     }
 }
 BENCHMARK(RepeatOurs)->Name("read_one_time_again/ours");
@@ -280,7 +392,7 @@ void ExternalOurs(benchmark::State& state)
 }
 void ExternalYardstick(benchmark::State& state)
 {
-    Bare(state, Get(1000, 1, KFS_Interp_Spline), Order::Random, SolveCurve);
+    Bare(state, Get(1000, 1, KFS_Interp_Spline), Order::Random, SolveSpline);
 }
 BENCHMARK(ExternalOurs)->Name("read_external_form/ours");
 BENCHMARK(ExternalYardstick)->Name("read_external_form/yardstick");
