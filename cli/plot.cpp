@@ -63,9 +63,12 @@ int Run(Options const& options, bool formGiven)
     kfshost::Scene const scene = LoadScene(drawing.selection);
     drawing.fps = fps ? *fps : kfshost::FindFrameGrid(SelectStreams(scene, drawing.selection)).rate;
     ReadPart(options, drawing);
-    std::string const svg =
-        Fitting("--fps", [&] { return options.motion ? DrawMotions(drawing, scene) : DrawValues(drawing, scene); });
-    static_cast<void>(TellFailedExpressions(drawing.selection));
+    auto const draw = [&] {
+        return Fitting("--fps",
+                       [&] { return options.motion ? DrawMotions(drawing, scene) : DrawValues(drawing, scene); });
+    };
+    std::string svg = draw();
+    while (TellFailedExpressions(drawing.selection)) svg = draw();  // those that failed as their keys
     WriteWholeFile(options.output, svg);
     return ExitDone;
 }

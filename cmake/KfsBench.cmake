@@ -21,4 +21,7 @@ foreach(source IN LISTS benchSources)
     target_link_libraries(bench_${name} PRIVATE kfs_services benchmark::benchmark_main benchmark::benchmark)
     list(APPEND benchTargets bench_${name})
 endforeach()
+if(TARGET bench_expressions)  # beside the language that expressions are in
+    target_link_libraries(bench_expressions PRIVATE PkgConfig::KFS_LUA)
+endif()
 add_custom_target(benchmarks DEPENDS ${benchTargets})

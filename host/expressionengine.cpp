@@ -9,6 +9,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <cstring>
 #include <limits>
 #include <utility>
 
@@ -20,6 +21,7 @@ namespace {
 constexpr int NestedFailure = KFS_Err_LegacyMismatch;
 // What a read costs beside the instructions of Lua.
 constexpr double StepsOfRead = 50.0;
+constexpr char const* NotFinite = "gives a number that isn't finite";
 
 bool MayLoop(std::string_view text)
 {
@@ -36,6 +38,12 @@ int CallWithVector(lua_State* lua)
     PushNumbers(lua, numbers.data(), numbers.size());
     lua_call(lua, 3, 1);
     return 1;
+}
+
+// As ==, which goes through the units one by one.
+bool IsSame(u16str const& a, u16str const& b)
+{
+    return a.size() == b.size() && std::memcmp(a.data(), b.data(), a.size() * sizeof a[0]) == 0;
 }
 
 std::string SentenceOf(int code)
@@ -82,13 +90,15 @@ void ExpressionEngine::Evaluate(KFS_Stream const* stream, int time, int flags, d
     if (depth_ > 0) CheckPlace(stream, time);
     KFS_Stream const& seen = *stream->GetKeyData()->stream;
     CompiledExpression& compiled = CompiledFor(seen);
-    std::optional<ExpressionFault> fault = compiled.fault;
-    if (!fault) {
+    bool hasValue = false;
+    if (compiled.fault) [[unlikely]] {
+        fault_ = *compiled.fault;
+    } else {
         ScRun const running(*this, {stream, &seen, time, flags, bag, &compiled});
-        fault = RunCompiled(values);
+        hasValue = RunCompiled(values);
     }
-    if (fault) [[unlikely]]
-        Fail(stream, std::move(*fault));
+    if (!hasValue) [[unlikely]]
+        Fail(stream, std::move(fault_));
 }
 
 // By the text, which may have changed while the cache was another context's or another record's at this address.
@@ -98,7 +108,7 @@ CompiledExpression& ExpressionEngine::CompiledFor(KFS_Stream const& seen)
     KFS_ExprInfo const& info = seen.GetExprInfo();
     boost::any* const cache = info.GetExpressionCacheImpl();
     if (Held* const held = boost::any_cast<Held>(cache);
-        held && (*held)->lua == lua_ && (*held)->text == info.GetExpression())
+        held && (*held)->lua == lua_ && IsSame((*held)->text, info.GetExpression()))
         return **held;
     auto const made = std::make_shared<CompiledExpression>(lua_);
     std::string const text = Q_UTF16ToMBString(info.GetExpression());
@@ -113,75 +123,109 @@ CompiledExpression& ExpressionEngine::CompiledFor(KFS_Stream const& seen)
 
 // ---- one run
 
-std::optional<ExpressionFault> ExpressionEngine::RunCompiled(double* values)
+bool ExpressionEngine::RunCompiled(double* values)
+{
+    Run const& run = Current();
+    CompiledExpression const& compiled = *run.compiled;
+    lua_State* const lua = lua_->Get();
+    if (!lua_->Spend(compiled.mayLoop ? LuaState::CountInterval : StepsOfRead)) [[unlikely]]
+        return Failed({"runs for too long", -1, true});
+    std::optional<double> frame;
+    if (compiled.usesFrame && !(frame = FrameOf(run)))
+        return Failed({"frame: nobody has looked for the rate of the project's keys"});
+    if (compiled.usesValue && run.seen->GetDimension() != 1) return RunWithVector(frame, values);
+    double key = 0.0;
+    if (compiled.usesValue && !ReadOwnKeys(&key)) return false;
+    lua_rawgeti(lua, LUA_REGISTRYINDEX, compiled.function);
+    PushTimes(lua, frame);
+    if (compiled.usesValue)
+        lua_pushnumber(lua, key);
+    else
+        lua_pushnil(lua);
+    return TakeResult(lua_pcall(lua, 3, 1, 0), values);
+}
+
+bool ExpressionEngine::RunWithVector(std::optional<double> const& frame, double* values)
 {
     Run const& run = Current();
     lua_State* const lua = lua_->Get();
-    if (!lua_->Spend(run.compiled->mayLoop ? LuaState::CountInterval : StepsOfRead))
-        return ExpressionFault{"runs for too long", -1, true};
-    if (lua_checkstack(lua, LUA_MINSTACK) == 0) return lua_->FaultOfMemory();
-    Numbers keys;
-    if (run.compiled->usesValue) {
-        keys.resize(run.Dimension());
-        try {
-            state_.EvalNoExprValueF(run.stream, run.time, run.flags, keys.data(), nullptr, run.bag);
-        } catch (int code) {
-            return ExpressionFault{"value: " + SentenceOf(code)};
-        }
-    }
-    std::optional<double> frame;
-    if (run.compiled->usesFrame && !(frame = FrameOf(run)))
-        return ExpressionFault{"frame: nobody has looked for the rate of the project's keys"};
-    bool const isVector = keys.size() > 1;
-    if (isVector) lua_pushcfunction(lua, CallWithVector);
+    Numbers keys(run.Dimension());
+    if (!ReadOwnKeys(keys.data())) return false;
+    lua_pushcfunction(lua, CallWithVector);
     lua_rawgeti(lua, LUA_REGISTRYINDEX, run.compiled->function);
-    lua_pushnumber(lua, run.Seconds());
+    PushTimes(lua, frame);
+    lua_pushlightuserdata(lua, &keys);
+    return TakeResult(lua_pcall(lua, 4, 1, 0), values);
+}
+
+bool ExpressionEngine::Failed(ExpressionFault fault)
+{
+    fault_ = std::move(fault);
+    return false;
+}
+
+bool ExpressionEngine::ReadOwnKeys(double* keys)
+try {
+    Run const& run = Current();
+    state_.EvalNoExprValueF(run.stream, run.time, run.flags, keys, nullptr, run.bag);
+    return true;
+} catch (int code) {
+    return Failed({"value: " + SentenceOf(code)});
+}
+
+void ExpressionEngine::PushTimes(lua_State* lua, std::optional<double> const& frame)
+{
+    lua_pushnumber(lua, Current().Seconds());
     if (frame)
         lua_pushnumber(lua, *frame);
     else
         lua_pushnil(lua);
-    if (isVector)
-        lua_pushlightuserdata(lua, &keys);
-    else if (!keys.empty())
-        lua_pushnumber(lua, keys.front());
-    else
-        lua_pushnil(lua);
-    int const status = lua_pcall(lua, isVector ? 4 : 3, 1, 0);
-    if (status == LUA_OK) return TakeResult(values);
-    ExpressionFault fault = lua_->FaultOf(status);
-    fault.isCircle = innerFault_ && innerFault_->isCircle && innerFault_->text == fault.text;
-    return fault;
 }
 
-// Takes the result from the stack.
-std::optional<ExpressionFault> ExpressionEngine::TakeResult(double* values)
+// What lua_pcall left on the stack.
+bool ExpressionEngine::TakeResult(int status, double* values)
+{
+    lua_State* const lua = lua_->Get();
+    if (status != LUA_OK) [[unlikely]] {
+        fault_ = lua_->FaultOf(status);
+        fault_.isCircle = innerFault_ && innerFault_->isCircle && innerFault_->text == fault_.text;
+        return false;
+    }
+    if (Current().seen->GetDimension() != 1) return TakeVector(values);
+    bool const isNumber = lua_type(lua, -1) == LUA_TNUMBER;
+    if (isNumber) *values = lua_tonumber(lua, -1);
+    if (isNumber && std::isfinite(*values)) [[likely]] {
+        lua_pop(lua, 1);
+        return true;
+    }
+    std::string const what = luaL_typename(lua, -1);
+    lua_pop(lua, 1);
+    return Failed({isNumber ? NotFinite : "gives a " + what + " in place of a number"});
+}
+
+bool ExpressionEngine::TakeVector(double* values)
 {
     lua_State* const lua = lua_->Get();
     std::size_t const dimension = Current().Dimension();
     std::string fault;
-    if (dimension == 1 && lua_type(lua, -1) == LUA_TNUMBER) {
-        *values = lua_tonumber(lua, -1);
-    } else if (dimension > 1 && lua_istable(lua, -1)) {
+    if (lua_istable(lua, -1)) {
         std::size_t const count = lua_rawlen(lua, -1);
-        if (count != dimension) fault = "gives a table of " + std::to_string(count) + " in place of ";
+        if (count != dimension) fault = "gives a table of " + std::to_string(count);
         for (std::size_t i = 0; i < dimension && fault.empty(); ++i) {
             if (lua_rawgeti(lua, -1, static_cast<lua_Integer>(i) + 1) == LUA_TNUMBER)
                 values[i] = lua_tonumber(lua, -1);
             else
-                fault = "gives a table with a " + std::string(luaL_typename(lua, -1)) + " in place of ";
+                fault = std::string("gives a table with a ") + luaL_typename(lua, -1);
             lua_pop(lua, 1);
         }
     } else {
-        fault = std::string("gives a ") + luaL_typename(lua, -1) + " in place of ";
+        fault = std::string("gives a ") + luaL_typename(lua, -1);
     }
     lua_pop(lua, 1);
-    if (!fault.empty()) {
-        return ExpressionFault{fault +
-                               (dimension == 1 ? "a number" : "a table of " + std::to_string(dimension) + " numbers")};
-    }
+    if (!fault.empty()) return Failed({fault + " in place of a table of " + std::to_string(dimension) + " numbers"});
     if (!std::all_of(values, values + dimension, [](double number) { return std::isfinite(number); }))
-        return ExpressionFault{"gives a number that isn't finite"};
-    return std::nullopt;
+        return Failed({NotFinite});
+    return true;
 }
 
 // A stream that stands in no scene has no keys to go by but its own; its frames are 1/24 s. One rounding: whole frames come out

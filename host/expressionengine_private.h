@@ -82,8 +82,14 @@ private:
     class ScRun;
 
     CompiledExpression& CompiledFor(KFS_Stream const& seen);
-    std::optional<ExpressionFault> RunCompiled(double* values);
-    std::optional<ExpressionFault> TakeResult(double* values);
+    // False: fault_ says why there is no value.
+    bool RunCompiled(double* values);
+    bool RunWithVector(std::optional<double> const& frame, double* values);
+    bool ReadOwnKeys(double* keys);
+    void PushTimes(lua_State* lua, std::optional<double> const& frame);
+    bool TakeResult(int status, double* values);
+    bool TakeVector(double* values);
+    bool Failed(ExpressionFault fault);
     void CheckPlace(KFS_Stream const* stream, int time);
     [[noreturn]] void Fail(KFS_Stream const* stream, ExpressionFault fault);
     void Record(KFS_Stream const* stream, ExpressionFault const& fault);
@@ -97,6 +103,7 @@ private:
     std::shared_ptr<LuaState> lua_;
     std::array<Run, MaxDepth> runs_;
     std::size_t depth_ = 0;
+    ExpressionFault fault_;                      // of the expression that has just ended
     std::optional<ExpressionFault> innerFault_;  // of the read that an expression asked for last
     SceneGroup const* scene_ = nullptr;          // whose paths these are
     std::shared_ptr<StreamPaths const> paths_;

@@ -137,21 +137,6 @@ void* LuaState::Allocate(void* owner, void* block, std::size_t oldSize, std::siz
     return grown;
 }
 
-void LuaState::BeginRead()
-{
-    usedBefore_ = used_;
-    allocated_ = 0;
-    steps_ = 0.0;
-    isExhausted_ = false;
-}
-
-bool LuaState::Spend(double steps)
-{
-    steps_ += steps;
-    if (!(steps_ <= MaxSteps)) isExhausted_ = true;
-    return !isExhausted_;
-}
-
 double LuaState::StepsOfInterval() const
 {
     constexpr double oneStep = 1 << 12;
@@ -179,9 +164,8 @@ void LuaState::Count(lua_State* lua, lua_Debug* record)
     lua_error(lua);
 }
 
-void LuaState::CountInstructions(bool on)
+void LuaState::SwitchCounting(bool on)
 {
-    if (on == countsInstructions_) return;
     lua_sethook(lua_, on ? Count : nullptr, on ? LUA_MASKCOUNT : 0, on ? CountInterval : 0);
     countsInstructions_ = on;
 }

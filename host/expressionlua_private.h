@@ -44,15 +44,29 @@ public:
     ExpressionEngine* Engine() const { return engine_; }
 
     // A read begins, with all that it may use. What it calls for is part of it.
-    void BeginRead();
+    void BeginRead()
+    {
+        usedBefore_ = used_;
+        allocated_ = 0;
+        steps_ = 0.0;
+        isExhausted_ = false;
+    }
     // Counts work that no instruction of Lua stands for; raises the limit's error. Only inside a call.
     void Charge(lua_State* lua, double steps);
     // The same outside a call; whether the read may go on.
-    bool Spend(double steps);
+    bool Spend(double steps)
+    {
+        steps_ += steps;
+        if (!(steps_ <= MaxSteps)) isExhausted_ = true;
+        return !isExhausted_;
+    }
     // The read has gone beyond another limit.
     void Exhaust() { isExhausted_ = true; }
     // Counts the instructions from here on.
-    void CountInstructions(bool on);
+    void CountInstructions(bool on)
+    {
+        if (on != countsInstructions_) SwitchCounting(on);
+    }
     bool CountsInstructions() const { return countsInstructions_; }
 
     // A function that takes time, frame and value; LUA_NOREF with a fault. Release gives it back.
@@ -74,6 +88,7 @@ public:
 private:
     static void* Allocate(void* owner, void* block, std::size_t oldSize, std::size_t newSize);
     static void Count(lua_State* lua, lua_Debug* record);
+    void SwitchCounting(bool on);
     // The more memory is held the longer a single instruction may take, such as comparing two long strings.
     double StepsOfInterval() const;
 

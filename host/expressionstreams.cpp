@@ -136,7 +136,7 @@ private:
     std::int64_t KeyTime(int index) const
     {
         T_Time time{};
-        if (run_.seen->HasNoKeys() || run_.seen->GetKeyData()->stream->GetKeyCount() == 0) return 0;
+        if (run_.seen->HasNoKeys() || run_.stream->GetKeyCount() == 0) return 0;
         if (KFS_IndexToTime(run_.stream, index, &time) != 0) luaL_error(lua_, "the stream's keys can't be read");
         return time.value;
     }

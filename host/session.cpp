@@ -110,11 +110,7 @@ void PutExternal(KFS_Stream const* stream, int time, double const* numbers, std:
 }  // namespace
 
 // Keys that no bag overrides are read as they are.
-ExpState::ExpState()
-    : KFS_ExpState(KeyReads::Plain),
-      canRun_(boost::make_shared<ExprContext>(true)),
-      canNotRun_(boost::make_shared<ExprContext>(false))
-{}
+ExpState::ExpState() : KFS_ExpState(KeyReads::Plain) {}
 
 ExpState::~ExpState() = default;
 
@@ -150,10 +146,14 @@ void ExpState::EvalNoExprValueF(KFS_Stream const* stream, int time, int, double*
 
 void ExpState::ResolveExprTarget(KFS_Stream const**, int*, KFS_ParamBag const*, KFS_ParamBag*) {}
 
-// A stream that was told of an error counts as without an expression.
+// A stream that was told of an error counts as without an expression. What is answered has no owner: it lives as long as the
+// program, and renders share no count.
 boost::shared_ptr<KFS_ExprContext> ExpState::GetExprContext(KFS_Stream const* stream)
 {
-    return stream->GetKeyData()->stream->HasExpressionError() ? canNotRun_ : canRun_;
+    static ExprContext canRun(true);
+    static ExprContext canNotRun(false);
+    bool const isInError = stream->GetKeyData()->stream->HasExpressionError();
+    return {boost::shared_ptr<KFS_ExprContext>(), isInError ? &canNotRun : &canRun};
 }
 
 std::vector<ExpressionError> ExpState::TakeErrors()

@@ -35,10 +35,7 @@ public:
     std::vector<ExpressionError> TakeErrors();
 
 private:
-    // Made with the first expression. This state's own references to what it answers, so that renders share no count.
-    std::unique_ptr<ExpressionEngine> engine_;
-    boost::shared_ptr<KFS_ExprContext> canRun_;
-    boost::shared_ptr<KFS_ExprContext> canNotRun_;
+    std::unique_ptr<ExpressionEngine> engine_;  // made with the first expression
 };
 
 // A project with a context and a render context that is ready for reads.

@@ -28,6 +28,13 @@ std::map<std::string, std::string> Inputs()
             {"dragged", RunKfs({"drag", Sample, "--stream", "*/translation", "--component", "y", "--at", "1.1", "--to",
                                 "-2.5", "-o", "-"})
                             .output},
+            {"expressed", RunKfs({"set", Sample, "--stream", "*/translation", "--expression",
+                                  "extend('cycle') + vec(0, frame, 0)", "-o", "-"})
+                              .output},
+            {"failing", RunKfs({"set", Sample, "--stream", "*/scale", "--expression",
+                                "if time > 1 then\n  return missing.x\nend\nreturn value", "-o", "-"})
+                            .output},
+            {"double.lua", "-- twice\nreturn value * 2\n"},
             {"was.csv", RunKfs({"identity", Sample, "--step", "1/4", "--format", "csv"}).output},
             {"was.json",
              RunKfs({"identity", Sample, "--stream", "*", "--step", "1/4", "--to", "2", "--format", "json"}).output},
@@ -169,7 +176,8 @@ TEST_P(KfsTranscript, IsWhatTheCommandsAnswer)
     ExpectGolden(GetParam(), text);
 }
 
-INSTANTIATE_TEST_SUITE_P(All, KfsTranscript, testing::Values("looks.txt", "drawings.txt", "refusals.txt"),
+INSTANTIATE_TEST_SUITE_P(All, KfsTranscript,
+                         testing::Values("looks.txt", "drawings.txt", "expressions.txt", "refusals.txt"),
                          [](auto const& test) { return std::string(test.param, std::strlen(test.param) - 4); });
 
 }  // namespace
