@@ -206,6 +206,7 @@ TEST_F(Expressions, SayWhatIsWrong)
         {"error({})", "error with a table in place of a text"},
         {"error('told')", "line 1: told"},
         {"assert(false, 'told')", "told"},
+        {"\ntable.insert({}, 5, 1)", "line 2: bad argument #2 to 'insert'"},
         {"x = 1", "only local variables can be set"},
         {"math.pi = 3", "only local variables can be set"},
         {"string.rep = nil return 1", "only local variables can be set"},
