@@ -62,8 +62,8 @@ foreach(name IN LISTS testFolders)
 endforeach()
 
 # The library with KFS_FOREIGN_SERVICES. Only the files that ask whether there are shortcuts are compiled once more.
-set(shortcutSources tree/birth.cpp keystore/batchreads.cpp keystore/cache.cpp keystore/evaluate.cpp keystore/plainkeys.cpp
-    curves/derivatives.cpp curves/interpolate.cpp curves/spatial.cpp curves/splinelanes.cpp)
+set(shortcutSources tree/birth.cpp keystore/batchreads.cpp keystore/cache.cpp keystore/evaluate.cpp keystore/keylist.cpp keystore/plainkeys.cpp
+    curves/derivatives.cpp curves/interpolate.cpp curves/spatial.cpp curves/splinelanes.cpp persist/keyrecords.cpp)
 add_library(kfs_foreign_objects OBJECT ${shortcutSources})
 kfs_library_code(kfs_foreign_objects)
 target_compile_definitions(kfs_foreign_objects PRIVATE KFS_FOREIGN_SERVICES)
