@@ -55,6 +55,10 @@ public:
     Leaf(KFS_MatchName const& name, KFS_StreamFactory* factory, bool constant, unsigned int scale, bool canonical)
         : KFS_Stream(1, scale, constant, false, KFS_InterpMask_All, 0, Doubles(), &name, factory, canonical)
     {}
+    void FillInParamDef() const override
+    {
+        FillInParamDefDetails(FX_Param_FLOAT_SLIDER, -100.0, 100.0, -100.0, 100.0, 2, 0, 0, 0, 0);
+    }
     M_Vector4T<double> GetVector4Ex(KFS_EvalData const& eval) const override
     {
         M_Vector4T<double> vector{};

@@ -32,6 +32,7 @@ extern Command const DragCommand;
 extern Command const DumpCommand;
 extern Command const DiffCommand;
 extern Command const IdentityCommand;
+extern Command const SampleCommand;
 extern Command const SeparateCommand;
 extern Command const JoinCommand;
 extern Command const SetCommand;

@@ -1,7 +1,9 @@
 #include "cli/curvesamples.h"
 
+#include "cli/axis.h"
 #include "cli/rates.h"
 #include "curves/tangents.h"
+#include "host/polyline.h"
 #include "host/rotations.h"
 #include "host/storeerror.h"
 #include "keystore/evaluate.h"
@@ -10,14 +12,24 @@
 #include <algorithm>
 #include <cmath>
 #include <cstdint>
+#include <limits>
 #include <optional>
 
+using kfshost::Rational;
 using kfshost::ThrowIfFailed;
 
 namespace {
 
-// One sampler walks a stream from key to key. Times are whole units of the stream's scale, as its keys are. Of a rotation
-// it takes what the quaternion stands for, of length 1, as all that is shown of one.
+// How far a line may be from its curve, as a share of what it extends over: a fraction of what can be seen.
+constexpr double ToleratedShare = 1.0 / 2000;
+// The least share of the handles' extent that is looked at closely.
+constexpr double LeastShare = 1e-9;
+
+// One sampler walks a stream from key to key. Times are whole units of the stream's scale, as its keys are.
+//
+// Values of plain streams are lines with as few points as they need. What the library has no line for is read at regular
+// times: rates; expressions; paths, whose components follow from their distance; and rotations, of which it takes what the quaternion
+// stands for, of length 1, as all that is shown of one.
 class Sampler {
 public:
     Sampler(KFS_Stream const& stream, bool isRotation, std::vector<std::size_t> const& components, TimeSpan const& part,
@@ -33,6 +45,7 @@ public:
           rates_(stream_, isRotation_)
     {
         curves_.components.resize(components.size());
+        extents_.resize(row_.size(), {HUGE_VAL, -HUGE_VAL});
     }
 
     // The value that an expression computes has neither keys nor handles.
@@ -52,11 +65,43 @@ public:
             if (time >= first_ && time <= last_) AddKey(i, time);
             if (i + 1 < keys && time < last_ && KeyUnits(i + 1) > first_) AddSegment(i, time, KeyUnits(i + 1));
         }
+        for (std::size_t c = 0; HasLines() && c < components_.size(); ++c)
+            curves_.components[c].value = LineOf(components_[c]);
         return std::move(curves_);
     }
 
 private:
     static constexpr int NoKey = -1;
+
+    bool HasLines() const { return !stream_.IsSpatial() && !isRotation_ && !stream_.HasActiveExpression(); }
+
+    // Ever finer until it is fine enough for what it turns out to extend over.
+    std::vector<Point> LineOf(std::size_t d) const
+    {
+        double const extent = extents_[d].high - extents_[d].low;
+        if (!std::isfinite(extent)) return {{Seconds(first_), extents_[d].low}, {Seconds(last_), extents_[d].high}};
+        double const finest = std::max(extent * LeastShare, std::numeric_limits<double>::min());
+        double tolerance = std::max(extent * ToleratedShare, finest);
+        for (;;) {
+            auto const points = kfshost::SamplePolyline(stream_, static_cast<int>(d), Rational(first_, scale_),
+                                                        Rational(last_, scale_), tolerance);
+            std::vector<Point> line;
+            Range range{HUGE_VAL, -HUGE_VAL};
+            for (kfshost::PolylinePoint const& point : points) {
+                line.push_back({point.seconds, point.value});
+                range = {std::min(range.low, point.value), std::max(range.high, point.value)};
+            }
+            double const needed = std::max((range.high - range.low) * ToleratedShare, finest);
+            if (!(2 * needed < tolerance)) return line;
+            tolerance = needed;
+        }
+    }
+
+    // A point of a key or of one of its handles.
+    void Include(std::size_t d, double y)
+    {
+        extents_[d] = {std::min(extents_[d].low, y), std::max(extents_[d].high, y)};
+    }
 
     double Seconds(std::int64_t units) const { return static_cast<double>(units) / scale_; }
 
@@ -84,10 +129,13 @@ private:
         for (std::size_t c = 0; c < components_.size(); ++c) {
             Point const key{seconds, row_[components_[c]]};
             curves_.components[c].keys.push_back(key);
-            curves_.components[c].value.push_back(key);
+            if (HasLines())
+                Include(components_[c], key.y);
+            else
+                curves_.components[c].value.push_back(key);
         }
         // A path's handles belong to the graph of its distance, a rotation's to its stored components, not to these.
-        if (!stream_.IsSpatial() && !isRotation_) AddHandles(index, seconds, inInterp, outInterp);
+        if (HasLines()) AddHandles(index, seconds, inInterp, outInterp);
     }
 
     // Those whose ends lie in the part that is drawn.
@@ -106,8 +154,25 @@ private:
         }
     }
 
+    // The ends of a segment with the handles between them: what is between lies there as well.
+    void IncludeSegment(int index)
+    {
+        std::size_t const dimension = row_.size();
+        std::vector<double> x(dimension), y(dimension);
+        for (int const key : {index, index + 1}) {
+            ThrowIfFailed(KFS_GetKeyF(&stream_, key, row_.data(), nullptr, nullptr));
+            double* const none = nullptr;
+            bool const out = key == index;
+            ThrowIfFailed(KFS_GetKeyTangentsF(&stream_, key, out ? none : x.data(), out ? none : y.data(),
+                                              out ? x.data() : none, out ? y.data() : none));
+            for (std::size_t d = 0; d < dimension; ++d)
+                for (double const value : {row_[d], row_[d] + y[d]}) Include(d, value);
+        }
+    }
+
     void AddSegment(int index, int start, int end)
     {
+        if (HasLines()) IncludeSegment(index);
         char outInterp = 0;
         char inInterp = 0;
         ThrowIfFailed(KFS_GetKeyF(&stream_, index, nullptr, nullptr, &outInterp));
@@ -132,7 +197,7 @@ private:
         for (std::size_t c = 0; c < components_.size(); ++c) {
             ComponentCurve& curve = curves_.components[c];
             for (int const time : {from, to}) {
-                curve.value.push_back({Seconds(time), row_[components_[c]]});
+                if (!HasLines()) curve.value.push_back({Seconds(time), row_[components_[c]]});
                 curve.speed.push_back({Seconds(time), 0.0});
             }
         }
@@ -147,10 +212,10 @@ private:
         for (std::int64_t i = 0; i <= pieces; ++i) {
             int const time = static_cast<int>(from + (pieces == 0 ? 0 : length * i / pieces));
             std::vector<double> const& rates = time == end ? rates_.Into(index + 1) : rates_.At(time);
-            Read(time, row_);
+            if (!HasLines()) Read(time, row_);
             for (std::size_t c = 0; c < components_.size(); ++c) {
                 ComponentCurve& curve = curves_.components[c];
-                curve.value.push_back({Seconds(time), row_[components_[c]]});
+                if (!HasLines()) curve.value.push_back({Seconds(time), row_[components_[c]]});
                 curve.speed.push_back({Seconds(time), rates[components_[c]]});
             }
         }
@@ -165,6 +230,7 @@ private:
     double pointsPerSecond_;
     std::vector<double> row_;
     Rates rates_;
+    std::vector<Range> extents_;  // of what bounds each component's curve
     StreamCurves curves_;
 };
 

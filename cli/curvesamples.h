@@ -25,8 +25,8 @@ struct StreamCurves {
     std::vector<Handle> handles;
 };
 
-// Samples these components of a stream with some `pointsPerSecond` points
-// from the first to the last time of `part`.
-// Throws StoreError.
+// Samples these components of a stream from the first to the last time of `part`: values of plain streams as lines with as
+// few points as can't be told from the curve (host/polyline.h), all else with some `pointsPerSecond` points. The values of
+// two components need not have points at the same times. Throws StoreError.
 StreamCurves SampleCurves(kfshost::StreamItem const& item, std::vector<std::size_t> const& components,
                           TimeSpan const& part, double pointsPerSecond);

@@ -10,9 +10,9 @@
 
 namespace {
 
-constexpr Command const* Commands[] = {&InfoCommand,     &EvalCommand,   &DiffCommand, &IdentityCommand,
-                                       &PlotCommand,     &ImportCommand, &DragCommand, &SaveAsCommand,
-                                       &SeparateCommand, &JoinCommand,   &SetCommand,  &DumpCommand};
+constexpr Command const* Commands[] = {&InfoCommand, &EvalCommand,   &DiffCommand, &IdentityCommand, &SampleCommand,
+                                       &PlotCommand, &ImportCommand, &DragCommand, &SaveAsCommand,   &SeparateCommand,
+                                       &JoinCommand, &SetCommand,    &DumpCommand};
 
 // One line as for any other error, with a hint. What stands where a command should is told by its name.
 std::string TellUsageError(CLI::App const* app, CLI::Error const& error)

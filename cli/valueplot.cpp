@@ -54,11 +54,42 @@ constexpr double LeastHandleDistance = 14.0;
 
 using CurvePoints = std::vector<Point> ComponentCurve::*;
 
-// How alike two curves are: as far apart as `tolerance` nowhere. At 0 they are one.
+// What a line says at a time, from the left and from the right: two values where it jumps.
+struct Sides {
+    double left;
+    double right;
+};
+
+Sides SidesAt(std::vector<Point> const& line, double x)
+{
+    auto const [first, last] = std::ranges::equal_range(line, x, {}, &Point::x);
+    if (first != last) return {first->y, last[-1].y};
+    if (first == line.begin() || first == line.end()) {
+        double const held = first == line.begin() ? first->y : last[-1].y;
+        return {held, held};
+    }
+    Point const& before = first[-1];
+    double const y = before.y + (first->y - before.y) * ((x - before.x) / (first->x - before.x));
+    return {y, y};
+}
+
+// Whether no point of a line is farther than that above or below another line.
+bool LiesOn(std::vector<Point> const& a, std::vector<Point> const& b, double tolerance)
+{
+    return std::ranges::all_of(
+        a,
+        [&](Point const& point) {
+            Sides const sides = SidesAt(b, point.x);
+            return std::min(std::abs(point.y - sides.left), std::abs(point.y - sides.right)) <= tolerance;
+        });
+}
+
+// How alike two curves are: as far apart as `tolerance` nowhere. At 0 they are one. Each has points where it bends.
 bool Coincide(std::vector<Point> const& a, std::vector<Point> const& b, double tolerance)
 {
-    return std::ranges::equal(
-        a, b, [tolerance](Point const& p, Point const& q) { return p.x == q.x && std::abs(p.y - q.y) <= tolerance; });
+    if (&a == &b) return true;
+    if (a.empty() || b.empty()) return a.empty() && b.empty();
+    return LiesOn(a, b, tolerance) && LiesOn(b, a, tolerance);
 }
 
 // The first component whose curve lies on that of `component`, which may be itself.

@@ -24,7 +24,7 @@
 #include <climits>
 #include <cmath>
 #include <cstring>
-#include <numeric>
+#include <utility>
 
 using hearth::utility::Guid;
 
@@ -116,20 +116,47 @@ private:
     std::array<unsigned char, 512> bytes_;
 };
 
+unsigned int GreatestDivisor(unsigned int a, unsigned int b)
+{
+    while (b != 0) a = std::exchange(b, a % b);
+    return a;
+}
+
 // From one time to another, in lowest terms. Most keys have the scale of what is rendered.
 T_Time Distance(T_Time const& from, T_Time const& to)
 {
     std::int64_t const units = std::int64_t{to.value} - from.value;
-    std::int64_t const size = units < 0 ? -units : units;
+    auto const size = static_cast<std::uint64_t>(units < 0 ? -units : units);
     if (from.scale == to.scale && from.scale != 0 && size <= INT_MAX) {
-        unsigned int const divisor = std::gcd(static_cast<unsigned int>(size), from.scale);
-        int const value = static_cast<int>(size / divisor);
+        unsigned int const divisor = GreatestDivisor(static_cast<unsigned int>(size), from.scale);
+        int const value = static_cast<int>(static_cast<unsigned int>(size) / divisor);
         return {units < 0 ? -value : value, from.scale / divisor};
     }
     T_Time const distance = to - from;
     T_Time reduced{};
     KFSp_ThrowIf(T_ReduceTime(&distance, &reduced, nullptr));
     return reduced;
+}
+
+// The keys at an index and behind it.
+KFSp_KeyPair KeyPair(Asked const& asked, int index)
+{
+    KFSp_KeyPair const pair = KFSp_GetKeyPair(asked.data, index);
+    if (!pair.a) throw int{SEQ_Err_BadIndex};
+    return pair;
+}
+
+// How far the key's neighbours are, where a list has no float keys to pass over: in place of KFSp_GetDurations.
+KFSp_Durations DurationsInList(Asked const& asked, Key const& key)
+{
+    KFSp_Durations durations;
+    unsigned int const scale = asked.data->stream->GetTimeScale();
+    durations.hasPrev = key.index > 0;
+    durations.hasNext = key.index + 1 < KFSp_ItemCount(asked.data);
+    if (durations.hasPrev)
+        durations.prev = KFSp_Seconds(key.record->time, KeyPair(asked, key.index - 1).a->time, scale);
+    if (durations.hasNext) durations.next = KFSp_Seconds(KeyPair(asked, key.index).b->time, key.record->time, scale);
+    return durations;
 }
 
 // One side of a key: how it is left or reached, and the handles that go with it.
@@ -170,9 +197,11 @@ void MixInKey(Gathered& gathered, Asked const& asked, int index, Range const& ra
     asked.stream->MixInValueAtTime(gathered.Fed(), time, asked.bag);
     if (range.first == range.last) return;
     if (!valueOnly) {
-        KFSp_ThrowIf(KFSp_GetConstKey(asked.data, index, &key.record));  // the host's value may have come by an edit
         KFSp_Durations durations;
-        KFSp_ThrowIf(KFSp_GetDurations(asked.data->stream, index, key.record, &durations));
+        if (asked.data->stream->IsSpatial())
+            KFSp_ThrowIf(KFSp_GetDurations(asked.data->stream, index, key.record, &durations));
+        else
+            durations = DurationsInList(asked, key);
         if (index != range.first) PutSide(gathered, asked, key, KFSp_Side::In, durations);
         if (index != range.last) PutSide(gathered, asked, key, KFSp_Side::Out, durations);
     }
@@ -189,18 +218,38 @@ bool IsModifiable(KFS_Stream const* stream, Key const& key)
     return IsLive(tangents.in) || IsLive(tangents.out);
 }
 
-// The key at a time of the source; without one the key on the preferred side, else the one on the other.
-Key FindKey(KFS_Stream const* source, T_Time const& time, bool before)
+// A time as the source counts it.
+int UnitsOf(Asked const& asked, T_Time const& time)
 {
     int units = 0;
-    KFSp_ThrowIf(T_ShortConvTime(time.value, time.scale, KFSp_Seen(source)->GetTimeScale(), &units));
+    KFSp_ThrowIf(T_ShortConvTime(time.value, time.scale, asked.data->stream->GetTimeScale(), &units));
+    return units;
+}
+
+// The key at a time of the source; without one the key on the preferred side, else the one on the other.
+Key FindKey(Asked const& asked, int units, bool before)
+{
     KFSp_Neighbours around;
-    KFSp_ThrowIf(KFSp_FindAround(source, units, 0, &around));
+    KFSp_ThrowIf(KFSp_FindAround(asked.source, units, 0, &around));
     if (around.at) return {around.atIndex, around.at};
     Key const prev{around.prevIndex, around.prev};
     Key const next{around.nextIndex, around.next};
     Key const& preferred = before ? prev : next;
     return preferred.record ? preferred : before ? next : prev;
+}
+
+// The key that ends a span which begins at `first`. Most spans are short, so that a few steps are less than a search.
+Key FindEnd(Asked const& asked, Key const& first, int start, int end)
+{
+    constexpr int MostSteps = 8;
+    if (asked.data->stream->IsSpatial() || end < start) return FindKey(asked, end, false);
+    int const last = KFSp_ItemCount(asked.data) - 1;
+    Key key = first;
+    for (int step = 0; step < MostSteps; ++step) {
+        if (key.record->time >= end || key.index == last) return key;
+        key = {key.index + 1, KeyPair(asked, key.index).b};
+    }
+    return FindKey(asked, end, false);
 }
 
 bool AllZero(double const* numbers, int count)
@@ -238,9 +287,10 @@ void MixInKeys(KFSp_IdentityHash& hash, Asked const& asked)
 {
     KFSp_ThrowIf(
         asked.source->UpdateStream());  // float keys move, and handles change, when they are brought up to date
-    Key const first = FindKey(asked.source, asked.span.start, true);
+    int const start = UnitsOf(asked, asked.span.start);
+    Key const first = FindKey(asked, start, true);
     T_Time const end = asked.span.start + asked.span.duration;
-    Key const last = FindKey(asked.source, end, false);
+    Key const last = FindEnd(asked, first, start, UnitsOf(asked, end));
     Range range{first.index, last.index, end};
     if (last.index == first.index + 1 && IsFlat(asked, first, last)) range.last = first.index;
     Gathered gathered(hash);
