@@ -218,6 +218,14 @@ int KFSp_SetDefaultKeyframeTangents(KFS_Stream const* stream, int time, char mod
     return error.Code();
 }
 
+void KFSp_SetHandlesBetween(KFS_Stream const* stream, KFS_KeyScalar* prev, KFS_KeyScalar* next, KFS_KeyScalar* key)
+{
+    KFSp_Neighbours around;
+    around.prev = prev;
+    around.next = next;
+    SetPlainHandles(stream, around, key);
+}
+
 int KFSp_ComputeDefaultSpTangents(short dimension, double const* prev, double const* cur, double const* next,
                                   double* inTangent, double* outTangent)
 {

@@ -204,10 +204,8 @@ public:
     }
 
     // Hands their values out. False where that ends the call.
-    bool Finish(KFS_Stream const* stream, T_Time const* times, int number, int first, double* values,
-                Results& results) const
+    bool Finish(bool isLimited, T_Time const* times, int number, int first, double* values, Results& results) const
     {
-        bool const isLimited = stream->IsFloatBased();
         for (int i = 0; i < number; ++i) {
             double* const to = values + first + i;
             *to = lanes_.result[i];
@@ -254,6 +252,17 @@ private:
     KFSp_SplineLanes lanes_{};
 };
 
+// Whether the stream's class has limits. False, and no answer, where it throws, which each read then does in its place.
+[[gnu::noinline]] bool AskIsLimited(KFS_Stream const* stream, bool* isLimited) noexcept
+{
+    try {
+        *isLimited = stream->IsFloatBased();
+        return true;
+    } catch (...) {
+        return false;
+    }
+}
+
 // A block of times on one stream.
 class TimesBlock {
 public:
@@ -261,15 +270,19 @@ public:
 
     // Prepares reads from `times` on and answers how many; 0 where the first one isn't short, -1 where one of the next ones
     // fails. Nothing that anybody sees has changed then or after.
+    //
+    // Along a list whose times ascend a search at a key's time finds that key, which is then what a record that holds it
+    // would answer. On a list around the circle it needn't, so there each read goes by what the one before has left.
     int Prepare(T_Time const* times, int count)
     {
         run_ = 0;
         Q_RenderContext const* const context = Q_RenderContext::PeekCurrent();
         if (!KFSp_IsShortRead(stream_, context, times, flags_, &read_) || read_.seen->HasNoKeys() ||
-            !KFSp_HasShortKeys(read_.data))
+            !KFSp_HasShortKeys(read_.data) || !read_.data->times.Ascends())
             return 0;
         int const dimension = read_.seen->GetDimension();
         if (dimension > MostComponents || read_.data->cache->time == read_.time) return 0;
+        if (!AskIsLimited(stream_, &isLimited_)) return -1;
         run_ = runs_.Prepare(read_, times, count);
         if (run_ > 0) return run_;
         int const number = std::min(count, Block / dimension);
@@ -291,13 +304,12 @@ public:
     // Hands the prepared values out. False where it ends the call.
     bool Finish(T_Time const* times, int number, int first, double* values, Results& results)
     {
-        if (run_ > 0) return runs_.Finish(stream_, times, number, first, values, results);
+        if (run_ > 0) return runs_.Finish(isLimited_, times, number, first, values, results);
         int const dimension = read_.seen->GetDimension();
-        bool const isLimited = stream_->IsFloatBased();
         for (int i = 0; i < number; ++i) {
             double const* const from = ValueOf(read_.data, elements_[static_cast<std::size_t>(i)]);
             double* const to = values + static_cast<std::ptrdiff_t>(first + i) * dimension;
-            int const code = !isLimited && KFSp_CopyFewDoubles(dimension, from, to)
+            int const code = !isLimited_ && KFSp_CopyFewDoubles(dimension, from, to)
                                  ? 0
                                  : KFSp_FakeCopyItemFunc(read_.seen, 0, KFS_Item_CacheValue, from, to);
             if (!results.Take(first + i, code)) {
@@ -324,6 +336,7 @@ private:
     KFS_Stream const* stream_;
     int flags_;
     KFSp_ShortRead read_{};
+    bool isLimited_ = false;
     int run_ = 0;  // how many reads are a run
     SplineRun runs_;
     std::array<Element, Block> elements_;
@@ -385,18 +398,21 @@ public:
         batch_.Solve();
     }
 
-    // One of them, its value to `to`.
+    // One of them, its value to `to`. Reads by the general way may have read others of the block, at other times: keys say
+    // the same after that, but a record stands elsewhere.
     int Finish(KFS_Stream const* stream, int index, double* to)
     {
         Element& element = elements_[static_cast<std::size_t>(index)];
         KFSp_ShortRead const& read = reads_[static_cast<std::size_t>(index)];
-        if (element.kind == Element::Kind::Single || SolveAlone(read.seen, element) != 0)
+        bool const moved =
+            element.kind == Element::Kind::Standing && !read.seen->HasNoKeys() && read.data->cache->time != read.time;
+        if (element.kind == Element::Kind::Single || moved || SolveAlone(read.seen, element) != 0)
             return KFS_GetValueFPlus(stream, time_, flags_, to, nullptr, nullptr);
         if (read.seen->HasNoKeys())
             KFSp_MoveConstant(read.data, read.time);
         else
             KeepInCache(read.data, read.seen, element);
-        return KFSp_CopyDoublesOut(stream, read.seen, ValueOf(read.data, element), to);
+        return KFSp_EndDoubles(stream, read.seen, ValueOf(read.data, element), to);
     }
 
 private:
@@ -410,7 +426,9 @@ private:
             read.seen->GetDimension() > MostComponents)
             return;
         bool const isConstant = read.seen->HasNoKeys();
-        if (isConstant ? KFSp_CacheIsEmpty(read.data->cache) : !KFSp_HasShortKeys(read.data)) return;
+        if (isConstant ? KFSp_CacheIsEmpty(read.data->cache)
+                       : !KFSp_HasShortKeys(read.data) || !read.data->times.Ascends())
+            return;
         element.time = read.time;
         element.kind = Element::Kind::Standing;
         if (isConstant || (read.data->cache->time == read.time && read.time != KFS_INVALID_INDEX)) return;

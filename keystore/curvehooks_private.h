@@ -62,6 +62,10 @@ inline constexpr char KFSp_Tangents_Spatial = 2;
 // service's.
 [[nodiscard]] int KFSp_SetDefaultKeyframeTangents(KFS_Stream const* stream, int time, char mode, KFS_KeyScalar* key);
 
+// The handles of the same for a key of a plain stream that isn't spatial, that is about to enter the list between two
+// keys at hand.
+void KFSp_SetHandlesBetween(KFS_Stream const* stream, KFS_KeyScalar* prev, KFS_KeyScalar* next, KFS_KeyScalar* key);
+
 // Puts a key on a curve without changing the curve: splits the segment at `time` and gives `key` the split point and
 // the inner handles, and the two neighbours the outer ones.
 //

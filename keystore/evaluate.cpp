@@ -293,18 +293,18 @@ int CopyExternalOut(KFS_Stream const* seen, void const* from, void* value)
     });
 }
 
-// The ends of short reads, which may ask the stream's class. Apart, so that what comes before needs no way out for a throw.
+// The end of a short read, apart as KFSp_EndDoubles is.
 [[gnu::noinline]] int EndExternal(KFS_Stream const* seen, void const* from, void* value)
 {
     return KFSp_Boundary([&] { return CopyExternalOut(seen, from, value); });
 }
 
-[[gnu::noinline]] int EndDoubles(KFS_Stream const* stream, KFS_Stream const* seen, void const* from, double* value)
+}  // namespace
+
+[[gnu::noinline]] int KFSp_EndDoubles(KFS_Stream const* stream, KFS_Stream const* seen, void const* from, double* value)
 {
     return KFSp_Boundary([&] { return KFSp_CopyDoublesOut(stream, seen, from, value); });
 }
-
-}  // namespace
 
 bool KFSp_MayAnswerFromFollowers(KFS_Stream const* stream) noexcept
 {
@@ -346,7 +346,7 @@ int KFS_GetValueFPlus(KFS_Stream const* stream, T_Time const* time, int flags, d
         return ReadDoublesStaged(stream, time, flags, value, nullptr, nullptr);
     if (code != 0) [[unlikely]]
         return code;
-    return EndDoubles(stream, read.seen, KFSp_ValueData(read.data->cache), value);
+    return KFSp_EndDoubles(stream, read.seen, KFSp_ValueData(read.data->cache), value);
 }
 
 void KFS_GetValueNoExpr(KFS_Stream const* stream, int time, unsigned char keyOnly, void* value, unsigned char* atKey,

@@ -3,6 +3,7 @@
 
 #include "keystore/plainkeys_private.h"
 
+#include "keystore/curvehooks_private.h"
 #include "keystore/items_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/savedrecords_private.h"
@@ -65,7 +66,8 @@ void Widen(int (&range)[2], int first, int last)
     Widen(data->arcInvalidKeyIndex, std::max(first - 2, 0), std::min(last + 2, count - 1));
 }
 
-// A new key without neighbours has no handles; any other one has, on which its sides agree.
+// A new key without neighbours has no handles; any other one has, on which its sides agree. Behind all others they are at
+// rest. The same bytes but for the time are what the general way leaves in the cache record, by which the key came in.
 [[gnu::always_inline]] inline void WriteKey(unsigned char* place, int time, char inInterp, char outInterp, bool isFirst,
                                             double const* value, int dimension)
 {
@@ -105,10 +107,12 @@ bool KFSp_AppendPlainKey(KFS_Stream* stream, T_Time const* time, double const* v
     int const count = (*data->keys)->count;
     unsigned char* const room = KFSp_GetRoom(data->keys, 1);
     if (!room || !data->times.Mirrors(count) || !data->times.Append(time->value)) return false;
-    WriteKey(room, time->value, inInterp, outInterp, false, value, stream->GetDimension());
+    int const dimension = stream->GetDimension();
+    WriteKey(room, time->value, inInterp, outInterp, false, value, dimension);
+    WriteKey(reinterpret_cast<unsigned char*>(data->cache), KFS_INVALID_INDEX, inInterp, outInterp, false, value,
+             dimension);
     KFSp_TakeRoom(data->keys, 1);
     MarkInserted(data, count, count, count + 1);
-    data->cache->time = KFS_INVALID_INDEX;
     return true;
 }
 
@@ -150,6 +154,9 @@ private:
     bool SortTimes();
     bool MakeRoom();
     bool Merge();
+    void Append();
+    int LastSource() const;
+    void LeaveInCache(int i, int index) const;
     int Source(int i) const { return order_ ? order_[i] : i; }
     void Write(unsigned char* place, int i) const;
     void WriteNumbers(unsigned char* place, std::size_t stride) const;
@@ -320,6 +327,43 @@ bool Batch::Merge()
     return true;
 }
 
+void Batch::Append()
+{
+    unsigned char* place = KFSp_GetRoom(data_->keys, keys_.count);
+    auto const stride = static_cast<std::size_t>((*data_->keys)->stride);
+    if (stream_->GetDimension() == 1 && HasAllHandles() && !order_)
+        WriteNumbers(place, stride);
+    else
+        for (int i = 0; i < keys_.count; ++i, place += stride) Write(place, i);
+    KFSp_TakeRoom(data_->keys, keys_.count);
+    data_->times.Appended({times_, static_cast<std::size_t>(keys_.count)});
+    MarkInserted(data_, count_, count_ + keys_.count - 1, count_ + keys_.count);
+}
+
+// Which one of the batch, in the order of time, is the last of the caller's order.
+int Batch::LastSource() const
+{
+    int const last = keys_.count - 1;
+    return order_ ? static_cast<int>(std::find(order_, order_ + last, last) - order_) : last;
+}
+
+// One by one the caller's last key would have come last: it stays in the cache record as it went into the list, which is
+// with the handles that followed from the keys beside it. Those that the caller gives go into the list alone.
+void Batch::LeaveInCache(int i, int index) const
+{
+    KFS_KeyScalar* const cache = data_->cache;
+    int const last = keys_.count - 1;
+    int const dimension = stream_->GetDimension();
+    char const in = keys_.inInterps[last], out = keys_.outInterps[last];
+    WriteKey(reinterpret_cast<unsigned char*>(cache), KFS_INVALID_INDEX, in, out, count_ + last == 0,
+             keys_.values + std::ptrdiff_t{last} * dimension, dimension);
+    if (!HasSplineSide(in, out) || index == 0 || index == count_ + last) return;
+    auto const stride = static_cast<std::size_t>((*data_->keys)->stride);
+    unsigned char* const before = (*data_->keys)->items + static_cast<std::size_t>(index - 1) * stride;
+    KFSp_SetHandlesBetween(stream_, reinterpret_cast<KFS_KeyScalar*>(before),
+                           reinterpret_cast<KFS_KeyScalar*>(before + 2 * stride), cache);
+}
+
 bool Batch::Insert()
 {
     data_ = OrdinaryKeys(stream_);
@@ -335,16 +379,13 @@ bool Batch::Insert()
     int const highest = std::max(count_ > 0 ? data_->times[count_ - 1] : times_[0], times_[keys_.count - 1]);
     bool const isShort = static_cast<unsigned int>(highest) - static_cast<unsigned int>(lowest) < 1U << 31;
     if (!isShort || (count_ > 0 && !data_->times.Ascends()) || !MakeRoom()) return false;
-    if (!behind) return Merge();
-    unsigned char* place = KFSp_GetRoom(data_->keys, keys_.count);
-    auto const stride = static_cast<std::size_t>((*data_->keys)->stride);
-    if (stream_->GetDimension() == 1 && HasAllHandles() && !order_)
-        WriteNumbers(place, stride);
-    else
-        for (int i = 0; i < keys_.count; ++i, place += stride) Write(place, i);
-    KFSp_TakeRoom(data_->keys, keys_.count);
-    data_->times.Appended({times_, static_cast<std::size_t>(keys_.count)});
-    MarkInserted(data_, count_, count_ + keys_.count - 1, count_ + keys_.count);
+    int const last = LastSource();
+    int const index = data_->times.LowerBound(times_[last]) + last;
+    if (behind)
+        Append();
+    else if (!Merge())
+        return false;
+    LeaveInCache(last, index);
     return true;
 }
 
@@ -353,7 +394,12 @@ bool Batch::Insert()
 bool KFSp_InsertPlainKeys(KFS_Stream* stream, KFS_NewKeys const& keys)
 {
     Batch batch(stream, keys);
-    if (!batch.Prepare() || !batch.Insert()) return false;
-    stream->GetCache()->time = KFS_INVALID_INDEX;
-    return true;
+    if (!batch.Prepare()) return false;
+    bool const hadList = stream->GetKeys() != nullptr;
+    if (batch.Insert()) return true;
+    if (SEQ_Head** const made = hadList ? nullptr : stream->GetKeys()) {
+        stream->SetKeys(nullptr);
+        KFSp_DisposeKeyList(made);
+    }
+    return false;
 }

@@ -147,3 +147,7 @@ struct KFSp_ShortRead {
     if (!stream->IsFloatBased() && KFSp_CopyFewDoubles(seen->GetDimension(), from, value)) return 0;
     return KFSp_FakeCopyItemFunc(seen, 0, KFS_Item_CacheValue, from, value);
 }
+
+// The same as the end of a short read, which may ask the stream's class. Apart, so that what comes before needs no way
+// out for a throw.
+[[nodiscard]] int KFSp_EndDoubles(KFS_Stream const* stream, KFS_Stream const* seen, void const* from, double* value);

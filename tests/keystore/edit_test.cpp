@@ -1,6 +1,7 @@
 #include "keystore/edit.h"
 
 #include "keystore/edit_private.h"
+#include "keystore/items_private.h"
 #include "tests/support/dice.h"
 #include "tests/support/listening.h"
 #include "tests/support/streams.h"
@@ -75,6 +76,7 @@ TEST_F(Edit, TheShortWaysLeaveWhatTheGeneralOneLeaves)
         StreamOptions const options{.dimension = static_cast<short>(1 + seed % 3),
                                     .type = seed % 4 == 3 ? KFS_Type_Float : KFS_Type_Double};
         TestStream quick(options), general(options);
+        ASSERT_EQ(0, KFSp_CreateKeyList(general));
         HeardRoot quickRoot, generalRoot;
         quickRoot.Store(quick), generalRoot.Store(general);
         ValueListener listener;
@@ -86,12 +88,14 @@ TEST_F(Edit, TheShortWaysLeaveWhatTheGeneralOneLeaves)
             ASSERT_EQ(quick.Bytes(), general.Bytes());
             EXPECT_EQ(quick.Stale(), general.Stale());
             EXPECT_EQ(quick.ArcStale(), general.ArcStale());
+            // Numbers between keys are read over what an edit leaves, and a list ends in what is there then.
+            ASSERT_EQ(0, std::memcmp(quick->GetCache(), general->GetCache(), quick->GetCacheSize()));
             EXPECT_EQ(reports.Take().size() % 2, 0U);
         };
         int const origin = seed % 5 == 4 ? 2147483000 : -50;
         auto const code = [&] { return static_cast<char>(1 + dice.Below(3)); };
         for (int step = 0; step < 60; ++step) {
-            if (general->GetKeys()) EXPECT_EQ(0, SEQ_SetFuncs(general->GetKeys(), 3, &slow));
+            EXPECT_EQ(0, SEQ_SetFuncs(general->GetKeys(), 3, &slow));
             int const what = dice.Below(10);
             int const last = general.Count() > 0 ? general.Times().back() : origin;
             bool const behind = dice.Below(3) != 0;
@@ -131,6 +135,22 @@ TEST_F(Edit, TheShortWaysLeaveWhatTheGeneralOneLeaves)
             }
         }
     }
+}
+
+// These times are too far apart for the short way, which has made the list by then.
+TEST_F(Edit, ABatchThatFailsLeavesNoList)
+{
+    int const times[] = {-1500000000, 0, 1500000000};
+    double const values[3] = {};
+    KFS_NewKeys const keys{3, times, 600, values, "\1\1\1", "\1\1\1"};
+    int refused = 0;
+    FailEveryAllocation([] { return std::make_unique<TestStream>(); },
+                        [&](TestStream& stream) { return KFS_InsertKeys(stream, &keys, 0); },
+                        [&](TestStream& stream, int code, Q_MemoryCount const&) {
+                            refused += code != 0;
+                            EXPECT_EQ(code != 0, stream->GetKeys() == nullptr);
+                        });
+    EXPECT_LT(2, refused);
 }
 
 // ---- insertion from the cache record, the way in for everybody

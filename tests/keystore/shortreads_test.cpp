@@ -6,6 +6,7 @@
 #include "keystore/cachestate.h"
 #include "keystore/curvehooks_private.h"
 #include "keystore/expstate.h"
+#include "keystore/lookup.h"
 #include "tests/support/dice.h"
 #include "tests/support/streams.h"
 #include "tests/support/text.h"
@@ -48,17 +49,21 @@ boost::shared_ptr<Q_RenderContext> MakeContext(bool isPlain, bool tempClone)
     return context;
 }
 
-// Forces values into limits, or refuses them.
+// Forces values into limits, or refuses them, and may read another stream meanwhile.
 class LimitedStream : public KFS_Stream {
 public:
     using KFS_Stream::KFS_Stream;
-    bool IsFloatBased() const override { return isLimited; }
+    bool IsFloatBased() const override { return throws ? throw 4714 : isLimited; }
     void LegalizeValue(double* values) const override
     {
+        double value[5];
+        if (other) static_cast<void>(KFS_GetValueFPlus(other, &otherTime, 0, value, nullptr, nullptr));
         if (values[0] > 50.0) throw 4711;
         values[0] = std::max(values[0], -20.0);
     }
-    bool isLimited = false;
+    bool isLimited = false, throws = false;
+    LimitedStream const* other = nullptr;
+    T_Time otherTime{};
 };
 
 int CountingDispose(KFS_Stream const*, long, short, void*)
@@ -115,6 +120,27 @@ protected:
         default: return (dice.Below(40) - 20) * 7;
         }
     }
+    int AnyKeyTime(Twin const& twin)
+    {
+        T_Time time{0, 600};
+        int const index = dice.Below(12);
+        bool const isThere = index < twin.streams[0]->GetKeyCount();
+        EXPECT_EQ(0, isThere ? KFS_IndexToTime(twin.streams[0].get(), index, &time) : 0);
+        return time.value;
+    }
+    // Each reads one before it, on its own side.
+    void LetRead(std::vector<Twin> const& twins)
+    {
+        for (std::size_t i = 1; i < twins.size(); ++i) {
+            if (dice.Below(4) != 0) continue;
+            auto const which = static_cast<std::size_t>(dice.Below(static_cast<int>(i)));
+            T_Time const at{AnyTime(), 600};
+            for (std::size_t side = 0; side < 2; ++side) {
+                LimitedStream& stream = *twins[i].streams[side];
+                stream.isLimited = true, stream.other = twins[which].streams[side].get(), stream.otherTime = at;
+            }
+        }
+    }
     double AnyNumber() { return dice.Below(6) ? dice.Between(-40.0, 60.0) : dice.Wild(12); }
     double AnyInfluence() { return dice.Below(3) ? dice.Between(0.0, 1.0) : dice.Below(5) * 0.25; }
 
@@ -153,7 +179,7 @@ protected:
                 if (!stream.IsSpatial()) stream.SetInterpFunc(which % 3 ? KFSp_Interpolate : FortyTwo);
                 break;
             case 11: stream.SetDisposeItemFunc(which % 3 ? nullptr : CountingDispose); break;
-            case 12: stream.isLimited = which % 3 == 0; break;
+            case 12: stream.isLimited = which % 3 == 0, stream.throws = which == 1; break;
             case 13: stream.SetTimeScale(which == 0 ? 0 : which == 1 ? 1200 : 600); break;
             default: break;
             }
@@ -268,6 +294,7 @@ TEST_F(ShortReads, BatchesAnswerAsLoopsDo)
             twins.push_back(MakeTwin());
             for (int edit = dice.Below(4) ? 0 : 3; edit > 0; --edit) Edit(twins.back());
         }
+        LetRead(twins);
         static_cast<void>(reports.Take());
         bool const inRender = dice.Below(4) == 0, keepsCodes = dice.Below(2) == 0, isPlain = dice.Below(8) != 0;
         auto const plain = MakeContext(isPlain, inRender), silent = MakeContext(false, inRender);
@@ -277,7 +304,11 @@ TEST_F(ShortReads, BatchesAnswerAsLoopsDo)
             int const step = dice.Below(4) ? dice.Below(6) : -1;
             for (int i = dice.Below(MostTimes); i > 0; --i) {
                 unsigned int const scale = dice.Below(300) ? 600 : dice.Below(3) ? 30 : 0;
-                times.push_back({time = step >= 0 && dice.Below(50) ? time + step : AnyTime(), scale});
+                if (step >= 0 && dice.Below(50))
+                    time = static_cast<int>(static_cast<unsigned>(time) + static_cast<unsigned>(step));
+                else
+                    time = dice.Below(2) ? AnyTime() : AnyKeyTime(twins[0]);
+                times.push_back({time, scale});
             }
             int const flags = dice.Below(4) ? 0 : 1;
             auto const count = static_cast<int>(times.size());
