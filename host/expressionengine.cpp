@@ -23,10 +23,13 @@ constexpr int NestedFailure = KFS_Err_LegacyMismatch;
 constexpr double StepsOfRead = 50.0;
 constexpr char const* NotFinite = "gives a number that isn't finite";
 
-bool MayLoop(std::string_view text)
+// Loops, and long texts, of which there are none without these; names can be written with backslashes.
+bool MayTakeLong(std::string_view text)
 {
-    constexpr std::string_view words[] = {"for", "while", "repeat", "goto", "function"};
-    return std::ranges::any_of(words, [text](std::string_view word) { return HasWord(text, word); });
+    constexpr std::size_t surelyShort = 4096;
+    constexpr std::string_view words[] = {"for", "while", "repeat", "goto", "function", "rep", "concat", "format"};
+    return text.size() > surelyShort || text.find("..") != text.npos || text.find('\\') != text.npos ||
+           std::ranges::any_of(words, [text](std::string_view word) { return HasWord(text, word); });
 }
 
 // The function and its arguments lie on the stack, but for the value, which is made in here: that takes memory, and there may
@@ -59,7 +62,8 @@ public:
     ScRun(ExpressionEngine& engine, Run const& run) : engine_(engine), counted_(engine.lua_->CountsInstructions())
     {
         engine_.runs_[engine_.depth_++] = run;
-        if (run.compiled->mayLoop) engine_.lua_->CountInstructions(true);
+        engine_.lua_->MeetText(run.compiled->longestText);
+        if (run.compiled->mayTakeLong) engine_.lua_->CountInstructions(true);
     }
     ~ScRun()
     {
@@ -88,35 +92,43 @@ void ExpressionEngine::Evaluate(KFS_Stream const* stream, int time, int flags, d
 {
     if (depth_ == 0) lua_->BeginRead();
     if (depth_ > 0) CheckPlace(stream, time);
-    KFS_Stream const& seen = *stream->GetKeyData()->stream;
-    CompiledExpression& compiled = CompiledFor(seen);
-    bool hasValue = false;
-    if (compiled.fault) [[unlikely]] {
-        fault_ = *compiled.fault;
-    } else {
-        ScRun const running(*this, {stream, &seen, time, flags, bag, &compiled});
-        hasValue = RunCompiled(values);
+    Run const run{stream, stream->GetKeyData()->stream, time, flags, bag, nullptr};
+    bool hasValue = TryEvaluate(run, values);
+    if (!hasValue && depth_ == 0 && fault_.isLimit) [[unlikely]] {
+        hasValue = lua_->BeginAgain() && TryEvaluate(run, values);
+        lua_->Settle();  // the next one needn't be begun again
     }
     if (!hasValue) [[unlikely]]
         Fail(stream, std::move(fault_));
 }
 
-// By the text, which may have changed while the cache was another context's or another record's at this address.
+bool ExpressionEngine::TryEvaluate(Run const& run, double* values)
+{
+    CompiledExpression& compiled = CompiledFor(*run.seen);
+    if (compiled.fault) [[unlikely]]
+        return Failed(*compiled.fault);
+    ScRun const running(*this, {run.stream, run.seen, run.time, run.flags, run.bag, &compiled});
+    return RunCompiled(values);
+}
+
+// By the text, which may have changed while the cache was another context's or another record's at this address. Where memory
+// ran out it is tried again: that was then, and not the text's.
 CompiledExpression& ExpressionEngine::CompiledFor(KFS_Stream const& seen)
 {
     using Held = std::shared_ptr<CompiledExpression>;
     KFS_ExprInfo const& info = seen.GetExprInfo();
     boost::any* const cache = info.GetExpressionCacheImpl();
-    if (Held* const held = boost::any_cast<Held>(cache);
-        held && (*held)->lua == lua_ && IsSame((*held)->text, info.GetExpression()))
+    if (Held* const held = boost::any_cast<Held>(cache); held && (*held)->lua == lua_ &&
+                                                         IsSame((*held)->text, info.GetExpression()) &&
+                                                         !((*held)->fault && (*held)->fault->isLimit))
         return **held;
     auto const made = std::make_shared<CompiledExpression>(lua_);
     std::string const text = Q_UTF16ToMBString(info.GetExpression());
     made->text = info.GetExpression();
     made->usesValue = HasWord(text, "value");
     made->usesFrame = HasWord(text, "frame");
-    made->mayLoop = MayLoop(text);
-    made->function = lua_->Compile(text, made->fault);
+    made->mayTakeLong = MayTakeLong(text);
+    made->function = lua_->Compile(text, made->fault, &made->longestText);
     *cache = made;
     return *made;
 }
@@ -128,7 +140,7 @@ bool ExpressionEngine::RunCompiled(double* values)
     Run const& run = Current();
     CompiledExpression const& compiled = *run.compiled;
     lua_State* const lua = lua_->Get();
-    if (!lua_->Spend(compiled.mayLoop ? LuaState::CountInterval : StepsOfRead)) [[unlikely]]
+    if (!lua_->Spend(compiled.mayTakeLong ? LuaState::CountInterval : StepsOfRead)) [[unlikely]]
         return Failed({"runs for too long", -1, true});
     std::optional<double> frame;
     if (compiled.usesFrame && !(frame = FrameOf(run)))

@@ -32,8 +32,9 @@ struct CompiledExpression {
     std::optional<ExpressionFault> fault;  // why there is no function
     bool usesValue = false;                // what it doesn't name isn't worked out
     bool usesFrame = false;
-    bool mayLoop = false;
-    std::set<int> dependencies;  // which the stream knows of
+    bool mayTakeLong = false;
+    std::size_t longestText = 0;  // that stands in it, in bytes
+    std::set<int> dependencies;   // which the stream knows of
 };
 
 // Runs the expressions that one render context reads. Threads: the context's.
@@ -83,6 +84,7 @@ private:
 
     CompiledExpression& CompiledFor(KFS_Stream const& seen);
     // False: fault_ says why there is no value.
+    bool TryEvaluate(Run const& run, double* values);
     bool RunCompiled(double* values);
     bool RunWithVector(std::optional<double> const& frame, double* values);
     bool ReadOwnKeys(double* keys);

@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <cstdlib>
 #include <new>
+#include <utility>
 
 namespace kfshost {
 
@@ -13,6 +14,7 @@ namespace {
 constexpr std::string_view ChunkName = "=expression";
 constexpr std::string_view Place = "expression:";
 constexpr std::size_t MostShown = 1000;  // of an error's text
+constexpr std::size_t ShortText = 64;    // with Lua's head of it; all work on it is an instruction's
 
 bool IsNameChar(char c)
 {
@@ -106,9 +108,12 @@ LuaState::LuaState(ExpressionEngine* engine) : engine_(engine)
     lua_ = lua_newstate(Allocate, this);
     if (!lua_) throw std::bad_alloc();
     *static_cast<LuaState**>(lua_getextraspace(lua_)) = this;
-    if (Protected(lua_, [](lua_State* inside) { MakeSandbox(inside); }) == LUA_OK) return;
-    lua_close(lua_);
-    throw std::bad_alloc();
+    if (Protected(lua_, [](lua_State* inside) { MakeSandbox(inside); }) != LUA_OK) {
+        lua_close(lua_);
+        throw std::bad_alloc();
+    }
+    Settle();
+    sandbox_ = base_;
 }
 
 LuaState::~LuaState()
@@ -119,6 +124,7 @@ LuaState::~LuaState()
 void* LuaState::Allocate(void* owner, void* block, std::size_t oldSize, std::size_t newSize)
 {
     LuaState& state = *static_cast<LuaState*>(owner);
+    bool const isText = !block && oldSize == LUA_TSTRING;
     if (!block) oldSize = 0;  // it is the kind of what is to be made
     if (newSize == 0) {
         std::free(block);
@@ -127,21 +133,44 @@ void* LuaState::Allocate(void* owner, void* block, std::size_t oldSize, std::siz
     }
     if (newSize > oldSize) {
         std::size_t const more = newSize - oldSize;
-        if (more > MaxMemory || state.used_ + more > state.usedBefore_ + MaxMemory ||
-            state.allocated_ + newSize > MaxAllocated)
+        if (more > MaxMemory || state.used_ + more > state.base_ + MaxMemory ||
+            state.spent_.allocated + newSize > MaxAllocated) {
+            state.spent_.hasMetMemory = true;
             return nullptr;
-        state.allocated_ += newSize;
+        }
+        state.spent_.allocated += newSize;
+        if (isText && newSize > ShortText) state.MeetText(newSize);
     }
     void* const grown = std::realloc(block, newSize);
     if (grown) state.used_ += newSize - oldSize;
     return grown;
 }
 
-double LuaState::StepsOfInterval() const
+double LuaState::StepsOfInterval()
 {
-    constexpr double oneStep = 1 << 12;
-    double const held = used_ > usedBefore_ ? static_cast<double>(used_ - usedBefore_) : 0.0;
-    return CountInterval * (1.0 + held / oneStep);
+    constexpr std::size_t freeHeld = 1 << 14;  // the garbage of what has just been compiled is less
+    constexpr double heldForStep = 1 << 12;
+    constexpr double textForStep = 1 << 4;
+    double steps = 1.0 + static_cast<double>(spent_.longestText) / textForStep;
+    if (used_ > base_ + freeHeld) {
+        spent_.hasMetMemory = true;
+        steps += static_cast<double>(used_ - base_ - freeHeld) / heldForStep;
+    }
+    return CountInterval * steps;
+}
+
+void LuaState::Settle()
+{
+    lua_gc(lua_, LUA_GCCOLLECT);
+    base_ = used_;
+}
+
+bool LuaState::BeginAgain()
+{
+    if (isSettled_ || !spent_.hasMetMemory) return false;
+    Settle();
+    BeginRead();
+    return true;
 }
 
 namespace {
@@ -170,7 +199,7 @@ void LuaState::SwitchCounting(bool on)
     countsInstructions_ = on;
 }
 
-int LuaState::Compile(std::string_view text, std::optional<ExpressionFault>& fault)
+int LuaState::Compile(std::string_view text, std::optional<ExpressionFault>& fault, std::size_t* longestText)
 {
     int function = LUA_NOREF;
     if (text.size() > MaxText) {
@@ -189,21 +218,29 @@ int LuaState::Compile(std::string_view text, std::optional<ExpressionFault>& fau
         else
             lua_error(inside);
     };
+    Spent const outer = std::exchange(spent_, {});
+    std::size_t const base = std::exchange(base_, used_);
     if (lua_checkstack(lua_, LUA_MINSTACK) == 0)
         fault = FaultOfMemory();
     else if (int const outcome = Protected(lua_, load); outcome != LUA_OK)
         fault = FaultOf(status == LUA_OK ? outcome : status);
+    if (longestText) *longestText = spent_.longestText;
+    spent_ = outer;
+    base_ = base;
+    isSettled_ = false;
     return function;
 }
 
 void LuaState::Release(int function)
 {
     luaL_unref(lua_, LUA_REGISTRYINDEX, function);  // into a free place of the registry: nothing is allocated
+    base_ = sandbox_;
+    isSettled_ = false;
 }
 
 ExpressionFault LuaState::FaultOfMemory()
 {
-    isExhausted_ = true;
+    spent_.isExhausted = true;
     return {"needs too much memory", -1, true};
 }
 
@@ -224,7 +261,7 @@ ExpressionFault LuaState::FaultOf(int status)
     } else {
         fault.text = std::string("error with a ") + luaL_typename(lua_, -1) + " in place of a text";
     }
-    fault.isLimit = isExhausted_;
+    fault.isLimit = spent_.isExhausted;
     lua_pop(lua_, 1);
     return fault;
 }

@@ -26,7 +26,7 @@ ExpressionEngine& EngineOf(lua_State* lua)
 
 double CheckSeconds(lua_State* lua, int index)
 {
-    double const seconds = luaL_checknumber(lua, index);
+    double const seconds = CheckNumber(lua, index);
     luaL_argcheck(lua, std::isfinite(seconds), index, "isn't a time");
     return seconds;
 }
@@ -45,6 +45,7 @@ int Stream(lua_State* lua)
     ExpressionEngine& engine = EngineOf(lua);
     std::size_t length = 0;
     char const* const path = luaL_checklstring(lua, 1, &length);
+    ChargeNumbers(lua, 1);
     double const seconds = lua_isnoneornil(lua, 2) ? 0.0 : CheckSeconds(lua, 2);
     Numbers values;
     engine.ReadStream(lua, {path, length}, lua_isnoneornil(lua, 2) ? nullptr : &seconds, values);
@@ -67,8 +68,8 @@ int Delay(lua_State* lua)
 
 int Random(lua_State* lua)
 {
-    double const time = lua_isnoneornil(lua, 2) ? EngineOf(lua).Current().Seconds() : luaL_checknumber(lua, 2);
-    lua_pushnumber(lua, exprmath::Random(luaL_checknumber(lua, 1), time));
+    double const time = lua_isnoneornil(lua, 2) ? EngineOf(lua).Current().Seconds() : CheckNumber(lua, 2);
+    lua_pushnumber(lua, exprmath::Random(CheckNumber(lua, 1), time));
     return 1;
 }
 
@@ -80,6 +81,7 @@ int Smooth(lua_State* lua)
     ExpressionEngine& engine = EngineOf(lua);
     ExpressionEngine::Run const& run = engine.Current();
     double const window = CheckSeconds(lua, 1);
+    ChargeNumbers(lua, 2);
     lua_Integer const samples = luaL_optinteger(lua, 2, usualSamples);
     luaL_argcheck(lua, samples >= 1 && samples <= mostSamples, 2, "isn't a number of samples from 1 to 1000");
     double const middle = lua_isnoneornil(lua, 3) ? run.Seconds() : CheckSeconds(lua, 3);

@@ -19,7 +19,7 @@ public:
         if (lua_istable(lua, index))
             count_ = lua_rawlen(lua, index);
         else
-            number_ = luaL_checknumber(lua, index);
+            number_ = CheckNumber(lua, index);
     }
 
     bool IsTable() const { return lua_istable(lua_, index_); }
@@ -126,6 +126,7 @@ int Component(lua_State* lua)
 int Vector(lua_State* lua)
 {
     int const count = lua_gettop(lua);
+    ChargeNumbers(lua, 1);
     lua_createtable(lua, count, 0);
     for (int i = 1; i <= count; ++i) {
         lua_pushnumber(lua, luaL_checknumber(lua, i));
@@ -179,16 +180,16 @@ double Between(double a, double b, double t)
 
 int Lerp(lua_State* lua)
 {
-    double const t = luaL_checknumber(lua, 3);
+    double const t = CheckNumber(lua, 3);
     return CombineFirstTwo(lua, [t](double a, double b) { return Between(a, b, t); });
 }
 
 // How far the first argument is on the way from the second to the third, held at both.
 double WayOfFirst(lua_State* lua)
 {
-    double const x = luaL_checknumber(lua, 1);
-    double const from = luaL_checknumber(lua, 2);
-    double const to = luaL_checknumber(lua, 3);
+    double const x = CheckNumber(lua, 1);
+    double const from = CheckNumber(lua, 2);
+    double const to = CheckNumber(lua, 3);
     if (from == to) return x < from ? 0.0 : 1.0;
     double const way = (x - from) / (to - from);
     return way < 0.0 ? 0.0 : way > 1.0 ? 1.0 : way;

@@ -246,6 +246,14 @@ TEST_F(Expressions, AreKeptInside)
         "1",
         "local t = {} for i = 1, 2e4 do t[i] = i end for i = 1, 1e9 do table.insert(t, 1, 0) table.remove(t, 1) end",
         "for i = 1, 1e9 do local x = select(1, table.unpack({}, 1, 1e5)) end return 1",
+        // numbers that are long texts, and orders of such
+        "local s = ('9'):rep(900000) while true do tonumber(s) end",
+        "local s = ('9'):rep(900000) while true do local x = sin(s) + floor(s) + noise(1, s) end",
+        "local s = ('9'):rep(900000) local t = {} for i = 1, 5000 do t[i] = s end return #vec(table.unpack(t))",
+        "local s = ('9'):rep(900000) while true do for i = 1, s do break end end",
+        "for i = 1, 9e6 do end local s, t = ('\\0'):rep(90000), ('\\0'):rep(90001) while true do local x = s < t end",
+        "for i = 1, 9e6 do end local t = {} for i = -999, 0 do t[i] = '' end while true do table.concat(t, '', -999, "
+        "0) end",
         // memory
         "string.rep('x', 1e9)",
         "string.rep('x', 1e5, string.rep('y', 1e5))",
@@ -285,6 +293,7 @@ TEST_F(Expressions, AreKeptInside)
         "string.gsub('x', '.', '')",
         "('x'):find('(.-)*')",
         "('').format('%p', {})",
+        "('').format('\\0%p', 'a text of more than forty characters, so that it has its own place')",
         "('').format('%s', {})",
         "next(math)",
         "math.random()",
@@ -300,6 +309,22 @@ TEST_F(Expressions, AreKeptInside)
         Set(tag, "value + 1");
         EXPECT_EQ(20.0, Read(tag, 12)[0]) << "after " << row;
     }
+    // What a read may use doesn't depend on what others left, nor on what is compiled meanwhile.
+    auto const holding = [](int pieces, std::string const& result) {
+        return "local t = {} for i = 1, " + std::to_string(pieces) +
+               " do t[i] = ('b'):rep(32768 - 40 - i) end return " + result;
+    };
+    for (int const pieces : {60, 90, 60, 90}) {
+        Set(box, holding(pieces, "#t"));
+        EXPECT_EQ(pieces == 60 ? 60.0 : 12.0, Read(box, 12)[0]);
+        EXPECT_EQ(pieces == 60 ? "" : "needs too much memory", Failure());
+    }
+    std::string names;
+    for (int i = 10000; i < 16000; ++i) names += "'" + std::to_string(i) + "',";
+    Set(tag, "if time < 0 then return {" + names + "} end return value");
+    Set(box, holding(60, "stream('a/Tag/weights')"));
+    EXPECT_EQ(19.0, Read(box, 12)[0]);
+    EXPECT_EQ("", Failure());
     // Nothing but values comes out of a read, and nothing stays.
     Set(box, "type(string.format) == 'function' and tostring({}) == 'table' and tostring(sin) == 'function' and 5");
     EXPECT_EQ(5.0, Read(box, 0)[0]);
