@@ -57,10 +57,8 @@ void CheckStream(StreamItem const& item, Options const& options)
 void SetOn(KFS_Stream& stream, Options const& options, std::optional<std::string> const& text)
 {
     if (text) KFS_SetStreamExpression(&stream, Q_MBToUTF16String(*text));
-    if (options.enable || options.disable) {
-        kfshost::ThrowIfFailed(
-            KFS_SetStreamExprFlags(&stream, KFS_ExprFlag_Disabled, options.disable ? KFS_ExprFlag_Disabled : 0));
-    }
+    if (options.enable || options.disable)
+        kfshost::ThrowIfFailed(KFS_SetStreamExprFlags(&stream, KFS_ExprFlag_Disabled, options.disable ? ~0U : 0U));
 }
 
 std::string DoneText(Options const& options, std::optional<std::string> const& text, std::size_t count)
