@@ -156,7 +156,7 @@ private:
     bool Merge();
     void Append();
     int LastSource() const;
-    void LeaveInCache(int i, int index) const;
+    void LeaveInCache(int index) const;
     int Source(int i) const { return order_ ? order_[i] : i; }
     void Write(unsigned char* place, int i) const;
     void WriteNumbers(unsigned char* place, std::size_t stride) const;
@@ -347,9 +347,10 @@ int Batch::LastSource() const
     return order_ ? static_cast<int>(std::find(order_, order_ + last, last) - order_) : last;
 }
 
-// One by one the caller's last key would have come last: it stays in the cache record as it went into the list, which is
-// with the handles that followed from the keys beside it. Those that the caller gives go into the list alone.
-void Batch::LeaveInCache(int i, int index) const
+// One by one the caller's last key, which stands at `index`, would have come last: it stays in the cache record as it
+// went into the list, which is with the handles that followed from the keys beside it. Those that the caller gives go
+// into the list alone.
+void Batch::LeaveInCache(int index) const
 {
     KFS_KeyScalar* const cache = data_->cache;
     int const last = keys_.count - 1;
@@ -385,7 +386,7 @@ bool Batch::Insert()
         Append();
     else if (!Merge())
         return false;
-    LeaveInCache(last, index);
+    LeaveInCache(index);
     return true;
 }
 

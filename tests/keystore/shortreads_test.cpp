@@ -106,6 +106,7 @@ protected:
             stream = std::make_unique<LimitedStream>(dimension, 600, 0, spatial, KFS_InterpMask_All, 0, desc, nullptr,
                                                      nullptr, false);
         int const keys = dice.Below(12);
+        isWide = dice.Below(4) == 0;
         for (int i = 0; i < keys; ++i) Insert(twin);
         static_cast<void>(reports.Take());  // times that can't be held are refused
         return twin;
@@ -117,15 +118,16 @@ protected:
         case 0: return INT_MIN + dice.Below(3);
         case 1: return INT_MAX - dice.Below(3);
         case 2: return (dice.Below(2) ? 1 : -1) * (1 << 30) + dice.Below(3) - 1;
+        case 3:
+        case 4: return (dice.Below(9) - 4) * 450000000;
         default: return (dice.Below(40) - 20) * 7;
         }
     }
     int AnyKeyTime(Twin const& twin)
     {
         T_Time time{0, 600};
-        int const index = dice.Below(12);
-        bool const isThere = index < twin.streams[0]->GetKeyCount();
-        EXPECT_EQ(0, isThere ? KFS_IndexToTime(twin.streams[0].get(), index, &time) : 0);
+        int const count = twin.streams[0]->GetKeyCount();
+        EXPECT_EQ(0, count > 0 ? KFS_IndexToTime(twin.streams[0].get(), dice.Below(count), &time) : 0);
         return time.value;
     }
     // Each reads one before it, on its own side.
@@ -146,8 +148,8 @@ protected:
 
     void Insert(Twin const& twin)
     {
-        // Mostly near zero; an order around the circle is undone where the list can't have it.
-        T_Time const at{dice.Below(9) ? (dice.Below(40) - 20) * 7 : AnyTime(), 600};
+        // Mostly near zero, on some streams all around; an order around the circle is undone where a list can't have it.
+        T_Time const at{!isWide && dice.Below(9) ? (dice.Below(40) - 20) * 7 : AnyTime(), 600};
         std::array<double, 5> value{}, inSpeed{}, outSpeed{}, inInfluence{}, outInfluence{};
         for (std::size_t i = 0; i < 5; ++i) {
             value[i] = AnyNumber(), inSpeed[i] = AnyNumber(), outSpeed[i] = AnyNumber();
@@ -203,6 +205,7 @@ protected:
     }
 
     Dice dice{20};
+    bool isWide = false;
 };
 
 TEST_F(ShortReads, AnswerAsTheStagesDo)
@@ -293,6 +296,7 @@ TEST_F(ShortReads, BatchesAnswerAsLoopsDo)
         for (int i = 0, count = dice.Below(3) ? 1 : 100; i < count; ++i) {
             twins.push_back(MakeTwin());
             for (int edit = dice.Below(4) ? 0 : 3; edit > 0; --edit) Edit(twins.back());
+            if (dice.Below(20) == 0) twins.back().Both([](LimitedStream& stream) { stream.throws = true; });
         }
         LetRead(twins);
         static_cast<void>(reports.Take());
