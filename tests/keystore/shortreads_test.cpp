@@ -105,8 +105,8 @@ protected:
         for (auto& stream : twin.streams)
             stream = std::make_unique<LimitedStream>(dimension, 600, 0, spatial, KFS_InterpMask_All, 0, desc, nullptr,
                                                      nullptr, false);
-        int const keys = dice.Below(12);
         isWide = dice.Below(4) == 0;
+        int const keys = dice.Below(isWide ? 5 : 12);
         for (int i = 0; i < keys; ++i) Insert(twin);
         static_cast<void>(reports.Take());  // times that can't be held are refused
         return twin;
@@ -148,7 +148,8 @@ protected:
 
     void Insert(Twin const& twin)
     {
-        // Mostly near zero, on some streams all around; an order around the circle is undone where a list can't have it.
+        // Mostly near zero, on some streams a few all around, where a search finds one key and misses another; an order
+        // around the circle is undone where a list can't have it.
         T_Time const at{!isWide && dice.Below(9) ? (dice.Below(40) - 20) * 7 : AnyTime(), 600};
         std::array<double, 5> value{}, inSpeed{}, outSpeed{}, inInfluence{}, outInfluence{};
         for (std::size_t i = 0; i < 5; ++i) {
@@ -305,7 +306,7 @@ TEST_F(ShortReads, BatchesAnswerAsLoopsDo)
         for (int call = 0; call < 4; ++call) {
             std::vector<T_Time> times;
             int time = AnyTime();
-            int const step = dice.Below(4) ? dice.Below(6) : -1;
+            int const step = !isWide && dice.Below(4) ? dice.Below(6) : -1;
             for (int i = dice.Below(MostTimes); i > 0; --i) {
                 unsigned int const scale = dice.Below(300) ? 600 : dice.Below(3) ? 30 : 0;
                 if (step >= 0 && dice.Below(50))
