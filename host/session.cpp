@@ -92,6 +92,11 @@ void AddStates(Q_RenderContext& context)
 
 namespace {
 
+[[gnu::noinline]] void RefuseOverridden(KFS_Stream const* stream, int time, KFS_ParamBag const* bag)
+{
+    if (Overridden(stream, time, bag).Source()) throw static_cast<int>(KFS_Err_ExprNoValue);
+}
+
 // The numbers of a value as the caller's buffer holds them: by way of the stream's own conversion, unless it holds doubles.
 void PutExternal(KFS_Stream const* stream, int time, double const* numbers, std::size_t count, void* value)
 {
@@ -109,8 +114,8 @@ void PutExternal(KFS_Stream const* stream, int time, double const* numbers, std:
 
 }  // namespace
 
-// Keys that no bag overrides are read as they are.
-ExpState::ExpState() : KFS_ExpState(KeyReads::Plain) {}
+// Keys that no bag overrides are read as they are. Expressions do nothing but compute.
+ExpState::ExpState() : KFS_ExpState(KeyReads::Plain, ExprRuns::InPlace) {}
 
 ExpState::~ExpState() = default;
 
@@ -125,8 +130,10 @@ void ExpState::EvalExprValue(KFS_Stream const* stream, int time, int flags, void
 
 void ExpState::EvalExprValueF(KFS_Stream const* stream, int time, int flags, double* value, KFS_ParamBag const* bag)
 {
-    if (bag && Overridden(stream, time, bag).Source()) throw static_cast<int>(KFS_Err_ExprNoValue);
-    if (!engine_) engine_ = std::make_unique<ExpressionEngine>(*this);
+    if (bag) [[unlikely]]
+        RefuseOverridden(stream, time, bag);
+    if (!engine_) [[unlikely]]
+        engine_ = std::make_unique<ExpressionEngine>(*this);
     engine_->Evaluate(stream, time, flags, value, bag);
 }
 

@@ -15,6 +15,7 @@
 #include "keystore/keylist_private.h"
 #include "keystore/renderstates_private.h"
 #include "keystore/savedrecords_private.h"
+#include "keystore/shortcuts_private.h"
 #include "keystore/shortread_private.h"
 #include "keystore/valuedata_private.h"
 #include "overrides/parambag.h"
@@ -142,13 +143,13 @@ Q_RenderContext const* ProjectRenderContext(KFS_Stream const* stream)
 }
 
 // The expression and, where it has no value, the keys. An expression may have the host replace the state that runs it,
-// so a reference is held; a read of the keys alone does without.
+// so a reference is held, unless the state has promised to stay; a read of the keys alone does without.
 template <class Form, class ReadKeys>
-[[gnu::noinline]] int ReadHoldingState(Q_RenderContext const* context, Reading const& reading,
-                                       typename Form::Value* value, unsigned char* atKey, ReadKeys const& readKeys)
+[[gnu::noinline]] int ReadWithExpression(Q_RenderContext const* context, KFS_ExpState* state, Reading const& reading,
+                                         typename Form::Value* value, unsigned char* atKey, ReadKeys const& readKeys)
 {
-    boost::shared_ptr<Q_RenderState> const held = context->GetState(KFS_ExpState::S_StateName);
-    KFS_ExpState* const state = KFSp_GetRenderStates(context).expState;
+    boost::shared_ptr<Q_RenderState> held;
+    if (!state->StaysInPlace()) held = context->GetState(KFS_ExpState::S_StateName);
     int code = 0;
     if (!ReadExpression<Form>(state, reading, value, atKey, &code)) readKeys(state);
     return code == KFS_Err_ExprNoValue ? 0 : code;
@@ -165,7 +166,7 @@ int ReadStaged(Reading const& reading, Q_RenderContext const* context, typename 
     if (!state) [[unlikely]]
         return ReportMissingState();
     if (WantsExpression(reading, value)) [[unlikely]]
-        return ReadHoldingState<Form>(context, reading, value, atKey, readKeys);
+        return ReadWithExpression<Form>(context, state, reading, value, atKey, readKeys);
     readKeys(state);
     return 0;
 }
@@ -262,7 +263,7 @@ int CopyExternalOut(KFS_Stream const* seen, void const* from, void* value)
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_GetValue, stream, KFSp_Row_GetValue)) return code;
     return KFSp_Boundary([&] {
-        Q_RenderContext const* const current = Q_RenderContext::PeekCurrent();
+        Q_RenderContext const* const current = KFSp_PeekRenderContext();
         KFS_Stream const* const seen = KFSp_Seen(stream, current);
         int at = 0;
         if (int const code = KFSp_TimeInStream(seen, time, &at)) return code;
@@ -279,7 +280,7 @@ int CopyExternalOut(KFS_Stream const* seen, void const* from, void* value)
 {
     if (int const code = KFSp_CheckStream(KFSp_Op_GetValue, stream, KFSp_Row_GetValue)) return code;
     return KFSp_Boundary([&] {
-        Q_RenderContext const* const current = Q_RenderContext::PeekCurrent();
+        Q_RenderContext const* const current = KFSp_PeekRenderContext();
         KFS_Stream const* const seen = KFSp_Seen(stream, current);
         int at = 0;
         if (int const code = KFSp_TimeInStream(seen, time, &at)) return code;

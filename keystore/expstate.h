@@ -49,6 +49,8 @@ public:
 
     // Whether the state has promised KeyReads::Plain.
     bool ReadsKeysPlainly() const { return keyReads_ == KeyReads::Plain; }
+    // Whether the state has promised ExprRuns::InPlace.
+    bool StaysInPlace() const { return exprRuns_ == ExprRuns::InPlace; }
 
 protected:
     // What a state says of its EvalNoExprValue and EvalNoExprValueF.
@@ -59,10 +61,21 @@ protected:
         // the class for all that derive from it.
         Plain,
     };
-    explicit KFS_ExpState(KeyReads keyReads = KeyReads::Asked) : keyReads_(keyReads) {}
+    // What a state says of the expressions that it runs.
+    enum class ExprRuns : unsigned char {
+        Held,  // one may have the state replaced in its render context, so each read holds a reference
+        // None does anything to its render context, and no other thread does while one runs. A promise of the class, as
+        // above.
+        InPlace,
+    };
+    explicit KFS_ExpState(KeyReads keyReads = KeyReads::Asked, ExprRuns exprRuns = ExprRuns::Held)
+        : keyReads_(keyReads),
+          exprRuns_(exprRuns)
+    {}
 
 private:
     KeyReads keyReads_;
+    ExprRuns exprRuns_;
 };
 
 // The state of a host that has no expression engine, and whose bags have no say over keys: every read is one of the keys.

@@ -15,6 +15,7 @@
 #include "keystore/items_private.h"
 #include "keystore/keylist_private.h"
 #include "keystore/renderstates_private.h"
+#include "keystore/shortcuts_private.h"
 #include "keystore/valuedata_private.h"
 #include "tree/listener_private.h"
 
@@ -294,7 +295,7 @@ KFS_Stream const* KFS_Stream::GetAsLeaf() const
 
 KFS_StreamKeyData const* KFS_Stream::GetKeyData() const
 {
-    Q_RenderContext const* const context = Q_RenderContext::PeekCurrent();
+    Q_RenderContext const* const context = KFSp_PeekRenderContext();
     if (!context || !context->GetIsTempCloneContext()) [[likely]]
         return &keyData_;
     if (!isWhole_) return &keyData_;

@@ -4,6 +4,7 @@
 
 #include "keystore/cachestate.h"
 #include "keystore/renderstates_private.h"
+#include "keystore/shortcuts_private.h"
 
 #include <memory>
 
@@ -12,7 +13,7 @@ namespace {
 // Where the calling thread's render keeps its caches, or null outside a temporary clone context.
 KFS_StreamCacheState* CloneState()
 {
-    Q_RenderContext const* const context = Q_RenderContext::PeekCurrent();
+    Q_RenderContext const* const context = KFSp_PeekRenderContext();
     return context && context->GetIsTempCloneContext() ? KFSp_GetRenderStates(context).cacheState : nullptr;
 }
 
@@ -109,9 +110,11 @@ void KFS_ExprInfo::SetFlags(unsigned int flags)
 
 boost::any* KFS_ExprInfo::GetExpressionCacheImpl() const
 {
-    Data& data = FieldsForModify();  // also where the cache is the render's: the end of the record drops that one then
+    Data* data = data_.load(std::memory_order_acquire);
+    if (!data)
+        data = &FieldsForModify();  // also where the cache is the render's: the end of the record drops that one then
     KFS_StreamCacheState* const state = CloneState();
-    return state ? state->GetOverrideExpressionCache(this) : &data.cache;
+    return state ? state->GetOverrideExpressionCache(this) : &data->cache;
 }
 
 void KFS_ExprInfo::SetExpressionCache(boost::any const& cache) const

@@ -16,27 +16,44 @@ bool Same(u16str const& a, u16str const& b)
     return a.size() == b.size() && std::memcmp(a.data(), b.data(), a.size() * sizeof(unsigned short)) == 0;
 }
 
-}  // namespace
-
-KFS_ParamBag::KFS_ParamBag(KFS_ParamBag const& source) : overrides_(source.overrides_)
+// What a bag's GUID begins with, and that of an empty one is made of.
+KFS_OverrideHash EmptyHash()
 {
-    FillIndex();
-    boost::mutex::scoped_lock const hold(source.lock_);
-    guid_ = source.guid_;
-    dirty_ = source.dirty_.load();
+    KFS_OverrideHash hash;
+    hash.Mix("KFS_ParamBag", 12);
+    return hash;
 }
 
-KFS_ParamBag::KFS_ParamBag(KFS_ParamBag const& a, KFS_ParamBag const& b) : overrides_(a.overrides_)
+}  // namespace
+
+KFS_ParamBag::KFS_ParamBag(KFS_ParamBag const& source)
 {
-    overrides_.insert(b.overrides_.begin(), b.overrides_.end());
+    if (source.IsEmpty()) return;
+    content_ = std::make_unique<Content>();
+    content_->overrides = source.content_->overrides;
     FillIndex();
+    boost::mutex::scoped_lock const hold(source.content_->lock);
+    content_->guid = source.content_->guid;
+    content_->dirty = source.content_->dirty.load();
+}
+
+KFS_ParamBag::KFS_ParamBag(KFS_ParamBag const& a, KFS_ParamBag const& b) : KFS_ParamBag(a)
+{
+    if (b.IsEmpty()) return;
+    if (!content_) content_ = std::make_unique<Content>();
+    content_->overrides.insert(b.content_->overrides.begin(), b.content_->overrides.end());
+    FillIndex();
+    content_->dirty = true;
 }
 
 void KFS_ParamBag::FillIndex()
 {
-    index_.reserve(overrides_.size());
-    for (Overrides::value_type const& entry : overrides_) index_.push_back({KFSp_CapsuleHash(entry.first), &entry});
-    std::ranges::sort(index_, {}, &Named::hash);
+    std::vector<Named>& index = content_->index;
+    index.clear();
+    index.reserve(content_->overrides.size());
+    for (Overrides::value_type const& entry : content_->overrides)
+        index.push_back({KFSp_CapsuleHash(entry.first), &entry});
+    std::ranges::sort(index, {}, &Named::hash);
 }
 
 // What can run out of memory comes first: a GUID must never stand beside a content that isn't its own.
@@ -48,10 +65,7 @@ KFS_ParamBag& KFS_ParamBag::operator=(KFS_ParamBag const& source)
 
 KFS_ParamBag& KFS_ParamBag::operator=(KFS_ParamBag&& source) noexcept
 {
-    overrides_.swap(source.overrides_);
-    index_.swap(source.index_);
-    std::swap(guid_, source.guid_);
-    dirty_ = source.dirty_.exchange(dirty_);
+    content_.swap(source.content_);
     return *this;
 }
 
@@ -59,58 +73,62 @@ KFS_ParamBag::~KFS_ParamBag() = default;
 
 void KFS_ParamBag::SetDirty() const
 {
-    boost::mutex::scoped_lock const hold(lock_);
-    dirty_ = true;
-    guid_ = Guid();
+    if (!content_) return;
+    boost::mutex::scoped_lock const hold(content_->lock);
+    content_->dirty = true;
+    content_->guid = Guid();
 }
 
+// All bags without a content are the same bag; what is worked out for them is kept nowhere.
 Guid KFS_ParamBag::GetGUID() const
 {
-    if (dirty_) ComputeGuid();
-    return guid_;
+    if (!content_) return EmptyHash().GetGuid();
+    if (content_->dirty) ComputeGuid();
+    return content_->guid;
 }
 
 // Of several threads that come here at once one computes; the others find it done, and nobody writes what another reads.
 void KFS_ParamBag::ComputeGuid() const
 {
-    boost::mutex::scoped_lock const hold(lock_);
-    if (!dirty_) return;
-    KFS_OverrideHash hash;
-    hash.Mix("KFS_ParamBag", 12);
-    for (auto const& [id, streamOverride] : overrides_) {
+    boost::mutex::scoped_lock const hold(content_->lock);
+    if (!content_->dirty) return;
+    KFS_OverrideHash hash = EmptyHash();
+    for (auto const& [id, streamOverride] : content_->overrides) {
         hash.Mix(id.data(), id.size() * sizeof(unsigned short));
         streamOverride->MixIn(hash);
     }
-    guid_ = hash.GetGuid();
-    dirty_ = false;
+    content_->guid = hash.GetGuid();
+    content_->dirty = false;
 }
 
 void KFS_ParamBag::AddOverride(KFS_StreamBase const* stream, boost::shared_ptr<KFS_StreamOverride> streamOverride)
 {
     u16str const& id = stream->GetStreamCapsuleData().id;
-    index_.reserve(overrides_.size() + 1);  // so that nothing fails once the entry is made
-    auto const [place, isNew] = overrides_.try_emplace(id);
+    if (!content_) content_ = std::make_unique<Content>();
+    std::vector<Named>& index = content_->index;
+    index.reserve(content_->overrides.size() + 1);  // so that nothing fails once the entry is made
+    auto const [place, isNew] = content_->overrides.try_emplace(id);
     place->second = std::move(streamOverride);
     unsigned int const hash = KFSp_CapsuleHash(id);
-    if (isNew) index_.insert(std::ranges::upper_bound(index_, hash, {}, &Named::hash), {hash, &*place});
+    if (isNew) index.insert(std::ranges::upper_bound(index, hash, {}, &Named::hash), {hash, &*place});
     SetDirty();
 }
 
 void KFS_ParamBag::Clear()
 {
-    overrides_.clear();
-    index_.clear();
-    SetDirty();
+    content_.reset();
 }
 
 KFS_StreamOverride const* KFS_ParamBag::Find(KFS_StreamBase const* stream) const
 {
-    if (index_.empty()) return nullptr;
+    if (!content_) return nullptr;
+    std::vector<Named> const& index = content_->index;
+    if (index.empty()) return nullptr;
     unsigned int const hash = stream->GetStreamCapsuleHash();
-    auto named = std::ranges::lower_bound(index_, hash, {}, &Named::hash);
-    if (named == index_.end() || named->hash != hash) return nullptr;
+    auto named = std::ranges::lower_bound(index, hash, {}, &Named::hash);
+    if (named == index.end() || named->hash != hash) return nullptr;
     u16str const& id = stream->GetStreamCapsuleData().id;
-    for (; named != index_.end() && named->hash == hash; ++named)
+    for (; named != index.end() && named->hash == hash; ++named)
         if (Same(named->entry->first, id)) return named->entry->second.get();
     return nullptr;
 }
@@ -133,8 +151,8 @@ bool KFS_ParamBag::GetStreamOverride(KFS_StreamBase const* stream, KFS_StreamOve
 
 bool KFS_ParamBag::IsTimeInvariant() const
 {
-    return std::all_of(
-        overrides_.begin(), overrides_.end(), [](auto const& entry) { return entry.second->IsTimeInvariant(); });
+    return !content_ || std::ranges::all_of(
+                            content_->overrides, [](auto const& entry) { return entry.second->IsTimeInvariant(); });
 }
 
 int KFS_ParamBag::GetSortOrder(KFS_ParamBag const& other) const
@@ -149,9 +167,11 @@ std::vector<boost::shared_ptr<KFS_StreamOverride>>
 KFS_ParamBag::FindRightySymmetricDifference(KFS_ParamBag const& other, bool effectsOnly) const
 {
     std::vector<boost::shared_ptr<KFS_StreamOverride>> different;
-    for (auto const& [id, theirs] : other.overrides_) {
-        auto const place = overrides_.find(id);
-        if (place == overrides_.end() || *place->second == *theirs) continue;
+    if (!content_ || !other.content_) return different;
+    Overrides const& mine = content_->overrides;
+    for (auto const& [id, theirs] : other.content_->overrides) {
+        auto const place = mine.find(id);
+        if (place == mine.end() || *place->second == *theirs) continue;
         if (!effectsOnly || theirs->GetIsForEffectStream()) different.push_back(theirs);
     }
     return different;

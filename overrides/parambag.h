@@ -24,7 +24,8 @@
 // Threads: any number of readers, GetGUID included, while nobody changes the bag; a shared bag isn't changed.
 class KFS_API KFS_ParamBag {
 public:
-    // Throws boost::thread_resource_error where there is no mutex to be had; so do the other constructors.
+    // Costs nothing: what a bag holds, its mutex included, is made with the first override. So the copies of bags with
+    // something in them, and AddOverride, throw boost::thread_resource_error where there is no mutex to be had.
     KFS_ParamBag() = default;
     KFS_ParamBag(KFS_ParamBag const& source);
     // The union of both; where both hold an override for one stream, `a` wins.
@@ -49,8 +50,11 @@ public:
     // The override itself, owned by the bag; false, and `streamOverride` is left alone, where there is none.
     bool GetStreamOverride(KFS_StreamBase const* stream, KFS_StreamOverride const** streamOverride) const;
 
-    bool IsEmpty() const { return overrides_.empty(); }
-    unsigned int GetOverrideCount() const { return static_cast<unsigned int>(overrides_.size()); }
+    bool IsEmpty() const { return !content_ || content_->overrides.empty(); }
+    unsigned int GetOverrideCount() const
+    {
+        return content_ ? static_cast<unsigned int>(content_->overrides.size()) : 0;
+    }
     // Whether no override has a value function.
     bool IsTimeInvariant() const;
 
@@ -71,17 +75,21 @@ private:
         Overrides::value_type const* entry;
     };
 
+    struct Content {
+        Overrides overrides;
+        // All of them, sorted by hash: nearly all streams that are read aren't named, and are told so by this; of one that
+        // is a single identifier is compared.
+        std::vector<Named> index;
+        hearth::utility::Guid guid;
+        boost::mutex lock;  // guards guid and the way of dirty to false
+        std::atomic<bool> dirty{true};
+    };
+
     KFS_StreamOverride const* Find(KFS_StreamBase const* stream) const;
     void FillIndex();
     void ComputeGuid() const;
 
-    Overrides overrides_;
-    // All of them, sorted by hash: nearly all streams that are read aren't named, and are told so by this; of one that is
-    // a single identifier is compared.
-    std::vector<Named> index_;
-    mutable hearth::utility::Guid guid_;
-    mutable boost::mutex lock_;  // guards guid_ and the way of dirty_ to false
-    mutable std::atomic<bool> dirty_{true};
+    std::unique_ptr<Content> content_;  // null until something is put in
 };
 
 // Two bags as one, for a scope: the union only where both have something to say, else whichever has, without a copy.
