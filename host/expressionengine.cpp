@@ -9,7 +9,9 @@
 
 #include <algorithm>
 #include <cmath>
+#include <cstdio>
 #include <cstring>
+#include <initializer_list>
 #include <limits>
 #include <utility>
 
@@ -23,13 +25,39 @@ constexpr int NestedFailure = KFS_Err_LegacyMismatch;
 constexpr double StepsOfRead = 50.0;
 constexpr char const* NotFinite = "gives a number that isn't finite";
 
+bool HasAnyWord(std::string_view text, std::initializer_list<std::string_view> words)
+{
+    return std::ranges::any_of(
+        words, [text](std::string_view word) { return HasWord(text, word); });
+}
+
 // Loops, and long texts, of which there are none without these; names can be written with backslashes.
 bool MayTakeLong(std::string_view text)
 {
     constexpr std::size_t surelyShort = 4096;
-    constexpr std::string_view words[] = {"for", "while", "repeat", "goto", "function", "rep", "concat", "format"};
     return text.size() > surelyShort || text.find("..") != text.npos || text.find('\\') != text.npos ||
-           std::ranges::any_of(words, [text](std::string_view word) { return HasWord(text, word); });
+           HasAnyWord(text, {"for", "while", "repeat", "goto", "function", "rep", "concat", "format"});
+}
+
+// Whether what may take long is only that it counts from one small number to another and computes with numbers meanwhile. It has
+// about as many instructions as characters, so that it isn't worth slowing them down to count them.
+bool EndsSoon(std::string const& text)
+{
+    constexpr double soon = 1000.0;
+    bool const hasOnlyNumbers = text.find_first_of("'\"\\:") == text.npos && text.find("[[") == text.npos &&
+                                text.find("[=") == text.npos && text.find("..") == text.npos;
+    if (!hasOnlyNumbers || HasAnyWord(text, {"while", "repeat", "goto", "function", "string", "table"})) return false;
+    auto steps = static_cast<double>(std::ranges::count_if(text, [](char c) { return c != ' ' && c != '\n'; }));
+    for (std::size_t at = text.find("for"); at != text.npos && steps < soon; at = text.find("for", at + 1)) {
+        int first = 0;
+        int last = 0;
+        int end = 0;  // where the scan came to
+        char const* const loop = text.c_str() + at;
+        if (std::sscanf(loop, "for %*[A-Za-z0-9_] = %5d , %5d do%n", &first, &last, &end) != 2 || end == 0)
+            return false;
+        steps *= std::max(1, last - first + 1);
+    }
+    return steps < soon;
 }
 
 // The function and its arguments lie on the stack, but for the value, which is made in here: that takes memory, and there may
@@ -63,7 +91,7 @@ public:
     {
         engine_.runs_[engine_.depth_++] = run;
         engine_.lua_->MeetText(run.compiled->longestText);
-        if (run.compiled->mayTakeLong) engine_.lua_->CountInstructions(true);
+        if (run.compiled->isCounted) engine_.lua_->CountInstructions(true);
     }
     ~ScRun()
     {
@@ -128,6 +156,7 @@ CompiledExpression& ExpressionEngine::CompiledFor(KFS_Stream const& seen)
     made->usesValue = HasWord(text, "value");
     made->usesFrame = HasWord(text, "frame");
     made->mayTakeLong = MayTakeLong(text);
+    made->isCounted = made->mayTakeLong && !EndsSoon(text);
     made->function = lua_->Compile(text, made->fault, &made->longestText);
     *cache = made;
     return *made;

@@ -33,6 +33,7 @@ struct CompiledExpression {
     bool usesValue = false;                // what it doesn't name isn't worked out
     bool usesFrame = false;
     bool mayTakeLong = false;
+    bool isCounted = false;       // instruction by instruction, which slows each of them down
     std::size_t longestText = 0;  // that stands in it, in bytes
     std::set<int> dependencies;   // which the stream knows of
 };

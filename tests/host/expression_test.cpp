@@ -236,6 +236,7 @@ TEST_F(Expressions, AreKeptInside)
         "while true do end return 1",
         "repeat local x = 1 until false",
         "for i = 1, 1e18 do end return 1",
+        "for i = 1, 9 do for j = 1, 99999 do for k = 1, 999 do end end end return 1",
         "::again:: goto again",
         "local function f() return f() end return f()",
         "local s = 0 for i = 1, 1e9 do s = s + at(i) end return s",
