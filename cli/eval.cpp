@@ -100,13 +100,17 @@ struct Evaluation {
 // Answers whether any has failed.
 bool TryStream(Evaluation const& evaluation, Shown& stream, Selection const& selection)
 try {
-    if (stream.HasValues())
-        for (Rational const& time : evaluation.times) stream.Read(time);
-    return TellFailedExpressions(selection);
-} catch (kfshost::StoreError const&) {
-    bool const anyFailed = TellFailedExpressions(selection);
-    if (!FailureOf(stream.Item())) throw;
+    bool anyFailed = false;
+    if (!stream.HasValues()) return anyFailed;
+    for (Rational const& time : evaluation.times) {
+        stream.Read(time);
+        anyFailed = TellFailedExpressions(selection) || anyFailed;  // at once: what was told isn't run again
+    }
     return anyFailed;
+} catch (kfshost::StoreError const&) {
+    TellFailedExpressions(selection);
+    if (!FailureOf(stream.Item())) throw;
+    return true;
 }
 
 // Reads everything once: a failed command writes nothing, and what is written isn't held in memory.

@@ -10,6 +10,9 @@
 // Expressions: texts in Lua that compute a stream's value in place of its keys (docs/expressions.md says what they see). The
 // engine belongs to each render context's ExpState (host/session.h) and is made with the first expression that it reads.
 //
+// A temporary clone context takes the paths of a tree's streams once, when an expression first needs them, which has to be while
+// nobody edits the tree. It goes by them as long as it lives, and the streams must live as long.
+//
 // An expression that fails has no value: the read goes on with the keys, and the failure is kept in the ExpState that read it,
 // once a stream. Streams that are told of it (TellExpressionErrors) count as without an expression until their text or
 // their flags change.
@@ -36,7 +39,7 @@ std::optional<ExpressionError> CheckExpression(std::string_view text);
 void PrepareExpressions(SceneGroup& tree);
 
 // The stream that an id of KFS_ExprInfo's dependencies stands for, which is its place in the order of the tree as it is now;
-// empty for an id that stands for none.
+// empty for an id that stands for none. Ids hold until streams come or go: then those noted before may name others.
 std::string PathOfDependency(SceneGroup const& tree, int id);
 
 // The failures that the current render context's reads have met since this was last asked.

@@ -77,6 +77,12 @@ bool IsSame(u16str const& a, u16str const& b)
     return a.size() == b.size() && std::memcmp(a.data(), b.data(), a.size() * sizeof a[0]) == 0;
 }
 
+bool IsOfRender()
+{
+    Q_RenderContext const* const context = Q_RenderContext::PeekCurrent();
+    return context && context->GetIsTempCloneContext();
+}
+
 std::string SentenceOf(int code)
 {
     return code == KFS_Err_NoKeys ? "it has neither keys nor a value" : "error " + std::to_string(code);
@@ -106,7 +112,11 @@ private:
     bool counted_;
 };
 
-ExpressionEngine::ExpressionEngine(KFS_ExpState& state) : state_(state), lua_(std::make_shared<LuaState>(this)) {}
+ExpressionEngine::ExpressionEngine(KFS_ExpState& state)
+    : state_(state),
+      lua_(std::make_shared<LuaState>(this)),
+      keepsPaths_(IsOfRender())
+{}
 
 int ExpressionEngine::UnitsOf(double seconds, KFS_Stream const& seen)
 {
@@ -335,37 +345,30 @@ std::vector<ExpressionError> ExpressionEngine::TakeErrors()
 std::string ExpressionEngine::PathOfStream(KFS_Stream const& stream) const
 {
     SceneGroup const* const scene = SceneOf(stream);
-    std::shared_ptr<StreamPaths const> const paths = scene ? PathsOf(*scene) : nullptr;
-    std::string const* const path = paths ? paths->PathOf(&stream) : nullptr;
+    std::string const* const path = scene ? PathsOfScene(*scene).PathOf(&stream) : nullptr;
     return path ? *path : CleanName(Q_UTF16ToMBString(stream.GetDisplayName()));
 }
 
 // ---- what expressions ask for
 
-StreamPaths const* ExpressionEngine::PathsOfCurrent()
+StreamPaths const& ExpressionEngine::PathsOfScene(SceneGroup const& scene) const
 {
-    SceneGroup const* const scene = SceneOf(*Current().stream);
-    if (!scene) return nullptr;
-    if (scene != scene_ || !paths_ || !paths_->IsCurrent()) {
-        paths_ = PathsOf(*scene);
-        scene_ = scene;
-    }
-    return paths_.get();
-}
-
-void ExpressionEngine::NoteDependency(int id)
-{
-    if (Current().compiled->dependencies.insert(id).second) Current().stream->GetExprInfo().AddDependency(id);
+    auto const known = std::ranges::find(paths_, &scene, [](auto const& pair) { return pair.first; });
+    if (known != paths_.end() && (keepsPaths_ || known->second->IsCurrent())) return *known->second;
+    auto paths = PathsOf(scene);
+    if (!keepsPaths_) paths_.clear();
+    return *paths_.emplace_back(&scene, std::move(paths)).second;
 }
 
 void ExpressionEngine::ReadStream(lua_State* lua, std::string_view path, double const* seconds, Numbers& values)
 {
     lua_->Charge(lua, StepsOfRead);
-    StreamPaths const* const paths = PathsOfCurrent();
-    StreamPaths::Entry const entry = paths ? paths->Find(path) : StreamPaths::Entry{};
+    SceneGroup const* const scene = SceneOf(*Current().stream);
+    StreamPaths::Entry const entry = scene ? PathsOfScene(*scene).Find(path) : StreamPaths::Entry{};
     std::string const quoted = '"' + CleanName(path) + '"';
-    if (!entry.stream || SceneOf(*entry.stream) != scene_) luaL_error(lua, "there is no stream %s", quoted.c_str());
-    NoteDependency(entry.id);
+    if (!entry.stream || SceneOf(*entry.stream) != scene) luaL_error(lua, "there is no stream %s", quoted.c_str());
+    Current().stream->GetExprInfo().AddDependency(
+        entry.id);  // again each time: a text that is set anew has forgotten it
     KFS_Stream const& seen = *entry.stream->GetKeyData()->stream;
     if (seen.HasExpressionError() && seen.HasEnabledExpression())
         luaL_error(lua, "the expression of %s is in error", quoted.c_str());

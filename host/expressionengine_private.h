@@ -9,9 +9,9 @@
 
 #include <array>
 #include <memory>
-#include <set>
 #include <string>
 #include <unordered_set>
+#include <utility>
 #include <vector>
 
 namespace kfshost {
@@ -96,10 +96,9 @@ private:
     void CheckPlace(KFS_Stream const* stream, int time);
     [[noreturn]] void Fail(KFS_Stream const* stream, ExpressionFault fault);
     void Record(KFS_Stream const* stream, ExpressionFault const& fault);
-    void NoteDependency(int id);
     std::string Chain(std::size_t from, KFS_Stream const* last) const;
     std::string PathOfStream(KFS_Stream const& stream) const;
-    StreamPaths const* PathsOfCurrent();
+    StreamPaths const& PathsOfScene(SceneGroup const& scene) const;
     std::optional<double> FrameOf(Run const& run) const;
 
     KFS_ExpState& state_;
@@ -108,8 +107,10 @@ private:
     std::size_t depth_ = 0;
     ExpressionFault fault_;                      // of the expression that has just ended
     std::optional<ExpressionFault> innerFault_;  // of the read that an expression asked for last
-    SceneGroup const* scene_ = nullptr;          // whose paths these are
-    std::shared_ptr<StreamPaths const> paths_;
+    // In a render's context the first ones hold for as long as it lives: to look again would be to walk over a tree that may be
+    // being edited. Elsewhere these are of one scene, while they are current.
+    bool const keepsPaths_;
+    mutable std::vector<std::pair<SceneGroup const*, std::shared_ptr<StreamPaths const>>> paths_;
     std::vector<ExpressionError> errors_;
     std::unordered_set<KFS_Stream const*> failed_;  // the streams of these
 };

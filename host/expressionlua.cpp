@@ -3,6 +3,7 @@
 #include "host/expressionlua_private.h"
 
 #include <algorithm>
+#include <charconv>
 #include <cstdlib>
 #include <new>
 #include <utility>
@@ -74,6 +75,29 @@ int LoadEither(lua_State* lua, std::string_view text)
     else
         lua_remove(lua, -2);
     return looksLikeExpression ? asExpression : asStatements;
+}
+
+// As much of an error's text as is shown, in whole characters.
+std::string BeginOf(std::string_view text)
+{
+    std::size_t length = std::min(text.size(), MostShown);
+    auto const isInside = [&](std::size_t at) { return (static_cast<unsigned char>(text[at]) & 0xC0) == 0x80; };
+    if (length < text.size())
+        while (length > 0 && isInside(length)) --length;
+    return std::string(text.substr(0, length));
+}
+
+// Of a text that begins with a place, as Lua puts it there; what only looks alike stays.
+void TakeLine(ExpressionFault& fault)
+{
+    if (!fault.text.starts_with(Place)) return;
+    char const* const begin = fault.text.data() + Place.size();
+    char const* const end = fault.text.data() + fault.text.size();
+    int line = 0;
+    auto const [behind, code] = std::from_chars(begin, end, line);
+    if (code != std::errc() || line < 0 || !std::string_view(behind, end).starts_with(": ")) return;
+    if (line > 0) fault.line = line;
+    fault.text.erase(0, static_cast<std::size_t>(behind + 2 - fault.text.data()));
 }
 
 }  // namespace
@@ -247,17 +271,15 @@ ExpressionFault LuaState::FaultOfMemory()
 ExpressionFault LuaState::FaultOf(int status)
 {
     ExpressionFault fault;
-    if (status == LUA_ERRMEM || status < 0) {  // below 0: something else than an error of Lua was thrown
+    // Below 0 something else than an error of Lua was thrown: by what reads call it can only be want of memory. What it was isn't
+    // known any more.
+    if (status == LUA_ERRMEM || status < 0) {
         fault = FaultOfMemory();
     } else if (lua_type(lua_, -1) == LUA_TSTRING) {
         std::size_t length = 0;
         char const* const text = lua_tolstring(lua_, -1, &length);
-        fault.text.assign(text, std::min(length, MostShown));
-        if (fault.text.starts_with(Place)) {
-            std::size_t const end = fault.text.find(": ", Place.size());
-            fault.line = std::atoi(fault.text.c_str() + Place.size());
-            fault.text.erase(0, end == std::string::npos ? 0 : end + 2);
-        }
+        fault.text = BeginOf({text, length});
+        TakeLine(fault);
     } else {
         fault.text = std::string("error with a ") + luaL_typename(lua_, -1) + " in place of a text";
     }

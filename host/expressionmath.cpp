@@ -74,14 +74,23 @@ double Atan(double x)
     return x < 0.0 ? -angle : angle;
 }
 
-double WholePower(double x, int n)
+double Multiplied(double x, unsigned int times)
 {
     double power = 1.0;
-    for (unsigned int rest = static_cast<unsigned int>(std::abs(n)); rest != 0; rest >>= 1) {
-        if (rest & 1) power *= x;
+    for (; times != 0; times >>= 1) {
+        if (times & 1) power *= x;
         x *= x;
     }
-    return n < 0 ? 1.0 / power : power;
+    return power;
+}
+
+// What is too small for a reciprocal of its own is multiplied from that of the base.
+double WholePower(double x, int n)
+{
+    auto const times = static_cast<unsigned int>(std::abs(n));
+    double const power = Multiplied(x, times);
+    if (n >= 0) return power;
+    return std::isinf(power) ? Multiplied(1.0 / x, times) : 1.0 / power;
 }
 
 // ---- drawn numbers
@@ -139,7 +148,7 @@ double Atan2(double y, double x)
     if (std::abs(y) > std::abs(x)) return (y < 0.0 ? -HalfPi : HalfPi) - Atan(x / y);
     double const angle = Atan(y / x);
     if (x > 0.0) return angle;
-    return y < 0.0 ? angle - 2.0 * HalfPi : angle + 2.0 * HalfPi;
+    return std::signbit(y) ? angle - 2.0 * HalfPi : angle + 2.0 * HalfPi;  // -0 lies below
 }
 
 double Exp(double x)

@@ -1,6 +1,7 @@
 #include "host/kinds.h"
 
 #include "frame/frame.h"
+#include "frame/services/reports.h"
 #include "frame/services/strings.h"
 #include "host/channelstream.h"
 #include "host/names.h"
@@ -167,7 +168,7 @@ int SceneGroup::EvaluateExpression(KFS_Stream const* stream, T_Time const* time,
 try {
     Q_RenderContext const* const context = Q_RenderContext::PeekCurrent();
     auto* const state = context ? dynamic_cast<KFS_ExpState*>(context->PeekState(KFS_ExpState::S_StateName)) : nullptr;
-    if (!state || !stream->HasEnabledExpression()) return 1;
+    if (!state || !stream->GetKeyData()->stream->HasActiveExpression()) return 1;
     unsigned int const scale = stream->GetKeyData()->stream->GetTimeScale();
     int at = 0;
     if (int const code = time ? T_ShortConvTime(time->value, time->scale, scale, &at) : 0) return code;
@@ -175,6 +176,8 @@ try {
     return 0;
 } catch (int code) {
     return code;
+} catch (std::exception& exception) {
+    return Q_TranslateAndReportException(exception);
 }
 
 AnimationGroup& SceneGroup::AppendAnimation(std::string const& name)

@@ -139,6 +139,10 @@ TEST_F(Expressions, GiveWhatTheyCompute)
         {"noise(0.5) == noise(0.5) and abs(noise(1.5) - noise(1.5 + 1e-9)) < 1e-6 and 1 or 0", 0, 1},
         {"type(pairs) == 'nil' and type(type) == 'function' and 1", 0, 1},
         {"select('#', table.unpack({1, 2, 3}))", 0, 3},
+        {"(tostring(-(0/0)) .. string.format(' %g', -(0/0))) == 'nan nan' and 1", 0, 1},
+        {"local t = {} for i = 1, 5000 do table.insert(t, i) end return #t", 0, 5000},
+        {"atan(-0.0, -1) == -pi and atan(0.0, -1) == pi and 1", 0, 1},
+        {"pow(2, -1030) * pow(2, 1000) * pow(2, 30)", 0, 1},
     };
     for (Row const& row : rows) {
         Set(box, row.text);
@@ -213,6 +217,7 @@ TEST_F(Expressions, SayWhatIsWrong)
         {"table.insert(math, 1)", "only local variables can be set"},
         {"('').rep = 1", "attempt to index a string value"},
         {"_ENV.x", "_ENV can't be used"},
+        {"error('expression:99999999999999: told', 0)", "expression:99999999999999: told"},
     };
     for (Row const& row : rows) {
         Set(box, row.text);
@@ -366,6 +371,11 @@ TEST_F(Expressions, OfChainsFailTogetherAndKeepTheirPlaces)
     box->GetExpressionDependencyIds(ids);
     ASSERT_EQ(1u, ids.size());
     EXPECT_EQ("a/Tag/weights", kfshost::PathOfDependency(*tree, *ids.begin()));
+
+    Set(box, "stream('a/Tag/weights') * 2");  // the same, which has forgotten them
+    Read(box, 12);
+    box->GetExpressionDependencyIds(ids);
+    EXPECT_EQ(1u, ids.size());
 
     Set(loop, "\nstream('a/Box/weights')");
     EXPECT_EQ(12.0, Read(box, 12)[0]);
