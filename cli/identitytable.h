@@ -19,7 +19,7 @@ struct IdentitySpan {
     kfshost::Rational start;   // seconds
     kfshost::Rational length;  // 0: a moment
 
-    auto operator<=>(IdentitySpan const&) const = default;
+    auto operator<=>(IdentitySpan const&) const = default;  // NOLINT(modernize-use-nullptr): a default has no zero
 };
 
 struct IdentityTable {

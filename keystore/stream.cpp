@@ -81,7 +81,7 @@ int SetPlainDescription(KFS_Stream* stream, KFS_ValueDesc const& newDesc)
     desc->dataType = (desc->dataType & ~0xFFL) | (newDesc.dataType & 0xFF);
     int code = 0;
     if (type >= 0) {
-        desc->itemSize = ElementSizes[static_cast<std::size_t>(type)];
+        desc->itemSize = ElementSizes[static_cast<unsigned char>(type)];
     } else {
         code = KFSp_CheckStream(KFSp_Op_SetCustomFuncs, stream, KFSp_Row_SetCustomFuncs);
         if (code == 0) {

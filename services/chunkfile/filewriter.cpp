@@ -242,7 +242,7 @@ int CKF_FileWriter::Create(char const* path, CKF_Target target) noexcept
     failure_ = {};
     size_ = 0;
     return Run([&] {
-        impl_.reset(new Impl(hook_));
+        impl_ = std::make_unique<Impl>(hook_);
         impl_->Create(path ? path : "", target);
     });
 }

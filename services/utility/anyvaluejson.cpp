@@ -99,10 +99,10 @@ private:
         u16str key;
     };
 
-    Q_AnyTree& Add(Q_Any value)
+    Q_AnyTree& Add(Q_Any const& value)
     {
         Open& parent = open_.back();
-        return parent.tree->push_back({std::move(parent.key), Q_AnyTree(std::move(value))})->second;
+        return parent.tree->push_back({std::move(parent.key), Q_AnyTree(value)})->second;
     }
 
     bool Value(Q_Any value)

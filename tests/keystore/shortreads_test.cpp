@@ -70,6 +70,12 @@ int CountingDispose(KFS_Stream const*, long, short, void*)
 {
     return 0;
 }
+// So much later, around the circle.
+int Around(int time, int by)
+{
+    return static_cast<int>(static_cast<unsigned>(time) + static_cast<unsigned>(by));
+}
+
 int FortyTwo(KFS_Stream const* stream, long, int time, int)
 {
     *KFSp_Numbers(stream->GetCache()) = 42.0;
@@ -226,7 +232,7 @@ TEST_F(ShortReads, AnswerAsTheStagesDo)
                         static_cast<KFS_StreamCacheState*>(context->PeekState(KFS_StreamCacheState::S_StateName))
                             ->FreeCacheData();
             }
-            if (dice.Below(3) != 0) time = dice.Below(3) ? time + dice.Below(9) - 2 : AnyTime();
+            if (dice.Below(3) != 0) time = dice.Below(3) ? Around(time, dice.Below(9) - 2) : AnyTime();
             constexpr unsigned int Scales[] = {600, 600, 600, 600, 600, 600, 1200, 30, 0};
             T_Time const at{time, Scales[dice.Below(9)]};
             int const flags = dice.Below(5) ? 0 : dice.Below(2) ? 0x1 : 0xF0;
@@ -310,7 +316,7 @@ TEST_F(ShortReads, BatchesAnswerAsLoopsDo)
             for (int i = dice.Below(MostTimes); i > 0; --i) {
                 unsigned int const scale = dice.Below(300) ? 600 : dice.Below(3) ? 30 : 0;
                 if (step >= 0 && dice.Below(50))
-                    time = static_cast<int>(static_cast<unsigned>(time) + static_cast<unsigned>(step));
+                    time = Around(time, step);
                 else
                     time = dice.Below(2) ? AnyTime() : AnyKeyTime(twins[0]);
                 times.push_back({time, scale});
