@@ -29,6 +29,7 @@ BELOW = {
 EXCEPTIONS = {
     ("keystore/shortcuts_private.h", "services/curvekernel/solve_private.h"),
     ("keystore/shortcuts_private.h", "services/sequence/list_private.h"),
+    ("keystore/shortcuts_private.h", "services/utility/context_private.h"),
     ("tree/birth.cpp", "services/stamp_private.h"),
 }
 
