@@ -13,7 +13,6 @@
 #include <cmath>
 #include <cstdint>
 #include <limits>
-#include <optional>
 
 using kfshost::Rational;
 using kfshost::ThrowIfFailed;
@@ -206,12 +205,12 @@ private:
     // A part of the segment behind a key. Where it ends in the next one the rate is the one before that.
     void AddPieces(int from, int to, std::int64_t pieces, int index)
     {
-        std::optional<int> const end = index == NoKey ? std::nullopt : std::optional(KeyUnits(index + 1));
+        bool const endsInKey = index != NoKey && to == KeyUnits(index + 1);
         std::int64_t const length = std::int64_t{to} - from;
         pieces = std::min(pieces, length);
         for (std::int64_t i = 0; i <= pieces; ++i) {
             int const time = static_cast<int>(from + (pieces == 0 ? 0 : length * i / pieces));
-            std::vector<double> const& rates = time == end ? rates_.Into(index + 1) : rates_.At(time);
+            std::vector<double> const& rates = endsInKey && time == to ? rates_.Into(index + 1) : rates_.At(time);
             if (!HasLines()) Read(time, row_);
             for (std::size_t c = 0; c < components_.size(); ++c) {
                 ComponentCurve& curve = curves_.components[c];
