@@ -62,7 +62,8 @@ struct Sides {
 
 Sides SidesAt(std::vector<Point> const& line, double x)
 {
-    auto const [first, last] = std::ranges::equal_range(line, x, {}, &Point::x);
+    auto const first = std::ranges::lower_bound(line, x, {}, &Point::x);
+    auto const last = std::ranges::upper_bound(line, x, {}, &Point::x);
     if (first != last) return {first->y, last[-1].y};
     if (first == line.begin() || first == line.end()) {
         double const held = first == line.begin() ? first->y : last[-1].y;
