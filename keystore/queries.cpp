@@ -39,7 +39,7 @@ bool KFS_Stream::IsModified() const
 
 bool KFS_Stream::IsAnimated(bool evenIfDisabled) const
 {
-    if (!IsCanonical() && GetParent() && AreDimensionsSeparated()) return IsAnyFollowerAnimated(this);
+    if (GetParent() && !IsCanonical() && AreDimensionsSeparated()) return IsAnyFollowerAnimated(this);
     KFS_Stream const* const seen = KFSp_Seen(this);  // a render's answers don't move with the main thread's edits
     if (seen->HasKeys()) return true;
     return evenIfDisabled ? seen->HasExpression() : seen->HasActiveExpression();
