@@ -105,14 +105,14 @@ private:
         return parent.tree->push_back({std::move(parent.key), Q_AnyTree(value)})->second;
     }
 
-    bool Value(Q_Any value)
+    bool Value(Q_Any const& value)
     {
         if (open_.size() == 1) return false;  // a bare value isn't a tree
         Open& parent = open_.back();
         if (parent.key == mixedKey_ && parent.tree->empty() && parent.tree->data().IsEmpty())
             parent.tree->data() = std::move(value);
         else
-            Add(std::move(value));
+            Add(value);
         parent.key.clear();
         return true;
     }
