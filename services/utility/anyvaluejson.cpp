@@ -110,7 +110,7 @@ private:
         if (open_.size() == 1) return false;  // a bare value isn't a tree
         Open& parent = open_.back();
         if (parent.key == mixedKey_ && parent.tree->empty() && parent.tree->data().IsEmpty())
-            parent.tree->data() = std::move(value);
+            parent.tree->data() = value;
         else
             Add(value);
         parent.key.clear();
